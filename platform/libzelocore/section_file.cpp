@@ -1,0 +1,363 @@
+/*
+ * Section files: reading them while others copy over them, and changing them.
+ *
+ * A list of n sections is one enumeration and n reads. The last file that was
+ * read is therefore kept with an index of its sections, and each call costs one
+ * stat and one look-up for as long as the file is the same.
+ */
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <time.h>
+
+#include <cerrno>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "replace_file.h"
+#include "section_text.h"
+#include "support.h"
+#include "szhash.h"
+#include "szlist.h"
+
+namespace zelo {
+namespace {
+
+constexpr int64_t kNanosecond = 1;
+constexpr int64_t kMillisecond = 1'000'000 * kNanosecond;
+constexpr int64_t kSecond = 1000 * kMillisecond;
+
+/* A copy in progress: one that is not done a second after its last write has
+ * lost its writer. */
+constexpr int64_t kCopyInProgress = kSecond;
+constexpr int64_t kPause = 4 * kMillisecond;
+constexpr int kMostPauses = kCopyInProgress / kPause;
+
+/* Time stamps without nanoseconds come from a file system that counts whole
+ * seconds, or pairs of them. */
+constexpr int64_t kCoarseStamp = 2 * kSecond;
+/* Kernel clocks differ by a tick or two among themselves; this is far more. */
+constexpr int64_t kClockSlack = 2 * kSecond;
+
+/* Far above any store, and below what would exhaust the machine. */
+constexpr off_t kMostBytes = off_t{1} << 30;
+
+int64_t Nanoseconds(const timespec &time) noexcept {
+  return time.tv_sec * kSecond + time.tv_nsec;
+}
+
+int64_t Now(clockid_t clock) noexcept {
+  timespec now{};
+  clock_gettime(clock, &now);
+  return Nanoseconds(now);
+}
+
+bool SameContents(const struct stat &a, const struct stat &b) noexcept {
+  return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_size == b.st_size &&
+         Nanoseconds(a.st_mtim) == Nanoseconds(b.st_mtim) &&
+         Nanoseconds(a.st_ctim) == Nanoseconds(b.st_ctim);
+}
+
+/* ---- reading ---- */
+
+struct Snapshot {
+  std::string contents;
+  struct stat status; /* before the first byte was read */
+  int64_t opened;     /* the clock that stamps files, before the file was opened */
+  bool steady;        /* nobody wrote while it was read */
+};
+
+/* Reads up to the end of the file, which need not be where fstat saw it. */
+bool ReadAll(int fd, size_t expected, std::string *contents) {
+  constexpr size_t kLeastStep = 4096;
+  size_t filled = 0;
+  contents->resize(expected + 1); /* the one more sees the end without another step */
+  for (;;) {
+    if (filled == contents->size()) {
+      contents->resize(filled + filled / 2 + kLeastStep);
+    }
+    const ssize_t count = read(fd, contents->data() + filled, contents->size() - filled);
+    if (count < 0 && errno == EINTR) {
+      continue;
+    }
+    if (count < 0 || filled > static_cast<size_t>(kMostBytes)) {
+      return false;
+    }
+    if (count == 0) {
+      contents->resize(filled);
+      return true;
+    }
+    filled += static_cast<size_t>(count);
+  }
+}
+
+/* 0, or -1 (0x0900, 0x0B00). */
+int ReadSnapshot(const std::string &path, int flags, Snapshot *snapshot) {
+  snapshot->opened = Now(CLOCK_REALTIME_COARSE);
+  /* Not blocking, for a FIFO would hang the open. */
+  const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
+  if (!file.valid()) {
+    return Fail(QLIBC_ERR_OPEN);
+  }
+  if (fstat(file.get(), &snapshot->status) != 0) {
+    return Fail(QLIBC_ERR_IO);
+  }
+  if (!S_ISREG(snapshot->status.st_mode)) {
+    return Fail(QLIBC_ERR_OPEN);
+  }
+  struct stat after;
+  if (snapshot->status.st_size > kMostBytes ||
+      !ReadAll(file.get(), static_cast<size_t>(snapshot->status.st_size), &snapshot->contents) ||
+      fstat(file.get(), &after) != 0) {
+    return Fail(QLIBC_ERR_IO);
+  }
+  snapshot->steady = SameContents(snapshot->status, after);
+  return 0;
+}
+
+/* ---- the file that was read last ---- */
+
+struct CachedFile {
+  std::string path;
+  struct stat status;
+  int64_t opened;
+  SectionText text;
+};
+
+/* Whether what was read still is what the file holds. Equal stamps alone do not
+ * say so: stamps advance by clock ticks, and a change in the tick of the last
+ * one leaves the same. So the stamp must lie outside the time from the reading
+ * until now, in which such a change would be stamped:
+ *
+ *  - before it, which is usual as soon as a tick has gone by. Until then every
+ *    call reads again;
+ *  - or well after now, when the clock was set back since the file was written.
+ *    No change made now can carry a stamp that is still to come, so that the
+ *    file need not be read at every call until the clock has caught up.
+ *
+ * A clock that went back since the reading says nothing; the file is read again
+ * once, by the new time. */
+bool IsCurrent(const CachedFile &cached, const std::string_view path,
+               const struct stat &status) noexcept {
+  if (cached.path != path || !SameContents(cached.status, status)) {
+    return false;
+  }
+  const int64_t stamp = Nanoseconds(status.st_ctim);
+  const int64_t granularity = status.st_ctim.tv_nsec == 0 ? kCoarseStamp : 0;
+  const int64_t now = Now(CLOCK_REALTIME_COARSE);
+  const bool stamped_before = stamp + granularity < cached.opened && cached.opened <= now;
+  const bool stamped_after = now + kClockSlack < stamp;
+  return stamped_before || stamped_after;
+}
+
+/* Never destroyed, so that exit handlers can still read. */
+std::unique_ptr<const CachedFile> &Cache() {
+  static auto &cache = *new std::unique_ptr<const CachedFile>;
+  return cache;
+}
+
+/* Only the change time is asked: every write sets it, and nobody can forge it.
+ * One in the future tells nothing of the file's age, and does not wait. */
+bool IsYoung(const struct stat &status) noexcept {
+  const int64_t age = Now(CLOCK_REALTIME) - Nanoseconds(status.st_ctim);
+  return -kCopyInProgress < age && age < kCopyInProgress;
+}
+
+bool LooksTorn(const Snapshot &snapshot, SectionForm form) noexcept {
+  if (!snapshot.steady) {
+    return true;
+  }
+  return form == SectionForm::kEmpty || form == SectionForm::kCutOff ||
+         form == SectionForm::kEdited;
+}
+
+void Pause() noexcept {
+  const timespec pause{0, kPause};
+  nanosleep(&pause, nullptr);
+}
+
+std::unique_ptr<const CachedFile> Load(const char *path) {
+  for (int pauses = 0;; ++pauses) {
+    Snapshot snapshot;
+    if (ReadSnapshot(path, 0, &snapshot) < 0) {
+      return nullptr;
+    }
+    /* Made in place, since its names are views into itself. */
+    std::unique_ptr<const CachedFile> file(new CachedFile{
+        path, snapshot.status, snapshot.opened, SectionText(std::move(snapshot.contents))});
+    if (pauses < kMostPauses && IsYoung(snapshot.status) &&
+        LooksTorn(snapshot, file->text.form())) {
+      Pause();
+      continue;
+    }
+    if (file->text.form() == SectionForm::kCutOff) {
+      Fail(QLIBC_ERR_IO);
+      return nullptr;
+    }
+    return file;
+  }
+}
+
+/* The text of the file as it is now; null on failure (0x0900, 0x0B00). */
+const SectionText *Current(const char *path) {
+  std::unique_ptr<const CachedFile> &cache = Cache();
+  struct stat status;
+  if (stat(path, &status) != 0 || !S_ISREG(status.st_mode)) {
+    cache.reset();
+    Fail(QLIBC_ERR_OPEN);
+    return nullptr;
+  }
+  if (cache == nullptr || !IsCurrent(*cache, path, status)) {
+    cache.reset(); /* first, so that two large files are never held at once */
+    cache = Load(path);
+  }
+  return cache == nullptr ? nullptr : &cache->text;
+}
+
+/* ---- writing ---- */
+
+/* A file that is about to be changed. Its writer works on a copy of its own,
+ * so nobody is waited for, and it leaves the index of the readers' file alone. */
+struct Original {
+  struct stat status;
+  std::unique_ptr<const SectionText> text;
+};
+
+/* A link is refused, for the change would replace the link and not the file.
+ * 0, or -1 (0x0900, 0x0B00). */
+int ReadOriginal(const char *path, Original *original) {
+  Snapshot snapshot;
+  if (ReadSnapshot(path, O_NOFOLLOW, &snapshot) < 0) {
+    return -1;
+  }
+  original->status = snapshot.status;
+  original->text = std::make_unique<const SectionText>(std::move(snapshot.contents));
+  if (!snapshot.steady || original->text->form() == SectionForm::kCutOff) {
+    return Fail(QLIBC_ERR_IO);
+  }
+  return 0;
+}
+
+bool HasWritableKeys(const QLIBC_SZHASH &hash) noexcept {
+  for (const QLIBC_SZHASH::Entry &entry : hash.entries()) {
+    if (!IsSectionKey(hash.Key(entry))) {
+      return false;
+    }
+  }
+  return true;
+}
+
+int Changed(int replaced) noexcept {
+  return replaced < 0 ? -1 : 1;
+}
+
+int SetSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash) {
+  Original original;
+  if (ReadOriginal(path, &original) < 0) {
+    return -1;
+  }
+  const Section *section = original.text->Find(name);
+  if (section == nullptr) {
+    return 0;
+  }
+  return Changed(ReplaceFile(path, original.text->WithSet(*section, hash), &original.status,
+                             Durability::kNone));
+}
+
+int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash) {
+  struct stat status;
+  if (lstat(path, &status) != 0 && errno == ENOENT) {
+    return Changed(
+        ReplaceFile(path, SectionText({}).WithAdded(name, hash), nullptr, Durability::kNone));
+  }
+  Original original;
+  if (ReadOriginal(path, &original) < 0) {
+    return -1;
+  }
+  if (original.text->Find(name) != nullptr) {
+    return Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return Changed(
+      ReplaceFile(path, original.text->WithAdded(name, hash), &original.status, Durability::kNone));
+}
+
+int RemoveSection(const char *path, std::string_view name) {
+  Original original;
+  if (ReadOriginal(path, &original) < 0) {
+    return -1;
+  }
+  const Section *section = original.text->Find(name);
+  if (section == nullptr) {
+    return 0;
+  }
+  return Changed(
+      ReplaceFile(path, original.text->WithRemoved(*section), &original.status, Durability::kNone));
+}
+
+}  // namespace
+}  // namespace zelo
+
+int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
+  if (szPath == nullptr || ppList == nullptr || *ppList == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  QLIBC_SZLIST &list = **ppList;
+  const size_t before = list.count();
+  const int count = zelo::AtBoundary(-1, [&] {
+    const zelo::SectionText *text = zelo::Current(szPath);
+    if (text == nullptr) {
+      return -1;
+    }
+    for (const zelo::Section &section : text->sections()) {
+      list.Push(section.name);
+    }
+    return static_cast<int>(text->sections().size());
+  });
+  if (count < 0) {
+    list.Truncate(before);
+  }
+  return count;
+}
+
+int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHash) {
+  if (szPath == nullptr || szSection == nullptr || ppHash == nullptr || *ppHash == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] {
+    const zelo::SectionText *text = zelo::Current(szPath);
+    if (text == nullptr) {
+      return -1;
+    }
+    const zelo::Section *section = text->Find(szSection);
+    if (section == nullptr) {
+      return 0;
+    }
+    text->Read(*section, **ppHash);
+    return 1;
+  });
+}
+
+int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PSZHASH pHash,
+                        int reserved) {
+  if (szPath == nullptr || szSection == nullptr || pHash == nullptr || flags != 0 ||
+      reserved != 0 || !zelo::HasWritableKeys(*pHash)) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] { return zelo::SetSection(szPath, szSection, *pHash); });
+}
+
+int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int reserved) {
+  if (szPath == nullptr || szSection == nullptr || pHash == nullptr || reserved != 0 ||
+      !zelo::IsSectionName(szSection) || !zelo::HasWritableKeys(*pHash)) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] { return zelo::AddSection(szPath, szSection, *pHash); });
+}
+
+int QLIBCFileRemoveSection(const char *szPath, const char *szSection) {
+  if (szPath == nullptr || szSection == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] { return zelo::RemoveSection(szPath, szSection); });
+}

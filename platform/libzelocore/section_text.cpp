@@ -1,0 +1,444 @@
+#include "section_text.h"
+
+#include <xxhash.h>
+
+#include <algorithm>
+#include <charconv>
+#include <cstdint>
+#include <cstdio>
+#include <cstring>
+
+namespace zelo {
+namespace {
+
+constexpr std::string_view kHeader = "# zelo section file\n";
+constexpr std::string_view kTrailerStart = "# end of file: ";
+constexpr std::string_view kTrailerMiddle = " sections, checksum ";
+constexpr const char *kTrailerFormat = "# end of file: %zu sections, checksum %016llx\n";
+constexpr size_t kChecksumDigits = 16;
+constexpr size_t kTrailerRoom = 96;
+/* The carriage return is blank so that files edited elsewhere read the same. */
+constexpr std::string_view kBlank = " \t\r";
+constexpr std::string_view kCommentMarks = "#;";
+
+constexpr bool IsBlank(char c) noexcept {
+  return kBlank.find(c) != std::string_view::npos;
+}
+
+constexpr bool IsControl(char c) noexcept {
+  constexpr unsigned char kFirstPrintable = 0x20;
+  constexpr unsigned char kDelete = 0x7f;
+  const auto byte = static_cast<unsigned char>(c);
+  return byte < kFirstPrintable || byte == kDelete;
+}
+
+std::string_view TrimLeft(std::string_view text) noexcept {
+  while (!text.empty() && IsBlank(text.front())) {
+    text.remove_prefix(1);
+  }
+  return text;
+}
+
+std::string_view Trim(std::string_view text) noexcept {
+  text = TrimLeft(text);
+  while (!text.empty() && IsBlank(text.back())) {
+    text.remove_suffix(1);
+  }
+  return text;
+}
+
+bool HasBlankEdge(std::string_view text) noexcept {
+  return IsBlank(text.front()) || IsBlank(text.back());
+}
+
+bool IsCommentOrEmpty(std::string_view trimmed) noexcept {
+  return trimmed.empty() || kCommentMarks.find(trimmed.front()) != std::string_view::npos;
+}
+
+/* A line with a bracket in front that names no section is no key either. */
+bool IsNoKeyLine(std::string_view trimmed) noexcept {
+  return IsCommentOrEmpty(trimmed) || trimmed.front() == '[';
+}
+
+/* Up to and with the line feed, or to the end of the text. */
+size_t LineEnd(std::string_view text, size_t from) noexcept {
+  const size_t feed = text.find('\n', from);
+  return feed == std::string_view::npos ? text.size() : feed + 1;
+}
+
+/* The line that lies from `begin` to `end`, without its line feed. */
+std::string_view LineAt(std::string_view text, size_t begin, size_t end) noexcept {
+  const size_t feed = end > begin && text[end - 1] == '\n' ? 1 : 0;
+  return text.substr(begin, end - begin - feed);
+}
+
+/* The last one before `end`, or npos. */
+size_t LastCommentMark(std::string_view text, size_t end) noexcept {
+  const auto *mark = static_cast<const char *>(memrchr(text.data(), kCommentMarks[0], end));
+  return mark == nullptr ? std::string_view::npos : static_cast<size_t>(mark - text.data());
+}
+
+/* ---- trailer ---- */
+
+struct Trailer {
+  size_t sections;
+  uint64_t checksum;
+};
+
+template <typename Number>
+bool TakeNumber(std::string_view &text, Number *number, int base) noexcept {
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), *number, base);
+  if (error != std::errc()) {
+    return false;
+  }
+  text.remove_prefix(static_cast<size_t>(end - text.data()));
+  return true;
+}
+
+bool TakeText(std::string_view &text, std::string_view expected) noexcept {
+  if (!text.starts_with(expected)) {
+    return false;
+  }
+  text.remove_prefix(expected.size());
+  return true;
+}
+
+bool ParseTrailer(std::string_view line, Trailer *trailer) noexcept {
+  return TakeText(line, kTrailerStart) && TakeNumber(line, &trailer->sections, 10) &&
+         TakeText(line, kTrailerMiddle) && Trim(line).size() == kChecksumDigits &&
+         TakeNumber(line, &trailer->checksum, 16) && Trim(line).empty();
+}
+
+uint64_t Checksum(std::string_view text) noexcept {
+  return XXH3_64bits(text.data(), text.size());
+}
+
+void AppendTrailer(std::string &out, size_t sections) {
+  char line[kTrailerRoom];
+  const int size = std::snprintf(line, sizeof line, kTrailerFormat, sections,
+                                 static_cast<unsigned long long>(Checksum(out)));
+  out.append(line, static_cast<size_t>(size));
+}
+
+/* ---- escapes ---- */
+
+struct Escape {
+  char letter;
+  char byte;
+};
+
+constexpr Escape kEscapes[] = {
+    {'"', '"'}, {'\\', '\\'}, {'n', '\n'}, {'t', '\t'}, {'r', '\r'},
+};
+
+void AppendQuoted(std::string &out, std::string_view value) {
+  constexpr char kDigits[] = "0123456789abcdef";
+  out.push_back('"');
+  for (const char c : value) {
+    if (!IsControl(c) && c != '"' && c != '\\') {
+      out.push_back(c);
+      continue;
+    }
+    const auto *named = std::find_if(std::begin(kEscapes), std::end(kEscapes),
+                                     [c](const Escape &escape) { return escape.byte == c; });
+    out.push_back('\\');
+    if (named != std::end(kEscapes)) {
+      out.push_back(named->letter);
+    } else {
+      const auto byte = static_cast<unsigned char>(c);
+      out.push_back('x');
+      out.push_back(kDigits[byte >> 4]);
+      out.push_back(kDigits[byte & 0xf]);
+    }
+  }
+  out.push_back('"');
+}
+
+/* The byte that the escape at the front of `text` stands for, which is removed.
+ * False, with nothing removed, for anything that is not an escape: it stands as
+ * it is then, and so does an escaped zero, which no text can hold. */
+bool TakeEscape(std::string_view &text, char *byte) noexcept {
+  constexpr size_t kHexSize = 4; /* \xNN */
+  if (text.size() < 2) {
+    return false;
+  }
+  for (const Escape &escape : kEscapes) {
+    if (text[1] == escape.letter) {
+      *byte = escape.byte;
+      text.remove_prefix(2);
+      return true;
+    }
+  }
+  if (text[1] != 'x' || text.size() < kHexSize) {
+    return false;
+  }
+  unsigned number = 0;
+  const char *end = text.data() + kHexSize;
+  const auto parsed = std::from_chars(text.data() + 2, end, number, 16);
+  if (parsed.ec != std::errc() || parsed.ptr != end || number == 0) {
+    return false;
+  }
+  *byte = static_cast<char>(static_cast<unsigned char>(number));
+  text.remove_prefix(kHexSize);
+  return true;
+}
+
+/* Reads on past the opening quote. False when the closing one is missing. */
+bool Unquote(std::string_view text, std::string *value) {
+  value->clear();
+  while (!text.empty() && text.front() != '"') {
+    char byte = text.front();
+    if (byte != '\\' || !TakeEscape(text, &byte)) {
+      text.remove_prefix(1);
+    }
+    value->push_back(byte);
+  }
+  return !text.empty();
+}
+
+/* ---- lines ---- */
+
+/* False for a line that gives no name: it is an ordinary line then. */
+bool ParseSectionLine(std::string_view line, std::string_view *name) noexcept {
+  const size_t close = line.find(']');
+  if (line.empty() || line.front() != '[' || close == std::string_view::npos ||
+      !IsCommentOrEmpty(TrimLeft(line.substr(close + 1)))) {
+    return false;
+  }
+  *name = Trim(line.substr(1, close - 1));
+  return !name->empty();
+}
+
+/* A text for C ends at its first zero byte. */
+std::string_view UpToZero(std::string_view text) noexcept {
+  return text.substr(0, text.find('\0'));
+}
+
+/* The general way to read a line, with all that a hand may have written. */
+void ReadLine(std::string_view line, QLIBC_SZHASH &hash, std::string &scratch) {
+  const std::string_view trimmed = Trim(line);
+  const size_t equals = trimmed.find('=');
+  if (IsNoKeyLine(trimmed) || equals == std::string_view::npos) {
+    return;
+  }
+  const std::string_view key = Trim(UpToZero(trimmed.substr(0, equals)));
+  std::string_view value = TrimLeft(trimmed.substr(equals + 1));
+  if (key.empty()) {
+    return;
+  }
+  if (!value.empty() && value.front() == '"') {
+    if (!Unquote(value.substr(1), &scratch)) {
+      return;
+    }
+    value = scratch;
+  }
+  hash.Set(key, UpToZero(value));
+}
+
+/* Reads a line as this library writes it: no blank, no escape, `key="value"`.
+ * False, with nothing set, for any other. */
+bool ReadPlainLine(std::string_view line, QLIBC_SZHASH &hash) {
+  constexpr size_t kLeast = 4; /* k="" */
+  if (line.size() < kLeast || line.back() != '"' || IsBlank(line.front()) || IsNoKeyLine(line)) {
+    return false;
+  }
+  const size_t equals = line.find('=');
+  if (equals == 0 || equals + 2 >= line.size() || line[equals + 1] != '"' ||
+      IsBlank(line[equals - 1])) {
+    return false;
+  }
+  const std::string_view value = line.substr(equals + 2, line.size() - equals - 3);
+  if (value.find('"') != std::string_view::npos) {
+    return false;
+  }
+  hash.Set(line.substr(0, equals), value);
+  return true;
+}
+
+void AppendSection(std::string &out, std::string_view name, const QLIBC_SZHASH &hash) {
+  std::vector<const QLIBC_SZHASH::Entry *> entries;
+  entries.reserve(hash.entries().size());
+  for (const QLIBC_SZHASH::Entry &entry : hash.entries()) {
+    entries.push_back(&entry);
+  }
+  /* Sorted, so that the same content always makes the same file. */
+  std::sort(entries.begin(), entries.end(),
+            [&](const auto *a, const auto *b) { return hash.Key(*a) < hash.Key(*b); });
+
+  out.append("[").append(name).append("]\n");
+  for (const QLIBC_SZHASH::Entry *entry : entries) {
+    out.append(hash.Key(*entry)).push_back('=');
+    AppendQuoted(out, hash.Value(*entry));
+    out.push_back('\n');
+  }
+}
+
+}  // namespace
+
+bool IsSectionName(std::string_view name) noexcept {
+  return !name.empty() && !HasBlankEdge(name) && name.find(']') == std::string_view::npos &&
+         std::none_of(name.begin(), name.end(), IsControl);
+}
+
+bool IsSectionKey(std::string_view key) noexcept {
+  return !key.empty() && !HasBlankEdge(key) && !IsNoKeyLine(key) &&
+         key.find('=') == std::string_view::npos && std::none_of(key.begin(), key.end(), IsControl);
+}
+
+SectionText::SectionText(std::string contents) : contents_(std::move(contents)) {
+  form_ = Judge();
+}
+
+/* Brackets are rare beside bytes, so the search is for them, and whether one
+ * begins its line is looked up backwards. */
+void SectionText::IndexSections() {
+  const std::string_view text(contents_);
+  for (size_t at = text.find('[', start_); at != std::string_view::npos;) {
+    size_t begin = at;
+    while (begin > start_ && IsBlank(text[begin - 1])) {
+      --begin;
+    }
+    const size_t end = LineEnd(text, at);
+    std::string_view name;
+    if ((begin == start_ || text[begin - 1] == '\n') &&
+        ParseSectionLine(Trim(LineAt(text, at, end)), &name)) {
+      if (!sections_.empty()) {
+        sections_.back().end = begin;
+      }
+      sections_.push_back({name, begin, end, text.size()});
+    }
+    at = text.find('[', end);
+  }
+  first_of_name_.reserve(sections_.size());
+  for (size_t i = 0; i < sections_.size(); ++i) {
+    first_of_name_.emplace(sections_[i].name, i);
+  }
+}
+
+/* What a hand appended may follow the trailer, so any line can be it. */
+void SectionText::FindTrailer() {
+  const std::string_view text(contents_);
+  for (size_t at = LastCommentMark(text, text.size()); at != std::string_view::npos && at >= start_;
+       at = LastCommentMark(text, at)) {
+    Trailer trailer{};
+    const bool begins_line = at == 0 || text[at - 1] == '\n';
+    if (begins_line && ParseTrailer(LineAt(text, at, LineEnd(text, at)), &trailer)) {
+      trailer_begin_ = at;
+      trailer_end_ = LineEnd(text, at);
+      return;
+    }
+  }
+}
+
+SectionForm SectionText::Judge() {
+  const std::string_view text(contents_);
+  if (text.empty()) {
+    return SectionForm::kEmpty;
+  }
+  if (text.size() < kHeader.size() && kHeader.starts_with(text)) {
+    return SectionForm::kCutOff;
+  }
+  const size_t first_line = LineEnd(text, 0);
+  const bool headed = Trim(LineAt(text, 0, first_line)) == LineAt(kHeader, 0, kHeader.size());
+  start_ = headed ? first_line : 0;
+  IndexSections();
+
+  FindTrailer();
+  if (!headed) {
+    return SectionForm::kPlain;
+  }
+  if (trailer_begin_ == trailer_end_) {
+    return SectionForm::kCutOff;
+  }
+  Trailer trailer{};
+  const bool agrees = ParseTrailer(LineAt(text, trailer_begin_, trailer_end_), &trailer) &&
+                      trailer_end_ == text.size() && trailer.sections == sections_.size() &&
+                      trailer.checksum == Checksum(text.substr(0, trailer_begin_));
+  return agrees ? SectionForm::kSealed : SectionForm::kEdited;
+}
+
+const Section *SectionText::Find(std::string_view name) const noexcept {
+  const auto found = first_of_name_.find(name);
+  return found == first_of_name_.end() ? nullptr : &sections_[found->second];
+}
+
+void SectionText::Read(const Section &section, QLIBC_SZHASH &hash) const {
+  const std::string_view body =
+      std::string_view(contents_).substr(section.body, section.end - section.body);
+  /* One look over the section spares a look at every value. */
+  const bool plain =
+      body.find('\\') == std::string_view::npos && body.find('\0') == std::string_view::npos;
+  std::string scratch;
+  for (size_t at = 0; at < body.size();) {
+    const size_t feed = std::min(body.find('\n', at), body.size());
+    const std::string_view line = body.substr(at, feed - at);
+    if (!plain || !ReadPlainLine(line, hash)) {
+      ReadLine(line, hash, scratch);
+    }
+    at = feed + 1;
+  }
+}
+
+/* Comments and blank lines that stand right before the next section are about
+ * that one, and stay when this one is replaced or removed. */
+size_t SectionText::EndOfReplaced(const Section &section) const noexcept {
+  const std::string_view text(contents_);
+  size_t end = section.body;
+  for (size_t at = section.body; at < section.end;) {
+    const size_t next = LineEnd(text, at);
+    if (!IsCommentOrEmpty(Trim(LineAt(text, at, next)))) {
+      end = next;
+    }
+    at = next;
+  }
+  return end;
+}
+
+/* The old trailer is the one line that is never kept. */
+void SectionText::AppendKept(std::string &out, size_t begin, size_t end) const {
+  const std::string_view text(contents_);
+  const auto append = [&](size_t from, size_t to) {
+    if (from < to) {
+      out.append(text.substr(from, to - from));
+    }
+  };
+  append(begin, std::min(end, std::max(begin, trailer_begin_)));
+  append(std::max(begin, std::min(end, trailer_end_)), end);
+  if (out.back() != '\n') {
+    out.push_back('\n');
+  }
+}
+
+std::string SectionText::Begin() const {
+  std::string out;
+  out.reserve(kHeader.size() + contents_.size() + kTrailerRoom);
+  out.append(kHeader);
+  return out;
+}
+
+std::string SectionText::WithSet(const Section &section, const QLIBC_SZHASH &hash) const {
+  std::string out = Begin();
+  AppendKept(out, start_, section.begin);
+  AppendSection(out, section.name, hash);
+  AppendKept(out, EndOfReplaced(section), contents_.size());
+  AppendTrailer(out, sections_.size());
+  return out;
+}
+
+std::string SectionText::WithAdded(std::string_view name, const QLIBC_SZHASH &hash) const {
+  std::string out = Begin();
+  AppendKept(out, start_, contents_.size());
+  AppendSection(out, name, hash);
+  AppendTrailer(out, sections_.size() + 1);
+  return out;
+}
+
+std::string SectionText::WithRemoved(const Section &section) const {
+  std::string out = Begin();
+  AppendKept(out, start_, section.begin);
+  AppendKept(out, EndOfReplaced(section), contents_.size());
+  AppendTrailer(out, sections_.size() - 1);
+  return out;
+}
+
+}  // namespace zelo

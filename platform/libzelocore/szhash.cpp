@@ -1,0 +1,219 @@
+/*
+ * Text hashes: open addressing over an arena of texts.
+ */
+#include "szhash.h"
+
+#include <algorithm>
+#include <bit>
+#include <cstring>
+#include <limits>
+#include <new>
+#include <string>
+
+#include "support.h"
+
+namespace {
+
+/* A caller's guess at the capacity reserves no more than this; a hash grows
+ * past it like any other. */
+constexpr size_t kMostReserved = 65536;
+constexpr size_t kLeastArena = 2048;
+/* Offsets are 32 bits wide. */
+constexpr size_t kMostArena = std::numeric_limits<uint32_t>::max();
+
+uint64_t LoadWord(const char *at, size_t size) noexcept {
+  uint64_t word = 0;
+  std::memcpy(&word, at, size);
+  return word;
+}
+
+uint64_t Mix(uint64_t state, uint64_t word) noexcept {
+  constexpr uint64_t kOddMultiplier = 0x9E3779B97F4A7C15U; /* 2^64 / golden ratio */
+  state = (state ^ word) * kOddMultiplier;
+  return state ^ (state >> 32);
+}
+
+/* Keys are short, so a word at a time beats a byte at a time and a general
+ * hash alike. */
+uint32_t HashText(std::string_view text) noexcept {
+  constexpr size_t kWord = sizeof(uint64_t);
+  const char *at = text.data();
+  size_t left = text.size();
+  uint64_t state = left;
+  for (; left > kWord; at += kWord, left -= kWord) {
+    state = Mix(state, LoadWord(at, kWord));
+  }
+  if (text.size() >= kWord) {
+    state = Mix(state, LoadWord(text.data() + text.size() - kWord, kWord));
+  } else {
+    state = Mix(state, LoadWord(at, left));
+  }
+  return static_cast<uint32_t>(Mix(state, state >> 29));
+}
+
+}  // namespace
+
+QLIBC_SZHASH::QLIBC_SZHASH(size_t capacity) {
+  const size_t reserved = std::clamp<size_t>(capacity, 1, kMostReserved);
+  entries_.reserve(reserved);
+  slots_.resize(std::bit_ceil(2 * reserved));
+}
+
+uint32_t QLIBC_SZHASH::FindSlot(std::string_view key, uint32_t hash) const noexcept {
+  const auto mask = static_cast<uint32_t>(slots_.size() - 1);
+  uint32_t slot = hash & mask;
+  while (slots_[slot] != 0) {
+    const Entry &entry = entries_[slots_[slot] - 1];
+    if (entry.hash == hash && Key(entry) == key) {
+      break;
+    }
+    slot = (slot + 1) & mask;
+  }
+  return slot;
+}
+
+const char *QLIBC_SZHASH::Find(std::string_view key) const noexcept {
+  const uint32_t index = slots_[FindSlot(key, HashText(key))];
+  return index == 0 ? nullptr : arena_.get() + entries_[index - 1].value;
+}
+
+void QLIBC_SZHASH::Clear() noexcept {
+  for (const Entry &entry : entries_) {
+    slots_[entry.slot] = 0;
+  }
+  entries_.clear();
+  arena_used_ = 0;
+}
+
+void QLIBC_SZHASH::GrowTable() {
+  std::vector<uint32_t> wider(slots_.size() * 2);
+  const auto mask = static_cast<uint32_t>(wider.size() - 1);
+  for (size_t i = 0; i < entries_.size(); ++i) {
+    uint32_t slot = entries_[i].hash & mask;
+    while (wider[slot] != 0) {
+      slot = (slot + 1) & mask;
+    }
+    wider[slot] = static_cast<uint32_t>(i + 1);
+    entries_[i].slot = slot;
+  }
+  slots_.swap(wider);
+}
+
+/* Moves to a larger arena when `size` more bytes do not fit, leaving replaced
+ * values behind. The arena that was left is handed to the caller, who may still
+ * be reading a text in it. */
+std::unique_ptr<char[]> QLIBC_SZHASH::MakeRoom(size_t size) {
+  if (size <= arena_room_ - arena_used_) {
+    return nullptr;
+  }
+  size_t live = 0;
+  for (const Entry &entry : entries_) {
+    live += entry.key_size + entry.value_size + 2;
+  }
+  if (size > kMostArena - live) {
+    throw std::bad_alloc();
+  }
+  const size_t room = std::min(std::max(kLeastArena, 2 * (live + size)), kMostArena);
+  auto left = std::make_unique_for_overwrite<char[]>(room);
+  arena_.swap(left);
+  arena_room_ = room;
+  arena_used_ = 0;
+  for (Entry &entry : entries_) {
+    entry.key = Store({left.get() + entry.key, entry.key_size});
+    entry.value = Store({left.get() + entry.value, entry.value_size});
+    entry.value_room = entry.value_size;
+  }
+  return left;
+}
+
+uint32_t QLIBC_SZHASH::Store(std::string_view text) noexcept {
+  const size_t at = arena_used_;
+  if (!text.empty()) {
+    std::memcpy(arena_.get() + at, text.data(), text.size());
+  }
+  arena_[at + text.size()] = '\0';
+  arena_used_ += text.size() + 1;
+  return static_cast<uint32_t>(at);
+}
+
+void QLIBC_SZHASH::Replace(Entry &entry, std::string_view value) {
+  if (value.size() <= entry.value_room) {
+    /* The new text may be a part of the old one. */
+    std::memmove(arena_.get() + entry.value, value.data(), value.size());
+    arena_[entry.value + value.size()] = '\0';
+  } else {
+    const auto left = MakeRoom(value.size() + 1);
+    entry.value = Store(value);
+    entry.value_room = static_cast<uint32_t>(value.size());
+  }
+  entry.value_size = static_cast<uint32_t>(value.size());
+}
+
+void QLIBC_SZHASH::Set(std::string_view key, std::string_view value) {
+  const uint32_t hash = HashText(key);
+  uint32_t slot = FindSlot(key, hash);
+  if (slots_[slot] != 0) {
+    Replace(entries_[slots_[slot] - 1], value);
+    return;
+  }
+  if (2 * (entries_.size() + 1) > slots_.size()) {
+    GrowTable();
+    slot = FindSlot(key, hash);
+  }
+  const auto left = MakeRoom(key.size() + value.size() + 2);
+  entries_.emplace_back();
+  Entry &entry = entries_.back();
+  entry.hash = hash;
+  entry.slot = slot;
+  entry.key = Store(key);
+  entry.key_size = static_cast<uint32_t>(key.size());
+  entry.value = Store(value);
+  entry.value_size = static_cast<uint32_t>(value.size());
+  entry.value_room = entry.value_size;
+  slots_[slot] = static_cast<uint32_t>(entries_.size());
+}
+
+PSZHASH QLIBCSzHashAlloc(int capacity) {
+  return zelo::AtBoundary<PSZHASH>(
+      nullptr, [&] { return new QLIBC_SZHASH(capacity > 0 ? static_cast<size_t>(capacity) : 1); });
+}
+
+int QLIBCSzHashSetValue(PSZHASH *ppHash, const char *szKey, const char *szValue) {
+  if (ppHash == nullptr || *ppHash == nullptr || szKey == nullptr || szValue == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] {
+    (*ppHash)->Set(szKey, szValue);
+    return 0;
+  });
+}
+
+const char *QLIBCSzHashGetValue(PSZHASH pHash, const char *szKey) {
+  if (pHash == nullptr || szKey == nullptr) {
+    zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return nullptr;
+  }
+  return pHash->Find(szKey);
+}
+
+void QLIBCHashRemoveAll(PSZHASH pHash) {
+  if (pHash != nullptr) {
+    pHash->Clear();
+  }
+}
+
+int QLIBCSzHashEnumKey(PSZHASH pHash, PSZLIST *ppList) {
+  if (pHash == nullptr || ppList == nullptr || *ppList == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  for (const QLIBC_SZHASH::Entry &entry : pHash->entries()) {
+    if (QLIBCSzListPush(ppList, pHash->Key(entry).data()) < 0) {
+      return -1;
+    }
+  }
+  return static_cast<int>(pHash->entries().size());
+}
+
+void QLIBCSzHashFree(PSZHASH pHash) {
+  delete pHash;
+}

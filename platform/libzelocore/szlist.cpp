@@ -1,0 +1,97 @@
+/*
+ * Text lists: one arena of texts and where each begins.
+ */
+#include "szlist.h"
+
+#include <algorithm>
+#include <climits>
+#include <stdexcept>
+
+#include "support.h"
+
+namespace {
+
+/* A caller's guess at the capacity reserves no more than this. */
+constexpr size_t kMostReserved = 65536;
+
+}  // namespace
+
+QLIBC_SZLIST::QLIBC_SZLIST(size_t capacity) {
+  starts_.reserve(std::min(capacity, kMostReserved));
+}
+
+void QLIBC_SZLIST::Push(std::string_view text) {
+  if (starts_.size() >= INT_MAX) {
+    throw std::length_error("text list");
+  }
+  const size_t start = arena_.size();
+  starts_.push_back(start);
+  try {
+    arena_.append(text);
+    arena_.push_back('\0');
+  } catch (...) {
+    arena_.resize(start);
+    starts_.pop_back();
+    throw;
+  }
+}
+
+void QLIBC_SZLIST::Truncate(size_t count) noexcept {
+  if (count < starts_.size()) {
+    arena_.resize(starts_[count]);
+    starts_.resize(count);
+  }
+}
+
+PSZLIST QLIBCSzListAlloc(int capacity) {
+  return zelo::AtBoundary<PSZLIST>(
+      nullptr, [&] { return new QLIBC_SZLIST(capacity > 0 ? static_cast<size_t>(capacity) : 1); });
+}
+
+int QLIBCSzListPush(PSZLIST *ppList, const char *szText) {
+  if (ppList == nullptr || *ppList == nullptr || szText == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] {
+    (*ppList)->Push(szText);
+    return static_cast<int>((*ppList)->count());
+  });
+}
+
+const char *QLIBCSzListGet(PSZLIST pList, int index) {
+  if (pList == nullptr || index < 0 || static_cast<size_t>(index) >= pList->count()) {
+    return nullptr;
+  }
+  return pList->At(static_cast<size_t>(index));
+}
+
+int QLIBCSzListCount(PSZLIST pList) {
+  return pList == nullptr ? 0 : static_cast<int>(pList->count());
+}
+
+void QLIBCSzListFree(PSZLIST pList) {
+  delete pList;
+}
+
+int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList) {
+  if (szText == nullptr || szSep == nullptr || ppList == nullptr || *ppList == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  QLIBC_SZLIST &list = **ppList;
+  const size_t before = list.count();
+  const int pieces = zelo::AtBoundary(-1, [&] {
+    /* A copy, since the text may be one of the list's own, which moves. */
+    const std::string text(szText);
+    size_t start = text.find_first_not_of(szSep);
+    while (start != std::string::npos) {
+      const size_t end = std::min(text.find_first_of(szSep, start), text.size());
+      list.Push(std::string_view(text).substr(start, end - start));
+      start = text.find_first_not_of(szSep, end);
+    }
+    return static_cast<int>(list.count() - before);
+  });
+  if (pieces < 0) {
+    list.Truncate(before);
+  }
+  return pieces;
+}

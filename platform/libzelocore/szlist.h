@@ -1,0 +1,33 @@
+/*
+ * The inside of a text list, for the units that append texts without a
+ * terminating zero.
+ */
+#ifndef ZELOCORE_SZLIST_H
+#define ZELOCORE_SZLIST_H
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "zelocore.h"
+
+struct QLIBC_SZLIST {
+ public:
+  explicit QLIBC_SZLIST(size_t capacity);
+
+  /* The text may lie in this very list. Throws when memory is short, and leaves
+   * the list as it was then. */
+  void Push(std::string_view text);
+  /* Takes back what was pushed since the list had `count` texts. */
+  void Truncate(size_t count) noexcept;
+
+  size_t count() const noexcept { return starts_.size(); }
+  const char *At(size_t index) const noexcept { return arena_.c_str() + starts_[index]; }
+
+ private:
+  std::string arena_;
+  std::vector<size_t> starts_;
+};
+
+#endif

@@ -1,0 +1,64 @@
+/*
+ * Base64, over nettle.
+ */
+#include <nettle/base64.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <cstring>
+#include <limits>
+
+#include "sdk_error.h"
+#include "zelosdk.h"
+
+namespace {
+
+/* nettle asks for room for the longest text that a run of characters could
+ * decode to, white space and all. Decoding in steps needs that room only here. */
+constexpr size_t kStepCharacters = 256;
+constexpr size_t kStepBytes = BASE64_DECODE_LENGTH(kStepCharacters);
+
+bool Fits(size_t source_size, size_t room) noexcept {
+  return source_size < std::numeric_limits<size_t>::max() / 2 &&
+         BASE64_ENCODE_RAW_LENGTH(source_size) < room;
+}
+
+bool Decode(const char *text, size_t size, char *out, size_t room, size_t *decoded) noexcept {
+  base64_decode_ctx context;
+  base64_decode_init(&context);
+  *decoded = 0;
+  while (size > 0) {
+    uint8_t step[kStepBytes];
+    size_t count = sizeof step;
+    const size_t taken = std::min(size, kStepCharacters);
+    if (base64_decode_update(&context, &count, step, taken, text) == 0 || count > room - *decoded) {
+      return false;
+    }
+    std::memcpy(out + *decoded, step, count);
+    *decoded += count;
+    text += taken;
+    size -= taken;
+  }
+  return true;
+}
+
+}  // namespace
+
+int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, int /*reserved*/) {
+  if (src == nullptr || dst == nullptr || !Fits(cbSrc, cbDst)) {
+    return zelo::FailWith(0, QLIBC_ERR_BAD_PARAMETER);
+  }
+  base64_encode_raw(dst, cbSrc, reinterpret_cast<const uint8_t *>(src));
+  dst[BASE64_ENCODE_RAW_LENGTH(cbSrc)] = '\0';
+  return 1;
+}
+
+int ZELOEncodingBase64Decode(const char *src, size_t cbSrc, char *dst, size_t *pcbDst) {
+  size_t decoded = 0;
+  if (src == nullptr || dst == nullptr || pcbDst == nullptr ||
+      !Decode(src, cbSrc, dst, *pcbDst, &decoded)) {
+    return zelo::FailWith(0, QLIBC_ERR_BAD_PARAMETER);
+  }
+  *pcbDst = decoded;
+  return 1;
+}

@@ -1,0 +1,349 @@
+// Text hashes and lists. Allocations are counted, and fail on request, through the program's own
+// operator new, which the libraries use too.
+#include <gtest/gtest.h>
+#include <zelocore.h>
+
+#include <climits>
+#include <cstdlib>
+#include <memory>
+#include <new>
+#include <random>
+#include <set>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+namespace {
+
+long g_allocations = 0;
+bool g_memory_is_short = false;
+
+void *Allocate(std::size_t size) {
+  ++g_allocations;
+  void *memory = g_memory_is_short ? nullptr : std::malloc(size > 0 ? size : 1);
+  if (memory == nullptr) {
+    throw std::bad_alloc();
+  }
+  return memory;
+}
+
+}  // namespace
+
+void *operator new(std::size_t size) {
+  return Allocate(size);
+}
+void *operator new[](std::size_t size) {
+  return Allocate(size);
+}
+void operator delete(void *memory) noexcept {
+  std::free(memory);
+}
+void operator delete[](void *memory) noexcept {
+  std::free(memory);
+}
+void operator delete(void *memory, std::size_t) noexcept {
+  std::free(memory);
+}
+void operator delete[](void *memory, std::size_t) noexcept {
+  std::free(memory);
+}
+
+namespace {
+
+class ShortMemory {
+ public:
+  ShortMemory() { g_memory_is_short = true; }
+  ~ShortMemory() { g_memory_is_short = false; }
+  ShortMemory(const ShortMemory &) = delete;
+  ShortMemory &operator=(const ShortMemory &) = delete;
+};
+
+class ZelocoreSzHash : public testing::Test {
+ protected:
+  void SetUp() override {
+    QLIBCErrSetEx(0, "", 0);
+    ASSERT_NE(hash_, nullptr);
+    ASSERT_NE(list_, nullptr);
+  }
+  void TearDown() override {
+    QLIBCSzHashFree(hash_);
+    QLIBCSzListFree(list_);
+  }
+
+  int Set(const std::string &key, const std::string &value) {
+    return QLIBCSzHashSetValue(&hash_, key.c_str(), value.c_str());
+  }
+  std::string Get(const std::string &key) {
+    const char *value = QLIBCSzHashGetValue(hash_, key.c_str());
+    return value != nullptr ? value : "(none)";
+  }
+  std::vector<std::string> Listed() {
+    std::vector<std::string> texts;
+    for (int i = 0; i < QLIBCSzListCount(list_); ++i) {
+      texts.emplace_back(QLIBCSzListGet(list_, i));
+    }
+    return texts;
+  }
+
+  PSZHASH hash_ = QLIBCSzHashAlloc(4);
+  PSZLIST list_ = QLIBCSzListAlloc(4);
+};
+
+using ZelocoreSzList = ZelocoreSzHash;
+
+TEST_F(ZelocoreSzHash, AKeyHasTheValueSetLast) {
+  EXPECT_EQ(Set("run hour", "8"), 0);
+  EXPECT_EQ(Set("run hour", "17 o'clock"), 0);
+  EXPECT_EQ(Set("name", ""), 0);
+
+  EXPECT_EQ(Get("run hour"), "17 o'clock");
+  EXPECT_EQ(Get("name"), "");
+}
+
+TEST_F(ZelocoreSzHash, AMissingKeyHasNoValueAndIsNoError) {
+  EXPECT_EQ(QLIBCSzHashGetValue(hash_, "nobody"), nullptr);
+  EXPECT_EQ(QLIBCErrGet(), 0);
+}
+
+TEST_F(ZelocoreSzHash, KeysThatDifferInOneByteAreDifferent) {
+  for (size_t size = 1; size <= 40; ++size) {
+    for (size_t at = 0; at < size; ++at) {
+      std::string key(size, 'k');
+      key[at] = 'x';
+      ASSERT_EQ(Set(key, std::to_string(size) + "." + std::to_string(at)), 0);
+    }
+  }
+  for (size_t size = 1; size <= 40; ++size) {
+    for (size_t at = 0; at < size; ++at) {
+      std::string key(size, 'k');
+      key[at] = 'x';
+      ASSERT_EQ(Get(key), std::to_string(size) + "." + std::to_string(at));
+    }
+  }
+}
+
+TEST_F(ZelocoreSzHash, ItAgreesWithTheStandardOneOverRandomChanges) {
+  std::mt19937 random(4);
+  std::unordered_map<std::string, std::string> expected;
+  for (int i = 0; i < 20000; ++i) {
+    const std::string key = "key" + std::to_string(random() % 700);
+    const std::string value(random() % 90, static_cast<char>('a' + random() % 26));
+    ASSERT_EQ(Set(key, value), 0);
+    expected[key] = value;
+    if (random() % 5000 == 0) {
+      QLIBCHashRemoveAll(hash_);
+      expected.clear();
+    }
+  }
+  for (const auto &[key, value] : expected) {
+    ASSERT_EQ(Get(key), value);
+  }
+  EXPECT_EQ(QLIBCSzHashEnumKey(hash_, &list_), static_cast<int>(expected.size()));
+}
+
+TEST_F(ZelocoreSzHash, RemovingAllLeavesNothing) {
+  Set("a", "1");
+  QLIBCHashRemoveAll(hash_);
+
+  EXPECT_EQ(Get("a"), "(none)");
+  EXPECT_EQ(QLIBCSzHashEnumKey(hash_, &list_), 0);
+  EXPECT_EQ(Set("a", "2"), 0);
+  EXPECT_EQ(Get("a"), "2");
+}
+
+TEST_F(ZelocoreSzHash, ItsOwnTextsCanBeSet) {
+  Set("a", std::string(1000, 'v'));
+  for (int i = 0; i < 200; ++i) {
+    const std::string key = "copy" + std::to_string(i);
+    ASSERT_EQ(QLIBCSzHashSetValue(&hash_, key.c_str(), QLIBCSzHashGetValue(hash_, "a")), 0);
+    ASSERT_EQ(Get(key), std::string(1000, 'v'));
+  }
+  ASSERT_EQ(QLIBCSzHashSetValue(&hash_, QLIBCSzHashGetValue(hash_, "a"), "by a value"), 0);
+  EXPECT_EQ(Get(std::string(1000, 'v')), "by a value");
+}
+
+TEST_F(ZelocoreSzHash, AValueCanBeReplacedByItsOwnEnd) {
+  Set("a", "one two three");
+  ASSERT_EQ(QLIBCSzHashSetValue(&hash_, "a", QLIBCSzHashGetValue(hash_, "a") + 4), 0);
+  EXPECT_EQ(Get("a"), "two three");
+}
+
+TEST_F(ZelocoreSzHash, ALongerValueOfItsOwnReplacesAShorterOne) {
+  Set("short", "s");
+  Set("long", std::string(5000, 'l'));
+  for (int i = 0; i < 20; ++i) {
+    const std::string longer = Get("long") + "+";
+    ASSERT_EQ(Set("long", longer), 0);
+    ASSERT_EQ(QLIBCSzHashSetValue(&hash_, "short", QLIBCSzHashGetValue(hash_, "long")), 0);
+    ASSERT_EQ(Get("short"), longer);
+  }
+}
+
+TEST_F(ZelocoreSzHash, AReusedHashAllocatesNothing) {
+  const auto fill = [&](int round) {
+    QLIBCHashRemoveAll(hash_);
+    char value[32];
+    for (char key[] = "a"; *key <= 'z'; ++*key) {
+      std::snprintf(value, sizeof value, "value %d", round % 10);
+      ASSERT_EQ(QLIBCSzHashSetValue(&hash_, key, value), 0);
+    }
+  };
+  fill(0);
+  const long before = g_allocations;
+  for (int round = 0; round < 1000; ++round) {
+    fill(round);
+  }
+  EXPECT_EQ(g_allocations, before);
+}
+
+TEST_F(ZelocoreSzHash, ReplacedValuesDoNotPileUp) {
+  for (int i = 0; i < 100000; ++i) {
+    ASSERT_EQ(Set("a", std::string(static_cast<size_t>(i % 200), 'v')), 0);
+    ASSERT_EQ(Set("b", std::string(static_cast<size_t>(200 - i % 200), 'v')), 0);
+  }
+  const long before = g_allocations;
+  for (int i = 0; i < 1000; ++i) {
+    ASSERT_EQ(QLIBCSzHashSetValue(&hash_, "a", i % 2 == 0 ? "longer value" : "short"), 0);
+  }
+  EXPECT_EQ(g_allocations, before);
+}
+
+TEST_F(ZelocoreSzHash, ShortMemoryIsReportedAndLosesNothing) {
+  Set("a", "1");
+  const std::string huge(1 << 20, 'x');
+  {
+    const ShortMemory scope;
+    EXPECT_EQ(QLIBCSzHashSetValue(&hash_, "b", huge.c_str()), -1);
+    EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_OUT_OF_MEMORY);
+    EXPECT_EQ(QLIBCSzHashSetValue(&hash_, "a", huge.c_str()), -1);
+    EXPECT_EQ(QLIBCSzHashAlloc(1024), nullptr);
+    EXPECT_EQ(QLIBCSzListAlloc(1024), nullptr);
+  }
+  EXPECT_EQ(Get("a"), "1");
+  EXPECT_EQ(Get("b"), "(none)");
+}
+
+TEST_F(ZelocoreSzHash, OddCapacitiesAreTaken) {
+  for (const int capacity : {INT_MIN, -1, 0, 1, 3, INT_MAX}) {
+    PSZHASH hash = QLIBCSzHashAlloc(capacity);
+    PSZLIST list = QLIBCSzListAlloc(capacity);
+    ASSERT_NE(hash, nullptr) << capacity;
+    ASSERT_NE(list, nullptr) << capacity;
+    EXPECT_EQ(QLIBCSzHashSetValue(&hash, "a", "1"), 0);
+    EXPECT_EQ(QLIBCSzListPush(&list, "a"), 1);
+    QLIBCSzHashFree(hash);
+    QLIBCSzListFree(list);
+  }
+}
+
+TEST_F(ZelocoreSzHash, NullArgumentsAreRefused) {
+  PSZHASH none = nullptr;
+  PSZLIST no_list = nullptr;
+  const auto refused = [](int result) {
+    const bool code = QLIBCErrGet() == QLIBC_ERR_BAD_PARAMETER;
+    QLIBCErrSetEx(0, "", 0);
+    return result == -1 && code;
+  };
+  EXPECT_TRUE(refused(QLIBCSzHashSetValue(nullptr, "a", "b")));
+  EXPECT_TRUE(refused(QLIBCSzHashSetValue(&none, "a", "b")));
+  EXPECT_TRUE(refused(QLIBCSzHashSetValue(&hash_, nullptr, "b")));
+  EXPECT_TRUE(refused(QLIBCSzHashSetValue(&hash_, "a", nullptr)));
+  EXPECT_TRUE(refused(QLIBCSzHashEnumKey(nullptr, &list_)));
+  EXPECT_TRUE(refused(QLIBCSzHashEnumKey(hash_, nullptr)));
+  EXPECT_TRUE(refused(QLIBCSzHashEnumKey(hash_, &no_list)));
+  EXPECT_EQ(QLIBCSzHashGetValue(nullptr, "a"), nullptr);
+  EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_BAD_PARAMETER);
+  QLIBCErrSetEx(0, "", 0);
+  EXPECT_EQ(QLIBCSzHashGetValue(hash_, nullptr), nullptr);
+  EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_BAD_PARAMETER);
+  QLIBCHashRemoveAll(nullptr);
+  QLIBCSzHashFree(nullptr);
+}
+
+TEST_F(ZelocoreSzHash, EveryKeyIsListedBehindWhatTheListHolds) {
+  QLIBCSzListPush(&list_, "before");
+  Set("a", "1");
+  Set("b", "2");
+  Set("a", "3");
+
+  EXPECT_EQ(QLIBCSzHashEnumKey(hash_, &list_), 2);
+  const std::vector<std::string> texts = Listed();
+  EXPECT_EQ(texts.front(), "before");
+  EXPECT_EQ(std::multiset<std::string>(texts.begin() + 1, texts.end()),
+            (std::multiset<std::string>{"a", "b"}));
+}
+
+TEST_F(ZelocoreSzList, TextsKeepTheirOrder) {
+  EXPECT_EQ(QLIBCSzListPush(&list_, "one"), 1);
+  EXPECT_EQ(QLIBCSzListPush(&list_, ""), 2);
+  EXPECT_EQ(QLIBCSzListPush(&list_, "three"), 3);
+
+  EXPECT_EQ(Listed(), (std::vector<std::string>{"one", "", "three"}));
+  EXPECT_EQ(QLIBCSzListCount(list_), 3);
+}
+
+TEST_F(ZelocoreSzList, OutsideOfTheListThereIsNoText) {
+  QLIBCSzListPush(&list_, "one");
+
+  EXPECT_EQ(QLIBCSzListGet(list_, -1), nullptr);
+  EXPECT_EQ(QLIBCSzListGet(list_, 1), nullptr);
+  EXPECT_EQ(QLIBCSzListGet(nullptr, 0), nullptr);
+  EXPECT_EQ(QLIBCSzListCount(nullptr), 0);
+  QLIBCSzListFree(nullptr);
+}
+
+TEST_F(ZelocoreSzList, AListTakesItsOwnTexts) {
+  QLIBCSzListPush(&list_, "a text that is copied over and over");
+  for (int i = 0; i < 2000; ++i) {
+    ASSERT_EQ(QLIBCSzListPush(&list_, QLIBCSzListGet(list_, i)), i + 2);
+  }
+  EXPECT_STREQ(QLIBCSzListGet(list_, 2000), "a text that is copied over and over");
+}
+
+TEST_F(ZelocoreSzList, GrowingAllocatesFewTimes) {
+  const long before = g_allocations;
+  for (int i = 0; i < 100000; ++i) {
+    ASSERT_EQ(QLIBCSzListPush(&list_, "text"), i + 1);
+  }
+  EXPECT_LT(g_allocations - before, 100);
+}
+
+TEST_F(ZelocoreSzList, ShortMemoryIsReportedAndLosesNothing) {
+  QLIBCSzListPush(&list_, "one");
+  const std::string huge(1 << 20, 'x');
+  {
+    const ShortMemory scope;
+    EXPECT_EQ(QLIBCSzListPush(&list_, huge.c_str()), -1);
+    EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_OUT_OF_MEMORY);
+    EXPECT_EQ(QLIBCStrSep(huge.c_str(), ",", &list_), -1);
+  }
+  EXPECT_EQ(Listed(), (std::vector<std::string>{"one"}));
+}
+
+TEST_F(ZelocoreSzList, ATextIsSplitAtEverySeparator) {
+  EXPECT_EQ(QLIBCStrSep(" a,b;;c d,", ",; ", &list_), 4);
+  EXPECT_EQ(Listed(), (std::vector<std::string>{"a", "b", "c", "d"}));
+  EXPECT_EQ(QLIBCStrSep("", ",", &list_), 0);
+  EXPECT_EQ(QLIBCStrSep(",,", ",", &list_), 0);
+  EXPECT_EQ(QLIBCStrSep("whole text", "", &list_), 1);
+  EXPECT_STREQ(QLIBCSzListGet(list_, 4), "whole text");
+}
+
+TEST_F(ZelocoreSzList, AListSplitsItsOwnText) {
+  QLIBCSzListPush(&list_, "1,2,3,4,5,6,7,8,9,10,11,12,13,14,15,16,17");
+  EXPECT_EQ(QLIBCStrSep(QLIBCSzListGet(list_, 0), ",", &list_), 17);
+  EXPECT_STREQ(QLIBCSzListGet(list_, 17), "17");
+}
+
+TEST_F(ZelocoreSzList, NullArgumentsAreRefused) {
+  PSZLIST none = nullptr;
+  EXPECT_EQ(QLIBCSzListPush(nullptr, "a"), -1);
+  EXPECT_EQ(QLIBCSzListPush(&none, "a"), -1);
+  EXPECT_EQ(QLIBCSzListPush(&list_, nullptr), -1);
+  EXPECT_EQ(QLIBCStrSep(nullptr, ",", &list_), -1);
+  EXPECT_EQ(QLIBCStrSep("a", nullptr, &list_), -1);
+  EXPECT_EQ(QLIBCStrSep("a", ",", nullptr), -1);
+  EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_BAD_PARAMETER);
+}
+
+}  // namespace
