@@ -1,0 +1,749 @@
+// Ordinary tasks: kept as sections of a section file, one a task, and started by the cron daemon
+// from lines in the system crontab that are written anew after every change.
+#include <sys/stat.h>
+#include <sys/types.h>
+#include <unistd.h>
+#include <zelocore.h>
+#include <zelosched.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+
+#include "sched_guards.h"
+#include "sched_hash.h"
+#include "sched_record.h"
+#include "sched_report.h"
+#include "sched_run_hours.h"
+#include "sched_surroundings.h"
+#include "sched_text.h"
+#include "sched_trigger_clock.h"
+
+namespace {
+
+constexpr char kName[] = "zeloschedule";
+
+// Every read uses the working copy; the persistent one is there for the next boot.
+constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
+constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
+constexpr char kScratchPrefix[] = "/tmp/scheduled_tasks.tmp";
+constexpr char kCopyProgram[] = "/bin/cp";
+
+constexpr char kCrontab[] = "/etc/crontab";
+constexpr char kCronPidFile[] = "/var/run/crond.pid";
+constexpr char kSignalCron[] = "/bin/kill -HUP `/bin/cat /var/run/crond.pid` > /dev/null 2>&1";
+constexpr char kTaskProgram[] = "/tmp/zeloschedtask";  // also what marks a crontab line as ours
+
+constexpr int kContainerCapacity = 1024;
+constexpr int kFound = 1;
+constexpr int kNotFound = 0;
+constexpr size_t kDaysOfWeek = 7;
+constexpr char kDayOff = '0';
+
+class SectionName {
+ public:
+  explicit SectionName(long id) { snprintf(text_, sizeof(text_), "%ld", id); }
+  const char *c_str() const { return text_; }
+
+ private:
+  char text_[32];
+};
+
+// ---- reading the store --------------------------------------------------------------------------
+
+// 1 read, 0 there is no such section, -1 on failure.
+int readSection(const char *szSection, HashGuard *hash) {
+  QLIBCHashRemoveAll(hash->get());
+  const int result = QLIBCFileGetSection(kWorkingCopy, szSection, hash->handle());
+  if (result < 0) {
+    SCHED_LOG_CALLEE("Get section [%s] from [%s] failed. ", szSection, kWorkingCopy);
+    return -1;
+  }
+  return result > 0 ? kFound : kNotFound;
+}
+
+int fillTask(ZELO_SCHED_TASK *pTask, PSZHASH hash, SchedTriggerClock *clock) {
+  if (ZELOSchedInitTaskFromHash(pTask, hash) < 0) {
+    SCHED_LOG_CALLEE("Init task from hash failed. ");
+    return -1;
+  }
+  if (schedNextTriggerTime(pTask, clock) < 0) {
+    SCHED_LOG_CALLEE("Failed to obtain next trigger time. id:[%ld]. ",
+                     static_cast<long>(pTask->ID));
+    return -1;
+  }
+  return 0;
+}
+
+TaskGuard takeRecord(SchedRecordSource *records, const char *szSection) {
+  TaskGuard task = records->take();
+  if (task == nullptr) {
+    SCHED_LOG("malloc ZELO_SCHED_TASK failed. key:[%s]", szSection);
+    SCHED_SET_ERROR(kErrRecordAlloc);
+  }
+  return task;
+}
+
+enum class Records { kReused, kKept };  // what is done with most of the records
+
+// Gives every task of the store to `take`, as a record in `*task`, which is zeroed and may be moved
+// from. A section that is unreadable, or gone since the names were listed, is passed over: one bad
+// section must not hide the others. -1 when the names cannot be listed or memory is short.
+template <class Take>
+int forEachTask(Records use, Take take) {
+  if (QLIBCFileExist(kWorkingCopy) == 0) {
+    return 0;
+  }
+  ListGuard names(QLIBCSzListAlloc(kContainerCapacity));
+  HashGuard hash(QLIBCSzHashAlloc(kContainerCapacity));
+  if (!names || !hash) {
+    return -1;
+  }
+  const int sections = QLIBCFileEnumSection(kWorkingCopy, names.handle());
+  SchedTriggerClock clock;
+  SchedRecordSource records(use == Records::kKept ? sections : 1);
+  TaskGuard task;
+  for (int i = 0; i < sections; ++i) {
+    const char *szSection = QLIBCSzListGet(names.get(), i);
+    if (readSection(szSection, &hash) != kFound) {
+      continue;
+    }
+    if (task == nullptr) {
+      task = takeRecord(&records, szSection);
+    } else {
+      memset(task.get(), 0, sizeof(*task));
+    }
+    if (task == nullptr) {
+      return -1;
+    }
+    if (fillTask(task.get(), hash.get(), &clock) == 0) {
+      take(&task);
+    }
+  }
+  return sections < 0 ? -1 : 0;
+}
+
+int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
+  SCHED_CHECK_ARG(pTaskList != nullptr, "((void *)0) != pTaskList", -1);
+  TaskChain tasks;
+  int count = 0;
+  const int result = forEachTask(Records::kKept, [&](TaskGuard *task) {
+    if (filter == nullptr || filter(task->get()) != 0) {
+      (*task)->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
+      tasks.pushFront(std::move(*task));
+      ++count;
+    }
+  });
+  if (result < 0) {
+    return -1;
+  }
+  tasks.appendTo(pTaskList);
+  return count;
+}
+
+int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  HashGuard hash(QLIBCSzHashAlloc(kContainerCapacity));
+  if (!hash) {
+    return -1;
+  }
+  pTask->State = ZELO_SCHED_STATE_NOT_EXISTED;
+  pTask->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
+  if (QLIBCFileExist(kWorkingCopy) == 0) {
+    return kNotFound;
+  }
+  const int read = readSection(SectionName(id).c_str(), &hash);
+  if (read != kFound) {
+    return read;
+  }
+  SchedTriggerClock clock;
+  return fillTask(pTask, hash.get(), &clock) < 0 ? -1 : kFound;
+}
+
+// ---- ids
+// ------------------------------------------------------------------------------------------
+
+// The ids of the stored tasks, in plain memory: no exception may arise here. It goes on counting
+// when memory is short, for the report.
+class IdArray {
+ public:
+  IdArray() = default;
+  ~IdArray() { free(ids_); }
+  IdArray(const IdArray &) = delete;
+  IdArray &operator=(const IdArray &) = delete;
+
+  void add(long id) {
+    if (count_ < capacity_ || grow()) {
+      ids_[count_] = id;
+    }
+    ++count_;
+  }
+  int count() const { return static_cast<int>(count_); }
+  bool isWhole() const { return count_ <= capacity_; }
+
+  long smallestFree() {
+    if (count_ == 0) {
+      return 1;
+    }
+    std::sort(ids_, ids_ + count_);
+    if (ids_[0] >= 2) {
+      return 1;
+    }
+    for (size_t i = 1; i < count_; ++i) {
+      if (ids_[i] - ids_[i - 1] >= 2) {
+        return ids_[i - 1] + 1;
+      }
+    }
+    return ids_[count_ - 1] + 1;
+  }
+
+ private:
+  bool grow() {
+    if (count_ > capacity_) {
+      return false;
+    }
+    const size_t wanted = capacity_ == 0 ? kContainerCapacity : 2 * capacity_;
+    auto *grown = static_cast<long *>(calloc(wanted, sizeof(long)));
+    if (grown == nullptr) {
+      return false;
+    }
+    std::copy(ids_, ids_ + count_, grown);
+    free(ids_);
+    ids_ = grown;
+    capacity_ = wanted;
+    return true;
+  }
+
+  long *ids_ = nullptr;
+  size_t count_ = 0;
+  size_t capacity_ = 0;
+};
+
+// One record serves for all tasks here: their ids are all that is wanted, and records are large.
+int next_id(long *pID) {
+  SCHED_CHECK_ARG(pID != nullptr, "((void *)0) != pID", -1);
+  IdArray ids;
+  if (forEachTask(Records::kReused, [&](TaskGuard *task) { ids.add((*task)->ID); }) < 0) {
+    return -1;
+  }
+  if (!ids.isWhole()) {
+    SCHED_LOG_CALLEE("Alloc id slot failed. num:[%d] ", ids.count());
+    return -1;
+  }
+  *pID = ids.smallestFree();
+  return 0;
+}
+
+// ---- writing the store
+// ------------------------------------------------------------------------------
+
+// The private copy on which one write is made. Whatever stands under its name was left or planted
+// by someone else: it is neither written through nor taken over.
+class ScratchFile {
+ public:
+  ScratchFile() {
+    snprintf(path_, sizeof(path_), "%s.%d", kScratchPrefix, static_cast<int>(getpid()));
+    unlink(path_);
+  }
+  ~ScratchFile() { unlink(path_); }
+  ScratchFile(const ScratchFile &) = delete;
+  ScratchFile &operator=(const ScratchFile &) = delete;
+
+  const char *path() const { return path_; }
+  bool isEmpty() const {
+    struct stat info = {};
+    return stat(path_, &info) == 0 && info.st_size == 0;
+  }
+
+ private:
+  char path_[64];
+};
+
+int copyFile(const char *szSource, const char *szTarget) {
+  if (QLIBCExec(kCopyProgram, "-f", szSource, szTarget, nullptr) != 0) {
+    SCHED_LOG_CALLEE("Copy sched conf failed. [%s] -> [%s] ", szSource, szTarget);
+    return -1;
+  }
+  return 0;
+}
+
+// A forced copy empties its target before it fills it. An empty scratch file has therefore most
+// likely been taken from under another process's copy: to build on it would lose every other task.
+int copyWorkingCopy(const ScratchFile &scratch) {
+  constexpr int kTries = 20;
+  constexpr useconds_t kPause = 5000;
+  for (int i = 0; i < kTries; ++i) {
+    if (copyFile(kWorkingCopy, scratch.path()) < 0) {
+      return -1;
+    }
+    if (!scratch.isEmpty()) {
+      return 0;
+    }
+    usleep(kPause);
+  }
+  return 0;
+}
+
+int fillScratch(const ScratchFile &scratch, bool stored) {
+  if (stored) {
+    return copyWorkingCopy(scratch);
+  }
+  if (QLIBCFileTouch(scratch.path()) < 0) {
+    SCHED_LOG_CALLEE("QLIBCFileTouch [%s] failed. ", scratch.path());
+    return -1;
+  }
+  return 0;
+}
+
+int writeSection(const ScratchFile &scratch, const SectionName &section,
+                 const ZELO_SCHED_TASK *pTask) {
+  HashGuard hash(QLIBCSzHashAlloc(kContainerCapacity));
+  if (!hash) {
+    SCHED_LOG_CALLEE("QLIBCSzHashAlloc failed.");
+    return -1;
+  }
+  if (ZELOSchedInitHashFromTask(hash.handle(), pTask) < 0) {
+    SCHED_LOG_CALLEE("Init hash from task failed. ");
+    return -1;
+  }
+  const int set = QLIBCFileSetSection(scratch.path(), section.c_str(), 0, hash.get(), 0);
+  if (set < 0) {
+    SCHED_LOG_CALLEE("Save section [%s] to [%s] failed. ", section.c_str(), scratch.path());
+    return -1;
+  }
+  if (set == 0 && QLIBCFileAddSection(scratch.path(), section.c_str(), hash.get(), 0) < 0) {
+    SCHED_LOG_CALLEE("Add section [%s] to [%s] failed. ", section.c_str(), scratch.path());
+    return -1;
+  }
+  return 0;
+}
+
+// 1 removed, 0 there was no such section, -1 on failure.
+int removeSection(const ScratchFile &scratch, const SectionName &section) {
+  const int removed = QLIBCFileRemoveSection(scratch.path(), section.c_str());
+  if (removed < 0) {
+    SCHED_LOG_CALLEE("QLIBCFileRemoveSection [%s] from [%s] failed.", section.c_str(),
+                     scratch.path());
+    return -1;
+  }
+  return removed > 0 ? 1 : 0;
+}
+
+// The persistent copy goes first: a failure in between leaves the working copy, which every read
+// uses, as it was.
+int publish(const ScratchFile &scratch) {
+  if (copyFile(scratch.path(), kPersistentCopy) < 0 || copyFile(scratch.path(), kWorkingCopy) < 0) {
+    return -1;
+  }
+  return 1;
+}
+
+// The one way in which the store changes: one section written, or deleted when pTask is null. 1
+// when the store changed, 0 when there was nothing to delete, -1 on failure.
+int write_store(long id, const ZELO_SCHED_TASK *pTask) {
+  const ScratchFile scratch;
+  const SectionName section(id);
+  const bool stored = QLIBCFileExist(kWorkingCopy) != 0;
+  if (fillScratch(scratch, stored) < 0) {
+    return -1;
+  }
+  if (pTask != nullptr) {
+    return writeSection(scratch, section, pTask) < 0 ? -1 : publish(scratch);
+  }
+  if (!stored) {
+    return 0;
+  }
+  const int removed = removeSection(scratch, section);
+  return removed > 0 ? publish(scratch) : removed;
+}
+
+// ---- the crontab
+// ------------------------------------------------------------------------------------
+
+using CronLine = BoundedText<8192>;
+using HourList = BoundedText<128>;
+using WeekdayList = BoundedText<16>;
+
+template <class List>
+void appendItem(List *list, int number) {
+  list->append("%s%d", list->c_str()[0] == '\0' ? "" : ",", number);
+}
+
+HourList hourList(const ZELO_SCHED_TASK &task) {
+  HourList hours;
+  anyRunHour(task, [&](uint32_t hour) {
+    appendItem(&hours, static_cast<int>(hour));
+    return false;
+  });
+  return hours;
+}
+
+WeekdayList weekdayList(const ZELO_SCHED_TASK &task) {
+  WeekdayList days;
+  for (size_t i = 0; i < kDaysOfWeek; ++i) {
+    if (task.Week[i] != kDayOff) {
+      appendItem(&days, static_cast<int>(i));
+    }
+  }
+  return days;
+}
+
+void appendTime(CronLine *line, const ZELO_SCHED_TASK &task) {
+  if (task.RepeatHour == 0) {
+    line->append("%u\t%u\t", task.RunMin, task.RunHour);
+  } else {
+    line->append("%u\t%s\t", task.RunMin, hourList(task).c_str());
+  }
+}
+
+// A crontab line cannot say a year: a task that runs once is started on its day every year, and the
+// check at the start of a run turns the other years away.
+void appendDays(CronLine *line, const ZELO_SCHED_TASK &task) {
+  switch (task.Type) {
+    case ZELO_SCHED_TYPE_ONCE:
+    case ZELO_SCHED_TYPE_YEARLY:
+      line->append("%u\t%u\t*\t", task.StartDay, task.StartMonth);
+      break;
+    case ZELO_SCHED_TYPE_MONTHLY:
+      line->append("%u\t*\t*\t", task.StartDay);
+      break;
+    case ZELO_SCHED_TYPE_WEEKLY:
+      line->append("*\t*\t%s\t", weekdayList(task).c_str());
+      break;
+    default:
+      line->append("*\t*\t*\t");
+      break;
+  }
+}
+
+int toCronLine(const ZELO_SCHED_TASK *pTask, CronLine *line) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  appendTime(line, *pTask);
+  appendDays(line, *pTask);
+  line->append("root\t%s --run id=%ld", kTaskProgram, static_cast<long>(pTask->ID));
+  return 0;
+}
+
+struct FileCloser {
+  void operator()(FILE *stream) const { fclose(stream); }
+};
+using Stream = std::unique_ptr<FILE, FileCloser>;
+
+int fail(SchedPlace place, int code) {
+  QLIBCErrSetEx(code, place.file, place.line);
+  return -1;
+}
+
+// The new crontab beside the old one, gone again unless it took the old one's place.
+class NewCrontab {
+ public:
+  NewCrontab() { snprintf(path_, sizeof(path_), "%s.XXXXXX", kCrontab); }
+  ~NewCrontab() {
+    stream_.reset();
+    if (made_) {
+      unlink(path_);
+    }
+  }
+  NewCrontab(const NewCrontab &) = delete;
+  NewCrontab &operator=(const NewCrontab &) = delete;
+
+  int open() {
+    const int descriptor = mkstemp(path_);
+    if (descriptor < 0) {
+      return fail(SCHED_HERE, kErrOpen);
+    }
+    made_ = true;
+    stream_.reset(fdopen(descriptor, "w"));
+    if (stream_ == nullptr) {
+      close(descriptor);
+      return fail(SCHED_HERE, kErrOpen);
+    }
+    return 0;
+  }
+
+  int write(const char *bytes, size_t count) {
+    if (count == 0) {
+      return 0;
+    }
+    if (fwrite(bytes, 1, count, stream_.get()) != count) {
+      return fail(SCHED_HERE, kErrIo);
+    }
+    endsLine_ = bytes[count - 1] == '\n';
+    return 0;
+  }
+
+  // A line must not be joined to a last line that has no line feed.
+  int endLine() { return endsLine_ ? 0 : write("\n", 1); }
+
+  // Whole on the disk and the old file's in owner and mode before anyone can see it.
+  int finish(const struct stat &old) {
+    constexpr mode_t kModeBits = 0xFFF;
+    FILE *stream = stream_.get();
+    const int descriptor = fileno(stream);
+    if (fflush(stream) != 0 || fsync(descriptor) != 0 ||
+        fchown(descriptor, old.st_uid, old.st_gid) != 0 ||
+        fchmod(descriptor, old.st_mode & kModeBits) != 0 || fclose(stream_.release()) != 0) {
+      return fail(SCHED_HERE, kErrIo);
+    }
+    return 0;
+  }
+
+  int replaceOld() {
+    if (rename(path_, kCrontab) != 0) {
+      return fail(SCHED_HERE, kErrRename);
+    }
+    made_ = false;
+    return 0;
+  }
+
+ private:
+  char path_[sizeof(kCrontab) + sizeof(".XXXXXX") - 1];
+  bool made_ = false;
+  bool endsLine_ = true;
+  Stream stream_;
+};
+
+int keepOtherLines(FILE *old, NewCrontab *crontab) {
+  char *buffer = nullptr;
+  size_t capacity = 0;
+  ssize_t length = 0;
+  int result = 0;
+  while (result == 0 && (length = getline(&buffer, &capacity, old)) >= 0) {
+    const auto count = static_cast<size_t>(length);
+    if (memmem(buffer, count, kTaskProgram, strlen(kTaskProgram)) == nullptr) {
+      result = crontab->write(buffer, count);
+    }
+  }
+  free(buffer);
+  if (result == 0 && feof(old) == 0) {
+    return fail(SCHED_HERE, kErrIo);
+  }
+  return result;
+}
+
+int addTaskLines(const ZELO_SCHED_TASK *pTask, NewCrontab *crontab) {
+  for (; pTask != nullptr; pTask = pTask->next) {
+    if (pTask->State != ZELO_SCHED_STATE_ENABLED) {
+      continue;
+    }
+    CronLine line;
+    if (toCronLine(pTask, &line) < 0) {
+      SCHED_LOG_CALLEE("Failed to convert task [%ld] to cron line. ", static_cast<long>(pTask->ID));
+      return -1;
+    }
+    if (crontab->endLine() < 0 || crontab->write(line.c_str(), strlen(line.c_str())) < 0 ||
+        crontab->write("\n", 1) < 0) {
+      return -1;
+    }
+  }
+  return 0;
+}
+
+int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
+  const Stream old(fopen(kCrontab, "r"));
+  if (old == nullptr) {
+    return -1;  // no crontab, nothing to write it like: none is made
+  }
+  struct stat info = {};
+  if (fstat(fileno(old.get()), &info) != 0) {
+    return fail(SCHED_HERE, kErrStat);
+  }
+  if (S_ISDIR(info.st_mode)) {
+    return fail(SCHED_HERE, kErrOpen);
+  }
+  NewCrontab crontab;
+  if (crontab.open() < 0 || keepOtherLines(old.get(), &crontab) < 0 ||
+      addTaskLines(tasks, &crontab) < 0 || crontab.finish(info) < 0) {
+    return -1;
+  }
+  return crontab.replaceOld();
+}
+
+void signalCron() {
+  if (QLIBCFileExist(kCronPidFile) != 0 && system(kSignalCron) != 0) {
+    SCHED_LOG("Failed to hup crond.");
+  }
+}
+
+// A crontab that could not be rewritten is told in the log alone: the task is stored, and the next
+// change or sync writes the crontab whole.
+int sync() {
+  TaskChain tasks;
+  const int count = list_get(tasks.handle(), nullptr);
+  if (count < 0) {
+    SCHED_LOG_CALLEE("get task list failed. ");
+    return count;
+  }
+  if (ZELOSchedTaskListSort(tasks.handle(), "id", 1) < 0) {
+    SCHED_LOG_CALLEE("failed to sort task list. ");
+    return count;
+  }
+  if (rewriteCrontab(tasks.head()) < 0) {
+    SCHED_LOG_CALLEE("sync task list failed. ");
+    return count;
+  }
+  signalCron();
+  return 0;
+}
+
+int syncAfterChange() {
+  if (sync() < 0) {
+    SCHED_LOG_CALLEE("sync crontab failed. ");
+    return -1;
+  }
+  return 0;
+}
+
+// ---- the operations of the backend
+// --------------------------------------------------------------------
+
+int storeTask(const ZELO_SCHED_TASK *pTask) {
+  if (write_store(pTask->ID, pTask) < 0) {
+    SCHED_LOG_CALLEE("set task failed. [%ld] ", static_cast<long>(pTask->ID));
+    return -1;
+  }
+  return 0;
+}
+
+int create(ZELO_SCHED_TASK *pTask) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  long id = 0;
+  if (next_id(&id) < 0) {
+    return -1;
+  }
+  if (pTask->Name[0] == '\0') {
+    snprintf(pTask->Name, sizeof(pTask->Name), "Task %ld", id);
+  }
+  const int32_t formerId = pTask->ID;
+  pTask->ID = static_cast<int32_t>(id);
+  if (storeTask(pTask) < 0) {
+    pTask->ID = formerId;  // still a new task: saving it again must create it, not edit another's
+    return -1;
+  }
+  return syncAfterChange();
+}
+
+int edit(ZELO_SCHED_TASK *pTask) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  return storeTask(pTask) < 0 ? -1 : syncAfterChange();
+}
+
+int remove(long id) {
+  const int removed = write_store(id, nullptr);
+  if (removed < 0) {
+    SCHED_LOG_CALLEE("set task failed. [%ld] ", id);
+    return -1;
+  }
+  if (removed == 0) {
+    return 0;
+  }
+  return syncAfterChange() < 0 ? -1 : 1;
+}
+
+// The values of a new task that differ from what the field table gives for a missing key, and those
+// that a hash must have. The start date is unset on purpose: an editor fills it in.
+struct DefaultValue {
+  const char *szKey;
+  const char *szValue;
+};
+constexpr DefaultValue kDefaults[] = {
+    {"id", "-1"},         {"run hour", "0"},  {"run min", "0"},     {"start year", "0"},
+    {"start month", "0"}, {"start day", "0"}, {"app", ""},          {"app name", ""},
+    {"action", ""},       {"cmd", ""},        {"state", "enabled"}, {"type", "daily"},
+};
+
+int setDefaultValue(HashGuard *hash, const char *szKey, const char *szValue) {
+  if (QLIBCSzHashSetValue(hash->handle(), szKey, szValue) < 0) {
+    SCHED_LOG_CALLEE("Set hash value failed. key:[%s], val:[%s]. ", szKey, szValue);
+    return -1;
+  }
+  return 0;
+}
+
+int get_default(ZELO_SCHED_TASK *pTask) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  HashGuard hash(QLIBCSzHashAlloc(kContainerCapacity));
+  if (!hash) {
+    SCHED_LOG_CALLEE("Alloc hash failed. ");
+    return -1;
+  }
+  long id = 0;
+  if (next_id(&id) < 0) {
+    SCHED_LOG_CALLEE("Get next id failed. ");
+    return -1;
+  }
+  char szName[32];
+  snprintf(szName, sizeof(szName), "Task %ld", id);
+  if (setDefaultValue(&hash, "name", szName) < 0) {
+    return -1;
+  }
+  for (const DefaultValue &value : kDefaults) {
+    if (setDefaultValue(&hash, value.szKey, value.szValue) < 0) {
+      return -1;
+    }
+  }
+  return schedFillTaskFromHash(pTask, hash.get(), SCHED_HERE);
+}
+
+// What the wait status of the shell means: the code, and in the comment the exit code or the
+// signal. Three digits hold either.
+void reportWaitStatus(int status, int *pStatusCode, char *szComment) {
+  constexpr size_t kCommentCapacity = 4;
+  constexpr int kStoppedByte = 0x7F;
+  const int lowByte = status & 0xFF;
+  const int lowBits = status & 0x7F;
+  const int highByte = (status >> 8) & 0xFF;
+  const auto report = [&](int code, int number) {
+    *pStatusCode = code;
+    snprintf(szComment, kCommentCapacity, "%d", number);
+  };
+  if (status == 0) {
+    *pStatusCode = ZELO_SCHED_STATUS_FINISHED;
+  } else if (status == -1) {
+    *pStatusCode = ZELO_SCHED_STATUS_NOT_STARTED;
+  } else if (lowBits == 0 || lowBits == kStoppedByte) {
+    report(ZELO_SCHED_STATUS_EXIT_NONZERO, highByte);
+  } else if (lowByte == kStoppedByte) {
+    report(ZELO_SCHED_STATUS_STOPPED, highByte);
+  } else {
+    report(ZELO_SCHED_STATUS_KILLED, lowBits);
+  }
+}
+
+int run(ZELO_SCHED_TASK *pTask, int *pStatusCode, char *szComment, size_t cbComment) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  SCHED_CHECK_ARG(pStatusCode != nullptr, "((void *)0) != pStatusCode", -1);
+  SCHED_CHECK_ARG(szComment != nullptr, "((void *)0) != szComment", -1);
+  SCHED_CHECK_ARG(0 < cbComment, "0 < cbComment", -1);
+  szComment[0] = '\0';
+  const SchedRealIds ids;
+  if (!ids.set()) {
+    return -1;
+  }
+  reportWaitStatus(system(pTask->Command), pStatusCode, szComment);
+  return 0;
+}
+
+}  // namespace
+
+int zeloschedule_init(const char *szName, ZELO_SCHED_BACKEND *pBackend) {
+  SCHED_CHECK_ARG(szName != nullptr, "((void *)0) != szName", -1);
+  SCHED_CHECK_ARG(pBackend != nullptr, "NULL != pBackend", -1);
+  if (strcmp(szName, kName) != 0) {
+    SCHED_LOG("backend name is mismatch for zeloschedule!! [%s]", szName);
+    return -1;
+  }
+  pBackend->szName = szName;
+  pBackend->sync = sync;
+  pBackend->create = create;
+  pBackend->edit = edit;
+  pBackend->remove = remove;
+  pBackend->get_default = get_default;
+  pBackend->owns_id = nullptr;
+  pBackend->get_by_id = get_by_id;
+  pBackend->run = run;
+  pBackend->list_get = list_get;
+  return 0;
+}

@@ -1,0 +1,414 @@
+/*
+ * zelosched.h - scheduled tasks of the appliance: keep them, list them, run
+ * them, and find out how they ended.
+ *
+ * Conventions
+ *
+ *  1. Records. A task is one ZELO_SCHED_TASK, flat and of fixed size. A record
+ *     comes from ZELOSchedTaskAlloc and goes back through ZELOSchedTaskFree; a
+ *     list comes from ZELOSchedTaskListGet, is walked with ZELOSchedTaskNext
+ *     and goes back through ZELOSchedTaskListFree. The library never keeps a
+ *     pointer to a caller's record after a call has returned.
+ *  2. Texts are zero-terminated and hold at most their capacity less one;
+ *     what is longer is cut without an error.
+ *  3. Results. 0 or a count that is not negative for success, -1 for failure.
+ *     A lookup that may find nothing: 1 found, 0 not found, -1 error.
+ *  4. Reasons. A failure leaves code, file and line in the platform's error
+ *     record (QLIBCErrGet and its kin) and one line in the system log at
+ *     priority error that begins with the file and the line. The codes:
+ *     0x0100 array allocation, 0x0200 record allocation, 0x0400 run lock not
+ *     taken, 0x0500 run lock not released, 0x0900 file or database not opened,
+ *     0x0B00 read or write failed, 0x0D00 bad argument, 0x2000 not found,
+ *     0x2700 fstat failed, 0x2800 rename failed, 0x2A00 call on time or
+ *     identity failed, 0x4000 malformed number, date or time.
+ *  5. Null. A pointer that must be given is tested; a null one is a failure
+ *     with 0x0D00. Where null is allowed, the function says so.
+ *  6. Outputs are untouched when a call fails, but for the record that a read
+ *     was filling: discard it.
+ *  7. Threads. One thread of a process at a time. Processes may use the
+ *     library side by side.
+ *  8. Clock. All times are local time; the resolution is the minute.
+ */
+#ifndef ZELOSCHED_H
+#define ZELOSCHED_H
+
+#include <stddef.h>
+#include <stdint.h>
+#include <stdio.h>
+
+#if defined(__GNUC__)
+#define ZELO_SCHED_API __attribute__((visibility("default")))
+#else
+#define ZELO_SCHED_API
+#endif
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/* The platform's text hash (zelocore.h) and SQLite's connection (sqlite3.h). */
+typedef struct QLIBC_SZHASH *PSZHASH;
+typedef struct sqlite3 sqlite3;
+
+/* ---- the task record ------------------------------------------------------ */
+
+enum { ZELO_SCHED_ID_NEW = -1 }; /* the id of a task that is not stored yet */
+
+enum { /* ZELO_SCHED_TASK.Backend */
+       ZELO_SCHED_BACKEND_SCHEDULE = -2,
+       ZELO_SCHED_BACKEND_AUTOPOWER = -3
+};
+
+enum { /* ZELO_SCHED_TASK.State */
+       ZELO_SCHED_STATE_DISABLED = 0,
+       ZELO_SCHED_STATE_ENABLED = 1,
+       ZELO_SCHED_STATE_NOT_EXISTED = 2
+};
+
+enum { /* ZELO_SCHED_TASK.Type */
+       ZELO_SCHED_TYPE_ONCE = 0,
+       ZELO_SCHED_TYPE_DAILY = 1,
+       ZELO_SCHED_TYPE_WEEKLY = 2,
+       ZELO_SCHED_TYPE_MONTHLY = 3,
+       ZELO_SCHED_TYPE_YEARLY = 4
+};
+
+typedef struct ZELO_SCHED_TASK ZELO_SCHED_TASK;
+struct ZELO_SCHED_TASK {
+  ZELO_SCHED_TASK *next;      /* next record of the list; null ends it */
+  int32_t Backend;            /* id of the backend that owns the task */
+  int32_t ID;                 /* id within the backend; -1 = not stored yet */
+  uint32_t Owner;             /* uid under whose rights the task runs */
+  char Name[4096];            /* display name */
+  char NextTriggerTime[1024]; /* "YYYY-MM-DD hh:mm" or "N/A"; never stored */
+  int32_t State;              /* 0 disabled, 1 enabled, 2 not existing */
+  int32_t Type;               /* 0 once, 1 daily, 2 weekly, 3 monthly, 4 yearly */
+  char Week[8];               /* seven characters from Sunday on; '0' = off */
+  uint32_t StartYear;         /* day of the first or only run */
+  uint32_t StartMonth;        /* 1 to 12 */
+  uint32_t StartDay;          /* 1 to 31 */
+  uint32_t RunHour;           /* 0 to 23: first run of a day */
+  uint32_t RunMin;            /* 0 to 59: minute of every run */
+  uint32_t RepeatHour;        /* 0 = one run a day; n = again every n hours */
+  uint32_t LastWorkHour;      /* last hour at which a repeated run may start */
+  char EditDialog[1024];      /* user interface: dialog class that edits the task */
+  char EditForm[1024];        /* user interface: form within that dialog */
+  int32_t SimpleEditForm;     /* flags: 1 = yes, 0 = no */
+  int32_t Listable;
+  int32_t CanEditName;
+  int32_t CanEditOwner;
+  int32_t CanRunAppSameTime;  /* may overlap runs of other tasks of its application */
+  int32_t CanRunTaskSameTime; /* may overlap another run of itself */
+  int32_t CanRunFromUI;
+  int32_t CanDeleteFromUI;
+  int32_t CanEditFromUI;
+  char App[1024];      /* application that owns the task */
+  char AppName[1024];  /* its display name */
+  char AppArgs[8192];  /* its arguments, in a form of its own */
+  char Action[1024];   /* what the task does, for display */
+  char Command[16384]; /* command line, given to the shell; of a longer one than
+                          12287 bytes only that many survive being stored */
+};
+
+/* A predicate on a task: nonzero keeps it. */
+typedef int (*ZELO_SCHED_TASK_FILTER)(const ZELO_SCHED_TASK *pTask);
+
+/* Allocates a record with the defaults of `zeloschedule`: a new, enabled,
+ * daily task at 00:00 without a command, named "Task N" after the next free id.
+ * The caller frees it with ZELOSchedTaskFree. Null on failure: 0x0200, or what
+ * reading the store left. */
+ZELO_SCHED_API ZELO_SCHED_TASK *ZELOSchedTaskAlloc(void);
+
+/* Frees one record (a list goes through ZELOSchedTaskListFree). 0, or -1 with
+ * 0x0D00 for null. */
+ZELO_SCHED_API int ZELOSchedTaskFree(ZELO_SCHED_TASK *pTask);
+
+/* Fills a record with the defaults for a new task of the backend that
+ * pTask->Backend names, which the caller sets beforehand. The backend's result
+ * (0 or more), or -1: 0x0D00, 0x2000 when no backend has that id, or what the
+ * backend left. */
+ZELO_SCHED_API int ZELOSchedTaskGetDefault(ZELO_SCHED_TASK *pTask);
+
+/* Fills a record with the stored task of that id, whichever backend holds it,
+ * its next trigger time included. 0, or -1: 0x0D00, 0x2000 when no backend
+ * holds the id, or what the backend left. */
+ZELO_SCHED_API int ZELOSchedTaskGetByID(long id, ZELO_SCHED_TASK *pTask);
+
+/* ZELOSchedTaskGetDefault for id -1, ZELOSchedTaskGetByID for any other; an id
+ * below -1 is a bad argument. 0 or -1. */
+ZELO_SCHED_API int ZELOSchedTaskLoad(long id, ZELO_SCHED_TASK *pTask);
+
+/* Stores a new task with the backend that pTask->Backend names, which writes
+ * the id it gave into the record (and a name, when that was empty). The
+ * backend's result (0 or more), or -1: 0x0D00, 0x2000 when no backend has that
+ * id, or what the backend left. */
+ZELO_SCHED_API int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask);
+
+/* Overwrites the stored task of the record's id; plugins hear of it before and
+ * after. The backend's result, or -1: 0x0D00, 0x2000 when the task or the
+ * backend is not found, or what the backend left. */
+ZELO_SCHED_API int ZELOSchedTaskEdit(ZELO_SCHED_TASK *pTask);
+
+/* ZELOSchedTaskCreate for a record with id -1, ZELOSchedTaskEdit for any other
+ * id. 0 or -1. */
+ZELO_SCHED_API int ZELOSchedTaskSave(ZELO_SCHED_TASK *pTask);
+
+/* Deletes the stored task of that id; plugins hear of it before and after. 0,
+ * or -1: 0x2000 when the task is not found, or what the backend left. */
+ZELO_SCHED_API int ZELOSchedTaskRemove(long id);
+
+/* Lists the tasks of every backend, each with its next trigger time; `filter`
+ * may be null (all). When there are any, *pTaskList becomes the list, which
+ * the caller frees with ZELOSchedTaskListFree; else it is left alone. A
+ * backend that fails is logged and adds nothing. Their number (0 = none), or
+ * -1: 0x0D00, or what the registration of the backends left. */
+ZELO_SCHED_API int ZELOSchedTaskListGet(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter);
+
+/* The record after pTask, or null after the last one and for null. */
+ZELO_SCHED_API ZELO_SCHED_TASK *ZELOSchedTaskNext(ZELO_SCHED_TASK *pTask);
+
+/* Frees every record of the list and makes *pTaskList null. Null, and a list
+ * that is empty, are allowed. */
+ZELO_SCHED_API void ZELOSchedTaskListFree(ZELO_SCHED_TASK **pTaskList);
+
+/* Writes the tasks of every backend out to where they take effect (crontab,
+ * power hardware). 0 also when a backend failed, which is logged; -1 when the
+ * backends cannot be registered. */
+ZELO_SCHED_API int ZELOSchedTaskSync(void);
+
+/* 1 when the task belongs to one of the applications that come with the
+ * appliance's scheduler, else 0 (null included). */
+ZELO_SCHED_API int ZELOSchedTaskIsBuildInApp(const ZELO_SCHED_TASK *pTask);
+
+/* Sorts a list in place by the field whose key is szKey ("name", "app", ...),
+ * ascending for direction 1, else descending; equal records keep their order
+ * ascending and reverse it descending. Text fields sort byte by byte. A number
+ * or an enumeration orders the records by where they lie in memory, not by its
+ * value. 0, also for an empty list, or -1: 0x0D00 for a null argument, 0x0100
+ * when memory is short, no code for a key that no field has. */
+ZELO_SCHED_API int ZELOSchedTaskListSort(ZELO_SCHED_TASK **pTaskList, const char *szKey,
+                                         int direction);
+
+/* The same by the field's row index in the field table (0 "id" to 30 "type"),
+ * which is not checked. An empty list is a failure here (0x0D00). */
+ZELO_SCHED_API int ZELOSchedTaskListSortEx(ZELO_SCHED_TASK **pTaskList, int index, int direction);
+
+/* ---- the hash form: a task as texts by field key --------------------------- */
+
+/* Empties the hash and fills it from the task: numbers as decimal text, state
+ * and type by name, the command in Base64, line feeds in every other text as
+ * blanks. *ppHash is an existing hash (it may grow). 0, or -1: 0x0D00, or what
+ * the platform left, with the hash partly filled. */
+ZELO_SCHED_API int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_TASK *pTask);
+
+/* Fills the task from a hash; `next`, `Backend` and `NextTriggerTime` are left
+ * alone. "id", "run hour", "run min", "name", "app", "app name", "action",
+ * "cmd", "state" and "type" must be there, the rest have defaults. 0, or -1:
+ * 0x0D00, 0x4000 when a number has trailing characters, or what the platform
+ * left, with the record partly filled. */
+ZELO_SCHED_API int ZELOSchedInitTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash);
+
+/* ---- enumerations ----------------------------------------------------------- */
+
+/* One value and its name; a null name ends the list. */
+typedef struct ZELO_SCHED_ENUM {
+  int32_t value;
+  const char *szName;
+} ZELO_SCHED_ENUM;
+
+/* The name of the first entry with that value (it belongs to the list), or
+ * null: 0x0D00 for a null list, 0x2000 (not logged) when no entry has it. */
+ZELO_SCHED_API const char *ZELOSchedEnumToName(const ZELO_SCHED_ENUM *enum_list, int value);
+
+/* The value of the first entry with exactly that name, or -1: 0x0D00 for a
+ * null argument, 0x2000 (not logged) when no entry has it. */
+ZELO_SCHED_API int ZELOSchedEnumToValue(const ZELO_SCHED_ENUM *enum_list, const char *szName);
+
+/* Turns on/off characters ("0" = off) into the names at the positions that are
+ * on, joined by commas. szFlags has exactly `count` characters, names as many
+ * entries. The text lives in a buffer of 4096 characters that the next call
+ * overwrites. Null, without code or log line, for a null argument or a szFlags
+ * shorter than `count`. */
+ZELO_SCHED_API const char *ZELOSchedMultiSelectToText(const char *szFlags, const char *const *names,
+                                                      size_t count);
+
+/* The way back: for each of the `count` names (below 4096) a '1' when the
+ * comma-separated text holds it, ignoring case, else a '0'. The text lives in
+ * a buffer that the next call overwrites. Null, without a log line, for a null
+ * argument, a count of 0, a text without items, and when memory is short. */
+ZELO_SCHED_API const char *ZELOSchedMultiSelectFromText(const char *text, const char *const *names,
+                                                        size_t count);
+
+/* ---- dates ------------------------------------------------------------------- */
+
+typedef struct ZELO_SCHED_DATE {
+  uint32_t year;    /* full year */
+  uint32_t month;   /* 1 to 12 */
+  uint32_t day;     /* 1 to 31 */
+  uint32_t weekday; /* 0 = Sunday to 6 = Saturday */
+  uint32_t hour;    /* 0 to 23 */
+  uint32_t minute;  /* 0 to 59 */
+} ZELO_SCHED_DATE;
+
+/* The current local date and time. 0, or -1: 0x0D00, 0x2A00. */
+ZELO_SCHED_API int ZELOSchedDateGet(ZELO_SCHED_DATE *pDate);
+
+/* Compares the days (year, month, day): -1 when pDate1 is earlier, 0 when they
+ * are the same day, 1 when it is later; also -1, with 0x0D00, for null. */
+ZELO_SCHED_API int ZELOSchedDateComp(const ZELO_SCHED_DATE *pDate1, const ZELO_SCHED_DATE *pDate2);
+
+/* Reads "2013/5/7" or "2013/05/07" into year, month and day, whose ranges are
+ * not checked; the other fields are left alone. 0, or -1: 0x0D00, 0x4000. */
+ZELO_SCHED_API int ZELOSchedDateParse(const char *szDateOrg, ZELO_SCHED_DATE *pDate);
+
+/* Reads "8:30" or "08:30" into hour and minute, whose ranges are not checked;
+ * the other fields are left alone. 0, or -1: 0x0D00, 0x4000. */
+ZELO_SCHED_API int ZELOSchedTimeParse(const char *szTimeOrg, ZELO_SCHED_DATE *pDate);
+
+/* Rolls fields that are out of range over (32 January becomes 1 February) and
+ * works out the weekday. The time is taken as standard time: in summer time it
+ * comes back one hour later. 0, or -1: 0x0D00, 0x2A00. */
+ZELO_SCHED_API int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate);
+
+/* Seeds rand() from the time and the process id, once in a process. */
+ZELO_SCHED_API void ZELOSchedRandInit(void);
+
+/* Works out when the task runs next, after the current minute, into its
+ * NextTriggerTime: "YYYY-MM-DD hh:mm", or "N/A" when it never does. 0, or -1
+ * with the field left alone: 0x0D00, 0x2A00. */
+ZELO_SCHED_API int ZELOSchedNextTriggerTime(ZELO_SCHED_TASK *pTask);
+
+/* ---- backends ------------------------------------------------------------------ */
+
+/* One store of tasks. A slot may be empty: the backend does not offer it. */
+typedef struct ZELO_SCHED_BACKEND {
+  int32_t id;                                 /* the Backend field of its tasks */
+  const char *szName;                         /* not a copy */
+  int (*sync)(void);                          /* below 0 = failure */
+  int (*create)(ZELO_SCHED_TASK *pTask);      /* gives the id; below 0 = failure */
+  int (*edit)(ZELO_SCHED_TASK *pTask);        /* below 0 = failure */
+  int (*remove)(long id);                     /* 1 removed, 0 no such task, below 0 = failure */
+  int (*get_default)(ZELO_SCHED_TASK *pTask); /* below 0 = failure */
+  int (*owns_id)(long id);                    /* 0 = certainly not this backend's */
+  int (*get_by_id)(long id, ZELO_SCHED_TASK *pTask); /* 1 found, 0 not here, -1 error */
+  /* Carries the task out in the user context that the caller has set up, and
+   * reports a status code and a comment of at most cbComment - 1 characters;
+   * the buffer must have room for 4 at the least. Below 0 = failure. */
+  int (*run)(ZELO_SCHED_TASK *pTask, int *pStatusCode, char *szComment, size_t cbComment);
+  /* Attaches its tasks at the end of the list; their number, below 0 = failure. */
+  int (*list_get)(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter);
+} ZELO_SCHED_BACKEND;
+
+/* The table, in the order in which backends are asked, and how many there are. */
+extern ZELO_SCHED_API ZELO_SCHED_BACKEND SchedBackends[16];
+extern ZELO_SCHED_API uint32_t cBackend;
+
+/* Registers the backends, once in a process; every call that needs them does
+ * this by itself. 0, or -1 with the table empty, so that the next call tries
+ * again. */
+ZELO_SCHED_API int ZELOSchedBackendInit(void);
+
+/* Fills an entry for the backend "zeloschedule", but for its id. 0, or -1:
+ * 0x0D00, no code for another name. */
+ZELO_SCHED_API int zeloschedule_init(const char *szName, ZELO_SCHED_BACKEND *pBackend);
+
+/* ---- hooks: telling plugins of changes ------------------------------------------- */
+
+/* The caller zeroes it, and frees it after ZELOSchedTaskPluginExit. */
+typedef struct ZELO_SCHED_PLUGIN {
+  void *framework[3];          /* the platform's; the first is not null while live */
+  int32_t result;              /* told to the plugins as RESULT */
+  const ZELO_SCHED_TASK *pOrg; /* the task as it was, or null */
+  const ZELO_SCHED_TASK *pNew; /* the task as it is to be, or null */
+} ZELO_SCHED_PLUGIN;
+
+enum { ZELO_SCHED_PLUGIN_PRE = 4, ZELO_SCHED_PLUGIN_POST = 5 };
+
+/* Prepares a hook context for the action "task_create", "task_edit" or
+ * "task_remove". One of the two tasks must be given; they must live until
+ * ZELOSchedTaskPluginExit. 0, or -1: 0x0D00, or what the platform left. */
+ZELO_SCHED_API int ZELOSchedTaskPluginInit(ZELO_SCHED_PLUGIN *pPlugin, const char *szAction,
+                                           const ZELO_SCHED_TASK *pOrg,
+                                           const ZELO_SCHED_TASK *pNew);
+
+/* Runs the plugins for PRE or POST. The platform's verdict (below 0 when one
+ * failed), or -1: 0x0D00 without tasks, no code for a context that was not
+ * initialised. */
+ZELO_SCHED_API int ZELOSchedTaskPlugin(int action, ZELO_SCHED_PLUGIN *pPlugin);
+
+/* Releases what the platform holds for the context. 0, or -1. */
+ZELO_SCHED_API int ZELOSchedTaskPluginExit(ZELO_SCHED_PLUGIN *pPlugin);
+
+/* ---- running, and the record of runs ------------------------------------------------ */
+
+enum {                             /* status codes of a run */
+       ZELO_SCHED_STATUS_NONE = 0, /* in ZELOSchedDBSetStatus: any old code */
+       ZELO_SCHED_STATUS_GONE = 1, /* was running, but its process is gone */
+       ZELO_SCHED_STATUS_RUNNING = 2,
+       ZELO_SCHED_STATUS_FINISHED = 3,    /* exit code 0 */
+       ZELO_SCHED_STATUS_NOT_STARTED = 4, /* the shell could not be started */
+       ZELO_SCHED_STATUS_STOPPED = 5,     /* comment = signal */
+       ZELO_SCHED_STATUS_KILLED = 6,      /* comment = signal */
+       ZELO_SCHED_STATUS_EXIT_NONZERO = 7 /* comment = exit code */
+};
+
+/* What the running checks find. The caller zeroes it. */
+typedef struct ZELO_SCHED_STATUS {
+  int32_t found;     /* 1 = a live run was found */
+  int32_t pid;       /* process that runs the task */
+  int32_t statusID;  /* key of the row */
+  int32_t timestamp; /* start, in seconds since the epoch */
+  long taskID;
+  char szApp[1024];
+  int32_t statusCode;
+  char szComment[1024];
+} ZELO_SCHED_STATUS;
+
+/* Runs a stored task in a child process of its own, which waits for conflicting
+ * runs, takes on the owner's rights and records the run in the status database.
+ * checkRunTime 1: only when the current minute is one of the task's.
+ * skipDisabled 1: not when the task is disabled. 0 when a child was started or
+ * there was nothing to do, or -1: 0x2000 when the task is not found, or what
+ * the callee left. How the run went is told by the status database and the log
+ * alone. */
+ZELO_SCHED_API int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled);
+
+/* The stream of the run lock file while this process holds the run lock. */
+extern ZELO_SCHED_API FILE *pfLock;
+
+/* Opens the status database, creating it when it is missing. The caller closes
+ * it with sqlite3_close. Null on failure: 0x0900 when it cannot be opened. */
+ZELO_SCHED_API sqlite3 *ZELOSchedDBInit(void);
+
+/* Looks for a run of the task, or of any task of the application, that is still
+ * going. 0 with pStatus->found 1 (pid, statusID and taskID are the run's) or
+ * untouched, or -1: 0x0D00, no code when the statement failed. */
+ZELO_SCHED_API int ZELOSchedDBIsTaskRunning(sqlite3 *db, long id, ZELO_SCHED_STATUS *pStatus);
+ZELO_SCHED_API int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp,
+                                           ZELO_SCHED_STATUS *pStatus);
+
+/* Records a run of the task by this process, starting now. pStatusID, which may
+ * be null, receives the row's key. 0, or -1: 0x0D00, 0x0B00 when the row cannot
+ * be read back, no code when a statement failed. */
+ZELO_SCHED_API int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatusID);
+
+/* Sets code and comment (null or empty: the comment stays) of the row with that
+ * key (-1: of every row) whose code is orgStatusCode (0: any). Not both -1 and
+ * 0. 0, or -1: 0x0D00, no code when the statement failed. */
+ZELO_SCHED_API int ZELOSchedDBSetStatus(sqlite3 *db, int iStatusID, int orgStatusCode,
+                                        int newStatusCode, const char *szComment);
+
+/* The status of one run, or of the latest run of a task. A run whose process is
+ * gone reads as ZELO_SCHED_STATUS_GONE. szComment and pTimestamp (seconds since
+ * the epoch) may be null. 1 found, 0 not found with the outputs untouched, -1:
+ * 0x0D00, no code when the statement failed. */
+ZELO_SCHED_API int ZELOSchedDBGetStatusByStatusID(sqlite3 *db, int iStatusID, int *pStatusCode,
+                                                  char *szComment, size_t cbComment);
+ZELO_SCHED_API int ZELOSchedDBGetStatusByTaskID(sqlite3 *db, long id, long *pTimestamp,
+                                                int *pStatusCode, char *szComment,
+                                                size_t cbComment);
+
+#ifdef __cplusplus
+}
+#endif
+#endif

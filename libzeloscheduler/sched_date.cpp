@@ -1,0 +1,240 @@
+// Dates that roll over, and the minute at which a task runs next.
+#include <zelosched.h>
+
+#include <cstring>
+#include <ctime>
+
+#include "sched_report.h"
+#include "sched_run_hours.h"
+#include "sched_text.h"
+#include "sched_trigger_clock.h"
+
+namespace {
+
+constexpr uint32_t kFirstYear = 1900;  // of struct tm
+constexpr uint32_t kDaysOfWeek = 7;
+constexpr uint32_t kHundred = 100;  // a time of day is hour * 100 + minute
+constexpr char kDayOff = '0';
+constexpr char kNever[] = "N/A";
+
+using TriggerText = BoundedText<64>;
+
+ZELO_SCHED_DATE startDate(const ZELO_SCHED_TASK &task) {
+  ZELO_SCHED_DATE date = {};
+  date.year = task.StartYear;
+  date.month = task.StartMonth;
+  date.day = task.StartDay;
+  return date;
+}
+
+bool isWeekdayOn(const ZELO_SCHED_TASK &task, uint32_t weekday) {
+  return task.Week[weekday] != kDayOff;
+}
+
+bool isDayOfMonth(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
+  return now.day == task.StartDay;
+}
+
+bool isDayOfYear(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
+  return now.month == task.StartMonth && now.day == task.StartDay;
+}
+
+TriggerText written(const ZELO_SCHED_DATE &date) {
+  TriggerText text;
+  text.append("%04u-%02u-%02u %02u:%02u", date.year, date.month, date.day, date.hour, date.minute);
+  return text;
+}
+
+enum class Today { kFound, kOver, kFailed };
+
+// The first run of today that is still ahead; one of this very minute has been started already.
+Today ZELOSchedTDayNextRunTime(const ZELO_SCHED_TASK *pTask, const ZELO_SCHED_DATE &now,
+                               TriggerText *result) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", Today::kFailed);
+  const uint32_t nowHM = now.hour * kHundred + now.minute;
+  uint64_t runHM = 0;
+  const bool found = anyRunHour(*pTask, [&](uint32_t hour) {
+    runHM = uint64_t{hour} * kHundred + pTask->RunMin;
+    return runHM > nowHM;
+  });
+  if (!found) {
+    return Today::kOver;
+  }
+  ZELO_SCHED_DATE date = now;
+  date.hour = static_cast<uint32_t>(runHM / kHundred);
+  date.minute = static_cast<uint32_t>(runHM % kHundred);
+  *result = written(date);
+  return Today::kFound;
+}
+
+// Without any day of the week the search ends eight days ahead; the display shows just that.
+uint32_t daysToNextWeekday(const ZELO_SCHED_TASK &task, uint32_t weekday) {
+  uint32_t days = 1;
+  while (days <= kDaysOfWeek && !isWeekdayOn(task, (weekday + days) % kDaysOfWeek)) {
+    ++days;
+  }
+  return days;
+}
+
+// The next day that fits the task, before it is normalised.
+ZELO_SCHED_DATE nextDay(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
+  ZELO_SCHED_DATE date = now;
+  switch (task.Type) {
+    case ZELO_SCHED_TYPE_DAILY:
+      date.day += 1;
+      return date;
+    case ZELO_SCHED_TYPE_WEEKLY:
+      date.day += daysToNextWeekday(task, now.weekday);
+      return date;
+    case ZELO_SCHED_TYPE_MONTHLY:
+      date.month += task.StartDay <= now.day ? 1 : 0;
+      date.day = task.StartDay;
+      return date;
+    case ZELO_SCHED_TYPE_YEARLY:
+      date.year +=
+          task.StartMonth < now.month || (task.StartMonth == now.month && task.StartDay <= now.day)
+              ? 1
+              : 0;
+      date.month = task.StartMonth;
+      date.day = task.StartDay;
+      return date;
+    default:
+      date = {};
+      date.hour = now.hour;
+      date.minute = now.minute;
+      return date;
+  }
+}
+
+int ZELOSchedNextRunEstimate(const ZELO_SCHED_TASK &task, SchedTriggerClock *clock,
+                             TriggerText *result) {
+  if (task.Type == ZELO_SCHED_TYPE_ONCE) {
+    result->append("%s", kNever);
+    return 0;
+  }
+  ZELO_SCHED_DATE date = nextDay(task, clock->now());
+  if (clock->normalize(&date) < 0) {
+    SCHED_LOG_CALLEE("date normalization failed. ");
+    return -1;
+  }
+  date.hour = task.RunHour;
+  date.minute = task.RunMin;
+  *result = written(date);
+  return 0;
+}
+
+bool runsToday(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now, int nowToStart) {
+  switch (task.Type) {
+    case ZELO_SCHED_TYPE_ONCE:
+      return nowToStart == 0;
+    case ZELO_SCHED_TYPE_MONTHLY:
+      return nowToStart == 0 || isDayOfMonth(task, now);
+    case ZELO_SCHED_TYPE_YEARLY:
+      return nowToStart == 0 || isDayOfYear(task, now);
+    case ZELO_SCHED_TYPE_DAILY:
+      return true;
+    default:
+      return isWeekdayOn(task, now.weekday);
+  }
+}
+
+bool hasStartDate(const ZELO_SCHED_TASK &task) {
+  return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_MONTHLY ||
+         task.Type == ZELO_SCHED_TYPE_YEARLY;
+}
+
+int triggerText(const ZELO_SCHED_TASK &task, SchedTriggerClock *clock, TriggerText *result) {
+  if (clock->read() < 0) {
+    SCHED_LOG_CALLEE("get date failed. ");
+    return -1;
+  }
+  const ZELO_SCHED_DATE &now = clock->now();
+  ZELO_SCHED_DATE start = startDate(task);
+  const int nowToStart = hasStartDate(task) ? ZELOSchedDateComp(&now, &start) : 0;
+  if (nowToStart < 0) {
+    start.hour = task.RunHour;
+    start.minute = task.RunMin;
+    *result = written(start);
+    return 0;
+  }
+  if (runsToday(task, now, nowToStart)) {
+    const Today today = ZELOSchedTDayNextRunTime(&task, now, result);
+    if (today == Today::kFailed) {
+      SCHED_LOG_CALLEE("ZELOSchedTDayNextRunTime failed. ");
+      return -1;
+    }
+    if (today == Today::kFound) {
+      return 0;
+    }
+  }
+  return ZELOSchedNextRunEstimate(task, clock, result);
+}
+
+}  // namespace
+
+int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate) {
+  SCHED_CHECK_ARG(pDate != nullptr, "((void *)0) != pDate", -1);
+  struct tm fields = {};
+  fields.tm_year = static_cast<int>(pDate->year - kFirstYear);
+  fields.tm_mon = static_cast<int>(pDate->month - 1);
+  fields.tm_mday = static_cast<int>(pDate->day);
+  fields.tm_hour = static_cast<int>(pDate->hour);
+  fields.tm_min = static_cast<int>(pDate->minute);
+  fields.tm_isdst = 0;  // standard time, not "unknown": see the header on summer time
+  const time_t seconds = mktime(&fields);
+  const struct tm *local = localtime(&seconds);
+  if (local == nullptr) {
+    SCHED_LOG_ERRNO("localtime failed. ");
+    SCHED_SET_ERROR(kErrSystem);
+    return -1;
+  }
+  pDate->year = static_cast<uint32_t>(local->tm_year) + kFirstYear;
+  pDate->month = static_cast<uint32_t>(local->tm_mon + 1);
+  pDate->day = static_cast<uint32_t>(local->tm_mday);
+  pDate->weekday = static_cast<uint32_t>(local->tm_wday);
+  pDate->hour = static_cast<uint32_t>(local->tm_hour);
+  pDate->minute = static_cast<uint32_t>(local->tm_min);
+  return 0;
+}
+
+int SchedTriggerClock::read() {
+  if (isRead_) {
+    return 0;
+  }
+  if (ZELOSchedDateGet(&now_) < 0) {
+    return -1;
+  }
+  isRead_ = true;
+  return 0;
+}
+
+int SchedTriggerClock::normalize(ZELO_SCHED_DATE *pDate) {
+  if (isNormalized_ && memcmp(pDate, &given_, sizeof(given_)) == 0) {
+    *pDate = normalized_;
+    return 0;
+  }
+  const ZELO_SCHED_DATE given = *pDate;
+  if (ZELOSchedDateNormalize(pDate) < 0) {
+    return -1;
+  }
+  given_ = given;
+  normalized_ = *pDate;
+  isNormalized_ = true;
+  return 0;
+}
+
+int schedNextTriggerTime(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
+  TriggerText result;
+  if (triggerText(*pTask, clock, &result) < 0) {
+    SCHED_LOG_CALLEE("get trigger date failed. [%ld] ", static_cast<long>(pTask->ID));
+    return -1;
+  }
+  copyText(pTask->NextTriggerTime, result.c_str());
+  return 0;
+}
+
+int ZELOSchedNextTriggerTime(ZELO_SCHED_TASK *pTask) {
+  SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  SchedTriggerClock clock;
+  return schedNextTriggerTime(pTask, &clock);
+}

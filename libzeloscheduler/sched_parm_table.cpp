@@ -1,0 +1,137 @@
+// The table of the persistent fields, and the conversions and orderings that its rows name.
+#include "sched_parm_table.h"
+
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
+#include "sched_report.h"
+
+const ZELO_SCHED_ENUM kStateEnum[] = {{ZELO_SCHED_STATE_DISABLED, "disabled"},
+                                      {ZELO_SCHED_STATE_ENABLED, "enabled"},
+                                      {ZELO_SCHED_STATE_NOT_EXISTED, "NotExisted"},
+                                      {-1, nullptr}};
+
+const ZELO_SCHED_ENUM kTypeEnum[] = {
+    {ZELO_SCHED_TYPE_ONCE, "once"},     {ZELO_SCHED_TYPE_DAILY, "daily"},
+    {ZELO_SCHED_TYPE_WEEKLY, "weekly"}, {ZELO_SCHED_TYPE_MONTHLY, "monthly"},
+    {ZELO_SCHED_TYPE_YEARLY, "yearly"}, {-1, nullptr}};
+
+namespace {
+
+constexpr int kDecimal = 10;
+
+int signedToText(const void *private_data, char *str, size_t cbStr) {
+  SCHED_CHECK_ARG(private_data != nullptr, "((void *)0) != private_data", -1);
+  SCHED_CHECK_ARG(str != nullptr, "NULL != str", -1);
+  snprintf(str, cbStr, "%ld", static_cast<long>(*static_cast<const int32_t *>(private_data)));
+  return 0;
+}
+
+int signedFromText(void *private_data, const char *str) {
+  SCHED_CHECK_ARG(private_data != nullptr, "((void *)0) != private_data", -1);
+  SCHED_CHECK_ARG(str != nullptr, "NULL != str", -1);
+  *static_cast<int32_t *>(private_data) = static_cast<int32_t>(strtol(str, nullptr, kDecimal));
+  return 0;
+}
+
+int unsignedToText(const void *private_data, char *str, size_t cbStr) {
+  SCHED_CHECK_ARG(private_data != nullptr, "((void *)0) != private_data", -1);
+  SCHED_CHECK_ARG(str != nullptr, "NULL != str", -1);
+  snprintf(str, cbStr, "%lu",
+           static_cast<unsigned long>(*static_cast<const uint32_t *>(private_data)));
+  return 0;
+}
+
+int unsignedFromText(void *private_data, const char *str) {
+  SCHED_CHECK_ARG(private_data != nullptr, "((void *)0) != private_data", -1);
+  SCHED_CHECK_ARG(str != nullptr, "NULL != str", -1);
+  char *end = nullptr;
+  *static_cast<uint32_t *>(private_data) = static_cast<uint32_t>(strtoul(str, &end, kDecimal));
+  if (*end != '\0') {
+    SCHED_SET_ERROR(kErrMalformed);
+    return -1;
+  }
+  return 0;
+}
+
+// Callers have long relied on a sort by a number leaving the records in the order of their
+// addresses, so the locations are compared and not what stands there.
+template <class Word>
+int compareLocations(const void *field1, const void *field2) {
+  const Word word1 = reinterpret_cast<Word>(field1);
+  const Word word2 = reinterpret_cast<Word>(field2);
+  return word1 == word2 ? 0 : (word1 < word2 ? -1 : 1);
+}
+
+int compareTexts(const void *field1, const void *field2) {
+  return strcmp(static_cast<const char *>(field1), static_cast<const char *>(field2));
+}
+
+constexpr bool kInHash = true;
+constexpr bool kNotInHash = false;
+constexpr bool kRequired = true;
+constexpr bool kOptional = false;
+
+constexpr SchedParm signedRow(const char *szKey, bool inHash, bool required, const char *szDefault,
+                              size_t offset) {
+  return {szKey, inHash,  required,     szDefault,      offset,
+          0,     nullptr, signedToText, signedFromText, compareLocations<intptr_t>};
+}
+
+constexpr SchedParm unsignedRow(const char *szKey, bool required, const char *szDefault,
+                                size_t offset) {
+  return {szKey, kInHash, required,       szDefault,        offset,
+          0,     nullptr, unsignedToText, unsignedFromText, compareLocations<uintptr_t>};
+}
+
+constexpr SchedParm enumRow(const char *szKey, const char *szDefault, size_t offset,
+                            const ZELO_SCHED_ENUM *enumList) {
+  return {szKey, kInHash,  kRequired, szDefault, offset,
+          0,     enumList, nullptr,   nullptr,   compareLocations<intptr_t>};
+}
+
+#define TEXT_ROW(key, inHash, required, szDefault, field)                       \
+  {                                                                             \
+    key, inHash, required, szDefault, offsetof(ZELO_SCHED_TASK, field),         \
+        sizeof(ZELO_SCHED_TASK::field), nullptr, nullptr, nullptr, compareTexts \
+  }
+#define FIELD(name) offsetof(ZELO_SCHED_TASK, name)
+
+}  // namespace
+
+const SchedParm parm_table[] = {
+    signedRow("id", kInHash, kRequired, "-1", FIELD(ID)),
+    signedRow("backend", kNotInHash, kOptional, "-1", FIELD(Backend)),
+    signedRow("can edit owner", kInHash, kOptional, "1", FIELD(CanEditOwner)),
+    signedRow("can edit name", kInHash, kOptional, "1", FIELD(CanEditName)),
+    signedRow("listable", kInHash, kOptional, "1", FIELD(Listable)),
+    signedRow("can run from ui", kInHash, kOptional, "1", FIELD(CanRunFromUI)),
+    signedRow("can delete from ui", kInHash, kOptional, "1", FIELD(CanDeleteFromUI)),
+    signedRow("can edit from ui", kInHash, kOptional, "1", FIELD(CanEditFromUI)),
+    signedRow("can run app same time", kInHash, kOptional, "1", FIELD(CanRunAppSameTime)),
+    signedRow("can run task same time", kInHash, kOptional, "0", FIELD(CanRunTaskSameTime)),
+    signedRow("simple edit form", kInHash, kOptional, "0", FIELD(SimpleEditForm)),
+    unsignedRow("owner", kOptional, "0", FIELD(Owner)),
+    unsignedRow("start year", kOptional, "2012", FIELD(StartYear)),
+    unsignedRow("start month", kOptional, "1", FIELD(StartMonth)),
+    unsignedRow("start day", kOptional, "1", FIELD(StartDay)),
+    unsignedRow("run hour", kRequired, "0", FIELD(RunHour)),
+    unsignedRow("run min", kRequired, "0", FIELD(RunMin)),
+    unsignedRow("repeat hour", kOptional, "0", FIELD(RepeatHour)),
+    unsignedRow("last work hour", kOptional, "0", FIELD(LastWorkHour)),
+    TEXT_ROW("name", kInHash, kRequired, "", Name),
+    TEXT_ROW("edit form", kInHash, kOptional, "", EditForm),
+    TEXT_ROW("edit dialog", kInHash, kOptional, "ZELO.TOV.TaskScheduler.EditDialog", EditDialog),
+    TEXT_ROW("app", kInHash, kRequired, "", App),
+    TEXT_ROW("app name", kInHash, kRequired, "", AppName),
+    TEXT_ROW("app args", kInHash, kOptional, "", AppArgs),
+    TEXT_ROW("action", kInHash, kRequired, "", Action),
+    TEXT_ROW("week", kInHash, kOptional, "1111111", Week),
+    TEXT_ROW("cmd", kInHash, kRequired, "", Command),
+    TEXT_ROW("next trigger time", kNotInHash, kOptional, "", NextTriggerTime),
+    enumRow("state", "enabled", FIELD(State), kStateEnum),
+    enumRow("type", "daily", FIELD(Type), kTypeEnum),
+    {nullptr, false, false, nullptr, 0, 0, nullptr, nullptr, nullptr, nullptr},
+};

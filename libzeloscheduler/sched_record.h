@@ -1,0 +1,40 @@
+// Where task records come from and go back to.
+#ifndef SCHED_RECORD_H
+#define SCHED_RECORD_H
+
+#include <zelosched.h>
+
+#include <memory>
+
+void schedRecordFree(ZELO_SCHED_TASK *pTask);
+
+struct TaskDeleter {
+  void operator()(ZELO_SCHED_TASK *pTask) const { schedRecordFree(pTask); }
+};
+using TaskGuard = std::unique_ptr<ZELO_SCHED_TASK, TaskDeleter>;
+
+// One zeroed record; null, with errno set, when memory is short.
+TaskGuard schedRecordAlloc();
+
+struct SchedSlab;
+
+// The records of one list. A record is large and mostly empty, and of many records taken one by one
+// it is the page faults that a list costs most. A long list therefore takes them from slabs, which
+// may be backed by huge pages; a slab is freed with the last of its records, in whatever order they
+// are freed.
+class SchedRecordSource {
+ public:
+  explicit SchedRecordSource(int expectedRecords);
+  ~SchedRecordSource();
+  SchedRecordSource(const SchedRecordSource &) = delete;
+  SchedRecordSource &operator=(const SchedRecordSource &) = delete;
+
+  // As schedRecordAlloc.
+  TaskGuard take();
+
+ private:
+  bool usesSlabs_;
+  SchedSlab *slab_ = nullptr;
+};
+
+#endif

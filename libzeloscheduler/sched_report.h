@@ -1,0 +1,72 @@
+// How every unit checks an argument and reports a failure. The macros stand in for functions so
+// that each log line names the file and the line where the failure was seen.
+#ifndef SCHED_REPORT_H
+#define SCHED_REPORT_H
+
+#include <syslog.h>
+#include <zelocore.h>
+
+#include <cerrno>
+#include <cstring>
+
+enum SchedError : int {
+  kErrArrayAlloc = 0x0100,
+  kErrRecordAlloc = 0x0200,
+  kErrLock = 0x0400,
+  kErrUnlock = 0x0500,
+  kErrOpen = 0x0900,
+  kErrIo = 0x0B00,
+  kErrBadArgument = 0x0D00,
+  kErrNotFound = 0x2000,
+  kErrStat = 0x2700,
+  kErrRename = 0x2800,
+  kErrSystem = 0x2A00,
+  kErrMalformed = 0x4000,
+};
+
+// A place in the source, for a shared routine that reports under its caller's name.
+struct SchedPlace {
+  constexpr SchedPlace(const char *szFile, int lineNumber) : file(szFile), line(lineNumber) {}
+  const char *file;
+  int line;
+};
+
+#define SCHED_HERE SchedPlace(__FILE_NAME__, __LINE__)
+
+#define SCHED_LOG_AT(place, format, ...) \
+  syslog(LOG_ERR, "%s:%d " format, (place).file, (place).line __VA_OPT__(, ) __VA_ARGS__)
+
+#define SCHED_LOG(format, ...) SCHED_LOG_AT(SCHED_HERE, format __VA_OPT__(, ) __VA_ARGS__)
+
+// For a failed call of the C library: the line ends with what errno says.
+#define SCHED_LOG_ERRNO(format, ...) \
+  SCHED_LOG(format "%s" __VA_OPT__(, ) __VA_ARGS__, strerror(errno))
+
+// For a failure passed up from a callee: its error record is appended to the line and stays as it
+// is. `format` ends with whatever stands before the bracket.
+#define SCHED_LOG_CALLEE_AT(place, format, ...)                           \
+  SCHED_LOG_AT(place, format "[0x%04X %s:%d]" __VA_OPT__(, ) __VA_ARGS__, \
+               static_cast<unsigned>(QLIBCErrGet()), QLIBCErrorGetFile(), QLIBCErrorGetLine())
+
+#define SCHED_LOG_CALLEE(format, ...) \
+  SCHED_LOG_CALLEE_AT(SCHED_HERE, format __VA_OPT__(, ) __VA_ARGS__)
+
+#define SCHED_SET_ERROR(code) QLIBCErrSetEx((code), __FILE_NAME__, __LINE__)
+
+#define SCHED_REPORT_BAD_ARGUMENT(text)                 \
+  do {                                                  \
+    SCHED_LOG("Invaild Argument (%s)=[%d]\n", text, 0); \
+    SCHED_SET_ERROR(kErrBadArgument);                   \
+  } while (0)
+
+// `text` is the condition as the log has always shown it; log readers match on it, so it is given
+// apart from the condition itself.
+#define SCHED_CHECK_ARG(condition, text, result) \
+  do {                                           \
+    if (!(condition)) {                          \
+      SCHED_REPORT_BAD_ARGUMENT(text);           \
+      return result;                             \
+    }                                            \
+  } while (0)
+
+#endif

@@ -1,0 +1,171 @@
+// What a run leaves behind of its caller, and what a command starts with.
+#include "sched_surroundings.h"
+
+#include <fcntl.h>
+#include <signal.h>
+#include <sys/stat.h>
+#include <syslog.h>
+#include <unistd.h>
+#include <zelocore.h>
+#include <zelosched.h>
+
+#include <cstdlib>
+#include <cstring>
+
+#include "sched_report.h"
+#include "sched_user.h"
+
+namespace {
+
+constexpr char kPath[] = "PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin";
+constexpr char kDefaultShell[] = "/bin/sh";
+constexpr char kRootDirectory[] = "/";
+constexpr mode_t kFileModeMask = 022;
+constexpr int kFirstOwnDescriptor = STDERR_FILENO + 1;
+constexpr unsigned kLastDescriptor = ~0U;
+
+// Of the caller's environment these stay: a command should speak the language and keep the time
+// zone of the machine. Nothing else of it reaches a command.
+constexpr const char *kKeptVariables[] = {
+    "TZ",          "LANG",         "LANGUAGE",       "LC_ALL",
+    "LC_CTYPE",    "LC_NUMERIC",   "LC_TIME",        "LC_COLLATE",
+    "LC_MONETARY", "LC_MESSAGES",  "LC_PAPER",       "LC_NAME",
+    "LC_ADDRESS",  "LC_TELEPHONE", "LC_MEASUREMENT", "LC_IDENTIFICATION",
+};
+
+// The new environment, built beside the old one: it takes the old one's place only when it is
+// whole.
+class Environment {
+ public:
+  Environment() { add(kPath); }
+
+  void addVariable(const char *szName, const char *szValue) {
+    char *szEntry = nullptr;
+    if (asprintf(&szEntry, "%s=%s", szName, szValue) < 0) {
+      whole_ = false;
+      return;
+    }
+    add(szEntry);
+  }
+
+  bool install() {
+    if (!whole_ || clearenv() != 0) {
+      return false;
+    }
+    for (size_t i = 0; i < count_; ++i) {
+      if (putenv(const_cast<char *>(entries_[i])) != 0) {
+        return false;
+      }
+    }
+    return true;
+  }
+
+ private:
+  // Entries become part of the environment and live as long as the process.
+  void add(const char *szEntry) { entries_[count_++] = szEntry; }
+
+  static constexpr size_t kOwnVariables = 5;  // PATH, HOME, USER, LOGNAME, SHELL
+  const char *entries_[kOwnVariables + sizeof(kKeptVariables) / sizeof(kKeptVariables[0])] = {};
+  size_t count_ = 0;
+  bool whole_ = true;
+};
+
+bool installEnvironment(const ZELOUSER &user) {
+  Environment environment;
+  environment.addVariable("HOME", user.szHome);
+  environment.addVariable("USER", user.szName);
+  environment.addVariable("LOGNAME", user.szName);
+  environment.addVariable("SHELL", user.szShell[0] != '\0' ? user.szShell : kDefaultShell);
+  for (const char *szName : kKeptVariables) {
+    const char *szValue = getenv(szName);
+    if (szValue != nullptr) {
+      environment.addVariable(szName, szValue);
+    }
+  }
+  return environment.install();
+}
+
+bool closeDescriptors(unsigned first, unsigned last) {
+  return first > last || close_range(first, last, 0) == 0;
+}
+
+bool closeCallersDescriptors() {
+  const int lock = pfLock != nullptr ? fileno(pfLock) : -1;
+  if (lock < kFirstOwnDescriptor) {
+    return closeDescriptors(kFirstOwnDescriptor, kLastDescriptor);
+  }
+  const auto kept = static_cast<unsigned>(lock);
+  return fcntl(lock, F_SETFD, FD_CLOEXEC) == 0 && closeDescriptors(kFirstOwnDescriptor, kept - 1) &&
+         closeDescriptors(kept + 1, kLastDescriptor);
+}
+
+// A descriptor below 3 that is free would be given to the next file opened, and the command would
+// then write its output into a database.
+void occupyStandardDescriptors() {
+  int descriptor = open("/dev/null", O_RDWR);
+  while (descriptor >= 0 && descriptor < kFirstOwnDescriptor) {
+    descriptor = dup(descriptor);
+  }
+}
+
+void resetSignals() {
+  struct sigaction action = {};
+  action.sa_handler = SIG_DFL;
+  for (int signal = 1; signal < NSIG; ++signal) {
+    sigaction(signal, &action, nullptr);  // SIGKILL and SIGSTOP refuse, and are default anyway
+  }
+  sigset_t none;
+  sigemptyset(&none);
+  sigprocmask(SIG_SETMASK, &none, nullptr);
+}
+
+}  // namespace
+
+int schedSetSurroundings(uid_t uid) {
+  const UserGuard user = schedLookUpUser(uid, SCHED_HERE);
+  if (user == nullptr) {
+    return -1;
+  }
+  if (!installEnvironment(*user)) {
+    SCHED_LOG_ERRNO("Failed to set environment: [%u] ", uid);
+    SCHED_SET_ERROR(kErrSystem);
+    return -1;
+  }
+  umask(kFileModeMask);
+  if (chdir(user->szHome) != 0 && chdir(kRootDirectory) != 0) {
+    SCHED_LOG_ERRNO("Failed to change directory: [%u] ", uid);
+    SCHED_SET_ERROR(kErrSystem);
+    return -1;
+  }
+  return 0;
+}
+
+int schedLeaveCaller() {
+  setsid();
+  resetSignals();
+  closelog();  // its descriptor is closed below; the C library would go on using the number
+  occupyStandardDescriptors();
+  if (!closeCallersDescriptors()) {
+    SCHED_LOG_ERRNO("Failed to close descriptors. ");
+    SCHED_SET_ERROR(kErrSystem);
+    return -1;
+  }
+  return 0;
+}
+
+SchedRealIds::SchedRealIds() : uid_(getuid()), gid_(getgid()) {
+  const auto keep = static_cast<uid_t>(-1);
+  set_ = setresgid(getegid(), keep, keep) == 0 && setresuid(geteuid(), keep, keep) == 0;
+  if (!set_) {
+    SCHED_LOG_ERRNO("Failed to set real ids: [%u:%u] ", geteuid(), getegid());
+    SCHED_SET_ERROR(kErrSystem);
+  }
+}
+
+SchedRealIds::~SchedRealIds() {
+  const auto keep = static_cast<uid_t>(-1);
+  if (setresgid(gid_, keep, keep) != 0 || setresuid(uid_, keep, keep) != 0) {
+    SCHED_LOG_ERRNO("Failed to restore real ids: [%u:%u] ", uid_, gid_);
+    SCHED_SET_ERROR(kErrSystem);
+  }
+}

@@ -1,0 +1,308 @@
+// The status database: one row for every run of a task.
+//
+// Values stand in the statements unescaped, so an application's name can end its quotes and go on
+// as SQL of its own. What keeps that harmless is the authorizer: while one of these statements is
+// compiled, the connection can create, read, insert into and update task_status, and nothing else.
+#include <sqlite3.h>
+#include <unistd.h>
+#include <zelocore.h>
+#include <zelosched.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+
+#include "sched_report.h"
+#include "sched_text.h"
+
+namespace {
+
+constexpr char kDatabase[] = "/tmp/sched_status.sqlite";
+constexpr char kTable[] = "task_status";
+constexpr char kCreateTable[] =
+    "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, "
+    "timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);";
+constexpr int kAnyStatusID = -1;
+constexpr int kAlive = 1;
+constexpr int kMostLockedRetries = 100;
+
+using Statement = BoundedText<4096>;
+using RowCallback = int (*)(void *context, int columns, char **values, char **names);
+
+bool isNamed(const char *szName, const char *szExpected) {
+  return szName != nullptr && strcmp(szName, szExpected) == 0;
+}
+
+// The schema table is written by CREATE TABLE itself; direct writes to it are SQLite's to refuse.
+bool isOwnTable(const char *szTable) {
+  return isNamed(szTable, kTable) || isNamed(szTable, "sqlite_master");
+}
+
+int allowOwnTableOnly(void *, int action, const char *szFirst, const char *, const char *,
+                      const char *) {
+  switch (action) {
+    case SQLITE_SELECT:
+      return SQLITE_OK;
+    case SQLITE_CREATE_TABLE:
+      return isNamed(szFirst, kTable) ? SQLITE_OK : SQLITE_DENY;
+    case SQLITE_READ:
+    case SQLITE_INSERT:
+    case SQLITE_UPDATE:
+      return isOwnTable(szFirst) ? SQLITE_OK : SQLITE_DENY;
+    default:
+      return SQLITE_DENY;
+  }
+}
+
+class RestrictedConnection {
+ public:
+  explicit RestrictedConnection(sqlite3 *db) : db_(db) {
+    sqlite3_set_authorizer(db_, allowOwnTableOnly, nullptr);
+  }
+  ~RestrictedConnection() { sqlite3_set_authorizer(db_, nullptr, nullptr); }
+  RestrictedConnection(const RestrictedConnection &) = delete;
+  RestrictedConnection &operator=(const RestrictedConnection &) = delete;
+
+ private:
+  sqlite3 *db_;
+};
+
+// Random, so that processes which collided do not collide again.
+useconds_t lockedWait() {
+  constexpr int32_t kSpread = 1000000;
+  constexpr int32_t kShortest = 100000;
+  constexpr uint32_t kLongest = 999999;
+  constexpr int kShift = 5;
+  const auto shifted = static_cast<int32_t>(static_cast<uint32_t>(rand()) << kShift);
+  const int32_t wait = shifted % kSpread + kShortest;
+  return std::min(static_cast<uint32_t>(wait), kLongest);
+}
+
+void reportFailedStatement(const char *szSql, const char *szError) {
+  SCHED_LOG("Exec sql:[%s] error: %s\n", szSql, szError);
+}
+
+int execute(sqlite3 *db, const char *szSql, RowCallback takeRow, void *context) {
+  const RestrictedConnection restricted(db);
+  for (int retries = 0;; ++retries) {
+    char *szError = nullptr;
+    if (sqlite3_exec(db, szSql, takeRow, context, &szError) == SQLITE_OK) {
+      return 0;
+    }
+    if (szError == nullptr) {
+      return -1;
+    }
+    const bool locked = strstr(szError, "database is locked") != nullptr;
+    if (!locked || retries == kMostLockedRetries) {
+      reportFailedStatement(szSql, szError);
+      sqlite3_free(szError);
+      return -1;
+    }
+    sqlite3_free(szError);
+    usleep(lockedWait());
+  }
+}
+
+// A statement that was cut could have lost its WHERE clause: it must not run.
+int execute(sqlite3 *db, const Statement &statement, RowCallback takeRow, void *context) {
+  if (statement.wasCut()) {
+    reportFailedStatement(statement.c_str(), "statement too long");
+    return -1;
+  }
+  return execute(db, statement.c_str(), takeRow, context);
+}
+
+int32_t numberOf(const char *szValue) {
+  return szValue != nullptr ? static_cast<int32_t>(strtol(szValue, nullptr, 10)) : 0;
+}
+
+void takeColumn(ZELO_SCHED_STATUS *row, const char *szColumn, const char *szValue) {
+  if (isNamed(szColumn, "pid")) {
+    row->pid = numberOf(szValue);
+  } else if (isNamed(szColumn, "status_id")) {
+    row->statusID = numberOf(szValue);
+  } else if (isNamed(szColumn, "timestamp")) {
+    row->timestamp = numberOf(szValue);
+  } else if (isNamed(szColumn, "task_id")) {
+    row->taskID = szValue != nullptr ? strtol(szValue, nullptr, 10) : 0;
+  } else if (isNamed(szColumn, "app")) {
+    copyText(row->szApp, szValue != nullptr ? szValue : "");
+  } else if (isNamed(szColumn, "status_code")) {
+    row->statusCode = numberOf(szValue);
+  } else if (isNamed(szColumn, "comment")) {
+    copyText(row->szComment, szValue != nullptr ? szValue : "");
+  }
+}
+
+void takeColumns(ZELO_SCHED_STATUS *row, int columns, char **values, char **names) {
+  for (int i = 0; i < columns; ++i) {
+    takeColumn(row, names[i], values[i]);
+  }
+}
+
+int takeFirstRow(void *context, int columns, char **values, char **names) {
+  auto *row = static_cast<ZELO_SCHED_STATUS *>(context);
+  if (row->found == 0) {
+    takeColumns(row, columns, values, names);
+    row->found = 1;
+  }
+  return 0;
+}
+
+int takeFirstLiveRow(void *context, int columns, char **values, char **names) {
+  auto *live = static_cast<ZELO_SCHED_STATUS *>(context);
+  if (live->found != 0) {
+    return 0;
+  }
+  ZELO_SCHED_STATUS row = {};
+  takeColumns(&row, columns, values, names);
+  if (row.pid > 0 && QLIBCProcAlive(row.pid) == kAlive) {
+    live->pid = row.pid;
+    live->statusID = row.statusID;
+    live->taskID = row.taskID;
+    live->found = 1;
+  }
+  return 0;
+}
+
+// A run that died could not write so itself.
+int reportedCode(const ZELO_SCHED_STATUS &row) {
+  const bool gone = row.statusCode == ZELO_SCHED_STATUS_RUNNING && row.pid > 0 &&
+                    QLIBCProcAlive(row.pid) != kAlive;
+  return gone ? ZELO_SCHED_STATUS_GONE : row.statusCode;
+}
+
+int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStatusCode,
+              char *szComment, size_t cbComment) {
+  ZELO_SCHED_STATUS row = {};
+  if (execute(db, select, takeFirstRow, &row) < 0) {
+    return -1;
+  }
+  if (row.found == 0) {
+    return 0;
+  }
+  *pStatusCode = reportedCode(row);
+  if (szComment != nullptr && cbComment > 0) {
+    copyText(szComment, cbComment, row.szComment);
+  }
+  if (pTimestamp != nullptr) {
+    *pTimestamp = row.timestamp;
+  }
+  return 1;
+}
+
+}  // namespace
+
+sqlite3 *ZELOSchedDBInit(void) {
+  ZELOSchedRandInit();
+  if (access(kDatabase, F_OK) != 0) {
+    QLIBCFileTouch(kDatabase);
+  }
+  sqlite3 *db = nullptr;
+  if (sqlite3_open(kDatabase, &db) != SQLITE_OK) {
+    SCHED_SET_ERROR(kErrOpen);
+    SCHED_LOG("Can't open database: %s\n", sqlite3_errmsg(db));
+    sqlite3_close(db);
+    return nullptr;
+  }
+  if (execute(db, kCreateTable, nullptr, nullptr) < 0) {
+    return nullptr;  // The handle stays open, as callers have always found it.
+  }
+  return db;
+}
+
+int ZELOSchedDBIsTaskRunning(sqlite3 *db, long id, ZELO_SCHED_STATUS *pStatus) {
+  SCHED_CHECK_ARG(pStatus != nullptr, "((void *)0) != pStatus", -1);
+  SCHED_CHECK_ARG(db != nullptr, "NULL != db", -1);
+  Statement select;
+  select.append(
+      "SELECT pid,status_id,task_id from task_status WHERE task_id=%ld AND status_code=%d;", id,
+      ZELO_SCHED_STATUS_RUNNING);
+  return execute(db, select, takeFirstLiveRow, pStatus);
+}
+
+int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp, ZELO_SCHED_STATUS *pStatus) {
+  SCHED_CHECK_ARG(db != nullptr, "((void *)0) != db", -1);
+  SCHED_CHECK_ARG(szApp != nullptr, "((void *)0) != szApp", -1);
+  SCHED_CHECK_ARG(pStatus != nullptr, "NULL != pStatus", -1);
+  Statement select;
+  select.append("SELECT pid,status_id,task_id from task_status WHERE app='%s' AND status_code=%d;",
+                szApp, ZELO_SCHED_STATUS_RUNNING);
+  return execute(db, select, takeFirstLiveRow, pStatus);
+}
+
+int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatusID) {
+  SCHED_CHECK_ARG(db != nullptr, "((void *)0) != db", -1);
+  SCHED_CHECK_ARG(pTask != nullptr, "NULL != pTask", -1);
+  const int pid = getpid();
+  const long now = time(nullptr);
+  const long taskID = pTask->ID;
+  Statement insert;
+  insert.append(
+      "INSERT INTO task_status (app, pid, timestamp, task_id, status_code) "
+      "VALUES ('%s', %d, %ld, %ld, %d);",
+      pTask->App, pid, now, taskID, ZELO_SCHED_STATUS_RUNNING);
+  if (execute(db, insert, nullptr, nullptr) < 0) {
+    return -1;
+  }
+  Statement select;
+  select.append(
+      "SELECT status_id from task_status WHERE app='%s' AND task_id=%ld AND timestamp=%ld "
+      "AND status_code=%d AND pid=%d;",
+      pTask->App, taskID, now, ZELO_SCHED_STATUS_RUNNING, pid);
+  ZELO_SCHED_STATUS row = {};
+  if (execute(db, select, takeFirstRow, &row) < 0) {
+    return -1;
+  }
+  if (row.found == 0) {
+    SCHED_SET_ERROR(kErrIo);
+    return -1;
+  }
+  if (pStatusID != nullptr) {
+    *pStatusID = row.statusID;
+  }
+  return 0;
+}
+
+int ZELOSchedDBSetStatus(sqlite3 *db, int iStatusID, int orgStatusCode, int newStatusCode,
+                         const char *szComment) {
+  SCHED_CHECK_ARG(db != nullptr, "((void *)0) != db", -1);
+  SCHED_CHECK_ARG(orgStatusCode != ZELO_SCHED_STATUS_NONE || iStatusID != kAnyStatusID,
+                  "SCHED_STATUS_CODE_NONE != orgStatusCode || -1 != iStatusID", -1);
+  Statement update;
+  update.append("UPDATE task_status SET status_code=%d", newStatusCode);
+  if (szComment != nullptr && szComment[0] != '\0') {
+    update.append(", comment='%s'", szComment);
+  }
+  if (iStatusID == kAnyStatusID) {
+    update.append(" WHERE status_code=%d", orgStatusCode);
+  } else {
+    update.append(" WHERE status_id=%d", iStatusID);
+    if (orgStatusCode != ZELO_SCHED_STATUS_NONE) {
+      update.append(" AND status_code=%d", orgStatusCode);
+    }
+  }
+  return execute(db, update, nullptr, nullptr);
+}
+
+int ZELOSchedDBGetStatusByStatusID(sqlite3 *db, int iStatusID, int *pStatusCode, char *szComment,
+                                   size_t cbComment) {
+  SCHED_CHECK_ARG(db != nullptr, "((void *)0) != db", -1);
+  SCHED_CHECK_ARG(pStatusCode != nullptr, "NULL != pStatusCode", -1);
+  Statement select;
+  select.append("SELECT pid,status_code,comment from task_status WHERE status_id=%d", iStatusID);
+  return getStatus(db, select, nullptr, pStatusCode, szComment, cbComment);
+}
+
+int ZELOSchedDBGetStatusByTaskID(sqlite3 *db, long id, long *pTimestamp, int *pStatusCode,
+                                 char *szComment, size_t cbComment) {
+  SCHED_CHECK_ARG(db != nullptr, "((void *)0) != db", -1);
+  SCHED_CHECK_ARG(pStatusCode != nullptr, "NULL != pStatusCode", -1);
+  Statement select;
+  select.append(
+      "SELECT pid,timestamp,status_code,comment from task_status WHERE task_id=%ld "
+      "ORDER BY timestamp DESC",
+      id);
+  return getStatus(db, select, pTimestamp, pStatusCode, szComment, cbComment);
+}

@@ -1,0 +1,873 @@
+#include "failing_calls.h"
+
+#include <dlfcn.h>
+#include <fcntl.h>
+#include <grp.h>
+#include <pwd.h>
+#include <sqlite3.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+#include <stdexcept>
+
+#include "shared_memory.h"
+#include "zelocore.h"
+#include "zelosdk.h"
+
+namespace support {
+namespace {
+
+// Name, and whether a plan's key must be equal (=) to the call's or be contained in it (~).
+#define CALLS(X)                   \
+  X(QLIBCExec, '~')                \
+  X(QLIBCSzHashAlloc, '~')         \
+  X(QLIBCSzHashSetValue, '=')      \
+  X(QLIBCSzHashGetValue, '=')      \
+  X(QLIBCSzHashEnumKey, '~')       \
+  X(QLIBCSzListAlloc, '~')         \
+  X(QLIBCSzListPush, '~')          \
+  X(QLIBCStrSep, '~')              \
+  X(QLIBCFileExist, '~')           \
+  X(QLIBCFileTouch, '~')           \
+  X(QLIBCFileEnumSection, '~')     \
+  X(QLIBCFileGetSection, '=')      \
+  X(QLIBCFileSetSection, '=')      \
+  X(QLIBCFileAddSection, '=')      \
+  X(QLIBCFileRemoveSection, '=')   \
+  X(QLIBCProcForkChildNoWait, '~') \
+  X(QLIBCProcAlive, '=')           \
+  X(QLIBPluginInit, '~')           \
+  X(QLIBPluginSetArg, '=')         \
+  X(QLIBPluginSetArgByInt, '=')    \
+  X(QLIBPluginAction, '=')         \
+  X(QLIBPluginExit, '~')           \
+  X(ZELOUserGetByUID, '=')         \
+  X(SzBase64EncodeFull, '~')       \
+  X(ZELOEncodingBase64Decode, '~') \
+  X(rename, '~')                   \
+  X(fsync, '~')                    \
+  X(fstat, '~')                    \
+  X(stat, '~')                     \
+  X(lstat, '~')                    \
+  X(fchown, '~')                   \
+  X(fchmod, '~')                   \
+  X(ftruncate, '~')                \
+  X(fflush, '~')                   \
+  X(fclose, '~')                   \
+  X(getline, '~')                  \
+  X(read, '~')                     \
+  X(write, '~')                    \
+  X(fwrite, '~')                   \
+  X(mkstemp, '~')                  \
+  X(fdopen, '~')                   \
+  X(fopen, '~')                    \
+  X(flock, '~')                    \
+  X(open, '~')                     \
+  X(mkdir, '~')                    \
+  X(chmod, '~')                    \
+  X(access, '~')                   \
+  X(unlink, '~')                   \
+  X(seteuid, '=')                  \
+  X(setegid, '=')                  \
+  X(setreuid, '~')                 \
+  X(setresuid, '~')                \
+  X(setregid, '~')                 \
+  X(setresgid, '~')                \
+  X(setgroups, '~')                \
+  X(initgroups, '~')               \
+  X(getpwuid_r, '~')               \
+  X(setsid, '~')                   \
+  X(close_range, '~')              \
+  X(fork, '~')                     \
+  X(localtime, '~')                \
+  X(localtime_r, '~')              \
+  X(mktime, '~')                   \
+  X(malloc, '~')                   \
+  X(calloc, '~')                   \
+  X(realloc, '~')                  \
+  X(system, '~')                   \
+  X(sleep, '~')                    \
+  X(usleep, '~')                   \
+  X(nanosleep, '~')                \
+  X(rand, '~')                     \
+  X(srand, '~')                    \
+  X(sqlite3_open, '~')             \
+  X(sqlite3_exec, '~')             \
+  X(sqlite3_close, '~')
+
+enum class Call : size_t {
+#define X(name, match) k_##name,
+  CALLS(X)
+#undef X
+      kCount
+};
+
+struct CallName {
+  const char *name;
+  bool exact;
+};
+
+constexpr CallName kCalls[] = {
+#define X(name, match) {#name, (match) == '='},
+    CALLS(X)
+#undef X
+};
+
+constexpr size_t kPlansPerCall = 8;
+constexpr size_t kKeySize = 256;
+constexpr size_t kTextSize = 256;
+
+// A FailPlan without pointers, so that it can lie in shared memory.
+struct Plan {
+  std::atomic<bool> stands;
+  std::atomic<unsigned> matched;
+  unsigned from;
+  unsigned times;
+  int error;
+  int code;
+  bool hasResult;
+  long result;
+  bool hasText;
+  size_t minSize;
+  char key[kKeySize];
+  char text[kTextSize];
+};
+
+struct State {
+  struct PerCall {
+    std::atomic<unsigned> count;
+    Plan plans[kPlansPerCall];
+  } calls[static_cast<size_t>(Call::kCount)];
+  std::atomic<unsigned> seed;
+};
+
+State &state() {
+  static State *shared = static_cast<State *>(sharedMemory(sizeof(State)));
+  return *shared;
+}
+
+constexpr size_t kRecordCapacity = size_t{8} << 20;
+
+SharedLines &systemCommands() {
+  static SharedLines lines(kRecordCapacity);
+  return lines;
+}
+
+SharedLines &execs() {
+  static SharedLines lines(kRecordCapacity);
+  return lines;
+}
+
+SharedLines &pluginCalls() {
+  static SharedLines lines(kRecordCapacity);
+  return lines;
+}
+
+SharedLines &sleeps() {
+  static SharedLines lines(kRecordCapacity);
+  return lines;
+}
+
+struct Forced {
+  bool reallySleep = false;
+  std::function<void(size_t)> sleepAction;
+  std::vector<int> randValues;
+  size_t randNext = 0;
+};
+
+Forced &forced() {
+  static Forced values;
+  return values;
+}
+
+// malloc is called before anything else here is ready, and by everything here.
+bool allocationPlanned = false;
+
+State::PerCall &slot(Call call) {
+  return state().calls[static_cast<size_t>(call)];
+}
+
+Call callNamed(const std::string &name) {
+  const auto *found = std::find_if(std::begin(kCalls), std::end(kCalls),
+                                   [&](const CallName &call) { return name == call.name; });
+  if (found == std::end(kCalls)) throw std::invalid_argument("no call to fail: " + name);
+  return static_cast<Call>(found - std::begin(kCalls));
+}
+
+bool isAllocation(Call call) {
+  return call == Call::k_malloc || call == Call::k_calloc || call == Call::k_realloc;
+}
+
+bool concerns(Call call, const Plan &plan, const char *key, size_t size) {
+  if (!plan.stands || size < plan.minSize) return false;
+  if (plan.key[0] == '\0') return true;
+  if (key == nullptr) return false;
+  return kCalls[static_cast<size_t>(call)].exact ? std::strcmp(key, plan.key) == 0
+                                                 : std::strstr(key, plan.key) != nullptr;
+}
+
+// Counts the call. The plan by which it fails, or null.
+const Plan *failing(Call call, const char *key = nullptr, size_t size = 0) {
+  State::PerCall &calls = slot(call);
+  ++calls.count;
+  for (Plan &plan : calls.plans) {
+    if (!concerns(call, plan, key, size)) continue;
+    const unsigned nth = ++plan.matched;
+    if (nth < plan.from || nth - plan.from >= plan.times) continue;
+    if (plan.code != 0) QLIBCErrSetEx(plan.code, kInjectedFile, kInjectedLine);
+    if (plan.error != 0) errno = plan.error;
+    return &plan;
+  }
+  return nullptr;
+}
+
+template <typename Result>
+Result resultOf(const Plan &plan, Result failure) {
+  if constexpr (std::is_integral_v<Result>) {
+    if (plan.hasResult) return static_cast<Result>(plan.result);
+  }
+  return failure;
+}
+
+void *nextSymbol(const char *name) {
+  void *address = dlsym(RTLD_NEXT, name);
+  if (address == nullptr) __builtin_trap();
+  return address;
+}
+
+bool isStandard(const FILE *stream) {
+  return stream == stdin || stream == stdout || stream == stderr;
+}
+
+bool isStandard(int descriptor) {
+  return descriptor >= 0 && descriptor <= STDERR_FILENO;
+}
+
+constexpr long kMicrosecondsPerSecond = 1000000;
+constexpr long kNanosecondsPerMicrosecond = 1000;
+
+// Whether the caller shall really sleep.
+bool recordSleep(const char *call, long microseconds) {
+  sleeps().append(static_cast<int>(microseconds), call);
+  if (forced().sleepAction) forced().sleepAction(sleeps().lines().size());
+  return forced().reallySleep;
+}
+
+}  // namespace
+
+void failCallFor(const std::string &call, const std::string &key, const FailPlan &wanted) {
+  if (key.size() >= kKeySize) throw std::invalid_argument("key too long: " + key);
+  const Call number = callNamed(call);
+  for (Plan &plan : slot(number).plans) {
+    if (plan.stands) continue;
+    plan.matched = 0;
+    plan.from = wanted.from;
+    plan.times = wanted.times;
+    plan.error = wanted.error;
+    plan.code = wanted.code;
+    plan.hasResult = wanted.result.has_value();
+    plan.result = wanted.result.value_or(0);
+    plan.hasText = wanted.text != nullptr;
+    plan.minSize = wanted.minSize;
+    std::snprintf(plan.key, sizeof(plan.key), "%s", key.c_str());
+    std::snprintf(plan.text, sizeof(plan.text), "%s", wanted.text != nullptr ? wanted.text : "");
+    plan.stands = true;
+    if (isAllocation(number)) allocationPlanned = true;
+    return;
+  }
+  throw std::invalid_argument("too many plans for " + call);
+}
+
+void failCall(const std::string &call, const FailPlan &plan) {
+  failCallFor(call, "", plan);
+}
+
+unsigned callCount(const std::string &call) {
+  return slot(callNamed(call)).count;
+}
+
+void resetFailingCalls() {
+  allocationPlanned = false;
+  for (State::PerCall &calls : state().calls) {
+    calls.count = 0;
+    for (Plan &plan : calls.plans) plan.stands = false;
+  }
+  state().seed = 0;
+  systemCommands().clear();
+  execs().clear();
+  pluginCalls().clear();
+  sleeps().clear();
+  forced() = Forced{};
+}
+
+FailingAllocation::FailingAllocation(const char *call, const FailPlan &plan) {
+  failCall(call, plan);
+}
+
+FailingAllocation::~FailingAllocation() {
+  allocationPlanned = false;
+  for (const Call call : {Call::k_malloc, Call::k_calloc, Call::k_realloc}) {
+    for (Plan &plan : slot(call).plans) plan.stands = false;
+  }
+}
+
+std::vector<std::string> recordedSystemCommands() {
+  return systemCommands().texts();
+}
+
+std::vector<std::string> recordedExecs() {
+  return execs().texts();
+}
+
+std::vector<std::string> recordedPluginCalls() {
+  return pluginCalls().texts();
+}
+
+std::vector<long> recordedSleeps(const std::string &call) {
+  std::vector<long> microseconds;
+  for (const SharedLines::Line &line : sleeps().lines()) {
+    if (call.empty() || line.text == call) microseconds.push_back(line.number);
+  }
+  return microseconds;
+}
+
+void clearSleeps() {
+  sleeps().clear();
+}
+
+void realSleep(bool really) {
+  forced().reallySleep = really;
+}
+
+void onSleep(std::function<void(size_t)> action) {
+  forced().sleepAction = std::move(action);
+}
+
+void setRandValues(std::vector<int> values) {
+  forced().randValues = std::move(values);
+  forced().randNext = 0;
+}
+
+unsigned lastSeed() {
+  return state().seed;
+}
+
+}  // namespace support
+
+// The calls themselves: they come before those of the C library and the platform, because the
+// program exports them.
+
+using support::Call;
+using support::failing;
+using support::isStandard;
+using support::resultOf;
+
+#define NEXT(variable, name) \
+  static const auto variable = reinterpret_cast<decltype(&name)>(support::nextSymbol(#name))
+
+#define REAL(name) NEXT(real_##name, name)
+
+#define FAIL_OR_CALL(name, key, failure, ...)              \
+  do {                                                     \
+    if (const auto *plan = failing(Call::k_##name, key)) { \
+      return resultOf(*plan, failure);                     \
+    }                                                      \
+    NEXT(next_##name, name);                               \
+    return next_##name(__VA_ARGS__);                       \
+  } while (false)
+
+extern "C" {
+
+// ---- libzelocore
+
+int QLIBCExec(const char *program, ...) {
+  constexpr size_t kMaxArguments = 8;
+  std::array<const char *, kMaxArguments> arguments{};
+  std::string line = program != nullptr ? program : "";
+  va_list list;
+  va_start(list, program);
+  for (size_t i = 0; i < kMaxArguments; ++i) {
+    const char *argument = va_arg(list, const char *);
+    if (argument == nullptr) break;
+    arguments[i] = argument;
+    line.append(" ").append(argument);
+  }
+  va_end(list);
+  support::execs().append(0, line);
+  FAIL_OR_CALL(QLIBCExec, line.c_str(), -1, program, arguments[0], arguments[1], arguments[2],
+               arguments[3], arguments[4], arguments[5], arguments[6], arguments[7],
+               static_cast<char *>(nullptr));
+}
+
+PSZHASH QLIBCSzHashAlloc(int capacity) {
+  FAIL_OR_CALL(QLIBCSzHashAlloc, nullptr, PSZHASH{}, capacity);
+}
+
+int QLIBCSzHashSetValue(PSZHASH *hash, const char *key, const char *value) {
+  FAIL_OR_CALL(QLIBCSzHashSetValue, key, -1, hash, key, value);
+}
+
+const char *QLIBCSzHashGetValue(PSZHASH hash, const char *key) {
+  FAIL_OR_CALL(QLIBCSzHashGetValue, key, static_cast<const char *>(nullptr), hash, key);
+}
+
+int QLIBCSzHashEnumKey(PSZHASH hash, PSZLIST *list) {
+  FAIL_OR_CALL(QLIBCSzHashEnumKey, nullptr, -1, hash, list);
+}
+
+PSZLIST QLIBCSzListAlloc(int capacity) {
+  FAIL_OR_CALL(QLIBCSzListAlloc, nullptr, PSZLIST{}, capacity);
+}
+
+int QLIBCSzListPush(PSZLIST *list, const char *text) {
+  FAIL_OR_CALL(QLIBCSzListPush, nullptr, -1, list, text);
+}
+
+int QLIBCStrSep(const char *text, const char *separators, PSZLIST *list) {
+  FAIL_OR_CALL(QLIBCStrSep, text, -1, text, separators, list);
+}
+
+int QLIBCFileExist(const char *path) {
+  FAIL_OR_CALL(QLIBCFileExist, path, 0, path);
+}
+
+int QLIBCFileTouch(const char *path) {
+  FAIL_OR_CALL(QLIBCFileTouch, path, -1, path);
+}
+
+int QLIBCFileEnumSection(const char *path, PSZLIST *list) {
+  FAIL_OR_CALL(QLIBCFileEnumSection, path, -1, path, list);
+}
+
+int QLIBCFileGetSection(const char *path, const char *section, PSZHASH *hash) {
+  FAIL_OR_CALL(QLIBCFileGetSection, section, -1, path, section, hash);
+}
+
+int QLIBCFileSetSection(const char *path, const char *section, int flags, PSZHASH hash,
+                        int reserved) {
+  FAIL_OR_CALL(QLIBCFileSetSection, section, -1, path, section, flags, hash, reserved);
+}
+
+int QLIBCFileAddSection(const char *path, const char *section, PSZHASH hash, int reserved) {
+  FAIL_OR_CALL(QLIBCFileAddSection, section, -1, path, section, hash, reserved);
+}
+
+int QLIBCFileRemoveSection(const char *path, const char *section) {
+  FAIL_OR_CALL(QLIBCFileRemoveSection, section, -1, path, section);
+}
+
+int QLIBCProcForkChildNoWait(void) {
+  FAIL_OR_CALL(QLIBCProcForkChildNoWait, nullptr, -1);
+}
+
+int QLIBCProcAlive(pid_t pid) {
+  FAIL_OR_CALL(QLIBCProcAlive, std::to_string(pid).c_str(), 0, pid);
+}
+
+int QLIBPluginInit(const char *plugin, const char *action, void **context) {
+  std::string line = "init ";
+  line.append(plugin != nullptr ? plugin : "").append(" ").append(action != nullptr ? action : "");
+  support::pluginCalls().append(0, line);
+  FAIL_OR_CALL(QLIBPluginInit, action, -1, plugin, action, context);
+}
+
+int QLIBPluginSetArg(void **context, const char *key, const char *value) {
+  std::string line = "arg ";
+  line.append(key != nullptr ? key : "").append("=").append(value != nullptr ? value : "");
+  support::pluginCalls().append(0, line);
+  FAIL_OR_CALL(QLIBPluginSetArg, key, -1, context, key, value);
+}
+
+int QLIBPluginSetArgByInt(void **context, const char *key, int value) {
+  std::string line = "int ";
+  line.append(key != nullptr ? key : "").append("=").append(std::to_string(value));
+  support::pluginCalls().append(0, line);
+  FAIL_OR_CALL(QLIBPluginSetArgByInt, key, -1, context, key, value);
+}
+
+int QLIBPluginAction(int stage, void **context) {
+  const std::string key = std::to_string(stage);
+  support::pluginCalls().append(0, "action " + key);
+  FAIL_OR_CALL(QLIBPluginAction, key.c_str(), -1, stage, context);
+}
+
+int QLIBPluginExit(void **context) {
+  support::pluginCalls().append(0, "exit");
+  FAIL_OR_CALL(QLIBPluginExit, nullptr, -1, context);
+}
+
+// ---- libzelosdk
+
+int ZELOUserGetByUID(uid_t uid, PZELOUSER *user) {
+  FAIL_OR_CALL(ZELOUserGetByUID, std::to_string(uid).c_str(), -1, uid, user);
+}
+
+int SzBase64EncodeFull(const char *source, size_t length, char *target, size_t capacity,
+                       int reserved) {
+  FAIL_OR_CALL(SzBase64EncodeFull, nullptr, 0, source, length, target, capacity, reserved);
+}
+
+int ZELOEncodingBase64Decode(const char *source, size_t length, char *target, size_t *capacity) {
+  FAIL_OR_CALL(ZELOEncodingBase64Decode, nullptr, 0, source, length, target, capacity);
+}
+
+// ---- files
+
+int rename(const char *from, const char *to) noexcept {
+  FAIL_OR_CALL(rename, (std::string(from) + " " + to).c_str(), -1, from, to);
+}
+
+int fsync(int descriptor) {
+  FAIL_OR_CALL(fsync, nullptr, -1, descriptor);
+}
+
+int fstat(int descriptor, struct stat *status) noexcept {
+  REAL(fstat);
+  if (isStandard(descriptor)) return real_fstat(descriptor, status);
+  FAIL_OR_CALL(fstat, nullptr, -1, descriptor, status);
+}
+
+int stat(const char *path, struct stat *status) noexcept {
+  FAIL_OR_CALL(stat, path, -1, path, status);
+}
+
+int lstat(const char *path, struct stat *status) noexcept {
+  FAIL_OR_CALL(lstat, path, -1, path, status);
+}
+
+int fchown(int descriptor, uid_t owner, gid_t group) noexcept {
+  FAIL_OR_CALL(fchown, nullptr, -1, descriptor, owner, group);
+}
+
+int fchmod(int descriptor, mode_t mode) noexcept {
+  FAIL_OR_CALL(fchmod, nullptr, -1, descriptor, mode);
+}
+
+int ftruncate(int descriptor, off_t length) noexcept {
+  FAIL_OR_CALL(ftruncate, nullptr, -1, descriptor, length);
+}
+
+int open(const char *path, int flags, ...) {
+  mode_t mode = 0;
+  if ((flags & O_CREAT) != 0 || (flags & O_TMPFILE) == O_TMPFILE) {
+    va_list list;
+    va_start(list, flags);
+    mode = va_arg(list, mode_t);
+    va_end(list);
+  }
+  FAIL_OR_CALL(open, path, -1, path, flags, mode);
+}
+
+ssize_t read(int descriptor, void *buffer, size_t size) {
+  REAL(read);
+  if (isStandard(descriptor)) return real_read(descriptor, buffer, size);
+  FAIL_OR_CALL(read, nullptr, ssize_t{-1}, descriptor, buffer, size);
+}
+
+ssize_t write(int descriptor, const void *buffer, size_t size) {
+  REAL(write);
+  if (isStandard(descriptor)) return real_write(descriptor, buffer, size);
+  FAIL_OR_CALL(write, nullptr, ssize_t{-1}, descriptor, buffer, size);
+}
+
+int mkstemp(char *pattern) {
+  FAIL_OR_CALL(mkstemp, pattern, -1, pattern);
+}
+
+int flock(int descriptor, int operation) noexcept {
+  FAIL_OR_CALL(flock, nullptr, -1, descriptor, operation);
+}
+
+int mkdir(const char *path, mode_t mode) noexcept {
+  FAIL_OR_CALL(mkdir, path, -1, path, mode);
+}
+
+int chmod(const char *path, mode_t mode) noexcept {
+  FAIL_OR_CALL(chmod, path, -1, path, mode);
+}
+
+int access(const char *path, int mode) noexcept {
+  FAIL_OR_CALL(access, path, -1, path, mode);
+}
+
+int unlink(const char *path) noexcept {
+  FAIL_OR_CALL(unlink, path, -1, path);
+}
+
+// ---- streams
+
+FILE *fopen(const char *path, const char *mode) {
+  FAIL_OR_CALL(fopen, path, static_cast<FILE *>(nullptr), path, mode);
+}
+
+FILE *fdopen(int descriptor, const char *mode) noexcept {
+  FAIL_OR_CALL(fdopen, mode, static_cast<FILE *>(nullptr), descriptor, mode);
+}
+
+int fflush(FILE *stream) {
+  REAL(fflush);
+  if (isStandard(stream)) return real_fflush(stream);
+  FAIL_OR_CALL(fflush, nullptr, EOF, stream);
+}
+
+int fclose(FILE *stream) {
+  REAL(fclose);
+  if (isStandard(stream)) return real_fclose(stream);
+  const int result = real_fclose(stream);
+  const auto *plan = failing(Call::k_fclose);
+  return plan != nullptr ? resultOf(*plan, EOF) : result;
+}
+
+// getline may have been compiled to the call it is made of.
+ssize_t __getdelim(char **line, size_t *capacity, int delimiter, FILE *stream) {
+  if (const auto *plan = failing(Call::k_getline)) return resultOf(*plan, ssize_t{-1});
+  REAL(__getdelim);
+  return real___getdelim(line, capacity, delimiter, stream);
+}
+
+ssize_t getdelim(char **line, size_t *capacity, int delimiter, FILE *stream) {
+  return __getdelim(line, capacity, delimiter, stream);
+}
+
+ssize_t getline(char **line, size_t *capacity, FILE *stream) {
+  return __getdelim(line, capacity, '\n', stream);
+}
+
+size_t fwrite(const void *data, size_t size, size_t count, FILE *stream) {
+  REAL(fwrite);
+  if (isStandard(stream)) return real_fwrite(data, size, count, stream);
+  FAIL_OR_CALL(fwrite, nullptr, size_t{0}, data, size, count, stream);
+}
+
+// Every other way to write to a stream counts as fwrite.
+
+int fputs(const char *text, FILE *stream) {
+  REAL(fputs);
+  if (!isStandard(stream)) {
+    if (const auto *plan = failing(Call::k_fwrite)) return resultOf(*plan, EOF);
+  }
+  return real_fputs(text, stream);
+}
+
+int fputc(int character, FILE *stream) {
+  REAL(fputc);
+  if (!isStandard(stream)) {
+    if (const auto *plan = failing(Call::k_fwrite)) return resultOf(*plan, EOF);
+  }
+  return real_fputc(character, stream);
+}
+
+#undef putc
+int putc(int character, FILE *stream) {
+  return fputc(character, stream);
+}
+
+int vfprintf(FILE *stream, const char *format, va_list arguments) {
+  REAL(vfprintf);
+  if (!isStandard(stream)) {
+    if (const auto *plan = failing(Call::k_fwrite)) return resultOf(*plan, -1);
+  }
+  return real_vfprintf(stream, format, arguments);
+}
+
+int fprintf(FILE *stream, const char *format, ...) {
+  va_list arguments;
+  va_start(arguments, format);
+  const int result = vfprintf(stream, format, arguments);
+  va_end(arguments);
+  return result;
+}
+
+// ---- identity and processes
+
+int seteuid(uid_t uid) noexcept {
+  FAIL_OR_CALL(seteuid, std::to_string(uid).c_str(), -1, uid);
+}
+
+int setegid(gid_t gid) noexcept {
+  FAIL_OR_CALL(setegid, std::to_string(gid).c_str(), -1, gid);
+}
+
+int setreuid(uid_t real, uid_t effective) noexcept {
+  FAIL_OR_CALL(setreuid, nullptr, -1, real, effective);
+}
+
+int setregid(gid_t real, gid_t effective) noexcept {
+  FAIL_OR_CALL(setregid, nullptr, -1, real, effective);
+}
+
+int setresuid(uid_t real, uid_t effective, uid_t saved) noexcept {
+  FAIL_OR_CALL(setresuid, nullptr, -1, real, effective, saved);
+}
+
+int setresgid(gid_t real, gid_t effective, gid_t saved) noexcept {
+  FAIL_OR_CALL(setresgid, nullptr, -1, real, effective, saved);
+}
+
+int setgroups(size_t count, const gid_t *groups) noexcept {
+  FAIL_OR_CALL(setgroups, nullptr, -1, count, groups);
+}
+
+int initgroups(const char *user, gid_t group) {
+  FAIL_OR_CALL(initgroups, user, -1, user, group);
+}
+
+int getpwuid_r(uid_t uid, struct passwd *entry, char *buffer, size_t size, struct passwd **result) {
+  if (const auto *plan = failing(Call::k_getpwuid_r)) {
+    *result = nullptr;
+    return resultOf(*plan, plan->error);
+  }
+  REAL(getpwuid_r);
+  return real_getpwuid_r(uid, entry, buffer, size, result);
+}
+
+pid_t setsid() noexcept {
+  FAIL_OR_CALL(setsid, nullptr, pid_t{-1});
+}
+
+int close_range(unsigned first, unsigned last, int flags) noexcept {
+  FAIL_OR_CALL(close_range, nullptr, -1, first, last, flags);
+}
+
+pid_t fork() noexcept {
+  FAIL_OR_CALL(fork, nullptr, pid_t{-1});
+}
+
+int system(const char *command) {
+  support::systemCommands().append(0, command != nullptr ? command : "");
+  FAIL_OR_CALL(system, command, -1, command);
+}
+
+// ---- time and chance
+
+struct tm *localtime(const time_t *seconds) noexcept {
+  FAIL_OR_CALL(localtime, nullptr, static_cast<struct tm *>(nullptr), seconds);
+}
+
+struct tm *localtime_r(const time_t *seconds, struct tm *broken) noexcept {
+  FAIL_OR_CALL(localtime_r, nullptr, static_cast<struct tm *>(nullptr), seconds, broken);
+}
+
+time_t mktime(struct tm *broken) noexcept {
+  FAIL_OR_CALL(mktime, nullptr, time_t{-1}, broken);
+}
+
+unsigned sleep(unsigned seconds) {
+  const auto *plan = failing(Call::k_sleep);
+  const bool really =
+      support::recordSleep("sleep", long{seconds} * support::kMicrosecondsPerSecond);
+  if (plan != nullptr) return resultOf(*plan, seconds);
+  if (!really) return 0;
+  REAL(sleep);
+  return real_sleep(seconds);
+}
+
+int usleep(useconds_t microseconds) {
+  const auto *plan = failing(Call::k_usleep);
+  const bool really = support::recordSleep("usleep", long{microseconds});
+  if (plan != nullptr) return resultOf(*plan, -1);
+  if (!really) return 0;
+  REAL(usleep);
+  return real_usleep(microseconds);
+}
+
+int nanosleep(const timespec *wanted, timespec *left) {
+  const auto *plan = failing(Call::k_nanosleep);
+  const bool really =
+      support::recordSleep("nanosleep", wanted->tv_sec * support::kMicrosecondsPerSecond +
+                                            wanted->tv_nsec / support::kNanosecondsPerMicrosecond);
+  if (plan != nullptr) return resultOf(*plan, -1);
+  if (!really) return 0;
+  REAL(nanosleep);
+  return real_nanosleep(wanted, left);
+}
+
+int rand() noexcept {
+  support::Forced &forced = support::forced();
+  failing(Call::k_rand);
+  if (!forced.randValues.empty()) {
+    return forced.randValues[forced.randNext++ % forced.randValues.size()];
+  }
+  REAL(rand);
+  return real_rand();
+}
+
+void srand(unsigned seed) noexcept {
+  failing(Call::k_srand);
+  support::state().seed = seed;
+  REAL(srand);
+  real_srand(seed);
+}
+
+// ---- memory
+
+#if !defined(__SANITIZE_ADDRESS__)
+
+void *__libc_malloc(size_t size);
+void *__libc_calloc(size_t count, size_t size);
+void *__libc_realloc(void *memory, size_t size);
+
+void *malloc(size_t size) noexcept {
+  if (support::allocationPlanned && failing(Call::k_malloc, nullptr, size) != nullptr) {
+    errno = ENOMEM;
+    return nullptr;
+  }
+  return __libc_malloc(size);
+}
+
+void *calloc(size_t count, size_t size) noexcept {
+  if (support::allocationPlanned && failing(Call::k_calloc, nullptr, count * size) != nullptr) {
+    errno = ENOMEM;
+    return nullptr;
+  }
+  return __libc_calloc(count, size);
+}
+
+void *realloc(void *memory, size_t size) noexcept {
+  if (support::allocationPlanned && failing(Call::k_realloc, nullptr, size) != nullptr) {
+    errno = ENOMEM;
+    return nullptr;
+  }
+  return __libc_realloc(memory, size);
+}
+
+#endif
+
+// ---- SQLite
+
+int sqlite3_open(const char *path, sqlite3 **database) {
+  REAL(sqlite3_open);
+  if (const auto *plan = failing(Call::k_sqlite3_open, path)) {
+    const int result = real_sqlite3_open("/nonexistent/database", database);
+    return resultOf(*plan, result);
+  }
+  return real_sqlite3_open(path, database);
+}
+
+int sqlite3_exec(sqlite3 *database, const char *sql, int (*callback)(void *, int, char **, char **),
+                 void *argument, char **error) {
+  if (const auto *plan = failing(Call::k_sqlite3_exec, sql)) {
+    if (error != nullptr) *error = plan->hasText ? sqlite3_mprintf("%s", plan->text) : nullptr;
+    return resultOf(*plan, SQLITE_ERROR);
+  }
+  REAL(sqlite3_exec);
+  return real_sqlite3_exec(database, sql, callback, argument, error);
+}
+
+int sqlite3_close(sqlite3 *database) {
+  REAL(sqlite3_close);
+  const int result = real_sqlite3_close(database);
+  const auto *plan = failing(Call::k_sqlite3_close);
+  return plan != nullptr ? resultOf(*plan, SQLITE_BUSY) : result;
+}
+}

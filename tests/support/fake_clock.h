@@ -1,0 +1,23 @@
+// The clock that time() shows to the library, the platform and the test. Children that are forked
+// later see the same one. gettimeofday and clock_gettime stay real.
+//
+//   void setZone("Europe/Berlin");          TZ, at once
+//   void setClock("2013-05-07 08:30");      local time in that zone, seconds may follow; stands
+//   still void setClock(time_t); void realClock(); time_t localTime("2013-05-07 08:30");   what
+//   setClock would set unsigned clockReads();                  calls of time() in this process so
+//   far
+#pragma once
+
+#include <ctime>
+#include <string>
+
+namespace support {
+
+void setClock(const std::string &localTime);
+void setClock(time_t now);
+void realClock();
+void setZone(const std::string &zone);
+time_t localTime(const std::string &text);
+unsigned clockReads();
+
+}  // namespace support

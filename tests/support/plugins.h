@@ -1,0 +1,32 @@
+// Plugins that a test installs, as an administrator would.
+//
+//   installPlugin("10-first", "echo $1 $2 >> /tmp/told");    a shell script; $1 action, $2 stage
+//   std::vector<std::string> toldPlugins();                  lines of kToldFile, which a test's
+//                                                            plugins append to
+#pragma once
+
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "sandbox_fixture.h"
+
+namespace support {
+
+inline constexpr char kToldFile[] = "/tmp/told";
+inline constexpr mode_t kProgramMode = 0755;
+
+inline std::string pluginPath(const std::string &name) {
+  return std::string(kPluginDirectory) + "/task_scheduler.d/" + name;
+}
+
+inline void installPlugin(const std::string &name, const std::string &script) {
+  std::filesystem::remove(kToldFile);
+  writeFile(pluginPath(name), "#!/bin/sh\n" + script + "\n", kProgramMode);
+}
+
+inline std::vector<std::string> toldPlugins() {
+  return linesOf(readFile(kToldFile));
+}
+
+}  // namespace support
