@@ -2,7 +2,8 @@
 //
 // Values stand in the statements unescaped, so an application's name can end its quotes and go on
 // as SQL of its own. What keeps that harmless is the authorizer: while one of these statements is
-// compiled, the connection can create, read, insert into and update task_status, and nothing else.
+// compiled, the connection can do nothing but what the statement is for, and that to task_status
+// alone.
 #include <sqlite3.h>
 #include <unistd.h>
 #include <zelocore.h>
@@ -34,31 +35,53 @@ bool isNamed(const char *szName, const char *szExpected) {
   return szName != nullptr && strcmp(szName, szExpected) == 0;
 }
 
-// The schema table is written by CREATE TABLE itself; direct writes to it are SQLite's to refuse.
-bool isOwnTable(const char *szTable) {
-  return isNamed(szTable, kTable) || isNamed(szTable, "sqlite_master");
+// What a statement is for. An application's name must not turn one kind into another: a check for
+// running tasks that marks them all as finished, say.
+enum class Purpose { kCreate, kRead, kInsert, kUpdate };
+
+// CREATE TABLE writes the schema table by itself; direct writes to it are SQLite's to refuse.
+bool mayCreate(int action, const char *szTable) {
+  return action == SQLITE_CREATE_TABLE ? isNamed(szTable, kTable)
+                                       : isNamed(szTable, "sqlite_master");
 }
 
-int allowOwnTableOnly(void *, int action, const char *szFirst, const char *, const char *,
-                      const char *) {
+// The key above all is out of reach: UPDATE OR REPLACE that gives several rows one key deletes
+// them.
+bool mayUpdate(const char *szTable, const char *szColumn) {
+  return isNamed(szTable, kTable) &&
+         (isNamed(szColumn, "status_code") || isNamed(szColumn, "comment"));
+}
+
+bool isAllowed(Purpose purpose, int action, const char *szFirst, const char *szSecond) {
   switch (action) {
     case SQLITE_SELECT:
-      return SQLITE_OK;
-    case SQLITE_CREATE_TABLE:
-      return isNamed(szFirst, kTable) ? SQLITE_OK : SQLITE_DENY;
+      return true;
     case SQLITE_READ:
+      return isNamed(szFirst, kTable) || purpose == Purpose::kCreate;
+    case SQLITE_CREATE_TABLE:
+      return purpose == Purpose::kCreate && mayCreate(action, szFirst);
     case SQLITE_INSERT:
+      return purpose == Purpose::kCreate ? mayCreate(action, szFirst)
+                                         : purpose == Purpose::kInsert && isNamed(szFirst, kTable);
     case SQLITE_UPDATE:
-      return isOwnTable(szFirst) ? SQLITE_OK : SQLITE_DENY;
+      return purpose == Purpose::kCreate
+                 ? mayCreate(action, szFirst)
+                 : purpose == Purpose::kUpdate && mayUpdate(szFirst, szSecond);
     default:
-      return SQLITE_DENY;
+      return false;
   }
+}
+
+int authorize(void *purpose, int action, const char *szFirst, const char *szSecond, const char *,
+              const char *) {
+  return isAllowed(*static_cast<const Purpose *>(purpose), action, szFirst, szSecond) ? SQLITE_OK
+                                                                                      : SQLITE_DENY;
 }
 
 class RestrictedConnection {
  public:
-  explicit RestrictedConnection(sqlite3 *db) : db_(db) {
-    sqlite3_set_authorizer(db_, allowOwnTableOnly, nullptr);
+  RestrictedConnection(sqlite3 *db, Purpose purpose) : db_(db), purpose_(purpose) {
+    sqlite3_set_authorizer(db_, authorize, &purpose_);
   }
   ~RestrictedConnection() { sqlite3_set_authorizer(db_, nullptr, nullptr); }
   RestrictedConnection(const RestrictedConnection &) = delete;
@@ -66,6 +89,7 @@ class RestrictedConnection {
 
  private:
   sqlite3 *db_;
+  Purpose purpose_;
 };
 
 // Random, so that processes which collided do not collide again.
@@ -83,8 +107,8 @@ void reportFailedStatement(const char *szSql, const char *szError) {
   SCHED_LOG("Exec sql:[%s] error: %s\n", szSql, szError);
 }
 
-int execute(sqlite3 *db, const char *szSql, RowCallback takeRow, void *context) {
-  const RestrictedConnection restricted(db);
+int execute(sqlite3 *db, Purpose purpose, const char *szSql, RowCallback takeRow, void *context) {
+  const RestrictedConnection restricted(db, purpose);
   for (int retries = 0;; ++retries) {
     char *szError = nullptr;
     if (sqlite3_exec(db, szSql, takeRow, context, &szError) == SQLITE_OK) {
@@ -105,12 +129,13 @@ int execute(sqlite3 *db, const char *szSql, RowCallback takeRow, void *context) 
 }
 
 // A statement that was cut could have lost its WHERE clause: it must not run.
-int execute(sqlite3 *db, const Statement &statement, RowCallback takeRow, void *context) {
+int execute(sqlite3 *db, Purpose purpose, const Statement &statement, RowCallback takeRow,
+            void *context) {
   if (statement.wasCut()) {
     reportFailedStatement(statement.c_str(), "statement too long");
     return -1;
   }
-  return execute(db, statement.c_str(), takeRow, context);
+  return execute(db, purpose, statement.c_str(), takeRow, context);
 }
 
 int32_t numberOf(const char *szValue) {
@@ -176,7 +201,7 @@ int reportedCode(const ZELO_SCHED_STATUS &row) {
 int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStatusCode,
               char *szComment, size_t cbComment) {
   ZELO_SCHED_STATUS row = {};
-  if (execute(db, select, takeFirstRow, &row) < 0) {
+  if (execute(db, Purpose::kRead, select, takeFirstRow, &row) < 0) {
     return -1;
   }
   if (row.found == 0) {
@@ -206,7 +231,7 @@ sqlite3 *ZELOSchedDBInit(void) {
     sqlite3_close(db);
     return nullptr;
   }
-  if (execute(db, kCreateTable, nullptr, nullptr) < 0) {
+  if (execute(db, Purpose::kCreate, kCreateTable, nullptr, nullptr) < 0) {
     return nullptr;  // The handle stays open, as callers have always found it.
   }
   return db;
@@ -219,7 +244,7 @@ int ZELOSchedDBIsTaskRunning(sqlite3 *db, long id, ZELO_SCHED_STATUS *pStatus) {
   select.append(
       "SELECT pid,status_id,task_id from task_status WHERE task_id=%ld AND status_code=%d;", id,
       ZELO_SCHED_STATUS_RUNNING);
-  return execute(db, select, takeFirstLiveRow, pStatus);
+  return execute(db, Purpose::kRead, select, takeFirstLiveRow, pStatus);
 }
 
 int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp, ZELO_SCHED_STATUS *pStatus) {
@@ -229,7 +254,7 @@ int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp, ZELO_SCHED_STATUS *p
   Statement select;
   select.append("SELECT pid,status_id,task_id from task_status WHERE app='%s' AND status_code=%d;",
                 szApp, ZELO_SCHED_STATUS_RUNNING);
-  return execute(db, select, takeFirstLiveRow, pStatus);
+  return execute(db, Purpose::kRead, select, takeFirstLiveRow, pStatus);
 }
 
 int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatusID) {
@@ -243,7 +268,7 @@ int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatus
       "INSERT INTO task_status (app, pid, timestamp, task_id, status_code) "
       "VALUES ('%s', %d, %ld, %ld, %d);",
       pTask->App, pid, now, taskID, ZELO_SCHED_STATUS_RUNNING);
-  if (execute(db, insert, nullptr, nullptr) < 0) {
+  if (execute(db, Purpose::kInsert, insert, nullptr, nullptr) < 0) {
     return -1;
   }
   Statement select;
@@ -252,7 +277,7 @@ int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatus
       "AND status_code=%d AND pid=%d;",
       pTask->App, taskID, now, ZELO_SCHED_STATUS_RUNNING, pid);
   ZELO_SCHED_STATUS row = {};
-  if (execute(db, select, takeFirstRow, &row) < 0) {
+  if (execute(db, Purpose::kRead, select, takeFirstRow, &row) < 0) {
     return -1;
   }
   if (row.found == 0) {
@@ -283,7 +308,7 @@ int ZELOSchedDBSetStatus(sqlite3 *db, int iStatusID, int orgStatusCode, int newS
       update.append(" AND status_code=%d", orgStatusCode);
     }
   }
-  return execute(db, update, nullptr, nullptr);
+  return execute(db, Purpose::kUpdate, update, nullptr, nullptr);
 }
 
 int ZELOSchedDBGetStatusByStatusID(sqlite3 *db, int iStatusID, int *pStatusCode, char *szComment,

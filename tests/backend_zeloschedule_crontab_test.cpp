@@ -1,0 +1,615 @@
+// The lines of ordinary tasks in the system crontab, and how the crontab is replaced.
+#include <dlfcn.h>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <csignal>
+#include <filesystem>
+#include <functional>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "sandbox_fixture.h"
+#include "tasks.h"
+#include "zelocore.h"
+
+namespace support {
+namespace {
+
+using Lines = std::vector<std::string>;
+
+constexpr int kInjectedCode = 0x0B00;
+constexpr mode_t kPermissions = 07777;
+constexpr uint32_t kHuge = UINT32_MAX;
+const std::string kInjected = "[0x0B00 injected.cpp:N]";
+const std::string kHangUp = "/bin/kill -HUP `/bin/cat /var/run/crond.pid` > /dev/null 2>&1";
+const std::string kFirstLine = "0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=1\n";
+
+std::string backendLine(const std::string &text) {
+  return "backend_zeloschedule.cpp:N " + text;
+}
+
+// What is left of a crontab that was not finished.
+Lines leftovers() {
+  Lines names;
+  for (const auto &entry : std::filesystem::directory_iterator("/etc")) {
+    const std::string name = entry.path().filename();
+    if (name.starts_with("crontab.")) names.push_back(name);
+  }
+  return names;
+}
+
+// What stands in for the library's own sort of lists.
+std::function<int(ZELO_SCHED_TASK **, const char *, int)> sortList;
+
+class CrontabTest : public SandboxTest {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    sortList = nullptr;
+    ASSERT_EQ(zeloschedule_init("zeloschedule", &backend_), 0);
+    ASSERT_EQ(leftovers(), Lines{});
+  }
+
+  void TearDown() override {
+    EXPECT_EQ(leftovers(), Lines{});
+    SandboxTest::TearDown();
+  }
+
+  void create(const std::function<void(ZELO_SCHED_TASK *)> &change = [](ZELO_SCHED_TASK *) {
+  }) const {
+    const Task task = makeTask("task", "true");
+    change(task.get());
+    EXPECT_EQ(backend_.create(task.get()), 0);
+  }
+
+  // The fields of the only task's line up to the user.
+  std::string fieldsOf(const std::function<void(ZELO_SCHED_TASK *)> &change) const {
+    cleanWorld();
+    create(change);
+    const Lines lines = crontabLines();
+    if (lines.size() != 1) return "not one line";
+    const std::string end = "\troot\t/tmp/zeloschedtask --run id=1";
+    EXPECT_TRUE(lines[0].ends_with(end)) << lines[0];
+    return lines[0].substr(0, lines[0].size() - std::min(end.size(), lines[0].size()));
+  }
+
+  static void forget() {
+    resetFailingCalls();
+    clearLog();
+    QLIBCErrSetEx(0, "", 0);
+  }
+
+  ZELO_SCHED_BACKEND backend_ = {};
+};
+
+// ---- one line
+
+TEST_F(CrontabTest, ATaskThatRunsOnceGetsItsDayAndMonth) {
+  create();
+  create();
+  create([](ZELO_SCHED_TASK *task) {
+    task->Type = ZELO_SCHED_TYPE_ONCE;
+    task->StartYear = 2031;
+    task->StartMonth = 1;
+    task->StartDay = 17;
+    task->RunHour = 5;
+    task->RunMin = 30;
+  });
+  const Lines lines = crontabLines();
+  EXPECT_NE(
+      std::find(lines.begin(), lines.end(), "30\t5\t17\t1\t*\troot\t/tmp/zeloschedtask --run id=3"),
+      lines.end());
+}
+
+struct LineCase {
+  const char *what;
+  std::function<void(ZELO_SCHED_TASK *)> change;
+  const char *fields;
+};
+
+TEST_F(CrontabTest, EachTypeHasItsDayFields) {
+  const auto start = [](ZELO_SCHED_TASK *task, int32_t type, uint32_t month, uint32_t day) {
+    task->Type = type;
+    task->StartMonth = month;
+    task->StartDay = day;
+    task->RunHour = 8;
+  };
+  const auto weekly = [](ZELO_SCHED_TASK *task, const char *week) {
+    task->Type = ZELO_SCHED_TYPE_WEEKLY;
+    task->RunHour = 8;
+    setText(task->Week, week);
+  };
+  const LineCase cases[] = {
+      {"once", [&](auto *task) { start(task, 0, 12, 31); }, "0\t8\t31\t12\t*"},
+      {"daily", [&](auto *task) { start(task, 1, 12, 31); }, "0\t8\t*\t*\t*"},
+      {"monthly", [&](auto *task) { start(task, 3, 12, 15); }, "0\t8\t15\t*\t*"},
+      {"monthly on day 31", [&](auto *task) { start(task, 3, 1, 31); }, "0\t8\t31\t*\t*"},
+      {"yearly", [&](auto *task) { start(task, 4, 5, 7); }, "0\t8\t7\t5\t*"},
+      {"yearly on 29 February", [&](auto *task) { start(task, 4, 2, 29); }, "0\t8\t29\t2\t*"},
+      {"weekly", [&](auto *task) { weekly(task, "0101010"); }, "0\t8\t*\t*\t1,3,5"},
+      {"weekly, two days", [&](auto *task) { weekly(task, "0100010"); }, "0\t8\t*\t*\t1,5"},
+      {"weekly, Sunday", [&](auto *task) { weekly(task, "1000000"); }, "0\t8\t*\t*\t0"},
+      {"weekly, Saturday", [&](auto *task) { weekly(task, "0000001"); }, "0\t8\t*\t*\t6"},
+      {"weekly, every day", [&](auto *task) { weekly(task, "1111111"); },
+       "0\t8\t*\t*\t0,1,2,3,4,5,6"},
+      {"weekly, no day", [&](auto *task) { weekly(task, "0000000"); }, "0\t8\t*\t*\t"},
+      {"weekly, any character but zero", [&](auto *task) { weekly(task, "x0y 0z0"); },
+       "0\t8\t*\t*\t0,2,3,5"},
+      {"a start date that was never set", [&](auto *task) { start(task, 4, 0, 0); },
+       "0\t8\t0\t0\t*"},
+      {"the greatest numbers",
+       [&](auto *task) {
+         start(task, 4, kHuge, kHuge);
+         task->RunHour = kHuge;
+         task->RunMin = kHuge;
+       },
+       "4294967295\t4294967295\t4294967295\t4294967295\t*"},
+  };
+  for (const LineCase &each : cases) {
+    SCOPED_TRACE(each.what);
+    EXPECT_EQ(fieldsOf(each.change), each.fields);
+  }
+}
+
+TEST_F(CrontabTest, RepeatedHoursAreListedUpToTheLast) {
+  struct {
+    uint32_t first;
+    uint32_t repeat;
+    uint32_t last;
+    const char *hours;
+  } cases[] = {
+      {8, 0, 0, "8"},
+      {8, 0, 23, "8"},
+      {23, 0, 0, "23"},
+      {8, 2, 17, "8,10,12,14,16"},
+      {8, 3, 17, "8,11,14,17"},
+      {20, 3, 5, "20"},
+      {20, 3, 20, "20"},
+      {0, 1, 23, "0,1,2,3,4,5,6,7,8,9,10,11,12,13,14,15,16,17,18,19,20,21,22,23"},
+      {0, 23, 23, "0,23"},
+      {0, 24, 23, "0"},
+      {22, 1, kHuge, "22,23"},
+      {22, kHuge, kHuge, "22"},
+      {23, kHuge, kHuge, "23"},
+      {0, 11, 99, "0,11,22"},
+      {24, 1, 99, "24"},
+  };
+  for (const auto &each : cases) {
+    SCOPED_TRACE(testing::Message() << each.first << "+" << each.repeat << ".." << each.last);
+    EXPECT_EQ(fieldsOf([&](ZELO_SCHED_TASK *task) {
+                task->RunMin = 59;
+                task->RunHour = each.first;
+                task->RepeatHour = each.repeat;
+                task->LastWorkHour = each.last;
+              }),
+              "59\t" + std::string(each.hours) + "\t*\t*\t*");
+  }
+}
+
+// ---- the whole crontab
+
+TEST_F(CrontabTest, OnlyEnabledTasksHaveALine) {
+  create();
+  create([](ZELO_SCHED_TASK *task) { task->State = ZELO_SCHED_STATE_DISABLED; });
+  create([](ZELO_SCHED_TASK *task) { task->State = ZELO_SCHED_STATE_NOT_EXISTED; });
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab + kFirstLine);
+}
+
+TEST_F(CrontabTest, EachEnabledTaskHasOneLineBehindTheOthers) {
+  constexpr int kTasks = 12;
+  for (int i = 0; i < kTasks; ++i) create();
+  const std::string crontab = readFile(kCrontab);
+  EXPECT_TRUE(crontab.starts_with(kPlainCrontab));
+  Lines lines = crontabLines();
+  ASSERT_EQ(lines.size(), size_t{kTasks});
+  Lines wanted;
+  for (int i = 1; i <= kTasks; ++i) {
+    wanted.push_back("0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=" + std::to_string(i));
+  }
+  std::sort(lines.begin(), lines.end());
+  std::sort(wanted.begin(), wanted.end());
+  EXPECT_EQ(lines, wanted);
+}
+
+TEST_F(CrontabTest, TheListIsSortedByItsIdKeyAscending) {
+  create();
+  Lines calls;
+  sortList = [&](ZELO_SCHED_TASK **, const char *key, int direction) {
+    calls.push_back(key + (" " + std::to_string(direction)));
+    return 0;
+  };
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(calls, Lines{"id 1"});
+}
+
+TEST_F(CrontabTest, LinesStandInTheOrderOfTheSortedList) {
+  for (int i = 0; i < 3; ++i) create();
+  sortList = [](ZELO_SCHED_TASK **list, const char *, int) {
+    std::vector<ZELO_SCHED_TASK *> tasks;
+    for (ZELO_SCHED_TASK *task = *list; task != nullptr; task = task->next) tasks.push_back(task);
+    constexpr int32_t kOrder[] = {2, 3, 1};
+    for (const int32_t id : kOrder) {
+      *list = *std::find_if(tasks.begin(), tasks.end(),
+                            [&](const ZELO_SCHED_TASK *task) { return task->ID == id; });
+      list = &(*list)->next;
+    }
+    *list = nullptr;
+    return 0;
+  };
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(crontabLines(), (Lines{"0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=2",
+                                   "0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=3",
+                                   "0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=1"}));
+}
+
+TEST_F(CrontabTest, ANewSyncReplacesTheLines) {
+  create();
+  const std::string once = readFile(kCrontab);
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(readFile(kCrontab), once);
+}
+
+TEST_F(CrontabTest, AnEmptyStoreRemovesEveryLineOfTasksAndKeepsTheRest) {
+  writeFile(kCrontab, "first\n" + kFirstLine + "second\n" + kFirstLine + "third\n");
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(readFile(kCrontab), "first\nsecond\nthird\n");
+}
+
+TEST_F(CrontabTest, EveryLineThatMentionsTheProgramIsRemoved) {
+  writeFile(kCrontab,
+            "# see /tmp/zeloschedtask\n"
+            "0 0 * * * root /bin/echo /tmp/zeloschedtasks\n"
+            "X=/tmp/zeloschedtask\n"
+            "0 0 * * * root /var/tmp/zeloschedtask\n"
+            "0 0 * * * root /tmp/zelosched\n"
+            "0 0 * * * root zeloschedtask --run id=1\n"
+            "0 0 * * * root /TMP/ZELOSCHEDTASK\n");
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(readFile(kCrontab),
+            "0 0 * * * root /tmp/zelosched\n"
+            "0 0 * * * root zeloschedtask --run id=1\n"
+            "0 0 * * * root /TMP/ZELOSCHEDTASK\n");
+}
+
+TEST_F(CrontabTest, OtherLinesAreKeptByteForByteInTheirOrder) {
+  std::string lines = "\n\t \n#\xff\xfe\n  %\\$\r\n" + std::string(100000, 'x') + "\n\n\n";
+  lines += std::string("zero \0 byte\n", 12);
+  writeFile(kCrontab, lines);
+  create();
+  EXPECT_EQ(readFile(kCrontab), lines + kFirstLine);
+}
+
+TEST_F(CrontabTest, AMentionBehindAZeroByteIsFoundToo) {
+  writeFile(kCrontab, std::string("a\0/tmp/zeloschedtask\nkept\n", 26));
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(readFile(kCrontab), "kept\n");
+}
+
+TEST_F(CrontabTest, ALastLineWithoutALineFeedIsNotJoinedToATasks) {
+  writeFile(kCrontab, "0 0 * * * root true");
+  create();
+  EXPECT_EQ(readFile(kCrontab), "0 0 * * * root true\n" + kFirstLine);
+}
+
+TEST_F(CrontabTest, WithoutTasksALastLineStaysWithoutALineFeed) {
+  writeFile(kCrontab, "0 0 * * * root true");
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(readFile(kCrontab), "0 0 * * * root true");
+}
+
+TEST_F(CrontabTest, AnEmptyCrontabGetsTheLinesAlone) {
+  writeFile(kCrontab, "");
+  create();
+  EXPECT_EQ(readFile(kCrontab), kFirstLine);
+}
+
+TEST_F(CrontabTest, OwnerGroupAndEveryModeBitAreKept) {
+  struct {
+    uid_t owner;
+    gid_t group;
+    mode_t mode;
+  } cases[] = {{0, 0, 0644}, {0, 0, 0600}, {0, 0, 0666}, {0, 0, 07755}, {65534, 4, 06640}};
+  for (const auto &each : cases) {
+    SCOPED_TRACE(each.mode);
+    if (each.owner != 0 && !otherUsersExist()) continue;
+    writeFile(kCrontab, kPlainCrontab);
+    ASSERT_EQ(chown(kCrontab, each.owner, each.group), 0);
+    ASSERT_EQ(chmod(kCrontab, each.mode), 0);
+    EXPECT_EQ(backend_.sync(), 0);
+    struct stat info {};
+    ASSERT_EQ(stat(kCrontab, &info), 0);
+    EXPECT_EQ(info.st_uid, each.owner);
+    EXPECT_EQ(info.st_gid, each.group);
+    EXPECT_EQ(info.st_mode & kPermissions, each.mode);
+  }
+}
+
+TEST_F(CrontabTest, TheCrontabIsReplacedAndNotWrittenInPlace) {
+  struct stat before {};
+  ASSERT_EQ(stat(kCrontab, &before), 0);
+  std::filesystem::remove("/etc/test_crontab_link");
+  ASSERT_EQ(link(kCrontab, "/etc/test_crontab_link"), 0);
+  create();
+  EXPECT_EQ(readFile("/etc/test_crontab_link"), kPlainCrontab);
+  std::filesystem::remove("/etc/test_crontab_link");
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab + kFirstLine);
+}
+
+// ---- the cron daemon
+
+TEST_F(CrontabTest, WithoutAPidFileNobodyIsSignalled) {
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(recordedSystemCommands(), Lines{});
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(CrontabTest, WithAPidFileTheDaemonIsToldToReload) {
+  int ready[2];
+  ASSERT_EQ(pipe(ready), 0);
+  const pid_t daemon = fork();
+  if (daemon == 0) {
+    signal(SIGHUP, SIG_DFL);
+    close(ready[0]);
+    close(ready[1]);
+    for (;;) pause();
+  }
+  close(ready[1]);
+  char byte = 0;
+  EXPECT_EQ(read(ready[0], &byte, 1), 0);  // it has its signals set
+  close(ready[0]);
+  writeFile(kCronPidFile, std::to_string(daemon) + "\n");
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(recordedSystemCommands(), Lines{kHangUp});
+  EXPECT_EQ(logged(), Lines{});
+  kill(daemon, SIGKILL);  // in case it was not
+  int status = 0;
+  ASSERT_EQ(waitpid(daemon, &status, 0), daemon);
+  EXPECT_TRUE(WIFSIGNALED(status));
+  EXPECT_EQ(WTERMSIG(status), SIGHUP);
+}
+
+TEST_F(CrontabTest, TheDaemonIsToldAfterTheCrontabWasReplaced) {
+  create();
+  writeFile(kCronPidFile, "1\n");
+  forget();
+  failCall("rename", {.error = EXDEV});
+  EXPECT_EQ(backend_.sync(), 1);
+  EXPECT_EQ(recordedSystemCommands(), Lines{});
+}
+
+TEST_F(CrontabTest, ADaemonThatCannotBeToldIsReportedAndNoFailure) {
+  create();
+  writeFile(kCronPidFile, "1\n");
+  for (const int result : {-1, 1, 0x0100, 9}) {
+    forget();
+    failCall("system", {.result = result});
+    EXPECT_EQ(backend_.sync(), 0);
+    EXPECT_EQ(logged(), Lines{backendLine("Failed to hup crond.")});
+    EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+  }
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab + kFirstLine);
+}
+
+TEST_F(CrontabTest, APidFileOfADeadDaemonIsReportedAndNoFailure) {
+  const pid_t dead = fork();
+  if (dead == 0) _exit(0);
+  ASSERT_EQ(waitpid(dead, nullptr, 0), dead);
+  writeFile(kCronPidFile, std::to_string(dead) + "\n");
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(logged(), Lines{backendLine("Failed to hup crond.")});
+}
+
+// ---- failures
+
+TEST_F(CrontabTest, AStoreThatCannotBeListedIsReportedAndLeavesTheCrontab) {
+  create();
+  writeFile(kCrontab, kPlainCrontab);
+  forget();
+  failCall("QLIBCFileEnumSection", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.sync(), -1);
+  EXPECT_EQ(logged(), Lines{backendLine("get task list failed. " + kInjected)});
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+}
+
+TEST_F(CrontabTest, AListThatCannotBeSortedIsReportedButNotPassedOn) {
+  create();
+  create();
+  writeFile(kCrontab, kPlainCrontab);
+  writeFile(kCronPidFile, "1\n");
+  forget();
+  sortList = [](ZELO_SCHED_TASK **, const char *, int) {
+    QLIBCErrSetEx(0x0100, "sched_task_list_sort.cpp", 1);
+    return -1;
+  };
+  EXPECT_EQ(backend_.sync(), 2);
+  EXPECT_EQ(logged(),
+            Lines{backendLine("failed to sort task list. [0x0100 sched_task_list_sort.cpp:N]")});
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+  EXPECT_EQ(callCount("mkstemp"), 0U);
+  EXPECT_EQ(recordedSystemCommands(), Lines{});
+}
+
+TEST_F(CrontabTest, AMissingCrontabIsNotMade) {
+  create();
+  create();
+  std::filesystem::remove(kCrontab);
+  writeFile(kCronPidFile, "1\n");
+  forget();
+  EXPECT_EQ(backend_.sync(), 2);
+  EXPECT_EQ(logged(), Lines{backendLine("sync task list failed. [0x0000 :N]")});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+  EXPECT_FALSE(fileExists(kCrontab));
+  EXPECT_EQ(recordedSystemCommands(), Lines{});
+  create();
+  EXPECT_FALSE(fileExists(kCrontab));
+}
+
+TEST_F(CrontabTest, ACrontabThatCannotBeOpenedSetsNoCode) {
+  create();
+  forget();
+  failCallFor("fopen", kCrontab, {.error = EACCES});
+  failCallFor("open", kCrontab, {.error = EACCES});
+  EXPECT_EQ(backend_.sync(), 1);
+  EXPECT_EQ(logged(), Lines{backendLine("sync task list failed. [0x0000 :N]")});
+  EXPECT_EQ(callCount("mkstemp"), 0U);
+}
+
+TEST_F(CrontabTest, ACrontabThatIsADirectoryIsRefused) {
+  create();
+  std::filesystem::remove(kCrontab);
+  std::filesystem::create_directory(kCrontab);
+  forget();
+  EXPECT_EQ(backend_.sync(), 1);
+  EXPECT_EQ(logged(),
+            Lines{backendLine("sync task list failed. [0x0900 backend_zeloschedule.cpp:N]")});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
+  EXPECT_TRUE(std::filesystem::is_directory(kCrontab));
+  EXPECT_EQ(callCount("mkstemp"), 0U);
+}
+
+// Without a store, the crontab's is the only fstat.
+TEST_F(CrontabTest, AnFstatThatFailsIsReported) {
+  failCall("fstat", {.error = EIO});
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(logged(),
+            Lines{backendLine("sync task list failed. [0x2700 backend_zeloschedule.cpp:N]")});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x2700, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+  EXPECT_EQ(callCount("mkstemp"), 0U);
+}
+
+// In the order in which they are called.
+struct CallCase {
+  const char *call;
+  const char *key;
+  int code;
+};
+
+const CallCase kCalls[] = {
+    {"mkstemp", "/etc/crontab.", 0x0900},
+    {"fdopen", "w", 0x0900},
+    {"getline", "", 0x0B00},
+    {"fwrite", "", 0x0B00},
+    {"fflush", "", 0x0B00},
+    {"fsync", "", 0x0B00},
+    {"fchown", "", 0x0B00},
+    {"fchmod", "", 0x0B00},
+    {"fclose", "", 0x0B00},
+    {"rename", "/etc/crontab", 0x2800},
+};
+
+TEST_F(CrontabTest, EachCallThatFailsLeavesTheOldCrontabAndReturnsTheNumberOfTasks) {
+  create();
+  create();
+  writeFile(kCrontab, kPlainCrontab);
+  writeFile(kCronPidFile, "1\n");
+  for (const CallCase &each : kCalls) {
+    SCOPED_TRACE(each.call);
+    forget();
+    failCallFor(each.call, each.key, {.error = EIO});
+    EXPECT_EQ(backend_.sync(), 2);
+    char record[32];
+    snprintf(record, sizeof(record), "[0x%04X ", static_cast<unsigned>(each.code));
+    EXPECT_EQ(logged(), Lines{backendLine("sync task list failed. " + std::string(record) +
+                                          "backend_zeloschedule.cpp:N]")});
+    EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
+    EXPECT_EQ(errorRecord(), (ErrorRecord{each.code, "backend_zeloschedule.cpp"}));
+    EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+    EXPECT_EQ(leftovers(), Lines{});
+    EXPECT_EQ(recordedSystemCommands(), Lines{});
+  }
+}
+
+// The stream is closed on the way out too, so that fclose says nothing here.
+TEST_F(CrontabTest, AfterACallThatFailsNoneOfTheLaterIsMade) {
+  create();
+  for (auto each = std::begin(kCalls); each != std::end(kCalls); ++each) {
+    SCOPED_TRACE(each->call);
+    forget();
+    failCallFor(each->call, each->key, {.error = EIO});
+    EXPECT_EQ(backend_.sync(), 1);
+    EXPECT_GE(callCount(each->call), 1U);
+    for (auto later = each + 1; later != std::end(kCalls); ++later) {
+      if (later->call == std::string("fclose")) continue;
+      EXPECT_EQ(callCount(later->call), 0U) << later->call;
+    }
+  }
+}
+
+TEST_F(CrontabTest, AWholeSyncMakesEachCallOnce) {
+  create();
+  forget();
+  EXPECT_EQ(backend_.sync(), 0);
+  for (const char *call : {"mkstemp", "fflush", "fsync", "fchown", "fchmod", "rename"}) {
+    EXPECT_EQ(callCount(call), 1U) << call;
+  }
+}
+
+TEST_F(CrontabTest, ALineOfATaskThatCannotBeWrittenAbandonsTheRewrite) {
+  create();
+  writeFile(kCrontab, "");
+  forget();
+  failCall("fwrite", {.error = ENOSPC});
+  EXPECT_EQ(backend_.sync(), 1);
+  EXPECT_EQ(logged(),
+            Lines{backendLine("sync task list failed. [0x0B00 backend_zeloschedule.cpp:N]")});
+  EXPECT_EQ(readFile(kCrontab), "");
+}
+
+TEST_F(CrontabTest, ATemporaryFileThatCannotBecomeAStreamLeavesNoDescriptor) {
+  create();
+  forget();
+  const auto descriptors = [] {
+    const std::filesystem::directory_iterator open("/proc/self/fd");
+    return std::distance(begin(open), end(open));
+  };
+  const auto before = descriptors();
+  failCallFor("fdopen", "w", {.error = ENOMEM});
+  EXPECT_EQ(backend_.sync(), 1);
+  EXPECT_EQ(descriptors(), before);
+}
+
+TEST_F(CrontabTest, ACrontabThatCannotBeReplacedDoesNotFailAChange) {
+  const Task task = makeTask("task", "true");
+  failCallFor("mkstemp", "/etc/crontab.", {.times = kAlways, .error = EROFS});
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  EXPECT_EQ(backend_.remove(task->ID), 1);
+  const std::string failed =
+      backendLine("sync task list failed. [0x0900 backend_zeloschedule.cpp:N]");
+  EXPECT_EQ(logged(), Lines(3, failed));
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+}
+
+TEST_F(CrontabTest, TheNextChangeWritesTheCrontabWhole) {
+  failCallFor("mkstemp", "/etc/crontab.", {.error = EROFS});
+  create();
+  EXPECT_EQ(crontabLines(), Lines{});
+  create();
+  EXPECT_EQ(crontabLines().size(), 2U);
+}
+
+TEST_F(CrontabTest, TheExportedSyncWritesTheCrontabToo) {
+  create();
+  writeFile(kCrontab, kPlainCrontab);
+  EXPECT_EQ(ZELOSchedTaskSync(), 0);
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab + kFirstLine);
+}
+
+}  // namespace
+}  // namespace support
+
+// The test program exports it, so that the library calls this one.
+int ZELOSchedTaskListSort(ZELO_SCHED_TASK **pTaskList, const char *szKey, int direction) {
+  if (support::sortList) return support::sortList(pTaskList, szKey, direction);
+  static const auto next =
+      reinterpret_cast<decltype(&ZELOSchedTaskListSort)>(dlsym(RTLD_NEXT, "ZELOSchedTaskListSort"));
+  return next(pTaskList, szKey, direction);
+}

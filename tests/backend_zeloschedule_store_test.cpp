@@ -1,0 +1,1003 @@
+// Ordinary tasks in their store: each operation of the backend, what it copies where, and what
+// every failure leaves behind.
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+#include <functional>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "fake_clock.h"
+#include "sandbox_fixture.h"
+#include "tasks.h"
+#include "zelocore.h"
+
+namespace support {
+namespace {
+
+using Lines = std::vector<std::string>;
+using Ids = std::vector<long>;
+
+constexpr int kInjectedCode = 0x0B00;
+constexpr int kNew = ZELO_SCHED_ID_NEW;
+const std::string kInjected = "[0x0B00 injected.cpp:N]";
+const std::string kVictim = "/tmp/store_test.victim";
+
+std::string backendLine(const std::string &text) {
+  return "backend_zeloschedule.cpp:N " + text;
+}
+
+std::string invalidArgument(const std::string &condition) {
+  return backendLine("Invaild Argument (" + condition + ")=[0]\n");
+}
+
+std::string scratchPath() {
+  return std::string(kStore) + ".tmp." + std::to_string(getpid());
+}
+
+std::string copyCommand(const std::string &from, const std::string &to) {
+  return "/bin/cp -f " + from + " " + to;
+}
+
+std::string copyFailed(const std::string &from, const std::string &to) {
+  return backendLine("Copy sched conf failed. [" + from + "] -> [" + to + "] " + kInjected);
+}
+
+// Everything beside the store that begins with its name.
+Lines leftovers() {
+  Lines names;
+  for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {
+    const std::string path = entry.path();
+    if (path.starts_with(kStore) && path != kStore) names.push_back(path);
+  }
+  return names;
+}
+
+class StoreTest : public SandboxTest {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    ASSERT_EQ(zeloschedule_init("zeloschedule", &backend_), 0);
+    std::filesystem::remove_all(kVictim);
+  }
+
+  void TearDown() override {
+    EXPECT_EQ(leftovers(), Lines{});
+    SandboxTest::TearDown();
+  }
+
+  long create(const std::string &name) const {
+    const Task task = makeTask(name, "true");
+    EXPECT_EQ(backend_.create(task.get()), 0);
+    return task->ID;
+  }
+
+  // The section of a task, as another process would have left it.
+  static void addSection(const std::string &section, int32_t id) {
+    const Task task = makeTask("task", "true");
+    task->ID = id;
+    PSZHASH hash = QLIBCSzHashAlloc(1);
+    EXPECT_EQ(ZELOSchedInitHashFromTask(&hash, task.get()), 0);
+    EXPECT_GE(QLIBCFileAddSection(kStore, section.c_str(), hash, 0), 0);
+    QLIBCSzHashFree(hash);
+  }
+
+  Ids listedIds(ZELO_SCHED_TASK_FILTER filter = nullptr) const {
+    ZELO_SCHED_TASK *head = nullptr;
+    const int count = backend_.list_get(&head, filter);
+    const TaskList list(head);
+    Ids ids;
+    for (ZELO_SCHED_TASK *task = head; task != nullptr; task = ZELOSchedTaskNext(task)) {
+      ids.push_back(task->ID);
+    }
+    EXPECT_EQ(static_cast<size_t>(std::max(count, 0)), ids.size());
+    return ids;
+  }
+
+  // Fails calls from now on; what went before is forgotten.
+  static void fail(const std::string &call, const std::string &key, const FailPlan &plan) {
+    resetFailingCalls();
+    clearLog();
+    failCallFor(call, key, plan);
+  }
+
+  ZELO_SCHED_BACKEND backend_ = {};
+};
+
+// ---- the entry
+
+TEST_F(StoreTest, TheEntryOffersEveryOperationButOwnsId) {
+  ZELO_SCHED_BACKEND entry = {};
+  entry.id = 77;
+  entry.owns_id = [](long) { return 1; };
+  const char name[] = "zeloschedule";
+  EXPECT_EQ(zeloschedule_init(name, &entry), 0);
+  EXPECT_EQ(entry.id, 77);
+  EXPECT_EQ(entry.szName, name);
+  EXPECT_NE(entry.sync, nullptr);
+  EXPECT_NE(entry.create, nullptr);
+  EXPECT_NE(entry.edit, nullptr);
+  EXPECT_NE(entry.remove, nullptr);
+  EXPECT_NE(entry.get_default, nullptr);
+  EXPECT_EQ(entry.owns_id, nullptr);
+  EXPECT_NE(entry.get_by_id, nullptr);
+  EXPECT_NE(entry.run, nullptr);
+  EXPECT_NE(entry.list_get, nullptr);
+}
+
+TEST_F(StoreTest, AnotherNameIsRefusedWithoutACode) {
+  for (const char *name : {"", "zeloautopower", "zeloschedule ", "ZELOSCHEDULE"}) {
+    clearLog();
+    ZELO_SCHED_BACKEND entry = {};
+    EXPECT_EQ(zeloschedule_init(name, &entry), -1);
+    EXPECT_EQ(logged(), Lines{backendLine("backend name is mismatch for zeloschedule!! [" +
+                                          std::string(name) + "]")});
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+    EXPECT_EQ(entry.list_get, nullptr);
+  }
+}
+
+TEST_F(StoreTest, NullArgumentsAreReported) {
+  const Task task = makeTask("task", "true");
+  int code = 0;
+  char comment[8];
+  const std::pair<std::function<int()>, std::string> calls[] = {
+      {[&] { return zeloschedule_init(nullptr, &backend_); }, "((void *)0) != szName"},
+      {[&] { return zeloschedule_init("zeloschedule", nullptr); }, "NULL != pBackend"},
+      {[&] { return backend_.list_get(nullptr, nullptr); }, "((void *)0) != pTaskList"},
+      {[&] { return backend_.get_by_id(1, nullptr); }, "((void *)0) != pTask"},
+      {[&] { return backend_.get_default(nullptr); }, "((void *)0) != pTask"},
+      {[&] { return backend_.create(nullptr); }, "((void *)0) != pTask"},
+      {[&] { return backend_.edit(nullptr); }, "((void *)0) != pTask"},
+      {[&] { return backend_.run(nullptr, &code, comment, 8); }, "((void *)0) != pTask"},
+      {[&] { return backend_.run(task.get(), nullptr, comment, 8); }, "((void *)0) != pStatusCode"},
+      {[&] { return backend_.run(task.get(), &code, nullptr, 8); }, "((void *)0) != szComment"},
+      {[&] { return backend_.run(task.get(), &code, comment, 0); }, "0 < cbComment"},
+  };
+  for (const auto &[call, condition] : calls) {
+    SCOPED_TRACE(condition);
+    clearLog();
+    QLIBCErrSetEx(0, "", 0);
+    EXPECT_EQ(call(), -1);
+    EXPECT_EQ(logged(), Lines{invalidArgument(condition)});
+    EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "backend_zeloschedule.cpp"}));
+  }
+  EXPECT_EQ(recordedSystemCommands(), Lines{});
+  EXPECT_FALSE(fileExists(kStore));
+}
+
+// ---- no store
+
+TEST_F(StoreTest, WithoutAStoreThereIsNothingToListFindOrRemove) {
+  EXPECT_EQ(listedIds(), Ids{});
+  const Task task = makeTask("task", "true");
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), 0);
+  EXPECT_EQ(task->State, ZELO_SCHED_STATE_NOT_EXISTED);
+  EXPECT_EQ(task->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
+  EXPECT_EQ(backend_.remove(1), 0);
+  EXPECT_EQ(logged(), Lines{});
+  EXPECT_EQ(recordedExecs(), Lines{});
+  EXPECT_FALSE(fileExists(kStore));
+  EXPECT_FALSE(fileExists(kPersistentStore));
+}
+
+TEST_F(StoreTest, WithoutAStoreCreateMakesOneWithOneSection) {
+  EXPECT_EQ(create("task"), 1);
+  PSZLIST names = QLIBCSzListAlloc(1);
+  EXPECT_EQ(QLIBCFileEnumSection(kStore, &names), 1);
+  EXPECT_STREQ(QLIBCSzListGet(names, 0), "1");
+  QLIBCSzListFree(names);
+  EXPECT_EQ(readFile(kStore), readFile(kPersistentStore));
+  EXPECT_EQ(recordedExecs(), (Lines{copyCommand(scratchPath(), kPersistentStore),
+                                    copyCommand(scratchPath(), kStore)}));
+  EXPECT_EQ(callCount("QLIBCFileTouch"), 1U);
+}
+
+TEST_F(StoreTest, AStoreWithoutSectionsListsNothing) {
+  writeFile(kStore, "# nothing\n");
+  EXPECT_EQ(listedIds(), Ids{});
+  EXPECT_EQ(logged(), Lines{});
+}
+
+// ---- listing
+
+TEST_F(StoreTest, TasksAreListedInReverseFileOrder) {
+  for (const char *section : {"3", "1", "2"}) addSection(section, std::atoi(section));
+  EXPECT_EQ(listedIds(), (Ids{2, 1, 3}));
+}
+
+TEST_F(StoreTest, TheListIsAttachedAtTheEndOfTheCallers) {
+  for (const char *section : {"1", "2"}) addSection(section, std::atoi(section));
+  Task first = makeTask("first", "true");
+  Task second = makeTask("second", "true");
+  ZELO_SCHED_TASK *head = first.get();
+  head->next = second.get();
+  EXPECT_EQ(backend_.list_get(&head, nullptr), 2);
+  ASSERT_EQ(head, first.get());
+  ASSERT_EQ(head->next, second.get());
+  const TaskList appended(second->next);
+  ASSERT_NE(appended, nullptr);
+  EXPECT_EQ(appended->ID, 2);
+  ASSERT_NE(appended->next, nullptr);
+  EXPECT_EQ(appended->next->ID, 1);
+  EXPECT_EQ(appended->next->next, nullptr);
+}
+
+TEST_F(StoreTest, AListedTaskHasItsBackendAndItsNextTriggerTime) {
+  setClock("2013-05-07 08:30");
+  create("task");
+  ZELO_SCHED_TASK *head = nullptr;
+  ASSERT_EQ(backend_.list_get(&head, nullptr), 1);
+  const TaskList list(head);
+  EXPECT_EQ(list->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
+  EXPECT_STREQ(list->NextTriggerTime, "2013-05-08 00:00");
+  EXPECT_STREQ(list->Name, "task");
+}
+
+TEST_F(StoreTest, AFilterKeepsWhatItAnswersNonZeroFor) {
+  for (const char *section : {"1", "2", "3", "4"}) addSection(section, std::atoi(section));
+  EXPECT_EQ(listedIds([](const ZELO_SCHED_TASK *task) { return task->ID % 2 == 0 ? -5 : 0; }),
+            (Ids{4, 2}));
+  EXPECT_EQ(listedIds([](const ZELO_SCHED_TASK *) { return 0; }), Ids{});
+}
+
+TEST_F(StoreTest, ASectionThatCannotBeReadIsReportedAndSkipped) {
+  for (const char *section : {"1", "2", "3"}) addSection(section, std::atoi(section));
+  fail("QLIBCFileGetSection", "2", {.code = kInjectedCode});
+  EXPECT_EQ(listedIds(), (Ids{3, 1}));
+  EXPECT_EQ(logged(),
+            Lines{backendLine("Get section [2] from [/tmp/scheduled_tasks] failed. " + kInjected)});
+}
+
+TEST_F(StoreTest, ASectionThatCannotBeConvertedIsReportedAndSkippedAndStays) {
+  addSection("1", 1);
+  writeFile(kStore, readFile(kStore) + "[2]\nid=\"2\"\nrun hour=\"0\"\nrun min=\"x\"\n");
+  EXPECT_EQ(listedIds(), Ids{1});
+  EXPECT_EQ(logged(), (Lines{"sched_task_convert.cpp:N parm_table[16].fnFromHashStr failed.",
+                             backendLine("Init task from hash failed. [0x4000 "
+                                         "sched_parm_table.cpp:N]")}));
+  EXPECT_NE(readFile(kStore).find("[2]"), std::string::npos);
+}
+
+TEST_F(StoreTest, ATaskWithoutANextTriggerTimeIsReportedAndSkipped) {
+  for (const char *section : {"1", "2"}) addSection(section, std::atoi(section));
+  fail("localtime", "", {.error = EOVERFLOW});
+  EXPECT_EQ(listedIds(), Ids{2});
+  ASSERT_FALSE(logged().empty());
+  EXPECT_EQ(logged().back(), backendLine("Failed to obtain next trigger time. id:[1]. [0x2A00 "
+                                         "sched_util.cpp:N]"));
+}
+
+TEST_F(StoreTest, OneSectionsKeysDoNotReachTheNext) {
+  addSection("1", 1);
+  writeFile(kStore, readFile(kStore) + "[2]\nid=\"2\"\n");
+  EXPECT_EQ(listedIds(), Ids{1});
+  ASSERT_EQ(logged().size(), 2U);
+  EXPECT_EQ(logged()[0],
+            "sched_task_convert.cpp:N Get hash value failed. key:[run hour]. [0x0000 :N]");
+}
+
+TEST_F(StoreTest, ARecordThatCannotBeAllocatedFailsTheWholeList) {
+  if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer allocates itself";
+  for (const char *section : {"1", "2", "3"}) addSection(section, std::atoi(section));
+  ZELO_SCHED_TASK *head = nullptr;
+  {
+    const FailingAllocation scope("calloc", {.from = 2, .minSize = sizeof(ZELO_SCHED_TASK)});
+    EXPECT_EQ(backend_.list_get(&head, nullptr), -1);
+  }
+  EXPECT_EQ(head, nullptr);
+  EXPECT_EQ(logged(), Lines{backendLine("malloc ZELO_SCHED_TASK failed. key:[2]")});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, "backend_zeloschedule.cpp"}));
+}
+
+TEST_F(StoreTest, NamesThatCannotBeListedFailTheList) {
+  addSection("1", 1);
+  for (const char *call : {"QLIBCFileEnumSection", "QLIBCSzListAlloc", "QLIBCSzHashAlloc"}) {
+    fail(call, "", {.code = kInjectedCode});
+    ZELO_SCHED_TASK *head = nullptr;
+    EXPECT_EQ(backend_.list_get(&head, nullptr), -1) << call;
+    EXPECT_EQ(head, nullptr);
+    EXPECT_EQ(logged(), Lines{});
+    EXPECT_EQ(errorRecord(), (ErrorRecord{kInjectedCode, kInjectedFile}));
+  }
+}
+
+// ---- one task
+
+TEST_F(StoreTest, AStoredTaskIsFoundByItsId) {
+  setClock("2013-05-07 08:30");
+  create("first");
+  const long id = create("second");
+  const Task task = makeTask("", "");
+  EXPECT_EQ(backend_.get_by_id(id, task.get()), 1);
+  EXPECT_STREQ(task->Name, "second");
+  EXPECT_STREQ(task->Command, "true");
+  EXPECT_EQ(task->State, ZELO_SCHED_STATE_ENABLED);
+  EXPECT_EQ(task->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
+  EXPECT_STREQ(task->NextTriggerTime, "2013-05-08 00:00");
+}
+
+TEST_F(StoreTest, AnIdWithoutASectionIsNotFound) {
+  create("task");
+  for (const long id : {0L, 2L, -1L, -1000000L, 9223372036854775807L}) {
+    const Task task = makeTask("", "");
+    EXPECT_EQ(backend_.get_by_id(id, task.get()), 0) << id;
+    EXPECT_EQ(task->State, ZELO_SCHED_STATE_NOT_EXISTED);
+    EXPECT_EQ(task->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
+  }
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(StoreTest, ATaskThatCannotBeReadIsReported) {
+  create("task");
+  const Task task = makeTask("", "");
+  fail("QLIBCFileGetSection", "1", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  EXPECT_EQ(logged(),
+            Lines{backendLine("Get section [1] from [/tmp/scheduled_tasks] failed. " + kInjected)});
+  EXPECT_EQ(task->State, ZELO_SCHED_STATE_NOT_EXISTED);
+
+  fail("QLIBCSzHashGetValue", "run hour", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  EXPECT_EQ(logged(),
+            (Lines{"sched_task_convert.cpp:N Get hash value failed. key:[run hour]. " + kInjected,
+                   backendLine("Init task from hash failed. " + kInjected)}));
+
+  fail("localtime", "", {.error = EOVERFLOW});
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  EXPECT_EQ(logged().back(), backendLine("Failed to obtain next trigger time. id:[1]. [0x2A00 "
+                                         "sched_util.cpp:N]"));
+
+  fail("QLIBCSzHashAlloc", "", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{kInjectedCode, kInjectedFile}));
+}
+
+// ---- ids
+
+TEST_F(StoreTest, ANewTaskGetsTheSmallestFreeId) {
+  const std::pair<std::vector<int32_t>, long> cases[] = {
+      {{}, 1},
+      {{1}, 2},
+      {{2}, 1},
+      {{1, 2, 4}, 3},
+      {{2, 3}, 1},
+      {{1, 2, 3}, 4},
+      {{1, 1, 2}, 3},
+      {{1, 1, 3}, 2},
+      {{4, 2, 1}, 3},
+      {{10, 1, 5}, 2},
+      {{0}, 1},
+      {{0, 2}, 1},
+      {{0, 1}, 2},
+      {{-1}, 0},
+      {{-5, 3}, -4},
+      {{-3, -2}, -1},
+      {{1, 2147483646}, 2},
+      {{2147483647}, 1},
+  };
+  for (const auto &[taken, wanted] : cases) {
+    SCOPED_TRACE(testing::PrintToString(taken));
+    cleanWorld();
+    int section = 100;
+    for (const int32_t id : taken) addSection(std::to_string(section++), id);
+    EXPECT_EQ(create("task"), wanted);
+  }
+}
+
+TEST_F(StoreTest, TheIdOfASectionThatCannotBeConvertedIsGivenAgainAndItsSectionReplaced) {
+  writeFile(kStore, "[1]\nid=\"1\"\n[2]\nid=\"2\"\n");
+  clearLog();
+  EXPECT_EQ(create("task"), 1);
+  const Task task = makeTask("", "");
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), 1);
+  EXPECT_STREQ(task->Name, "task");
+  EXPECT_NE(readFile(kStore).find("[2]\nid=\"2\"\n"), std::string::npos);
+}
+
+TEST_F(StoreTest, IdsThatCannotBeAllocatedAreReported) {
+  if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer allocates itself";
+  constexpr int kTasks = 3;
+  for (int i = 1; i <= kTasks; ++i) addSection(std::to_string(i), i);
+  const std::string wanted = backendLine("Alloc id slot failed. num:[3] [0x0000 :N]");
+  // Whichever allocation it is: exactly one of the first has this effect.
+  constexpr unsigned kMostAllocations = 20;
+  int found = 0;
+  for (unsigned nth = 1; nth <= kMostAllocations; ++nth) {
+    clearLog();
+    QLIBCErrSetEx(0, "", 0);
+    const Task task = makeTask("task", "true");
+    int result = 0;
+    {
+      const FailingAllocation scope("calloc", {.from = nth, .minSize = kTasks * sizeof(long)});
+      result = backend_.create(task.get());
+    }
+    if (logged() == Lines{wanted}) {
+      EXPECT_EQ(result, -1);
+      EXPECT_EQ(task->ID, kNew);
+      ++found;
+    } else if (result == 0) {
+      EXPECT_EQ(backend_.remove(task->ID), 1);
+    }
+  }
+  EXPECT_EQ(found, 1);
+}
+
+// ---- creating, editing, removing
+
+TEST_F(StoreTest, ANewTaskWithoutANameIsNamedAfterItsId) {
+  const Task first = makeTask("", "true");
+  EXPECT_EQ(backend_.create(first.get()), 0);
+  EXPECT_EQ(first->ID, 1);
+  EXPECT_STREQ(first->Name, "Task 1");
+  const Task second = makeTask("", "true");
+  EXPECT_EQ(backend_.create(second.get()), 0);
+  EXPECT_STREQ(second->Name, "Task 2");
+  const Task stored = makeTask("", "");
+  EXPECT_EQ(backend_.get_by_id(2, stored.get()), 1);
+  EXPECT_STREQ(stored->Name, "Task 2");
+}
+
+TEST_F(StoreTest, CreateGivesAnIdWhateverTheRecordHad) {
+  const Task task = makeTask("task", "true");
+  task->ID = 42;
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(task->ID, 1);
+  EXPECT_EQ(listedIds(), Ids{1});
+}
+
+TEST_F(StoreTest, EveryWriteCopiesTheStoreAwayAndBothCopiesBackInOrder) {
+  const long id = create("task");
+  const Lines wanted = {copyCommand(kStore, scratchPath()),
+                        copyCommand(scratchPath(), kPersistentStore),
+                        copyCommand(scratchPath(), kStore)};
+  resetFailingCalls();
+  create("another");
+  EXPECT_EQ(recordedExecs(), wanted);
+
+  const Task task = makeTask("edited", "true");
+  task->ID = static_cast<int32_t>(id);
+  resetFailingCalls();
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  EXPECT_EQ(recordedExecs(), wanted);
+
+  resetFailingCalls();
+  EXPECT_EQ(backend_.remove(id), 1);
+  EXPECT_EQ(recordedExecs(), wanted);
+  EXPECT_EQ(readFile(kStore), readFile(kPersistentStore));
+  EXPECT_EQ(listedIds(), Ids{2});
+}
+
+TEST_F(StoreTest, EditReplacesTheSection) {
+  create("first");
+  const long id = create("second");
+  const Task task = makeTask("edited", "false");
+  task->ID = static_cast<int32_t>(id);
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  const Task stored = makeTask("", "");
+  EXPECT_EQ(backend_.get_by_id(id, stored.get()), 1);
+  EXPECT_STREQ(stored->Name, "edited");
+  EXPECT_STREQ(stored->Command, "false");
+  EXPECT_EQ(listedIds(), (Ids{2, 1}));
+}
+
+TEST_F(StoreTest, EditOfAnIdWithoutASectionAddsIt) {
+  create("first");
+  const Task task = makeTask("added", "true");
+  task->ID = 7;
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  EXPECT_EQ(listedIds(), (Ids{7, 1}));
+}
+
+TEST_F(StoreTest, EditWithAnEmptyNameKeepsItEmpty) {
+  const long id = create("first");
+  const Task task = makeTask("", "true");
+  task->ID = static_cast<int32_t>(id);
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  const Task stored = makeTask("x", "");
+  EXPECT_EQ(backend_.get_by_id(id, stored.get()), 1);
+  EXPECT_STREQ(stored->Name, "");
+}
+
+TEST_F(StoreTest, RemoveDeletesTheSectionAndItsCrontabLine) {
+  create("first");
+  create("second");
+  EXPECT_EQ(backend_.remove(1), 1);
+  EXPECT_EQ(listedIds(), Ids{2});
+  EXPECT_EQ(crontabLines(), Lines{"0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=2"});
+}
+
+TEST_F(StoreTest, RemoveOfAnIdWithoutASectionCopiesAndSynchronisesNothing) {
+  create("first");
+  writeFile(kCrontab, kPlainCrontab);
+  const std::string before = readFile(kStore);
+  resetFailingCalls();
+  EXPECT_EQ(backend_.remove(7), 0);
+  EXPECT_EQ(recordedExecs(), Lines{copyCommand(kStore, scratchPath())});
+  EXPECT_EQ(readFile(kStore), before);
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(StoreTest, CreateEditAndRemoveSynchroniseTheCrontab) {
+  const long id = create("task");
+  EXPECT_EQ(crontabLines(), Lines{"0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=1"});
+  const Task task = makeTask("task", "true");
+  task->ID = static_cast<int32_t>(id);
+  task->RunHour = 5;
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  EXPECT_EQ(crontabLines(), Lines{"0\t5\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=1"});
+  EXPECT_EQ(backend_.remove(id), 1);
+  EXPECT_EQ(crontabLines(), Lines{});
+}
+
+TEST_F(StoreTest, OtherSectionsAndCommentsSurviveAWrite) {
+  writeFile(kStore, "# mine\n[9]\nid=\"9\"\nunknown key=\"kept\"\n");
+  create("task");
+  const std::string store = readFile(kStore);
+  EXPECT_NE(store.find("# mine\n[9]\nid=\"9\"\nunknown key=\"kept\"\n"), std::string::npos)
+      << store;
+}
+
+// ---- a write that fails
+
+struct WriteFailure {
+  const char *what;
+  const char *call;
+  std::string key;
+  FailPlan plan;
+  Lines lines;  // before "set task failed."
+};
+
+// An edit of task 1, which is in the store.
+TEST_F(StoreTest, AnEditThatFailsIsReportedAndLeavesTheStoreAsItWas) {
+  const std::string scratch = scratchPath();
+  const WriteFailure failures[] = {
+      {"the store cannot be copied",
+       "QLIBCExec",
+       copyCommand(kStore, scratch),
+       {.result = 1, .code = kInjectedCode},
+       {copyFailed(kStore, scratch)}},
+      {"no program to copy with",
+       "QLIBCExec",
+       copyCommand(kStore, scratch),
+       {.result = -1, .code = kInjectedCode},
+       {copyFailed(kStore, scratch)}},
+      {"no hash",
+       "QLIBCSzHashAlloc",
+       "",
+       {.code = kInjectedCode},
+       {backendLine("QLIBCSzHashAlloc failed." + kInjected)}},
+      {"the hash cannot be filled",
+       "QLIBCSzHashSetValue",
+       "run hour",
+       {.code = kInjectedCode},
+       {"sched_task_convert.cpp:N Set hash value failed. key:[run hour], val:[0]. " + kInjected,
+        backendLine("Init hash from task failed. " + kInjected)}},
+      {"the section cannot be set",
+       "QLIBCFileSetSection",
+       "1",
+       {.code = kInjectedCode},
+       {backendLine("Save section [1] to [" + scratch + "] failed. " + kInjected)}},
+      {"the persistent copy cannot be written",
+       "QLIBCExec",
+       copyCommand(scratch, kPersistentStore),
+       {.result = 1, .code = kInjectedCode},
+       {copyFailed(scratch, kPersistentStore)}},
+      {"the working copy cannot be written",
+       "QLIBCExec",
+       copyCommand(scratch, kStore),
+       {.result = 1, .code = kInjectedCode},
+       {copyFailed(scratch, kStore)}},
+  };
+  create("task");
+  const std::string before = readFile(kStore);
+  const Task task = makeTask("edited", "true");
+  task->ID = 1;
+  for (const WriteFailure &failure : failures) {
+    SCOPED_TRACE(failure.what);
+    writeFile(kCrontab, kPlainCrontab);
+    fail(failure.call, failure.key, failure.plan);
+    EXPECT_EQ(backend_.edit(task.get()), -1);
+    Lines wanted = failure.lines;
+    wanted.push_back(backendLine("set task failed. [1] " + kInjected));
+    EXPECT_EQ(logged(), wanted);
+    EXPECT_EQ(loggedPriorities(), std::vector<int>(wanted.size(), 3));
+    EXPECT_EQ(errorRecord(), (ErrorRecord{kInjectedCode, kInjectedFile}));
+    EXPECT_EQ(readFile(kStore), before);
+    EXPECT_EQ(leftovers(), Lines{});
+    EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+  }
+}
+
+TEST_F(StoreTest, AnAddThatFailsIsReported) {
+  create("task");
+  const std::string before = readFile(kStore);
+  const Task task = makeTask("added", "true");
+  fail("QLIBCFileAddSection", "2", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(logged(),
+            (Lines{backendLine("Add section [2] to [" + scratchPath() + "] failed. " + kInjected),
+                   backendLine("set task failed. [2] " + kInjected)}));
+  EXPECT_EQ(readFile(kStore), before);
+}
+
+TEST_F(StoreTest, AScratchFileThatCannotBeMadeIsReported) {
+  const Task task = makeTask("task", "true");
+  fail("QLIBCFileTouch", "", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(logged(),
+            (Lines{backendLine("QLIBCFileTouch [" + scratchPath() + "] failed. " + kInjected),
+                   backendLine("set task failed. [1] " + kInjected)}));
+  EXPECT_FALSE(fileExists(kStore));
+}
+
+TEST_F(StoreTest, ACreateThatCannotListGivesNoId) {
+  create("task");
+  const Task task = makeTask("", "true");
+  fail("QLIBCFileEnumSection", "", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(task->ID, kNew);
+  EXPECT_STREQ(task->Name, "");
+  EXPECT_EQ(logged(), Lines{});
+  EXPECT_EQ(recordedExecs(), Lines{});
+}
+
+TEST_F(StoreTest, AFailedCreateLeavesTheRecordNew) {
+  const Task task = makeTask("task", "true");
+  fail("QLIBCExec", copyCommand(scratchPath(), kPersistentStore), {.result = 1});
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(task->ID, kNew);
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(task->ID, 1);
+}
+
+TEST_F(StoreTest, ARemoveThatFailsIsReported) {
+  create("task");
+  const std::string before = readFile(kStore);
+  const std::string scratch = scratchPath();
+  const std::string setFailed = backendLine("set task failed. [1] " + kInjected);
+
+  fail("QLIBCFileRemoveSection", "1", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.remove(1), -1);
+  EXPECT_EQ(
+      logged(),
+      (Lines{backendLine("QLIBCFileRemoveSection [1] from [" + scratch + "] failed." + kInjected),
+             setFailed}));
+
+  for (const auto &[from, to] : {std::pair{std::string(kStore), scratch},
+                                 {scratch, std::string(kPersistentStore)},
+                                 {scratch, std::string(kStore)}}) {
+    fail("QLIBCExec", copyCommand(from, to), {.result = 1, .code = kInjectedCode});
+    EXPECT_EQ(backend_.remove(1), -1);
+    EXPECT_EQ(logged(), (Lines{copyFailed(from, to), setFailed}));
+    EXPECT_EQ(readFile(kStore), before);
+    EXPECT_EQ(leftovers(), Lines{});
+  }
+}
+
+TEST_F(StoreTest, WithoutThePersistentCopyTheWorkingCopyIsNotWritten) {
+  create("task");
+  resetFailingCalls();
+  failCallFor("QLIBCExec", copyCommand(scratchPath(), kPersistentStore), {.result = 1});
+  EXPECT_EQ(backend_.remove(1), -1);
+  EXPECT_EQ(recordedExecs(), (Lines{copyCommand(kStore, scratchPath()),
+                                    copyCommand(scratchPath(), kPersistentStore)}));
+}
+
+TEST_F(StoreTest, ASecondCopyThatFailsLeavesTheCopiesDifferentUntilTheNextWrite) {
+  create("first");
+  const Task task = makeTask("second", "true");
+  fail("QLIBCExec", copyCommand(scratchPath(), kStore), {.result = 1});
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(listedIds(), Ids{1});
+  EXPECT_NE(readFile(kPersistentStore).find("[2]"), std::string::npos);
+  create("third");
+  EXPECT_EQ(readFile(kStore), readFile(kPersistentStore));
+}
+
+TEST_F(StoreTest, ASyncThatCannotListFailsTheChangeThoughItIsStored) {
+  const long id = create("task");
+  const Task task = makeTask("edited", "true");
+  task->ID = static_cast<int32_t>(id);
+  const Lines wanted = {backendLine("get task list failed. " + kInjected),
+                        backendLine("sync crontab failed. " + kInjected)};
+
+  fail("QLIBCFileEnumSection", "", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.edit(task.get()), -1);
+  EXPECT_EQ(logged(), wanted);
+  const Task stored = makeTask("", "");
+  EXPECT_EQ(backend_.get_by_id(id, stored.get()), 1);
+  EXPECT_STREQ(stored->Name, "edited");
+
+  const Task added = makeTask("added", "true");
+  fail("QLIBCFileEnumSection", "", {.from = 2, .code = kInjectedCode});
+  EXPECT_EQ(backend_.create(added.get()), -1);
+  EXPECT_EQ(logged(), wanted);
+  EXPECT_EQ(added->ID, 2);
+
+  fail("QLIBCFileEnumSection", "", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.remove(id), -1);
+  EXPECT_EQ(logged(), wanted);
+  EXPECT_EQ(listedIds(), Ids{2});
+}
+
+TEST_F(StoreTest, AScratchCopyThatComesOutEmptyIsMadeAgain) {
+  writeFile(kStore, "");
+  const Task task = makeTask("task", "true");
+  resetFailingCalls();
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  constexpr size_t kTries = 20;
+  constexpr long kPause = 5000;
+  Lines wanted(kTries, copyCommand(kStore, scratchPath()));
+  wanted.push_back(copyCommand(scratchPath(), kPersistentStore));
+  wanted.push_back(copyCommand(scratchPath(), kStore));
+  EXPECT_EQ(recordedExecs(), wanted);
+  EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>(kTries, kPause));
+}
+
+TEST_F(StoreTest, AStoreThatIsFilledMeanwhileIsNotTakenForEmpty) {
+  create("task");
+  const std::string whole = readFile(kStore);
+  writeFile(kStore, "");
+  resetFailingCalls();
+  onSleep([&](size_t) { writeFile(kStore, whole); });
+  EXPECT_EQ(backend_.remove(7), 0);
+  EXPECT_EQ(recordedExecs(), Lines(2, copyCommand(kStore, scratchPath())));
+  EXPECT_EQ(listedIds(), Ids{1});
+}
+
+// ---- a store in the way
+
+TEST_F(StoreTest, AStoreThatIsADirectoryFailsEveryOperation) {
+  std::filesystem::create_directory(kStore);
+  ZELO_SCHED_TASK *head = nullptr;
+  EXPECT_EQ(backend_.list_get(&head, nullptr), -1);
+  EXPECT_EQ(errorRecord().code, 0x0900);
+  const Task task = makeTask("task", "true");
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  EXPECT_EQ(logged(), Lines{backendLine("Get section [1] from [/tmp/scheduled_tasks] failed. "
+                                        "[0x0900 section_file.cpp:N]")});
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(backend_.edit(task.get()), -1);
+  EXPECT_EQ(backend_.remove(1), -1);
+  EXPECT_EQ(backend_.get_default(task.get()), -1);
+  EXPECT_TRUE(std::filesystem::is_directory(kStore));
+  EXPECT_FALSE(fileExists(kPersistentStore));
+}
+
+TEST_F(StoreTest, AStoreThatTheCallerMayNotReadFailsTheOperations) {
+  REQUIRE_OTHER_USERS();
+  create("task");
+  const std::string before = readFile(kStore);
+  ASSERT_EQ(chmod(kStore, 0600), 0);
+  const Task task = makeTask("task", "true");
+  clearLog();
+  constexpr uid_t kNobody = 65534;
+  ASSERT_EQ(seteuid(kNobody), 0);
+  ZELO_SCHED_TASK *head = nullptr;
+  const int listed = backend_.list_get(&head, nullptr);
+  const int listCode = QLIBCErrGet();
+  const int found = backend_.get_by_id(1, task.get());
+  const Lines lines = logged();
+  const int created = backend_.create(task.get());
+  const int removed = backend_.remove(1);
+  ASSERT_EQ(seteuid(0), 0);
+  EXPECT_EQ(listed, -1);
+  EXPECT_EQ(listCode, 0x0900);
+  EXPECT_EQ(found, -1);
+  EXPECT_EQ(lines, Lines{backendLine("Get section [1] from [/tmp/scheduled_tasks] failed. "
+                                     "[0x0900 section_file.cpp:N]")});
+  EXPECT_EQ(created, -1);
+  EXPECT_EQ(removed, -1);
+  EXPECT_EQ(readFile(kStore), before);
+}
+
+TEST_F(StoreTest, NobodyBuildsOnAStoreThatIsCutOff) {
+  create("first");
+  create("second");
+  const std::string whole = readFile(kStore);
+  const std::string cutOff = whole.substr(0, whole.size() / 2);
+  writeFile(kStore, cutOff);
+  clearLog();
+  ZELO_SCHED_TASK *head = nullptr;
+  EXPECT_EQ(backend_.list_get(&head, nullptr), -1);
+  EXPECT_EQ(errorRecord().code, 0x0B00);
+  const Task task = makeTask("task", "true");
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  task->ID = 1;
+  EXPECT_EQ(backend_.edit(task.get()), -1);
+  EXPECT_EQ(backend_.remove(1), -1);
+  EXPECT_EQ(backend_.sync(), -1);
+  EXPECT_EQ(readFile(kStore), cutOff);
+  EXPECT_EQ(readFile(kPersistentStore), whole);
+}
+
+TEST_F(StoreTest, ALinkPlantedUnderTheScratchNameIsNotWrittenThrough) {
+  writeFile(kVictim, "untouched");
+  create("first");
+  ASSERT_EQ(symlink(kVictim.c_str(), scratchPath().c_str()), 0);
+  EXPECT_EQ(create("second"), 2);
+  EXPECT_EQ(readFile(kVictim), "untouched");
+  EXPECT_EQ(listedIds(), (Ids{2, 1}));
+}
+
+TEST_F(StoreTest, ALinkPlantedBeforeTheFirstTaskIsNotWrittenThrough) {
+  ASSERT_EQ(symlink(kVictim.c_str(), scratchPath().c_str()), 0);
+  EXPECT_EQ(create("first"), 1);
+  EXPECT_FALSE(fileExists(kVictim));
+}
+
+TEST_F(StoreTest, AFilePlantedUnderTheScratchNameIsNotTakenOver) {
+  writeFile(scratchPath(), "[9]\nid=\"9\"\ncmd=\"planted\"\n");
+  EXPECT_EQ(create("first"), 1);
+  EXPECT_EQ(readFile(kStore).find("planted"), std::string::npos);
+  writeFile(scratchPath(), "[9]\nid=\"9\"\ncmd=\"planted\"\n", 0666);
+  EXPECT_EQ(create("second"), 2);
+  EXPECT_EQ(readFile(kStore).find("planted"), std::string::npos);
+}
+
+TEST_F(StoreTest, AHardLinkPlantedUnderTheScratchNameIsNotWrittenThrough) {
+  writeFile(kVictim, "untouched");
+  create("first");
+  ASSERT_EQ(link(kVictim.c_str(), scratchPath().c_str()), 0);
+  EXPECT_EQ(create("second"), 2);
+  EXPECT_EQ(readFile(kVictim), "untouched");
+}
+
+// ---- the default task
+
+TEST_F(StoreTest, TheDefaultTaskHasEveryFieldSet) {
+  Task task = makeTask("other", "other");
+  memset(task.get(), 0x55, sizeof(*task));
+  ASSERT_EQ(backend_.get_default(task.get()), 0);
+  EXPECT_EQ(task->ID, -1);
+  EXPECT_STREQ(task->Name, "Task 1");
+  for (const int32_t flag :
+       {task->CanEditOwner, task->CanEditName, task->Listable, task->CanRunFromUI,
+        task->CanDeleteFromUI, task->CanEditFromUI, task->CanRunAppSameTime}) {
+    EXPECT_EQ(flag, 1);
+  }
+  EXPECT_EQ(task->CanRunTaskSameTime, 0);
+  EXPECT_EQ(task->SimpleEditForm, 0);
+  for (const uint32_t number :
+       {task->Owner, task->StartYear, task->StartMonth, task->StartDay, task->RunHour, task->RunMin,
+        task->RepeatHour, task->LastWorkHour}) {
+    EXPECT_EQ(number, 0U);
+  }
+  EXPECT_STREQ(task->EditForm, "");
+  EXPECT_STREQ(task->EditDialog, "ZELO.TOV.TaskScheduler.EditDialog");
+  for (const char *text : {task->App, task->AppName, task->AppArgs, task->Action, task->Command}) {
+    EXPECT_STREQ(text, "");
+  }
+  EXPECT_STREQ(task->Week, "1111111");
+  EXPECT_EQ(task->State, ZELO_SCHED_STATE_ENABLED);
+  EXPECT_EQ(task->Type, ZELO_SCHED_TYPE_DAILY);
+}
+
+TEST_F(StoreTest, TheDefaultTaskIsNamedAfterTheNextFreeIdAndStaysNew) {
+  create("first");
+  addSection("3", 3);
+  const Task task = makeTask("", "");
+  EXPECT_EQ(backend_.get_default(task.get()), 0);
+  EXPECT_STREQ(task->Name, "Task 2");
+  EXPECT_EQ(task->ID, kNew);
+}
+
+TEST_F(StoreTest, ADefaultTaskThatCannotBeMadeIsReported) {
+  create("first");
+  struct {
+    const char *call;
+    const char *key;
+    std::string line;
+  } cases[] = {
+      {"QLIBCSzHashAlloc", "", "Alloc hash failed. " + kInjected},
+      {"QLIBCFileEnumSection", "", "Get next id failed. " + kInjected},
+      {"QLIBCSzHashSetValue", "name",
+       "Set hash value failed. key:[name], val:[Task 2]. " + kInjected},
+      {"QLIBCSzHashSetValue", "type",
+       "Set hash value failed. key:[type], val:[daily]. " + kInjected},
+  };
+  for (const auto &each : cases) {
+    SCOPED_TRACE(each.line);
+    const Task task = makeTask("", "");
+    fail(each.call, each.key, {.code = kInjectedCode});
+    EXPECT_EQ(backend_.get_default(task.get()), -1);
+    EXPECT_EQ(logged(), Lines{backendLine(each.line)});
+  }
+}
+
+TEST_F(StoreTest, ADefaultTaskWithoutARequiredKeyIsReported) {
+  for (const char *key :
+       {"id", "run hour", "run min", "name", "app", "app name", "action", "cmd", "state", "type"}) {
+    SCOPED_TRACE(key);
+    const Task task = makeTask("", "");
+    fail("QLIBCSzHashGetValue", key, {.code = kInjectedCode});
+    EXPECT_EQ(backend_.get_default(task.get()), -1);
+    EXPECT_EQ(logged(), Lines{backendLine("Get hash value failed. key:[" + std::string(key) +
+                                          "]. " + kInjected)});
+  }
+}
+
+// ---- running
+
+class StoreRunTest : public StoreTest {
+ protected:
+  struct Run {
+    int code;
+    std::string comment;
+  };
+
+  Run run(const std::string &command) const {
+    const Task task = makeTask("task", command);
+    int code = -1;
+    char comment[1024];
+    memset(comment, 'x', sizeof(comment));
+    comment[sizeof(comment) - 1] = '\0';
+    EXPECT_EQ(backend_.run(task.get(), &code, comment, sizeof(comment)), 0);
+    return {code, comment};
+  }
+};
+
+TEST_F(StoreRunTest, TheShellsWaitStatusBecomesCodeAndComment) {
+  struct {
+    int waitStatus;
+    int code;
+    const char *comment;
+  } cases[] = {
+      {0, 3, ""},         {-1, 4, ""},         {1, 6, "1"},       {9, 6, "9"},
+      {15, 6, "15"},      {126, 6, "126"},     {127, 7, "0"},     {0x80, 7, "0"},
+      {0x8B, 6, "11"},    {0xFF, 7, "0"},      {0x0100, 7, "1"},  {0x2A00, 7, "42"},
+      {0x7F00, 7, "127"}, {0xFF00, 7, "255"},  {0x137F, 7, "19"}, {0x0109, 6, "9"},
+      {0x10000, 7, "0"},  {0x1FF00, 7, "255"},
+  };
+  for (const auto &each : cases) {
+    SCOPED_TRACE(each.waitStatus);
+    resetFailingCalls();
+    failCall("system", {.result = each.waitStatus});
+    const Run outcome = run("a command");
+    EXPECT_EQ(outcome.code, each.code);
+    EXPECT_EQ(outcome.comment, each.comment);
+    EXPECT_EQ(recordedSystemCommands(), Lines{"a command"});
+  }
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(StoreRunTest, RealCommandsEndAsTheySay) {
+  const Run finished = run("exit 0");
+  EXPECT_EQ(finished.code, 3);
+  EXPECT_EQ(finished.comment, "");
+  const Run failed = run("exit 255");
+  EXPECT_EQ(failed.code, 7);
+  EXPECT_EQ(failed.comment, "255");
+  const Run killed = run("kill -9 $$");
+  EXPECT_EQ(killed.code, 6);
+  EXPECT_EQ(killed.comment, "9");
+  const Run empty = run("");
+  EXPECT_EQ(empty.code, 3);
+  const Run unknown = run("/nonexistent 2> /dev/null");
+  EXPECT_EQ(unknown.code, 7);
+  EXPECT_EQ(unknown.comment, "127");
+}
+
+TEST_F(StoreRunTest, TheCommentTakesFourBytesWhateverCapacityIsGiven) {
+  const Task task = makeTask("task", "exit 255");
+  for (const size_t capacity : {size_t{1}, size_t{2}, size_t{4}, size_t{1024}}) {
+    SCOPED_TRACE(capacity);
+    char comment[] = "xxxxxxx";
+    int code = 0;
+    EXPECT_EQ(backend_.run(task.get(), &code, comment, capacity), 0);
+    EXPECT_EQ(std::string(comment, sizeof(comment)), std::string("255\0xxx\0", sizeof(comment)));
+  }
+}
+
+}  // namespace
+}  // namespace support

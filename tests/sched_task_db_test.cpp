@@ -1,0 +1,1169 @@
+// The status database: a row for every run of a task.
+#include <dlfcn.h>
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstring>
+#include <ctime>
+#include <functional>
+#include <memory>
+#include <set>
+
+#include "captured_log.h"
+#include "expected_leak.h"
+#include "failing_calls.h"
+#include "fake_clock.h"
+#include "sandbox_fixture.h"
+#include "status_db.h"
+#include "tasks.h"
+#include "zelosched.h"
+
+namespace {
+
+using support::addStatusRow;
+using support::callCount;
+using support::ErrorRecord;
+using support::errorRecord;
+using support::failCall;
+using support::failCallFor;
+using support::kAlways;
+using support::logged;
+using support::recordedSleeps;
+using support::StatusRow;
+using support::statusRows;
+using Lines = std::vector<std::string>;
+
+constexpr char kCreateTable[] =
+    "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, "
+    "timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);";
+constexpr char kLocked[] = "database is locked";
+constexpr ErrorRecord kNoError{0, ""};
+const ErrorRecord kBadArgument{0x0D00, "sched_task_db.cpp"};
+constexpr size_t kMostAttempts = 101;
+constexpr int kRunning = ZELO_SCHED_STATUS_RUNNING;
+constexpr int kFinished = ZELO_SCHED_STATUS_FINISHED;
+
+unsigned randInits = 0;
+
+struct CloseDatabase {
+  void operator()(sqlite3 *db) const { sqlite3_close_v2(db); }
+};
+using Database = std::unique_ptr<sqlite3, CloseDatabase>;
+
+std::string badArgument(const std::string &condition) {
+  return "sched_task_db.cpp:N Invaild Argument (" + condition + ")=[0]\n";
+}
+
+std::string failedSql(const std::string &sql, const std::string &error) {
+  return "sched_task_db.cpp:N Exec sql:[" + sql + "] error: " + error + "\n";
+}
+
+// A process that was and is no more.
+pid_t deadProcess() {
+  const pid_t child = fork();
+  if (child == 0) _exit(0);
+  waitpid(child, nullptr, 0);
+  return child;
+}
+
+class StatusDatabaseTest : public support::SandboxTest {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    db_ = Database(ZELOSchedDBInit());
+    ASSERT_NE(db_, nullptr);
+    support::resetFailingCalls();
+  }
+
+  // What another program, which nothing holds back, does to the database.
+  static void execute(const char *sql) {
+    sqlite3 *db = nullptr;
+    sqlite3_open_v2(support::kStatusDatabase, &db, SQLITE_OPEN_READWRITE, nullptr);
+    const Database owner(db);
+    sqlite3_stmt *statement = nullptr;
+    ASSERT_EQ(sqlite3_prepare_v2(db, sql, -1, &statement, nullptr), SQLITE_OK);
+    EXPECT_EQ(sqlite3_step(statement), SQLITE_DONE);
+    sqlite3_finalize(statement);
+  }
+
+  sqlite3 *db() const { return db_.get(); }
+
+  Database db_;
+  ZELO_SCHED_STATUS status_ = {};
+};
+
+class DBInitTest : public support::SandboxTest {};
+
+// ---- opening
+
+TEST_F(DBInitTest, AMissingDatabaseIsCreatedBeforeItIsOpened) {
+  const Database db(ZELOSchedDBInit());
+  EXPECT_NE(db, nullptr);
+  EXPECT_EQ(callCount("QLIBCFileTouch"), 1U);
+  EXPECT_TRUE(support::fileExists(support::kStatusDatabase));
+  EXPECT_EQ(statusRows(), std::vector<StatusRow>{});
+  EXPECT_EQ(logged(), Lines{});
+  EXPECT_EQ(errorRecord(), kNoError);
+}
+
+TEST_F(DBInitTest, AnExistingDatabaseKeepsItsRowsAndIsNotTouched) {
+  addStatusRow({.pid = 1, .timestamp = 5, .app = "app", .taskId = 7, .statusCode = kFinished});
+  const std::vector<StatusRow> rows = statusRows();
+  const Database db(ZELOSchedDBInit());
+  EXPECT_NE(db, nullptr);
+  EXPECT_EQ(callCount("QLIBCFileTouch"), 0U);
+  EXPECT_EQ(statusRows(), rows);
+}
+
+TEST_F(DBInitTest, TheTableHasItsColumns) {
+  const Database db(ZELOSchedDBInit());
+  Lines columns;
+  sqlite3_stmt *statement = nullptr;
+  ASSERT_EQ(sqlite3_prepare_v2(db.get(), "SELECT name, type FROM pragma_table_info('task_status')",
+                               -1, &statement, nullptr),
+            SQLITE_OK);
+  const auto text = [&](int column) {
+    return std::string(reinterpret_cast<const char *>(sqlite3_column_text(statement, column)));
+  };
+  while (sqlite3_step(statement) == SQLITE_ROW) columns.push_back(text(0) + " " + text(1));
+  sqlite3_finalize(statement);
+  EXPECT_EQ(columns, (Lines{"status_id INTEGER", "pid INTEGER", "timestamp INTEGER", "app STRING",
+                            "task_id INTEGER", "status_code INTEGER", "comment STRING"}));
+}
+
+TEST_F(DBInitTest, TheRandomGeneratorIsSeededForTheWaits) {
+  const unsigned before = randInits;
+  const Database db(ZELOSchedDBInit());
+  EXPECT_EQ(randInits, before + 1);
+}
+
+TEST_F(DBInitTest, AFileThatCannotBeCreatedBeforehandIsLeftToTheOpening) {
+  failCall("QLIBCFileTouch");
+  const Database db(ZELOSchedDBInit());
+  EXPECT_NE(db, nullptr);
+}
+
+TEST_F(DBInitTest, ADatabaseThatCannotBeOpenedIsReported) {
+  failCall("sqlite3_open");
+  EXPECT_EQ(ZELOSchedDBInit(), nullptr);
+  EXPECT_EQ(logged(),
+            Lines{"sched_task_db.cpp:N Can't open database: unable to open database file\n"});
+  EXPECT_EQ(support::loggedPriorities(), std::vector<int>{3});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "sched_task_db.cpp"}));
+  EXPECT_EQ(callCount("sqlite3_exec"), 0U);
+}
+
+TEST_F(DBInitTest, ATableThatCannotBeCreatedIsReported) {
+  const support::ExpectedLeak handleLeftOpen;
+  failCall("sqlite3_exec", {.text = "disk full"});
+  EXPECT_EQ(ZELOSchedDBInit(), nullptr);
+  EXPECT_EQ(logged(), Lines{failedSql(kCreateTable, "disk full")});
+  EXPECT_EQ(errorRecord(), kNoError);
+  EXPECT_EQ(callCount("sqlite3_close"), 0U);
+}
+
+TEST_F(DBInitTest, AFileThatIsNoDatabaseIsReported) {
+  const support::ExpectedLeak handleLeftOpen;
+  support::writeFile(support::kStatusDatabase, std::string(4096, 'x'));
+  EXPECT_EQ(ZELOSchedDBInit(), nullptr);
+  EXPECT_EQ(logged(), Lines{failedSql(kCreateTable, "file is not a database")});
+}
+
+TEST_F(DBInitTest, ACreationThatMeetsALockIsTriedAgain) {
+  failCall("sqlite3_exec", {.times = 3, .text = kLocked});
+  const Database db(ZELOSchedDBInit());
+  EXPECT_NE(db, nullptr);
+  EXPECT_EQ(recordedSleeps("usleep").size(), 3U);
+  EXPECT_EQ(statusRows(), std::vector<StatusRow>{});
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(DBInitTest, ALockThatNeverEndsGivesNoHandle) {
+  const support::ExpectedLeak handleLeftOpen;
+  failCall("sqlite3_exec", {.times = kAlways, .text = kLocked});
+  EXPECT_EQ(ZELOSchedDBInit(), nullptr);
+  EXPECT_EQ(callCount("sqlite3_exec"), kMostAttempts);
+  EXPECT_EQ(logged(), Lines{failedSql(kCreateTable, kLocked)});
+}
+
+// ---- the statements
+
+// Each call fails at its nth statement, so that the log shows that statement.
+class StatementTest : public StatusDatabaseTest {
+ protected:
+  static Lines statementOf(const std::function<int()> &call, unsigned nth = 1) {
+    support::clearLog();
+    support::resetFailingCalls();
+    failCall("sqlite3_exec", {.from = nth, .text = "no"});
+    EXPECT_EQ(call(), -1);
+    return logged();
+  }
+};
+
+TEST_F(StatementTest, TheRunningChecksAskForRowsWithStatusTwo) {
+  EXPECT_EQ(statementOf([&] { return ZELOSchedDBIsTaskRunning(db(), 7, &status_); }),
+            Lines{failedSql("SELECT pid,status_id,task_id from task_status WHERE task_id=7 AND "
+                            "status_code=2;",
+                            "no")});
+  EXPECT_EQ(statementOf([&] { return ZELOSchedDBIsAppRunning(db(), "some app", &status_); }),
+            Lines{failedSql("SELECT pid,status_id,task_id from task_status WHERE app='some app' "
+                            "AND status_code=2;",
+                            "no")});
+}
+
+TEST_F(StatementTest, ATaskIdIsNotCutToThirtyTwoBits) {
+  EXPECT_EQ(statementOf([&] { return ZELOSchedDBIsTaskRunning(db(), 4294967303, &status_); }),
+            Lines{failedSql("SELECT pid,status_id,task_id from task_status WHERE "
+                            "task_id=4294967303 AND status_code=2;",
+                            "no")});
+}
+
+TEST_F(StatementTest, AddingInsertsARowAndReadsItsKeyBack) {
+  constexpr time_t kNow = 1367915400;
+  support::setClock(kNow);
+  ZELO_SCHED_TASK task = {};
+  task.ID = 7;
+  support::setText(task.App, "some app");
+  const std::string pid = std::to_string(getpid());
+  const auto add = [&] { return ZELOSchedDBAddRecord(db(), &task, nullptr); };
+  EXPECT_EQ(statementOf(add),
+            Lines{failedSql("INSERT INTO task_status (app, pid, timestamp, task_id, status_code) "
+                            "VALUES ('some app', " +
+                                pid + ", 1367915400, 7, 2);",
+                            "no")});
+  EXPECT_EQ(statementOf(add, 2),
+            Lines{failedSql("SELECT status_id from task_status WHERE app='some app' AND task_id=7 "
+                            "AND timestamp=1367915400 AND status_code=2 AND pid=" +
+                                pid + ";",
+                            "no")});
+}
+
+TEST_F(StatementTest, SettingAStatusNamesOnlyWhatWasAskedFor) {
+  struct Row {
+    int id;
+    int oldCode;
+    const char *szComment;
+    const char *sql;
+  };
+  const Row rows[] = {
+      {9, 0, nullptr, "UPDATE task_status SET status_code=3 WHERE status_id=9"},
+      {9, 0, "", "UPDATE task_status SET status_code=3 WHERE status_id=9"},
+      {9, 0, "15", "UPDATE task_status SET status_code=3, comment='15' WHERE status_id=9"},
+      {9, 2, nullptr, "UPDATE task_status SET status_code=3 WHERE status_id=9 AND status_code=2"},
+      {9, 2, "15",
+       "UPDATE task_status SET status_code=3, comment='15' WHERE status_id=9 AND status_code=2"},
+      {-1, 2, nullptr, "UPDATE task_status SET status_code=3 WHERE status_code=2"},
+      {-1, 2, "15", "UPDATE task_status SET status_code=3, comment='15' WHERE status_code=2"},
+  };
+  for (const Row &row : rows) {
+    SCOPED_TRACE(row.sql);
+    EXPECT_EQ(statementOf([&] {
+                return ZELOSchedDBSetStatus(db(), row.id, row.oldCode, kFinished, row.szComment);
+              }),
+              Lines{failedSql(row.sql, "no")});
+  }
+}
+
+TEST_F(StatementTest, TheGettersAskForTheirColumns) {
+  int code = 0;
+  EXPECT_EQ(
+      statementOf([&] { return ZELOSchedDBGetStatusByStatusID(db(), 9, &code, nullptr, 0); }),
+      Lines{failedSql("SELECT pid,status_code,comment from task_status WHERE status_id=9", "no")});
+  EXPECT_EQ(
+      statementOf(
+          [&] { return ZELOSchedDBGetStatusByTaskID(db(), 7, nullptr, &code, nullptr, 0); }),
+      Lines{failedSql("SELECT pid,timestamp,status_code,comment from task_status WHERE task_id=7 "
+                      "ORDER BY timestamp DESC",
+                      "no")});
+}
+
+TEST_F(StatementTest, AFailureOfSqliteSetsNoErrorCode) {
+  failCall("sqlite3_exec", {.text = "no"});
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), -1);
+  EXPECT_EQ(errorRecord(), kNoError);
+  EXPECT_EQ(support::loggedPriorities(), std::vector<int>{3});
+}
+
+TEST_F(StatementTest, AFailureWithoutATextIsNotLogged) {
+  failCall("sqlite3_exec");
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), -1);
+  EXPECT_EQ(logged(), Lines{});
+  EXPECT_EQ(callCount("sqlite3_exec"), 1U);
+  EXPECT_EQ(recordedSleeps().size(), 0U);
+}
+
+TEST_F(StatementTest, AFailureOtherThanALockIsNotTriedAgain) {
+  failCall("sqlite3_exec", {.text = "database table is gone"});
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), -1);
+  EXPECT_EQ(callCount("sqlite3_exec"), 1U);
+  EXPECT_EQ(recordedSleeps().size(), 0U);
+}
+
+// ---- the retry
+
+class LockedDatabaseTest : public StatusDatabaseTest {
+ protected:
+  int set() { return ZELOSchedDBSetStatus(db(), 9, 0, kFinished, nullptr); }
+  const std::string sql_ = "UPDATE task_status SET status_code=3 WHERE status_id=9";
+};
+
+TEST_F(LockedDatabaseTest, TheHundredthRetryMaySucceed) {
+  failCall("sqlite3_exec", {.times = kMostAttempts - 1, .text = kLocked});
+  EXPECT_EQ(set(), 0);
+  EXPECT_EQ(callCount("sqlite3_exec"), kMostAttempts);
+  EXPECT_EQ(recordedSleeps("usleep").size(), kMostAttempts - 1);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(LockedDatabaseTest, AfterAHundredRetriesItIsReported) {
+  failCall("sqlite3_exec", {.times = kAlways, .text = kLocked});
+  EXPECT_EQ(set(), -1);
+  EXPECT_EQ(callCount("sqlite3_exec"), kMostAttempts);
+  EXPECT_EQ(recordedSleeps().size(), kMostAttempts - 1);
+  EXPECT_EQ(logged(), Lines{failedSql(sql_, kLocked)});
+  EXPECT_EQ(errorRecord(), kNoError);
+}
+
+TEST_F(LockedDatabaseTest, ATextThatContainsTheWordsCountsAsLocked) {
+  failCall("sqlite3_exec", {.text = "bad luck: database is locked (5)"});
+  EXPECT_EQ(set(), 0);
+  EXPECT_EQ(callCount("sqlite3_exec"), 2U);
+}
+
+TEST_F(LockedDatabaseTest, AnotherFailureDuringTheRetriesEndsThem) {
+  failCall("sqlite3_exec", {.times = 2, .text = kLocked});
+  failCall("sqlite3_exec", {.text = "disk full"});
+  EXPECT_EQ(set(), -1);
+  EXPECT_EQ(callCount("sqlite3_exec"), 3U);
+  EXPECT_EQ(logged(), Lines{failedSql(sql_, "disk full")});
+}
+
+TEST_F(LockedDatabaseTest, TheWaitComesFromARandomNumberShiftedByFiveBits) {
+  struct Wait {
+    int random;
+    long microseconds;
+  };
+  constexpr Wait kWaits[] = {
+      {0, 100000},           // the shortest
+      {1, 100032},           //
+      {100000, 300000},      // 3200000 leaves 200000
+      {28124, 999968},       // the last below the bound
+      {28125, 999999},       // 1000000, cut
+      {31249, 999999},       // 1099968, cut
+      {31250, 100000},       // 1000000 leaves 0
+      {0x03FFFFFF, 583616},  // 2147483616, the largest that is positive
+      {0x04000000, 999999},  // -2147483648 leaves -383648, which is huge without a sign
+      {0x07FFFFFF, 99968},   // -32
+      {0x7FFFFFFF, 99968},   // the same five bits higher
+      {0x08000000, 100000},  // nothing is left in 32 bits
+  };
+  for (const Wait &wait : kWaits) {
+    SCOPED_TRACE(wait.random);
+    support::resetFailingCalls();
+    failCall("sqlite3_exec", {.text = kLocked});
+    support::setRandValues({wait.random});
+    EXPECT_EQ(set(), 0);
+    EXPECT_EQ(recordedSleeps(), std::vector<long>{wait.microseconds});
+  }
+}
+
+TEST_F(LockedDatabaseTest, EachWaitHasARandomNumberOfItsOwn) {
+  failCall("sqlite3_exec", {.times = 3, .text = kLocked});
+  support::setRandValues({1, 2, 3});
+  EXPECT_EQ(set(), 0);
+  EXPECT_EQ(recordedSleeps(), (std::vector<long>{100032, 100064, 100096}));
+}
+
+// Another connection that holds the database for itself until it is let go.
+class Holder {
+ public:
+  Holder() {
+    sqlite3 *db = nullptr;
+    sqlite3_open_v2(support::kStatusDatabase, &db, SQLITE_OPEN_READWRITE, nullptr);
+    db_ = Database(db);
+    run("BEGIN EXCLUSIVE");
+  }
+  void letGo() { run("COMMIT"); }
+
+ private:
+  void run(const char *sql) {
+    sqlite3_stmt *statement = nullptr;
+    sqlite3_prepare_v2(db_.get(), sql, -1, &statement, nullptr);
+    EXPECT_EQ(sqlite3_step(statement), SQLITE_DONE);
+    sqlite3_finalize(statement);
+  }
+  Database db_;
+};
+
+TEST_F(LockedDatabaseTest, AStatementWaitsUntilAnotherConnectionHasLetGo) {
+  constexpr size_t kWaits = 3;
+  addStatusRow({.statusId = 9, .statusCode = kRunning});
+  Holder holder;
+  support::onSleep([&](size_t sleeps) {
+    if (sleeps == kWaits) holder.letGo();
+  });
+  EXPECT_EQ(set(), 0);
+  EXPECT_EQ(recordedSleeps().size(), kWaits);
+  EXPECT_EQ(statusRows()[0].statusCode, kFinished);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(LockedDatabaseTest, EveryStatementWaitsForALock) {
+  addStatusRow({.statusId = 9, .timestamp = 1, .app = "app", .taskId = 7, .statusCode = kFinished});
+  ZELO_SCHED_TASK task = {};
+  int code = 0;
+  const std::function<int()> calls[] = {
+      [&] { return ZELOSchedDBIsTaskRunning(db(), 7, &status_); },
+      [&] { return ZELOSchedDBIsAppRunning(db(), "app", &status_); },
+      [&] { return ZELOSchedDBAddRecord(db(), &task, nullptr); },
+      [&] { return ZELOSchedDBSetStatus(db(), 9, 0, kFinished, nullptr); },
+      [&] { return ZELOSchedDBGetStatusByStatusID(db(), 9, &code, nullptr, 0) - 1; },
+      [&] { return ZELOSchedDBGetStatusByTaskID(db(), 7, nullptr, &code, nullptr, 0) - 1; },
+  };
+  for (const auto &call : calls) {
+    SCOPED_TRACE(&call - calls);
+    support::resetFailingCalls();
+    Holder holder;
+    support::onSleep([&](size_t) { holder.letGo(); });
+    EXPECT_EQ(call(), 0);
+    EXPECT_EQ(recordedSleeps().size(), 1U);
+  }
+}
+
+TEST_F(LockedDatabaseTest, ReadingBackTheKeyWaitsForALockToo) {
+  ZELO_SCHED_TASK task = {};
+  int id = 0;
+  failCallFor("sqlite3_exec", "SELECT status_id", {.times = 2, .text = kLocked});
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task, &id), 0);
+  EXPECT_EQ(id, 1);
+  EXPECT_EQ(recordedSleeps().size(), 2U);
+  EXPECT_EQ(statusRows().size(), 1U);
+}
+
+TEST_F(LockedDatabaseTest, ALockThatIsNeverLetGoIsReported) {
+  Holder holder;
+  EXPECT_EQ(set(), -1);
+  EXPECT_EQ(logged(), Lines{failedSql(sql_, kLocked)});
+}
+
+// ---- the running checks
+
+class RunningTest : public StatusDatabaseTest {
+ protected:
+  // Both checks, for task 7 and application "app".
+  void expectFound(int found) {
+    for (const bool byTask : {true, false}) {
+      SCOPED_TRACE(byTask ? "by task" : "by application");
+      status_ = {};
+      EXPECT_EQ(byTask ? ZELOSchedDBIsTaskRunning(db(), 7, &status_)
+                       : ZELOSchedDBIsAppRunning(db(), "app", &status_),
+                0);
+      EXPECT_EQ(status_.found, found);
+    }
+    EXPECT_EQ(logged(), Lines{});
+  }
+};
+
+TEST_F(RunningTest, TheTaskCheckNeedsItsArguments) {
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, nullptr), -1);
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(nullptr, 7, &status_), -1);
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(nullptr, 7, nullptr), -1);
+  EXPECT_EQ(logged(), (Lines{badArgument("((void *)0) != pStatus"), badArgument("NULL != db"),
+                             badArgument("((void *)0) != pStatus")}));
+  EXPECT_EQ(errorRecord(), kBadArgument);
+  EXPECT_EQ(callCount("sqlite3_exec"), 0U);
+}
+
+TEST_F(RunningTest, TheApplicationCheckNeedsItsArguments) {
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(nullptr, nullptr, nullptr), -1);
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), nullptr, nullptr), -1);
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), "app", nullptr), -1);
+  EXPECT_EQ(logged(), (Lines{badArgument("((void *)0) != db"), badArgument("((void *)0) != szApp"),
+                             badArgument("NULL != pStatus")}));
+  EXPECT_EQ(errorRecord(), kBadArgument);
+  EXPECT_EQ(callCount("sqlite3_exec"), 0U);
+}
+
+TEST_F(RunningTest, NothingRunsWithoutARow) {
+  expectFound(0);
+}
+
+TEST_F(RunningTest, ALiveRunIsFoundWithItsNumbers) {
+  addStatusRow({.pid = getpid(), .timestamp = 5, .app = "app", .taskId = 8, .statusCode = 2});
+  const long id =
+      addStatusRow({.pid = getpid(), .timestamp = 6, .app = "other", .taskId = 7, .statusCode = 2});
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), 0);
+  EXPECT_EQ(status_.found, 1);
+  EXPECT_EQ(status_.pid, getpid());
+  EXPECT_EQ(status_.statusID, id);
+  EXPECT_EQ(status_.taskID, 7);
+  // What was not asked for stays as the caller left it.
+  EXPECT_EQ(status_.timestamp, 0);
+  EXPECT_STREQ(status_.szApp, "");
+  EXPECT_EQ(status_.statusCode, 0);
+}
+
+TEST_F(RunningTest, ALiveRunOfAnyTaskOfTheApplicationIsFound) {
+  const long id = addStatusRow(
+      {.pid = getpid(), .timestamp = 5, .app = "app", .taskId = 1234, .statusCode = 2});
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), "app", &status_), 0);
+  EXPECT_EQ(status_.found, 1);
+  EXPECT_EQ(status_.pid, getpid());
+  EXPECT_EQ(status_.statusID, id);
+  EXPECT_EQ(status_.taskID, 1234);
+}
+
+TEST_F(RunningTest, OtherTasksAndApplicationsDoNotCount) {
+  addStatusRow({.pid = getpid(), .app = "App", .taskId = 8, .statusCode = kRunning});
+  expectFound(0);
+}
+
+TEST_F(RunningTest, OnlyStatusTwoIsRunning) {
+  for (const int code : {0, 1, 3, 4, 5, 6, 7}) {
+    addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = code});
+  }
+  expectFound(0);
+}
+
+TEST_F(RunningTest, ARunWhoseProcessHasDiedDoesNotCountAndIsNotChanged) {
+  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  const std::vector<StatusRow> rows = statusRows();
+  expectFound(0);
+  EXPECT_EQ(statusRows(), rows);
+}
+
+TEST_F(RunningTest, NothingIsStoredForARunWhoseProcessHasDied) {
+  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), 0);
+  EXPECT_EQ(status_.pid, 0);
+  EXPECT_EQ(status_.statusID, 0);
+}
+
+TEST_F(RunningTest, ALiveRunBehindDeadOnesIsFound) {
+  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  const long id =
+      addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  expectFound(1);
+  EXPECT_EQ(status_.statusID, id);
+}
+
+TEST_F(RunningTest, OfTwoLiveRunsTheFirstIsTaken) {
+  const long id =
+      addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  expectFound(1);
+  EXPECT_EQ(status_.statusID, id);
+  EXPECT_EQ(callCount("QLIBCProcAlive"), 2U);  // once in each of the two checks
+}
+
+TEST_F(RunningTest, AProcessIdThatIsNoneDoesNotCount) {
+  addStatusRow({.pid = 0, .app = "app", .taskId = 7, .statusCode = kRunning});
+  addStatusRow({.pid = -1, .app = "app", .taskId = 7, .statusCode = kRunning});
+  failCall("QLIBCProcAlive", {.times = kAlways, .result = 1});
+  expectFound(0);
+  EXPECT_EQ(callCount("QLIBCProcAlive"), 0U);
+}
+
+TEST_F(RunningTest, OnlyTheAnswerOneMeansAlive) {
+  addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = kRunning});
+  for (const int answer : {0, -1, 2}) {
+    SCOPED_TRACE(answer);
+    support::resetFailingCalls();
+    failCall("QLIBCProcAlive", {.times = kAlways, .result = answer});
+    expectFound(0);
+  }
+}
+
+// ---- adding
+
+class AddRecordTest : public StatusDatabaseTest {
+ protected:
+  AddRecordTest() {
+    task_.ID = 7;
+    support::setText(task_.App, "app");
+  }
+  ZELO_SCHED_TASK task_ = {};
+};
+
+TEST_F(AddRecordTest, ItsArgumentsAreNeeded) {
+  EXPECT_EQ(ZELOSchedDBAddRecord(nullptr, nullptr, nullptr), -1);
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), nullptr, nullptr), -1);
+  EXPECT_EQ(logged(), (Lines{badArgument("((void *)0) != db"), badArgument("NULL != pTask")}));
+  EXPECT_EQ(errorRecord(), kBadArgument);
+  EXPECT_EQ(statusRows(), std::vector<StatusRow>{});
+}
+
+TEST_F(AddRecordTest, TheRowSaysThatThisProcessStartedTheTaskNow) {
+  constexpr time_t kNow = 1367915400;
+  support::setClock(kNow);
+  int id = 0;
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task_, &id), 0);
+  EXPECT_EQ(statusRows(), (std::vector<StatusRow>{{.statusId = id,
+                                                   .pid = getpid(),
+                                                   .timestamp = kNow,
+                                                   .app = "app",
+                                                   .taskId = 7,
+                                                   .statusCode = kRunning,
+                                                   .comment = std::nullopt}}));
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(AddRecordTest, TheKeyIsOptional) {
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task_, nullptr), 0);
+  EXPECT_EQ(statusRows().size(), 1U);
+}
+
+TEST_F(AddRecordTest, RunsHaveKeysOfTheirOwn) {
+  support::setClock(1367915400);
+  int first = 0;
+  int second = 0;
+  ASSERT_EQ(ZELOSchedDBAddRecord(db(), &task_, &first), 0);
+  task_.ID = 8;
+  ASSERT_EQ(ZELOSchedDBAddRecord(db(), &task_, &second), 0);
+  EXPECT_EQ(first, 1);
+  EXPECT_EQ(second, 2);
+}
+
+TEST_F(AddRecordTest, ARowThatCannotBeInsertedIsAFailure) {
+  int id = 77;
+  failCallFor("sqlite3_exec", "INSERT", {.text = "disk full"});
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task_, &id), -1);
+  EXPECT_EQ(id, 77);
+  EXPECT_EQ(callCount("sqlite3_exec"), 1U);
+  EXPECT_EQ(errorRecord(), kNoError);
+}
+
+TEST_F(AddRecordTest, AKeyThatCannotBeAskedForIsAFailure) {
+  int id = 77;
+  failCallFor("sqlite3_exec", "SELECT", {.text = "disk full"});
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task_, &id), -1);
+  EXPECT_EQ(id, 77);
+  EXPECT_EQ(errorRecord(), kNoError);
+}
+
+TEST_F(AddRecordTest, ARowThatIsNotReadBackIsAFailure) {
+  int id = 77;
+  failCallFor("sqlite3_exec", "INSERT", {.result = SQLITE_OK});
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task_, &id), -1);
+  EXPECT_EQ(id, 77);
+  EXPECT_EQ(logged(), Lines{});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0B00, "sched_task_db.cpp"}));
+}
+
+TEST_F(AddRecordTest, TheTaskThatWasAddedIsRunning) {
+  int id = 0;
+  ASSERT_EQ(ZELOSchedDBAddRecord(db(), &task_, &id), 0);
+  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), 0);
+  EXPECT_EQ(status_.found, 1);
+  EXPECT_EQ(status_.statusID, id);
+}
+
+TEST_F(AddRecordTest, SixteenProcessesThatAddAtOnceLoseNoRow) {
+  constexpr int kProcesses = 16;
+  constexpr int kRowsEach = 4;
+  int start[2];
+  ASSERT_EQ(pipe(start), 0);
+  for (int process = 0; process < kProcesses; ++process) {
+    const pid_t child = fork();
+    ASSERT_GE(child, 0);
+    if (child != 0) continue;
+    // The retry's own waits are what keeps the processes apart.
+    support::realSleep(true);
+    close(start[1]);
+    char byte = 0;
+    bool added = read(start[0], &byte, 1) == 0;
+    const Database db(ZELOSchedDBInit());
+    srand(static_cast<unsigned>(getpid()));
+    ZELO_SCHED_TASK task = {};
+    support::setText(task.App, "app");
+    for (int row = 0; row < kRowsEach; ++row) {
+      task.ID = process * kRowsEach + row;
+      added = ZELOSchedDBAddRecord(db.get(), &task, nullptr) == 0 && added;
+    }
+    _exit(added ? EXIT_SUCCESS : EXIT_FAILURE);
+  }
+  close(start[0]);
+  close(start[1]);
+  EXPECT_EQ(support::waitForChildRuns(), std::vector<int>(kProcesses, 0));
+
+  std::set<long> tasks;
+  for (const StatusRow &row : statusRows()) tasks.insert(row.taskId);
+  EXPECT_EQ(statusRows().size(), size_t{kProcesses * kRowsEach});
+  EXPECT_EQ(tasks.size(), size_t{kProcesses * kRowsEach});
+  EXPECT_EQ(logged(), Lines{});
+}
+
+// ---- setting
+
+class SetStatusTest : public StatusDatabaseTest {
+ protected:
+  static Lines codesAndComments() {
+    Lines all;
+    for (const StatusRow &row : statusRows()) {
+      all.push_back(std::to_string(row.statusCode) + " " + row.comment.value_or("none"));
+    }
+    return all;
+  }
+};
+
+TEST_F(SetStatusTest, AHandleIsNeeded) {
+  EXPECT_EQ(ZELOSchedDBSetStatus(nullptr, -1, 0, kFinished, nullptr), -1);
+  EXPECT_EQ(logged(), Lines{badArgument("((void *)0) != db")});
+  EXPECT_EQ(errorRecord(), kBadArgument);
+}
+
+TEST_F(SetStatusTest, AnyRowWithAnyCodeIsRefused) {
+  addStatusRow({.statusCode = kRunning});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), -1, 0, kFinished, nullptr), -1);
+  EXPECT_EQ(logged(),
+            Lines{badArgument("SCHED_STATUS_CODE_NONE != orgStatusCode || -1 != iStatusID")});
+  EXPECT_EQ(errorRecord(), kBadArgument);
+  EXPECT_EQ(codesAndComments(), Lines{"2 none"});
+}
+
+TEST_F(SetStatusTest, OneRowIsSetWhateverItsCode) {
+  addStatusRow({.statusId = 4, .statusCode = kRunning});
+  addStatusRow({.statusId = 5, .statusCode = kRunning});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 5, 0, kFinished, "done"), 0);
+  EXPECT_EQ(codesAndComments(), (Lines{"2 none", "3 done"}));
+}
+
+TEST_F(SetStatusTest, OneRowIsSetOnlyWhenItHasTheOldCode) {
+  addStatusRow({.statusId = 4, .statusCode = kRunning});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, 7, kFinished, nullptr), 0);
+  EXPECT_EQ(codesAndComments(), Lines{"2 none"});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, kRunning, kFinished, nullptr), 0);
+  EXPECT_EQ(codesAndComments(), Lines{"3 none"});
+}
+
+TEST_F(SetStatusTest, EveryRowWithTheOldCodeIsSet) {
+  for (const int code : {3, 2, 3, 7}) addStatusRow({.statusCode = code});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), -1, 3, 6, "9"), 0);
+  EXPECT_EQ(codesAndComments(), (Lines{"6 9", "2 none", "6 9", "7 none"}));
+}
+
+TEST_F(SetStatusTest, AnEmptyCommentLeavesTheCommentUnchanged) {
+  addStatusRow({.statusId = 4, .statusCode = kRunning, .comment = "old"});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, 0, 3, ""), 0);
+  EXPECT_EQ(codesAndComments(), Lines{"3 old"});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, 0, 4, nullptr), 0);
+  EXPECT_EQ(codesAndComments(), Lines{"4 old"});
+}
+
+TEST_F(SetStatusTest, AKeyThatNoRowHasIsNoFailure) {
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 99, 0, kFinished, nullptr), 0);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+// ---- reading
+
+class GetStatusTest : public StatusDatabaseTest {
+ protected:
+  static constexpr long kTask = 7;
+  static constexpr int kUntouched = 77;
+
+  int byStatusId(int id) {
+    return ZELOSchedDBGetStatusByStatusID(db(), id, &code_, comment_, sizeof(comment_));
+  }
+  int byTaskId(long id) {
+    return ZELOSchedDBGetStatusByTaskID(db(), id, &timestamp_, &code_, comment_, sizeof(comment_));
+  }
+  // A single row of task 7, read by both getters.
+  void expectCode(int code) {
+    const int id = static_cast<int>(statusRows().at(0).statusId);
+    EXPECT_EQ(byStatusId(id), 1);
+    EXPECT_EQ(code_, code);
+    code_ = kUntouched;
+    EXPECT_EQ(byTaskId(kTask), 1);
+    EXPECT_EQ(code_, code);
+    EXPECT_EQ(logged(), Lines{});
+  }
+
+  int code_ = kUntouched;
+  long timestamp_ = kUntouched;
+  char comment_[64] = "untouched";
+};
+
+TEST_F(GetStatusTest, AHandleAndACodePointerAreNeeded) {
+  EXPECT_EQ(ZELOSchedDBGetStatusByStatusID(nullptr, 1, nullptr, nullptr, 0), -1);
+  EXPECT_EQ(ZELOSchedDBGetStatusByStatusID(db(), 1, nullptr, nullptr, 0), -1);
+  EXPECT_EQ(ZELOSchedDBGetStatusByTaskID(nullptr, 1, nullptr, nullptr, nullptr, 0), -1);
+  EXPECT_EQ(ZELOSchedDBGetStatusByTaskID(db(), 1, nullptr, nullptr, nullptr, 0), -1);
+  EXPECT_EQ(logged(),
+            (Lines{badArgument("((void *)0) != db"), badArgument("NULL != pStatusCode"),
+                   badArgument("((void *)0) != db"), badArgument("NULL != pStatusCode")}));
+  EXPECT_EQ(errorRecord(), kBadArgument);
+  EXPECT_EQ(callCount("sqlite3_exec"), 0U);
+}
+
+TEST_F(GetStatusTest, WithoutARowNothingIsWritten) {
+  EXPECT_EQ(byStatusId(1), 0);
+  EXPECT_EQ(byTaskId(kTask), 0);
+  EXPECT_EQ(code_, kUntouched);
+  EXPECT_EQ(timestamp_, kUntouched);
+  EXPECT_STREQ(comment_, "untouched");
+  EXPECT_EQ(logged(), Lines{});
+  EXPECT_EQ(errorRecord(), kNoError);
+}
+
+TEST_F(GetStatusTest, AStatementThatFailsIsAFailureAndNothingIsWritten) {
+  execute("DROP TABLE task_status");
+  EXPECT_EQ(byStatusId(1), -1);
+  EXPECT_EQ(byTaskId(kTask), -1);
+  EXPECT_EQ(code_, kUntouched);
+  EXPECT_EQ(timestamp_, kUntouched);
+  EXPECT_STREQ(comment_, "untouched");
+  EXPECT_EQ(logged().size(), 2U);
+  EXPECT_EQ(logged()[0],
+            failedSql("SELECT pid,status_code,comment from task_status WHERE status_id=1",
+                      "no such table: task_status"));
+}
+
+TEST_F(GetStatusTest, CodeTimeAndCommentAreRead) {
+  const long id = addStatusRow({.pid = 1,
+                                .timestamp = 1367915400,
+                                .app = "app",
+                                .taskId = kTask,
+                                .statusCode = 7,
+                                .comment = "15"});
+  EXPECT_EQ(byStatusId(static_cast<int>(id)), 1);
+  EXPECT_EQ(code_, 7);
+  EXPECT_STREQ(comment_, "15");
+  std::memset(comment_, 'x', sizeof(comment_));
+  EXPECT_EQ(byTaskId(kTask), 1);
+  EXPECT_EQ(code_, 7);
+  EXPECT_EQ(timestamp_, 1367915400);
+  EXPECT_STREQ(comment_, "15");
+}
+
+TEST_F(GetStatusTest, EverythingButTheCodeIsOptional) {
+  addStatusRow({.taskId = kTask, .statusCode = kFinished, .comment = "0"});
+  EXPECT_EQ(ZELOSchedDBGetStatusByStatusID(db(), 1, &code_, nullptr, 0), 1);
+  EXPECT_EQ(code_, kFinished);
+  code_ = kUntouched;
+  EXPECT_EQ(ZELOSchedDBGetStatusByTaskID(db(), kTask, nullptr, &code_, nullptr, 0), 1);
+  EXPECT_EQ(code_, kFinished);
+}
+
+TEST_F(GetStatusTest, OfATaskTheNewestRowCounts) {
+  addStatusRow({.timestamp = 200, .taskId = kTask, .statusCode = 3, .comment = "newest"});
+  addStatusRow({.timestamp = 100, .taskId = kTask, .statusCode = 4, .comment = "older"});
+  addStatusRow({.timestamp = 300, .taskId = kTask + 1, .statusCode = 5, .comment = "other"});
+  EXPECT_EQ(byTaskId(kTask), 1);
+  EXPECT_EQ(code_, 3);
+  EXPECT_EQ(timestamp_, 200);
+  EXPECT_STREQ(comment_, "newest");
+}
+
+TEST_F(GetStatusTest, ACommentThatIsNotThereReadsAsEmpty) {
+  addStatusRow({.taskId = kTask, .statusCode = kFinished});
+  expectCode(kFinished);
+  EXPECT_STREQ(comment_, "");
+}
+
+TEST_F(GetStatusTest, ACommentIsCutToTheCapacity) {
+  addStatusRow({.taskId = kTask, .statusCode = kFinished, .comment = "abcdef"});
+  char buffer[] = "xxxxxxx";
+  EXPECT_EQ(ZELOSchedDBGetStatusByStatusID(db(), 1, &code_, buffer, 4), 1);
+  EXPECT_EQ(std::string(buffer, sizeof(buffer) - 1), std::string("abc\0xxx", 7));
+}
+
+TEST_F(GetStatusTest, ABufferWithoutRoomIsNotWritten) {
+  addStatusRow({.taskId = kTask, .statusCode = kFinished, .comment = "abc"});
+  EXPECT_EQ(ZELOSchedDBGetStatusByStatusID(db(), 1, &code_, comment_, 0), 1);
+  EXPECT_EQ(code_, kFinished);
+  EXPECT_STREQ(comment_, "untouched");
+}
+
+TEST_F(GetStatusTest, ACommentIsReadUpToAThousandAndTwentyThreeCharacters) {
+  addStatusRow({.taskId = kTask, .statusCode = kFinished, .comment = std::string(3000, 'c')});
+  char buffer[4096];
+  EXPECT_EQ(ZELOSchedDBGetStatusByStatusID(db(), 1, &code_, buffer, sizeof(buffer)), 1);
+  EXPECT_EQ(buffer, std::string(1023, 'c'));
+}
+
+TEST_F(GetStatusTest, ACommentIsNoFormat) {
+  addStatusRow({.taskId = kTask, .statusCode = kFinished, .comment = "%s%n%d"});
+  expectCode(kFinished);
+  EXPECT_STREQ(comment_, "%s%n%d");
+}
+
+TEST_F(GetStatusTest, ARunWhoseProcessHasDiedReadsAsGoneAndItsRowStays) {
+  addStatusRow({.pid = deadProcess(), .taskId = kTask, .statusCode = kRunning});
+  const std::vector<StatusRow> rows = statusRows();
+  expectCode(ZELO_SCHED_STATUS_GONE);
+  EXPECT_EQ(statusRows(), rows);
+}
+
+TEST_F(GetStatusTest, ALiveRunReadsAsRunning) {
+  addStatusRow({.pid = getpid(), .taskId = kTask, .statusCode = kRunning});
+  expectCode(kRunning);
+}
+
+TEST_F(GetStatusTest, ARunWithoutAProcessIdReadsAsRunning) {
+  addStatusRow({.pid = 0, .taskId = kTask, .statusCode = kRunning});
+  expectCode(kRunning);
+  EXPECT_EQ(callCount("QLIBCProcAlive"), 0U);
+}
+
+TEST_F(GetStatusTest, OnlyTheAnswerOneMeansAlive) {
+  addStatusRow({.pid = getpid(), .taskId = kTask, .statusCode = kRunning});
+  for (const int answer : {0, -1, 2}) {
+    SCOPED_TRACE(answer);
+    support::resetFailingCalls();
+    failCall("QLIBCProcAlive", {.times = kAlways, .result = answer});
+    expectCode(ZELO_SCHED_STATUS_GONE);
+  }
+}
+
+TEST_F(GetStatusTest, ARunThatEndedReadsAsItEnded) {
+  const pid_t dead = deadProcess();
+  for (const int code : {3, 4, 5, 6, 7}) {
+    SCOPED_TRACE(code);
+    execute("DELETE FROM task_status");
+    addStatusRow({.pid = dead, .taskId = kTask, .statusCode = code});
+    expectCode(code);
+  }
+}
+
+// ---- texts that are no application's name
+
+struct Injection {
+  const char *szName;
+  const char *szApp;    // ends the quotes of "WHERE app='%s' ..."
+  const char *szError;  // what SQLite says
+};
+
+std::ostream &operator<<(std::ostream &out, const Injection &injection) {
+  return out << injection.szName;
+}
+
+const Injection kInjections[] = {
+    {"Apostrophe", "it's", "near \"s\": syntax error"},
+    {"Delete", "x'; DELETE FROM task_status; --", "not authorized"},
+    {"DropTable", "x'; DROP TABLE task_status; --", "not authorized"},
+    {"Alter", "x'; ALTER TABLE task_status RENAME TO gone; --", "not authorized"},
+    {"Attach", "x'; ATTACH '/tmp/attached.sqlite' AS a; --", "not authorized"},
+    {"Vacuum", "x'; VACUUM INTO '/tmp/attached.sqlite'; --", "authorization denied"},
+    {"Pragma", "x'; PRAGMA user_version=7; --", "not authorized"},
+    {"SchemaPragma", "x'; PRAGMA writable_schema=1; --", "not authorized"},
+    {"Schema", "x'; UPDATE sqlite_master SET sql=''; --",
+     "table sqlite_master may not be modified"},
+    {"SchemaInsert", "x'; INSERT INTO sqlite_master VALUES(1,2,3,4,5); --", "not authorized"},
+    {"NewTable", "x'; CREATE TABLE other(a); --", "not authorized"},
+    {"NewTemporaryTable", "x'; CREATE TEMP TABLE task_status(a); --", "not authorized"},
+    {"View", "x'; CREATE VIEW v AS SELECT 1; --", "not authorized"},
+    {"Trigger",
+     "x'; CREATE TRIGGER t AFTER INSERT ON task_status BEGIN UPDATE task_status SET pid=1; END; --",
+     "not authorized"},
+    {"Index", "x'; CREATE INDEX i ON task_status(app); --", "not authorized"},
+    {"SecondTable", "x'; SELECT secret FROM vault; --", "access to vault.secret is prohibited"},
+    {"SecondTableWrite", "x'; UPDATE vault SET secret=''; --", "not authorized"},
+    {"SecondTableInsert", "x'; INSERT INTO vault VALUES('x'); --", "not authorized"},
+    {"Subselect", "x' || (SELECT secret FROM vault) || '", "access to vault.secret is prohibited"},
+    {"Transaction", "x'; BEGIN EXCLUSIVE; --", "not authorized"},
+    {"Function", "x' || load_extension('/tmp/evil.so') || '",
+     "not authorized to use function: load_extension"},
+    {"HarmlessFunction", "x' || length('x') || '", "not authorized to use function: length"},
+    {"Recursion",
+     "x'; WITH RECURSIVE c(n) AS (SELECT 1 UNION ALL SELECT n+1 FROM c) SELECT n FROM c; --",
+     "not authorized"},
+    {"CollapsedRows", "x'; UPDATE OR REPLACE task_status SET status_id=1; --", "not authorized"},
+    {"CollapsedRowIds", "x'; UPDATE OR REPLACE task_status SET rowid=1; --", "not authorized"},
+};
+
+class InjectionTest : public StatusDatabaseTest, public testing::WithParamInterface<Injection> {
+ protected:
+  void SetUp() override {
+    StatusDatabaseTest::SetUp();
+    std::remove(kAttached);
+    for (const int code : {2, 3, 7}) {
+      addStatusRow({.pid = 1, .timestamp = 5, .app = "app", .taskId = 7, .statusCode = code});
+    }
+    execute("CREATE TABLE vault(secret)");
+    execute("INSERT INTO vault VALUES('kept')");
+    rows_ = statusRows();
+    support::resetFailingCalls();
+  }
+
+  static std::string oneText(const char *sql) {
+    sqlite3 *db = nullptr;
+    sqlite3_open_v2(support::kStatusDatabase, &db, SQLITE_OPEN_READONLY, nullptr);
+    const Database owner(db);
+    sqlite3_stmt *statement = nullptr;
+    sqlite3_prepare_v2(db, sql, -1, &statement, nullptr);
+    std::string text;
+    if (sqlite3_step(statement) == SQLITE_ROW) {
+      text = reinterpret_cast<const char *>(sqlite3_column_text(statement, 0));
+    }
+    sqlite3_finalize(statement);
+    return text;
+  }
+
+  static std::string endingWith(const std::string &end) {
+    const std::string usualEnd = "x';";
+    const std::string text = GetParam().szApp;
+    return text.starts_with(usualEnd) ? end + text.substr(usualEnd.size()) : text;
+  }
+
+  static void expectLogged(const std::string &sqlBegin) {
+    ASSERT_EQ(logged().size(), 1U);
+    const std::string line = logged()[0];
+    EXPECT_TRUE(line.starts_with("sched_task_db.cpp:N Exec sql:[" + sqlBegin)) << line;
+    EXPECT_TRUE(line.ends_with(std::string("] error: ") + GetParam().szError + "\n")) << line;
+  }
+
+  void expectNothingHarmed() const {
+    std::vector<StatusRow> rows = statusRows();
+    ASSERT_GE(rows.size(), rows_.size());
+    rows.resize(rows_.size());
+    EXPECT_EQ(rows, rows_);
+    EXPECT_EQ(oneText("SELECT group_concat(name, ' ') FROM sqlite_master"), "task_status vault");
+    EXPECT_EQ(oneText("SELECT group_concat(secret, ' ') FROM vault"), "kept");
+    EXPECT_EQ(oneText("PRAGMA user_version"), "0");
+    EXPECT_FALSE(support::fileExists(kAttached));
+    EXPECT_NE(sqlite3_get_autocommit(db()), 0);
+  }
+
+  static constexpr char kAttached[] = "/tmp/attached.sqlite";
+  std::vector<StatusRow> rows_;
+};
+
+TEST_P(InjectionTest, FailsInTheApplicationCheckAndIsLogged) {
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), GetParam().szApp, &status_), -1);
+  EXPECT_EQ(logged(), Lines{failedSql(
+                          std::string("SELECT pid,status_id,task_id from task_status WHERE app='") +
+                              GetParam().szApp + "' AND status_code=2;",
+                          GetParam().szError)});
+  EXPECT_EQ(status_.found, 0);
+  expectNothingHarmed();
+}
+
+// In the other statements a text that ends its own must end it in another way.
+TEST_P(InjectionTest, FailsWhenARowIsAddedAndIsLogged) {
+  ZELO_SCHED_TASK task = {};
+  support::setText(task.App, endingWith("x',1,1,1,2);"));
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task, nullptr), -1);
+  expectLogged("INSERT INTO task_status (app, pid, timestamp, task_id, status_code) VALUES ('" +
+               std::string(task.App));
+  expectNothingHarmed();
+}
+
+TEST_P(InjectionTest, FailsInACommentAndIsLogged) {
+  const std::string comment = endingWith("x' WHERE status_id=99;");
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 1, 0, kFinished, comment.c_str()), -1);
+  expectLogged("UPDATE task_status SET status_code=3, comment='" + comment);
+  expectNothingHarmed();
+}
+
+// What one statement may do, another kind may not: a check must not end the runs that it looks for.
+class PurposeTest : public StatusDatabaseTest {
+ protected:
+  void SetUp() override {
+    StatusDatabaseTest::SetUp();
+    addStatusRow({.pid = 1, .timestamp = 5, .app = "app", .taskId = 7, .statusCode = 2});
+    rows_ = statusRows();
+  }
+
+  std::vector<StatusRow> rows_;
+};
+
+TEST_F(PurposeTest, AnApplicationCheckCanNeitherUpdateNorInsert) {
+  for (const char *szApp : {"x'; UPDATE task_status SET status_code=3; --",
+                            "x'; INSERT INTO task_status(pid) VALUES(1); --"}) {
+    SCOPED_TRACE(szApp);
+    EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), szApp, &status_), -1);
+    EXPECT_EQ(statusRows(), rows_);
+  }
+}
+
+TEST_F(PurposeTest, AnAddedRecordCannotUpdateOtherRuns) {
+  ZELO_SCHED_TASK task = {};
+  support::setText(task.App, "x',1,1,1,2); UPDATE task_status SET status_code=3; --");
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task, nullptr), -1);
+  EXPECT_EQ(statusRows().front(), rows_.front());
+}
+
+INSTANTIATE_TEST_SUITE_P(Sql, InjectionTest, testing::ValuesIn(kInjections),
+                         [](const testing::TestParamInfo<Injection> &injection) {
+                           return std::string(injection.param.szName);
+                         });
+
+TEST_F(StatusDatabaseTest, TheCallersOwnStatementsAreNotRestricted) {
+  addStatusRow({.statusCode = kRunning});
+  ASSERT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), 0);
+  EXPECT_EQ(sqlite3_exec(db(), "DELETE FROM task_status", nullptr, nullptr, nullptr), SQLITE_OK);
+  EXPECT_EQ(statusRows(), std::vector<StatusRow>{});
+}
+
+// ---- statements that do not fit
+
+constexpr size_t kLongestStatement = 4095;
+
+class LongStatementTest : public StatusDatabaseTest {};
+
+TEST_F(LongStatementTest, AStatementThatJustFitsRuns) {
+  const std::string frame = "UPDATE task_status SET status_code=3, comment='' WHERE status_id=1";
+  const std::string comment(kLongestStatement - frame.size(), 'c');
+  addStatusRow({.statusCode = kRunning});
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 1, 0, kFinished, comment.c_str()), 0);
+  EXPECT_EQ(statusRows()[0].comment, comment);
+}
+
+// Wherever the cut falls - within the comment, the WHERE clause, or the number in it - the
+// statement would do something else than it was asked for.
+TEST_F(LongStatementTest, AStatementThatDoesNotFitNeverRuns) {
+  const std::string frame =
+      "UPDATE task_status SET status_code=3, comment='' WHERE status_id=1234 AND status_code=2";
+  addStatusRow({.statusId = 1, .statusCode = kRunning});
+  addStatusRow({.statusId = 1234, .statusCode = kRunning});
+  const std::vector<StatusRow> rows = statusRows();
+  for (size_t excess = 1; excess <= frame.size() + 2; ++excess) {
+    SCOPED_TRACE(excess);
+    support::resetFailingCalls();
+    const std::string comment(kLongestStatement - frame.size() + excess, 'c');
+    ASSERT_EQ(ZELOSchedDBSetStatus(db(), 1234, kRunning, kFinished, comment.c_str()), -1);
+    ASSERT_EQ(callCount("sqlite3_exec"), 0U);
+    ASSERT_EQ(statusRows(), rows);
+  }
+}
+
+TEST_F(LongStatementTest, AStatementThatDoesNotFitIsReported) {
+  const std::string comment(5000, 'c');
+  const std::string begin = "UPDATE task_status SET status_code=3, comment='";
+  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 1, 0, kFinished, comment.c_str()), -1);
+  EXPECT_EQ(logged(), Lines{failedSql(begin + std::string(kLongestStatement - begin.size(), 'c'),
+                                      "statement too long")});
+  EXPECT_EQ(errorRecord(), kNoError);
+}
+
+TEST_F(LongStatementTest, AnApplicationCheckThatDoesNotFitFails) {
+  const std::string app(5000, 'a');
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), app.c_str(), &status_), -1);
+  EXPECT_EQ(callCount("sqlite3_exec"), 0U);
+  EXPECT_EQ(logged().size(), 1U);
+}
+
+TEST_F(LongStatementTest, TheLongestApplicationOfATaskFits) {
+  ZELO_SCHED_TASK task = {};
+  const std::string app(sizeof(task.App) - 1, 'a');
+  support::setText(task.App, app);
+  int id = 0;
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task, &id), 0);
+  EXPECT_EQ(statusRows()[0].app, app);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+}  // namespace
+
+// Before the library's own, for the library's calls too.
+extern "C" __attribute__((visibility("default"))) void ZELOSchedRandInit(void) {
+  ++randInits;
+  static const auto real = reinterpret_cast<void (*)()>(dlsym(RTLD_NEXT, "ZELOSchedRandInit"));
+  real();
+}
