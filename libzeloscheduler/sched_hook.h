@@ -23,13 +23,18 @@ class SchedHook {
     }
   }
 
-  // Also for a hook that is not live: that the plugins could not be told is logged too.
+  // Also for a hook that is not live: that the plugins could not be told is logged too. Why the
+  // change failed stays in the error record, whatever the plugins do.
   void after(int result, SchedPlace place) {
+    const SchedErrorRecord reason;
     plugin_.result = result;
     if (ZELOSchedTaskPlugin(ZELO_SCHED_PLUGIN_POST, &plugin_) < 0) {
       SCHED_LOG_AT(place, "Fail to execute task plugin (POST)");
     }
     ZELOSchedTaskPluginExit(&plugin_);
+    if (result < 0) {
+      reason.restore();
+    }
   }
 
  private:

@@ -7,6 +7,7 @@
 #include <zelocore.h>
 
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
 
 enum SchedError : int {
@@ -52,6 +53,20 @@ struct SchedPlace {
   SCHED_LOG_CALLEE_AT(SCHED_HERE, format __VA_OPT__(, ) __VA_ARGS__)
 
 #define SCHED_SET_ERROR(code) QLIBCErrSetEx((code), __FILE_NAME__, __LINE__)
+
+// Keeps the error record of a failure while what follows it may set another.
+class SchedErrorRecord {
+ public:
+  SchedErrorRecord() : code_(QLIBCErrGet()), line_(QLIBCErrorGetLine()) {
+    snprintf(file_, sizeof(file_), "%s", QLIBCErrorGetFile());
+  }
+  void restore() const { QLIBCErrSetEx(code_, file_, line_); }
+
+ private:
+  int code_;
+  int line_;
+  char file_[256];
+};
 
 #define SCHED_REPORT_BAD_ARGUMENT(text)                 \
   do {                                                  \

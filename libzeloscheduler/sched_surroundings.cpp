@@ -70,12 +70,17 @@ class Environment {
   bool whole_ = true;
 };
 
-bool installEnvironment(const ZELOUSER &user) {
+// Without a user record, which only a run that needed no switch of users can be, the command starts
+// with what does not depend on it.
+bool installEnvironment(const ZELOUSER *user) {
   Environment environment;
-  environment.addVariable("HOME", user.szHome);
-  environment.addVariable("USER", user.szName);
-  environment.addVariable("LOGNAME", user.szName);
-  environment.addVariable("SHELL", user.szShell[0] != '\0' ? user.szShell : kDefaultShell);
+  environment.addVariable("HOME", user != nullptr ? user->szHome : kRootDirectory);
+  if (user != nullptr) {
+    environment.addVariable("USER", user->szName);
+    environment.addVariable("LOGNAME", user->szName);
+  }
+  const bool hasShell = user != nullptr && user->szShell[0] != '\0';
+  environment.addVariable("SHELL", hasShell ? user->szShell : kDefaultShell);
   for (const char *szName : kKeptVariables) {
     const char *szValue = getenv(szName);
     if (szValue != nullptr) {
@@ -85,8 +90,25 @@ bool installEnvironment(const ZELOUSER &user) {
   return environment.install();
 }
 
+bool enterHome(const ZELOUSER *user) {
+  return (user != nullptr && chdir(user->szHome) == 0) || chdir(kRootDirectory) == 0;
+}
+
+// One by one where the kernel, or a filter on its calls, does not know the call for all at once.
+bool closeOneByOne(unsigned first, unsigned last) {
+  const long most = sysconf(_SC_OPEN_MAX);
+  if (most < 0) {
+    return false;
+  }
+  for (unsigned descriptor = first; descriptor <= last && descriptor < static_cast<unsigned>(most);
+       ++descriptor) {
+    close(static_cast<int>(descriptor));
+  }
+  return true;
+}
+
 bool closeDescriptors(unsigned first, unsigned last) {
-  return first > last || close_range(first, last, 0) == 0;
+  return first > last || close_range(first, last, 0) == 0 || closeOneByOne(first, last);
 }
 
 bool closeCallersDescriptors() {
@@ -123,16 +145,13 @@ void resetSignals() {
 
 int schedSetSurroundings(uid_t uid) {
   const UserGuard user = schedLookUpUser(uid, SCHED_HERE);
-  if (user == nullptr) {
-    return -1;
-  }
-  if (!installEnvironment(*user)) {
+  if (!installEnvironment(user.get())) {
     SCHED_LOG_ERRNO("Failed to set environment: [%u] ", uid);
     SCHED_SET_ERROR(kErrSystem);
     return -1;
   }
   umask(kFileModeMask);
-  if (chdir(user->szHome) != 0 && chdir(kRootDirectory) != 0) {
+  if (!enterHome(user.get())) {
     SCHED_LOG_ERRNO("Failed to change directory: [%u] ", uid);
     SCHED_SET_ERROR(kErrSystem);
     return -1;

@@ -72,24 +72,35 @@ bool isAllowed(Purpose purpose, int action, const char *szFirst, const char *szS
   }
 }
 
-int authorize(void *purpose, int action, const char *szFirst, const char *szSecond, const char *,
-              const char *) {
-  return isAllowed(*static_cast<const Purpose *>(purpose), action, szFirst, szSecond) ? SQLITE_OK
-                                                                                      : SQLITE_DENY;
-}
-
+// For one attempt at one statement.
 class RestrictedConnection {
  public:
-  RestrictedConnection(sqlite3 *db, Purpose purpose) : db_(db), purpose_(purpose) {
-    sqlite3_set_authorizer(db_, authorize, &purpose_);
+  RestrictedConnection(sqlite3 *db, Purpose purpose)
+      : db_(db), purpose_(purpose), changesBefore_(sqlite3_total_changes(db)) {
+    sqlite3_set_authorizer(db_, authorize, this);
   }
   ~RestrictedConnection() { sqlite3_set_authorizer(db_, nullptr, nullptr); }
   RestrictedConnection(const RestrictedConnection &) = delete;
   RestrictedConnection &operator=(const RestrictedConnection &) = delete;
 
  private:
+  static int authorize(void *context, int action, const char *szFirst, const char *szSecond,
+                       const char *, const char *) {
+    auto *self = static_cast<RestrictedConnection *>(context);
+    return self->isFirstStatement() && isAllowed(self->purpose_, action, szFirst, szSecond)
+               ? SQLITE_OK
+               : SQLITE_DENY;
+  }
+
+  // Once a row is in, whatever is compiled next is not ours. It could be a REPLACE, which takes the
+  // place of other rows and looks like any INSERT here.
+  bool isFirstStatement() const {
+    return purpose_ != Purpose::kInsert || sqlite3_total_changes(db_) == changesBefore_;
+  }
+
   sqlite3 *db_;
   Purpose purpose_;
+  int changesBefore_;
 };
 
 // Random, so that processes which collided do not collide again.
@@ -108,8 +119,8 @@ void reportFailedStatement(const char *szSql, const char *szError) {
 }
 
 int execute(sqlite3 *db, Purpose purpose, const char *szSql, RowCallback takeRow, void *context) {
-  const RestrictedConnection restricted(db, purpose);
   for (int retries = 0;; ++retries) {
+    const RestrictedConnection restricted(db, purpose);
     char *szError = nullptr;
     if (sqlite3_exec(db, szSql, takeRow, context, &szError) == SQLITE_OK) {
       return 0;

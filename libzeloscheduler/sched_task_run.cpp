@@ -322,7 +322,10 @@ struct RunResult {
 int runByBackend(ZELO_SCHED_TASK *pTask, RunResult *result) {
   const int index = schedFindBackend(pTask->Backend, &ZELO_SCHED_BACKEND::run);
   if (index < 0) {
-    return 0;  // nobody runs it: recorded as it is, without a status
+    SCHED_LOG("No %s backend (%ld) is found for task [%ld] ", "run",
+              static_cast<long>(pTask->Backend), static_cast<long>(pTask->ID));
+    SCHED_SET_ERROR(kErrNotFound);
+    return 0;  // recorded all the same, without a status
   }
   if (SchedBackends[index].run(pTask, &result->statusCode, result->szComment,
                                sizeof(result->szComment)) < 0) {

@@ -881,6 +881,28 @@ TEST_F(StoreTest, TheDefaultTaskHasEveryFieldSet) {
   EXPECT_STREQ(task->Week, "1111111");
   EXPECT_EQ(task->State, ZELO_SCHED_STATE_ENABLED);
   EXPECT_EQ(task->Type, ZELO_SCHED_TYPE_DAILY);
+  EXPECT_STREQ(task->NextTriggerTime, "");
+}
+
+TEST_F(StoreTest, ADefaultTaskWhoseCommandCannotBeDecodedIsReported) {
+  const Task task = makeTask("", "");
+  fail("ZELOEncodingBase64Decode", "", {.code = kInjectedCode});
+  EXPECT_EQ(backend_.get_default(task.get()), -1);
+  EXPECT_EQ(logged(), Lines{backendLine("Base64 decoding failed. [] " + kInjected)});
+}
+
+// What was copied from under another process's copy would lose the other tasks.
+TEST_F(StoreTest, ACopyThatIsNotAsLongAsTheStoreIsTakenAgain) {
+  create("first");
+  create("second");
+  support::resetFailingCalls();
+  failCallFor("QLIBCExec", std::string(kStore) + " " + scratchPath(), {.result = 0});
+  create("third");
+  Ids ids = listedIds();
+  std::sort(ids.begin(), ids.end());
+  EXPECT_EQ(ids, (Ids{1, 2, 3}));
+  const Lines execs = recordedExecs();
+  EXPECT_EQ(std::count(execs.begin(), execs.end(), copyCommand(kStore, scratchPath())), 2);
 }
 
 TEST_F(StoreTest, TheDefaultTaskIsNamedAfterTheNextFreeIdAndStaysNew) {

@@ -217,6 +217,17 @@ TEST_F(TaskEditTest, NothingIsChangedWhenPluginsCannotBePrepared) {
                    "sched_task_plugin.cpp:N Fail to do plugin exit[0x0D00 plugin.cpp:N]"}));
   EXPECT_EQ(fakes.calls().back(), "get_by_id 0 id 7");
   EXPECT_EQ(hookCalls(), (Lines{"init task_scheduler task_edit", "exit"}));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, support::kInjectedFile}));
+}
+
+TEST_F(TaskEditTest, WhyAnEditFailedOutlivesAPluginThatFailsToo) {
+  FakeBackends fakes(1);
+  holdTask(&fakes);
+  fakes[0].edit = -7;
+  support::installPlugin("failing", "exit 1");
+  ZELO_SCHED_TASK task = taskOf(kFirst, 7);
+  EXPECT_EQ(ZELOSchedTaskEdit(&task), -7);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{support::kFakeError, support::kFakeFile}));
 }
 
 TEST_F(TaskEditTest, InstalledPluginsSeeTheStoreBeforeAndAfterTheChange) {

@@ -197,4 +197,13 @@ TEST_F(TaskRemoveTest, ARemovedTaskIsGoneAndTheOthersStay) {
   EXPECT_STREQ(support::loadTask(second)->Name, "second");
 }
 
+TEST_F(TaskRemoveTest, WhyARemovalFailedOutlivesAPluginThatFailsToo) {
+  FakeBackends fakes(1);
+  fakes[0].get_by_id = 1;
+  fakes[0].remove = -7;
+  support::installPlugin("failing", "exit 1");
+  EXPECT_EQ(ZELOSchedTaskRemove(7), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{support::kFakeError, support::kFakeFile}));
+}
+
 }  // namespace

@@ -15,6 +15,7 @@
 
 #include "captured_log.h"
 #include "failing_calls.h"
+#include "fake_backends.h"
 #include "fake_clock.h"
 #include "fifos.h"
 #include "shared_memory.h"
@@ -786,10 +787,8 @@ TEST_F(TaskRunTest, ALockThatCannotBeReleasedLeavesItsCodeAndTheRunGoesOn) {
     failCall("ZELOUserGetByUID");
     useBackendRun([](ZELO_SCHED_TASK *, int *, char *, size_t) { return 0; });
     runToEnd(id);
-    EXPECT_EQ(
-        logged(),
-        (Lines{"sched_surroundings.cpp:N Get uid [0] failed. [0x0500 sched_task_run.cpp:N]",
-               runLine("Failed to set user context. uid:[0] [0x0500 sched_task_run.cpp:N]")}));
+    EXPECT_EQ(logged(),
+              Lines{"sched_surroundings.cpp:N Get uid [0] failed. [0x0500 sched_task_run.cpp:N]"});
   }
 }
 
@@ -1077,7 +1076,7 @@ TEST_F(TaskRunTest, WithoutABackendNothingRunsAndTheCodeStaysZero) {
   const long id = saveRanTask();
   SchedBackends[0].run = nullptr;
   runToEnd(id);
-  EXPECT_EQ(logged(), Lines{});
+  EXPECT_EQ(logged(), Lines{runLine("No run backend (-2) is found for task [1] ")});
   EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_NONE);
   expectNothingRan();
 }
@@ -1190,13 +1189,37 @@ TEST_F(UserContextTest, AUserLookUpThatFailsMakesNoSwitch) {
   expectNothingRan();
 }
 
-TEST_F(UserContextTest, ALookUpForTheSurroundingsThatFailsRunsNothing) {
+// The rights are given up by then; what is missing is only where to start.
+TEST_F(UserContextTest, ALookUpForTheSurroundingsThatFailsLeavesThemBare) {
   REQUIRE_OTHER_USERS();
-  const long id = saveOwnedTask();
+  Task task = makeTask("task", "env > /tmp/bare; pwd >> /tmp/bare");
+  task->Owner = kOwner;
+  const long id = save(task);
   failCallFor("ZELOUserGetByUID", std::to_string(kOwner), {.from = 2, .code = kInjectedCode});
   runToEnd(id);
-  EXPECT_EQ(logged(), (Lines{"sched_surroundings.cpp:N Get uid [4242] failed. " + kInjected,
-                             runLine("Failed to set user context. uid:[4242] " + kInjected)}));
+  EXPECT_EQ(logged(), Lines{"sched_surroundings.cpp:N Get uid [4242] failed. " + kInjected});
+  EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
+  const std::string bare = readFile("/tmp/bare");
+  EXPECT_NE(bare.find("HOME=/\n"), std::string::npos) << bare;
+  EXPECT_NE(bare.find("SHELL=/bin/sh\n"), std::string::npos) << bare;
+  EXPECT_EQ(bare.find("USER="), std::string::npos) << bare;
+  EXPECT_TRUE(bare.ends_with("\n/\n")) << bare;
+}
+
+TEST_F(TaskRunTest, ATaskOfTheCallersOwnUserRunsWithoutAUserRecord) {
+  const long id = saveRanTask();
+  failCall("ZELOUserGetByUID", {.times = kAlways, .code = kInjectedCode});
+  runToEnd(id);
+  EXPECT_TRUE(ran());
+  EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
+}
+
+TEST_F(TaskRunTest, BackendsThatCannotBeRegisteredInTheChildEndTheRun) {
+  const long id = saveRanTask();
+  support::failBackendInit(2);
+  runToEnd(id);
+  support::failBackendInit(0);
+  EXPECT_EQ(logged(), Lines{runLine("Init backend failed. [0x0000 :N]")});
   EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_RUNNING);
   expectNothingRan();
 }
@@ -1283,14 +1306,16 @@ TEST_F(UserContextTest, ABackendThatFailsIsFollowedByTheWayBack) {
   EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_RUNNING);
 }
 
-TEST_F(UserContextTest, DescriptorsThatCannotBeClosedEndTheRunBeforeItBegins) {
-  const long id = saveRanTask();
-  failCall("close_range", {.error = ENOMEM});
+// An old kernel, or a filter on system calls.
+TEST_F(TaskRunTest, WithoutTheCallForAllTheDescriptorsAreClosedOneByOne) {
+  const long id = save(makeTask("task", "ls /proc/self/fd > /tmp/run_test.ran"));
+  const int open[] = {dup(0), dup(0), dup(0)};
+  failCall("close_range", {.times = kAlways, .error = ENOSYS});
   runToEnd(id);
-  EXPECT_EQ(logged(),
-            Lines{"sched_surroundings.cpp:N Failed to close descriptors. Cannot allocate memory"});
-  EXPECT_FALSE(fileExists(kStatusDatabase));
-  expectNothingRan();
+  for (const int descriptor : open) close(descriptor);
+  EXPECT_EQ(logged(), Lines{});
+  // 3 is the directory that ls reads.
+  EXPECT_EQ(readFile(kRanFile), "0\n1\n2\n3\n");
 }
 
 }  // namespace

@@ -252,14 +252,15 @@ class ScratchFile {
   ScratchFile &operator=(const ScratchFile &) = delete;
 
   const char *path() const { return path_; }
-  bool isEmpty() const {
-    struct stat info = {};
-    return stat(path_, &info) == 0 && info.st_size == 0;
-  }
 
  private:
   char path_[64];
 };
+
+off_t sizeOf(const char *szPath) {
+  struct stat info = {};
+  return stat(szPath, &info) == 0 ? info.st_size : 0;
+}
 
 int copyFile(const char *szSource, const char *szTarget) {
   if (QLIBCExec(kCopyProgram, "-f", szSource, szTarget, nullptr) != 0) {
@@ -269,8 +270,9 @@ int copyFile(const char *szSource, const char *szTarget) {
   return 0;
 }
 
-// A forced copy empties its target before it fills it. An empty scratch file has therefore most
-// likely been taken from under another process's copy: to build on it would lose every other task.
+// A forced copy empties its target before it fills it. A scratch file that is empty, or shorter or
+// longer than the working copy, has therefore most likely been taken from under another process's
+// copy: to build on it would lose other tasks.
 int copyWorkingCopy(const ScratchFile &scratch) {
   constexpr int kTries = 20;
   constexpr useconds_t kPause = 5000;
@@ -278,7 +280,8 @@ int copyWorkingCopy(const ScratchFile &scratch) {
     if (copyFile(kWorkingCopy, scratch.path()) < 0) {
       return -1;
     }
-    if (!scratch.isEmpty()) {
+    const off_t size = sizeOf(scratch.path());
+    if (size > 0 && size == sizeOf(kWorkingCopy)) {
       return 0;
     }
     usleep(kPause);
@@ -613,13 +616,16 @@ int create(ZELO_SCHED_TASK *pTask) {
   if (next_id(&id) < 0) {
     return -1;
   }
-  if (pTask->Name[0] == '\0') {
+  const bool isNamed = pTask->Name[0] != '\0';
+  if (!isNamed) {
     snprintf(pTask->Name, sizeof(pTask->Name), "Task %ld", id);
   }
   const int32_t formerId = pTask->ID;
   pTask->ID = static_cast<int32_t>(id);
   if (storeTask(pTask) < 0) {
-    pTask->ID = formerId;  // still a new task: saving it again must create it, not edit another's
+    // Still a new task: saving it again must create it, not edit the one that has the id by then.
+    pTask->ID = formerId;
+    pTask->Name[0] = isNamed ? pTask->Name[0] : '\0';
     return -1;
   }
   return syncAfterChange();
@@ -684,6 +690,7 @@ int get_default(ZELO_SCHED_TASK *pTask) {
       return -1;
     }
   }
+  pTask->NextTriggerTime[0] = '\0';
   return schedFillTaskFromHash(pTask, hash.get(), SCHED_HERE);
 }
 

@@ -14,8 +14,9 @@
  *  3. Results. 0 or a count that is not negative for success, -1 for failure.
  *     A lookup that may find nothing: 1 found, 0 not found, -1 error.
  *  4. Reasons. A failure leaves code, file and line in the platform's error
- *     record (QLIBCErrGet and its kin) and one line in the system log at
- *     priority error that begins with the file and the line. The codes:
+ *     record (QLIBCErrGet and its kin) and, but where a function says
+ *     otherwise, a line in the system log at priority error that begins with
+ *     the file and the line. The codes:
  *     0x0100 array allocation, 0x0200 record allocation, 0x0400 run lock not
  *     taken, 0x0500 run lock not released, 0x0900 file or database not opened,
  *     0x0B00 read or write failed, 0x0D00 bad argument, 0x2000 not found,
@@ -185,7 +186,7 @@ ZELO_SCHED_API int ZELOSchedTaskIsBuildInApp(const ZELO_SCHED_TASK *pTask);
  * ascending and reverse it descending. Text fields sort byte by byte. A number
  * or an enumeration orders the records by where they lie in memory, not by its
  * value. 0, also for an empty list, or -1: 0x0D00 for a null argument, 0x0100
- * when memory is short, no code for a key that no field has. */
+ * when memory is short, no code and no log line for a key that no field has. */
 ZELO_SCHED_API int ZELOSchedTaskListSort(ZELO_SCHED_TASK **pTaskList, const char *szKey,
                                          int direction);
 
@@ -204,8 +205,8 @@ ZELO_SCHED_API int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_T
 /* Fills the task from a hash; `next`, `Backend` and `NextTriggerTime` are left
  * alone. "id", "run hour", "run min", "name", "app", "app name", "action",
  * "cmd", "state" and "type" must be there, the rest have defaults. 0, or -1:
- * 0x0D00, 0x4000 when a number has trailing characters, or what the platform
- * left, with the record partly filled. */
+ * 0x0D00, 0x4000 when a number without a sign ("owner", "run hour", ...) has
+ * trailing characters, or what the platform left, with the record partly filled. */
 ZELO_SCHED_API int ZELOSchedInitTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash);
 
 /* ---- enumerations ----------------------------------------------------------- */
@@ -333,7 +334,8 @@ ZELO_SCHED_API int ZELOSchedTaskPluginInit(ZELO_SCHED_PLUGIN *pPlugin, const cha
 
 /* Runs the plugins for PRE or POST. The platform's verdict (below 0 when one
  * failed), or -1: 0x0D00 without tasks, no code for a context that was not
- * initialised. */
+ * initialised, what the platform left when an argument could not be set; none of
+ * these is logged. */
 ZELO_SCHED_API int ZELOSchedTaskPlugin(int action, ZELO_SCHED_PLUGIN *pPlugin);
 
 /* Releases what the platform holds for the context. 0, or -1. */
@@ -377,7 +379,9 @@ ZELO_SCHED_API int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled)
 extern ZELO_SCHED_API FILE *pfLock;
 
 /* Opens the status database, creating it when it is missing. The caller closes
- * it with sqlite3_close. Null on failure: 0x0900 when it cannot be opened. */
+ * it with sqlite3_close; an authorizer of its own on the connection is gone
+ * after the calls below. Null on failure: 0x0900 when it cannot be opened, no
+ * code, and the connection left open, when the table cannot be created. */
 ZELO_SCHED_API sqlite3 *ZELOSchedDBInit(void);
 
 /* Looks for a run of the task, or of any task of the application, that is still
@@ -388,8 +392,8 @@ ZELO_SCHED_API int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp,
                                            ZELO_SCHED_STATUS *pStatus);
 
 /* Records a run of the task by this process, starting now. pStatusID, which may
- * be null, receives the row's key. 0, or -1: 0x0D00, 0x0B00 when the row cannot
- * be read back, no code when a statement failed. */
+ * be null, receives the row's key. 0, or -1: 0x0D00, 0x0B00, not logged, when the
+ * row cannot be read back, no code when a statement failed. */
 ZELO_SCHED_API int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatusID);
 
 /* Sets code and comment (null or empty: the comment stays) of the row with that

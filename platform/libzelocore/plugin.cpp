@@ -208,6 +208,7 @@ bool RunPlugin(const std::string &path, const Context &context, const char *stag
   }
   if (!EndsInTime(pid)) {
     kill(-pid, SIGKILL);
+    kill(pid, SIGKILL); /* it may have left its group */
   }
   int status = 0;
   return zelo::WaitForChild(pid, &status) && zelo::ExitCode(status) == 0;

@@ -1,0 +1,174 @@
+// Long lists: their records come from slabs, and go back one by one, in any order.
+#include <gtest/gtest.h>
+#include <sys/mman.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <random>
+#include <set>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "sandbox_fixture.h"
+#include "zelosched.h"
+
+namespace {
+
+using support::errorRecord;
+using support::ErrorRecord;
+using support::logged;
+using Lines = std::vector<std::string>;
+
+bool slabsFail = false;
+constexpr size_t kSmallestSlab = size_t{1} << 22;
+
+}  // namespace
+
+extern "C" __attribute__((visibility("default"))) void *mmap(void *address, size_t length,
+                                                             int protection, int flags,
+                                                             int descriptor,
+                                                             off_t offset) noexcept {
+  if (slabsFail && length >= kSmallestSlab) {
+    errno = ENOMEM;
+    return MAP_FAILED;
+  }
+  return mmap64(address, length, protection, flags, descriptor, offset);
+}
+
+namespace {
+
+// Two slabs and a part of a third.
+constexpr int kMany = 500;
+
+class LongListTest : public support::SandboxTest {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    slabsFail = false;
+  }
+  void TearDown() override {
+    slabsFail = false;
+    SandboxTest::TearDown();
+  }
+
+  static void storeTasks(int count) {
+    std::string text;
+    for (int id = 1; id <= count; ++id) {
+      const std::string number = std::to_string(id);
+      text += "[" + number + "]\nid=" + number + "\nname=task " + number +
+              "\nrun hour=8\nrun min=30\napp=a\napp name=b\naction=c\ncmd=\nstate=enabled\n"
+              "type=daily\n";
+    }
+    support::writeFile(support::kStore, text);
+  }
+
+  static std::vector<ZELO_SCHED_TASK *> listed(ZELO_SCHED_TASK_FILTER filter = nullptr) {
+    ZELO_SCHED_TASK *task = nullptr;
+    ZELOSchedTaskListGet(&task, filter);
+    std::vector<ZELO_SCHED_TASK *> tasks;
+    for (; task != nullptr; task = ZELOSchedTaskNext(task)) tasks.push_back(task);
+    return tasks;
+  }
+
+  static std::set<int> idsOf(const std::vector<ZELO_SCHED_TASK *> &tasks) {
+    std::set<int> ids;
+    for (const ZELO_SCHED_TASK *task : tasks) ids.insert(task->ID);
+    return ids;
+  }
+
+  static void freeAll(const std::vector<ZELO_SCHED_TASK *> &tasks) {
+    for (ZELO_SCHED_TASK *task : tasks) EXPECT_EQ(ZELOSchedTaskFree(task), 0);
+  }
+};
+
+TEST_F(LongListTest, EveryTaskHasARecordOfItsOwn) {
+  storeTasks(kMany);
+  const std::vector<ZELO_SCHED_TASK *> tasks = listed();
+  EXPECT_EQ(tasks.size(), size_t{kMany});
+  EXPECT_EQ(idsOf(tasks).size(), size_t{kMany});
+  for (const ZELO_SCHED_TASK *task : tasks) {
+    EXPECT_EQ("task " + std::to_string(task->ID), task->Name);
+  }
+  freeAll(tasks);
+}
+
+TEST_F(LongListTest, RecordsMayBeFreedInAnyOrderWhileTheOthersStand) {
+  storeTasks(kMany);
+  std::vector<ZELO_SCHED_TASK *> tasks = listed();
+  std::shuffle(tasks.begin(), tasks.end(), std::mt19937(7));
+  while (!tasks.empty()) {
+    ZELOSchedTaskFree(tasks.back());
+    tasks.pop_back();
+    if (tasks.size() % 50 == 0) {
+      for (const ZELO_SCHED_TASK *task : tasks) {
+        ASSERT_EQ("task " + std::to_string(task->ID), task->Name);
+      }
+    }
+  }
+}
+
+TEST_F(LongListTest, TwoListsAndASingleRecordDoNotGetInEachOthersWay) {
+  storeTasks(kMany);
+  const std::vector<ZELO_SCHED_TASK *> first = listed();
+  ZELO_SCHED_TASK *single = ZELOSchedTaskAlloc();
+  const std::vector<ZELO_SCHED_TASK *> second = listed();
+  freeAll(first);
+  EXPECT_EQ(idsOf(second).size(), size_t{kMany});
+  EXPECT_EQ(ZELOSchedTaskFree(single), 0);
+  freeAll(second);
+}
+
+TEST_F(LongListTest, ARecordThatIsFilteredOutIsUsedForTheNextTask) {
+  storeTasks(kMany);
+  const std::vector<ZELO_SCHED_TASK *> tasks =
+      listed([](const ZELO_SCHED_TASK *task) { return task->ID % 100 == 0 ? 1 : 0; });
+  EXPECT_EQ(idsOf(tasks), (std::set<int>{100, 200, 300, 400, 500}));
+  freeAll(tasks);
+}
+
+TEST_F(LongListTest, AListIsInTheOrderOfMemoryWhichASortByNumberKeeps) {
+  storeTasks(kMany);
+  ZELO_SCHED_TASK *head = nullptr;
+  ASSERT_EQ(ZELOSchedTaskListGet(&head, nullptr), kMany);
+  ZELOSchedTaskListSort(&head, "id", 1);
+  for (const ZELO_SCHED_TASK *task = head; task->next != nullptr; task = task->next) {
+    ASSERT_LT(task, task->next);
+  }
+  ZELOSchedTaskListFree(&head);
+  EXPECT_EQ(head, nullptr);
+}
+
+TEST_F(LongListTest, WithoutRoomForASlabRecordsAreTakenOneByOne) {
+  storeTasks(kMany);
+  slabsFail = true;
+  const std::vector<ZELO_SCHED_TASK *> tasks = listed();
+  EXPECT_EQ(idsOf(tasks).size(), size_t{kMany});
+  EXPECT_EQ(logged(), Lines{});
+  freeAll(tasks);
+}
+
+TEST_F(LongListTest, WithoutRoomForARecordEitherTheListFails) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  storeTasks(kMany);
+  ASSERT_EQ(ZELOSchedBackendInit(), 0);
+  slabsFail = true;
+  ZELO_SCHED_TASK *head = nullptr;
+  const support::FailingAllocation scope(
+      "calloc", {.from = 300, .times = support::kAlways, .minSize = sizeof(ZELO_SCHED_TASK)});
+  EXPECT_EQ(SchedBackends[0].list_get(&head, nullptr), -1);
+  EXPECT_EQ(head, nullptr);
+  EXPECT_EQ(logged(), Lines{"backend_zeloschedule.cpp:N malloc ZELO_SCHED_TASK failed. key:[300]"});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, "backend_zeloschedule.cpp"}));
+}
+
+// More ids than are first made room for.
+TEST_F(LongListTest, TheNextIdAfterThousandsIsFound) {
+  storeTasks(2500);
+  ZELO_SCHED_TASK *task = ZELOSchedTaskAlloc();
+  ASSERT_NE(task, nullptr);
+  EXPECT_STREQ(task->Name, "Task 2501");
+  ZELOSchedTaskFree(task);
+}
+
+}  // namespace
