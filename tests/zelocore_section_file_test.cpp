@@ -614,10 +614,12 @@ TEST_F(ZelocoreSectionFile, NullAndReservedArgumentsAreRefused) {
   EXPECT_TRUE(FailedWith(QLIBCFileSetSection(nullptr, "1", 0, hash, 0), code));
   EXPECT_TRUE(FailedWith(QLIBCFileSetSection(path, nullptr, 0, hash, 0), code));
   EXPECT_TRUE(FailedWith(QLIBCFileSetSection(path, "1", 0, nullptr, 0), code));
-  EXPECT_TRUE(FailedWith(QLIBCFileSetSection(path, "1", 1, hash, 0), code));
+  EXPECT_TRUE(FailedWith(QLIBCFileSetSection(path, "1", 2, hash, 0), code));
+  EXPECT_TRUE(FailedWith(QLIBCFileSetSection(path, "1", 0, hash, 1), code));
   EXPECT_TRUE(FailedWith(QLIBCFileAddSection(nullptr, "1", hash, 0), code));
   EXPECT_TRUE(FailedWith(QLIBCFileAddSection(path, nullptr, hash, 0), code));
   EXPECT_TRUE(FailedWith(QLIBCFileAddSection(path, "1", nullptr, 0), code));
+  EXPECT_TRUE(FailedWith(QLIBCFileAddSection(path, "1", hash, 2), code));
   EXPECT_TRUE(FailedWith(QLIBCFileRemoveSection(nullptr, "1"), code));
   EXPECT_TRUE(FailedWith(QLIBCFileRemoveSection(path, nullptr), code));
   EXPECT_TRUE(FailedWith(QLIBCFileTouch(nullptr), code));

@@ -15,6 +15,7 @@
 #include <string>
 #include <string_view>
 
+#include "read_file.h"
 #include "replace_file.h"
 #include "section_text.h"
 #include "support.h"
@@ -39,9 +40,6 @@ constexpr int kMostPauses = kCopyInProgress / kPause;
 constexpr int64_t kCoarseStamp = 2 * kSecond;
 /* Kernel clocks differ by a tick or two among themselves; this is far more. */
 constexpr int64_t kClockSlack = 2 * kSecond;
-
-/* Far above any store, and below what would exhaust the machine. */
-constexpr off_t kMostBytes = off_t{1} << 30;
 
 int64_t Nanoseconds(const timespec &time) noexcept {
   return time.tv_sec * kSecond + time.tv_nsec;
@@ -68,30 +66,6 @@ struct Snapshot {
   bool steady;        /* nobody wrote while it was read */
 };
 
-/* Reads up to the end of the file, which need not be where fstat saw it. */
-bool ReadAll(int fd, size_t expected, std::string *contents) {
-  constexpr size_t kLeastStep = 4096;
-  size_t filled = 0;
-  contents->resize(expected + 1); /* the one more sees the end without another step */
-  for (;;) {
-    if (filled == contents->size()) {
-      contents->resize(filled + filled / 2 + kLeastStep);
-    }
-    const ssize_t count = read(fd, contents->data() + filled, contents->size() - filled);
-    if (count < 0 && errno == EINTR) {
-      continue;
-    }
-    if (count < 0 || filled > static_cast<size_t>(kMostBytes)) {
-      return false;
-    }
-    if (count == 0) {
-      contents->resize(filled);
-      return true;
-    }
-    filled += static_cast<size_t>(count);
-  }
-}
-
 /* 0, or -1 (0x0900, 0x0B00). */
 int ReadSnapshot(const std::string &path, int flags, Snapshot *snapshot) {
   snapshot->opened = Now(CLOCK_REALTIME_COARSE);
@@ -107,7 +81,7 @@ int ReadSnapshot(const std::string &path, int flags, Snapshot *snapshot) {
     return Fail(QLIBC_ERR_OPEN);
   }
   struct stat after;
-  if (snapshot->status.st_size > kMostBytes ||
+  if (snapshot->status.st_size > kMostFileBytes ||
       !ReadAll(file.get(), static_cast<size_t>(snapshot->status.st_size), &snapshot->contents) ||
       fstat(file.get(), &after) != 0) {
     return Fail(QLIBC_ERR_IO);
@@ -239,6 +213,15 @@ int ReadOriginal(const char *path, Original *original) {
   return 0;
 }
 
+/* What the caller asked for by flags that were checked. */
+Durability DurabilityOf(int flags) noexcept {
+  return (flags & QLIBC_FILE_SYNC) != 0 ? Durability::kSynced : Durability::kNone;
+}
+
+bool AreKnownFlags(int flags) noexcept {
+  return (flags & ~QLIBC_FILE_SYNC) == 0;
+}
+
 bool HasWritableKeys(const QLIBC_SZHASH &hash) noexcept {
   for (const QLIBC_SZHASH::Entry &entry : hash.entries()) {
     if (!IsSectionKey(hash.Key(entry))) {
@@ -252,7 +235,8 @@ int Changed(int replaced) noexcept {
   return replaced < 0 ? -1 : 1;
 }
 
-int SetSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash) {
+int SetSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash,
+               Durability durability) {
   Original original;
   if (ReadOriginal(path, &original) < 0) {
     return -1;
@@ -261,15 +245,15 @@ int SetSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash
   if (section == nullptr) {
     return 0;
   }
-  return Changed(ReplaceFile(path, original.text->WithSet(*section, hash), &original.status,
-                             Durability::kNone));
+  return Changed(
+      ReplaceFile(path, original.text->WithSet(*section, hash), &original.status, durability));
 }
 
-int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash) {
+int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash,
+               Durability durability) {
   struct stat status;
   if (lstat(path, &status) != 0 && errno == ENOENT) {
-    return Changed(
-        ReplaceFile(path, SectionText({}).WithAdded(name, hash), nullptr, Durability::kNone));
+    return Changed(ReplaceFile(path, SectionText({}).WithAdded(name, hash), nullptr, durability));
   }
   Original original;
   if (ReadOriginal(path, &original) < 0) {
@@ -279,7 +263,7 @@ int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash
     return Fail(QLIBC_ERR_BAD_PARAMETER);
   }
   return Changed(
-      ReplaceFile(path, original.text->WithAdded(name, hash), &original.status, Durability::kNone));
+      ReplaceFile(path, original.text->WithAdded(name, hash), &original.status, durability));
 }
 
 int RemoveSection(const char *path, std::string_view name) {
@@ -340,19 +324,22 @@ int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHa
 
 int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PSZHASH pHash,
                         int reserved) {
-  if (szPath == nullptr || szSection == nullptr || pHash == nullptr || flags != 0 ||
-      reserved != 0 || !zelo::HasWritableKeys(*pHash)) {
+  if (szPath == nullptr || szSection == nullptr || pHash == nullptr ||
+      !zelo::AreKnownFlags(flags) || reserved != 0 || !zelo::HasWritableKeys(*pHash)) {
     return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return zelo::AtBoundary(-1, [&] { return zelo::SetSection(szPath, szSection, *pHash); });
+  return zelo::AtBoundary(
+      -1, [&] { return zelo::SetSection(szPath, szSection, *pHash, zelo::DurabilityOf(flags)); });
 }
 
-int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int reserved) {
-  if (szPath == nullptr || szSection == nullptr || pHash == nullptr || reserved != 0 ||
-      !zelo::IsSectionName(szSection) || !zelo::HasWritableKeys(*pHash)) {
+int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int flags) {
+  if (szPath == nullptr || szSection == nullptr || pHash == nullptr ||
+      !zelo::AreKnownFlags(flags) || !zelo::IsSectionName(szSection) ||
+      !zelo::HasWritableKeys(*pHash)) {
     return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return zelo::AtBoundary(-1, [&] { return zelo::AddSection(szPath, szSection, *pHash); });
+  return zelo::AtBoundary(
+      -1, [&] { return zelo::AddSection(szPath, szSection, *pHash, zelo::DurabilityOf(flags)); });
 }
 
 int QLIBCFileRemoveSection(const char *szPath, const char *szSection) {

@@ -108,6 +108,11 @@ int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList);
  * waits for nobody: it must be a copy of its own.
  */
 
+/* For the functions that change a file: the change is on the disk when the call
+ * returns, so that after a power cut the file is the old or the new one, never
+ * half of it and never empty. */
+enum { QLIBC_FILE_SYNC = 1 };
+
 /* 1 when the path exists, else 0. */
 int QLIBCFileExist(const char *szPath);
 /* Creates an empty file, or updates the times of an existing one. 0, or -1
@@ -125,7 +130,7 @@ int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHa
  * other sections keep every byte, and so do comments and blank lines right before
  * the next one. 1 when replaced, 0 when there is no such section (nothing is
  * written), -1 on failure (0x0D00, 0x0900, 0x0B00, 0x2800, 0x0200; the file is
- * as it was). The flags and `reserved` must be 0. A key must not be empty,
+ * as it was). The flags are 0 or QLIBC_FILE_SYNC, `reserved` must be 0. A key must not be empty,
  * begin with `[`, `#` or `;`, begin or end with a blank, or hold `=` or a
  * control byte (0x0D00). */
 int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PSZHASH pHash,
@@ -133,9 +138,22 @@ int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PS
 /* Appends a new section, to a new file when there is none. 1, or -1 as above
  * (0x0D00 also for a section that exists, and for a name that is empty, begins
  * or ends with a blank, or holds `]` or a control byte). */
-int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int reserved);
+int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int flags);
 /* Removes a section. 1 when removed, 0 when there is none, -1 on failure. */
 int QLIBCFileRemoveSection(const char *szPath, const char *szSection);
+
+/* ---- files of lines -------------------------------------------------------- */
+
+/* Changes the first line of any text file that holds szKey somewhere. Without a
+ * value (NULL) that line is removed; with one it is replaced by the value, which
+ * is appended as a new last line when no line holds the key. Every other line is
+ * kept byte for byte, and so are the file's owner and mode; the change is always
+ * on the disk when the call returns (QLIBC_FILE_SYNC), and a symbolic link is
+ * refused. 1 when the file was changed; 0 when there is nothing to remove, also
+ * when there is no file; -1 with the file as it was (0x0D00 for an empty key, a
+ * value with a line feed and for flags other than 0, 0x0900 also when there is no
+ * file to set a value in, 0x0B00, 0x2800, 0x0200). */
+int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue, int flags);
 
 /* ---- processes ------------------------------------------------------------ */
 

@@ -1,0 +1,58 @@
+/*
+ * Changing one line of a text file that other programs share.
+ */
+#include <string_view>
+
+#include "line_file.h"
+#include "support.h"
+
+namespace zelo {
+namespace {
+
+/* One that spans lines could never be found in one. */
+bool IsKey(const char *key) noexcept {
+  return key != nullptr && key[0] != '\0' && std::strchr(key, '\n') == nullptr;
+}
+
+bool IsValue(const char *value) noexcept {
+  return value == nullptr || std::strchr(value, '\n') == nullptr;
+}
+
+/* Whether the text changed. */
+bool Apply(std::string *text, std::string_view key, const char *value) {
+  const LineRange line = FindLine(*text, key);
+  if (line.found && value == nullptr) {
+    text->erase(line.begin, line.end - line.begin);
+  } else if (line.found) {
+    text->replace(line.begin, line.end - line.begin, std::string(value) + '\n');
+  } else if (value != nullptr) {
+    AppendLine(text, value);
+  } else {
+    return false;
+  }
+  return true;
+}
+
+int SetLine(const char *path, const char *key, const char *value) {
+  if (value == nullptr && QLIBCFileExist(path) == 0) {
+    return 0;
+  }
+  LineFile file;
+  if (ReadLineFile(path, &file) < 0) {
+    return -1;
+  }
+  if (!Apply(&file.text, key, value)) {
+    return 0;
+  }
+  return WriteLineFile(path, file) < 0 ? -1 : 1;
+}
+
+}  // namespace
+}  // namespace zelo
+
+int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue, int flags) {
+  if (szPath == nullptr || !zelo::IsKey(szKey) || !zelo::IsValue(szValue) || flags != 0) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] { return zelo::SetLine(szPath, szKey, szValue); });
+}

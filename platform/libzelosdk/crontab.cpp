@@ -1,0 +1,123 @@
+/*
+ * Lines of the system crontab, and the daemon that reads it.
+ */
+#include <signal.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdlib>
+#include <string>
+#include <string_view>
+
+#include "line_file.h"
+#include "support.h"
+#include "zelosdk.h"
+
+namespace zelo {
+namespace {
+
+constexpr char kCrontab[] = "/etc/crontab";
+constexpr char kCronPidFile[] = "/var/run/crond.pid";
+
+constexpr int kDaysOfWeek = 7;
+constexpr int32_t kEveryDay = 127;
+constexpr int32_t kLastHour = 23;
+constexpr int32_t kLastMinute = 59;
+
+/* ---- a line ---- */
+
+bool IsBetween(int32_t value, int32_t most) noexcept {
+  return value >= 0 && value <= most;
+}
+
+/* Cron would cut the command at a '%' and feed it the rest. */
+bool IsCommand(const char (&command)[1024]) noexcept {
+  const size_t length = strnlen(command, sizeof command);
+  return length > 0 && length < sizeof command &&
+         std::none_of(command, command + length, [](char c) {
+           return c == '%' || c == '\x7f' || static_cast<unsigned char>(c) < ' ';
+         });
+}
+
+bool IsValid(const ZELO_SCHEDULE &schedule) noexcept {
+  return IsBetween(schedule.weekdays, kEveryDay) && IsBetween(schedule.hour, kLastHour) &&
+         schedule.repeat == 0 && IsBetween(schedule.lastHour, kLastHour) &&
+         IsBetween(schedule.minute, kLastMinute) && schedule.reserved == 0 &&
+         IsCommand(schedule.szCommand);
+}
+
+std::string Weekdays(int32_t mask) {
+  if (mask == kEveryDay) {
+    return "*";
+  }
+  std::string list;
+  for (int day = 0; day < kDaysOfWeek; ++day) {
+    if ((mask >> day & 1) != 0) {
+      list += list.empty() ? "" : ",";
+      list += std::to_string(day);
+    }
+  }
+  return list;
+}
+
+std::string Line(const ZELO_SCHEDULE &schedule) {
+  return std::to_string(schedule.minute) + '\t' + std::to_string(schedule.hour) + "\t*\t*\t" +
+         Weekdays(schedule.weekdays) + "\troot\t" + schedule.szCommand;
+}
+
+int AddLine(const ZELO_SCHEDULE &schedule) {
+  LineFile crontab;
+  if (ReadLineFile(kCrontab, &crontab) < 0) {
+    return -1;
+  }
+  AppendLine(&crontab.text, Line(schedule));
+  return WriteLineFile(kCrontab, crontab);
+}
+
+/* ---- the daemon ---- */
+
+/* The daemon's process, 0 when there is none. A number that stands for a group of
+ * processes, for all of them or for the first must not be signalled, whoever
+ * wrote it there. */
+pid_t ProcessOf(const std::string &pid_file) noexcept {
+  constexpr int kDecimal = 10;
+  constexpr long kFirstProcess = 1;
+  constexpr long kMostProcesses = 1L << 22; /* the kernel's own limit */
+  const long pid = std::strtol(pid_file.c_str(), nullptr, kDecimal);
+  return pid > kFirstProcess && pid <= kMostProcesses ? static_cast<pid_t>(pid) : 0;
+}
+
+int Reload() {
+  if (QLIBCFileExist(kCronPidFile) == 0) {
+    return 0;
+  }
+  LineFile file;
+  if (ReadLineFile(kCronPidFile, &file) < 0) {
+    return -1;
+  }
+  const pid_t daemon = ProcessOf(file.text);
+  if (daemon != 0 && kill(daemon, SIGHUP) != 0 && errno != ESRCH) {
+    return Fail(QLIBC_ERR_SYSTEM);
+  }
+  return 0;
+}
+
+}  // namespace
+}  // namespace zelo
+
+int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
+  if (pSchedule == nullptr || (enabled != 0 && enabled != 1) || !zelo::IsValid(*pSchedule)) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  if (enabled == 0 || pSchedule->weekdays == 0) {
+    return 0;
+  }
+  return zelo::AtBoundary(-1, [&] { return zelo::AddLine(*pSchedule); });
+}
+
+int ZELOUpdateCrontab(const char *szCommand, int stop, int reload) {
+  if (szCommand == nullptr || stop != 0 || (reload != 0 && reload != 1)) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return reload == 0 ? 0 : zelo::AtBoundary(-1, [] { return zelo::Reload(); });
+}

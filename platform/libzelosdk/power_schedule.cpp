@@ -1,0 +1,179 @@
+/*
+ * The two lists of power times, in a section file of their own.
+ */
+#include "power_schedule.h"
+
+#include <algorithm>
+#include <charconv>
+#include <string>
+#include <string_view>
+
+#include "support.h"
+
+namespace zelo {
+namespace {
+
+constexpr char kFile[] = "/usr/zelo/etc/power_sched.conf";
+constexpr char kTimesKey[] = "times";
+/* By the number of the list. */
+constexpr const char *kSections[] = {"poweron", "poweroff"};
+constexpr int kMalformed = 0x4000;
+
+class Hash {
+ public:
+  Hash() : hash_(QLIBCSzHashAlloc(1)) {}
+  Hash(const Hash &) = delete;
+  Hash &operator=(const Hash &) = delete;
+  ~Hash() { QLIBCSzHashFree(hash_); }
+
+  bool valid() const noexcept { return hash_ != nullptr; }
+  PSZHASH get() const noexcept { return hash_; }
+  PSZHASH *address() noexcept { return &hash_; }
+
+ private:
+  PSZHASH hash_;
+};
+
+const char *SectionOf(int list) noexcept {
+  return list == ZELO_AUTOPOWER_ON || list == ZELO_AUTOPOWER_OFF ? kSections[list] : nullptr;
+}
+
+/* One byte of an entry: where it lies, and the largest value that it may have. */
+struct Field {
+  unsigned char ZELO_AUTOPOWER::*at;
+  unsigned char most;
+};
+constexpr Field kFields[] = {
+    {&ZELO_AUTOPOWER::enabled, 1},
+    {&ZELO_AUTOPOWER::weekdays, 127},
+    {&ZELO_AUTOPOWER::hour, 23},
+    {&ZELO_AUTOPOWER::minute, 59},
+};
+
+bool IsInRange(const ZELO_AUTOPOWER &entry) noexcept {
+  return std::all_of(std::begin(kFields), std::end(kFields),
+                     [&](const Field &field) { return entry.*field.at <= field.most; });
+}
+
+/* ---- the text of a list ---- */
+
+void SkipBlanks(std::string_view *text) noexcept {
+  while (!text->empty() && (text->front() == ' ' || text->front() == '\t')) {
+    text->remove_prefix(1);
+  }
+}
+
+bool TakeByte(std::string_view *text, unsigned char *byte) noexcept {
+  SkipBlanks(text);
+  const auto [end, error] = std::from_chars(text->data(), text->data() + text->size(), *byte);
+  if (error != std::errc()) {
+    return false;
+  }
+  text->remove_prefix(static_cast<size_t>(end - text->data()));
+  return text->empty() || text->front() == ' ' || text->front() == '\t' || text->front() == ';';
+}
+
+bool TakeEntry(std::string_view *text, ZELO_AUTOPOWER *entry) noexcept {
+  for (const Field &field : kFields) {
+    if (!TakeByte(text, &(entry->*field.at))) {
+      return false;
+    }
+  }
+  return IsInRange(*entry);
+}
+
+bool Parse(std::string_view text, std::vector<ZELO_AUTOPOWER> *entries) {
+  SkipBlanks(&text);
+  while (!text.empty()) {
+    ZELO_AUTOPOWER entry{};
+    if (!TakeEntry(&text, &entry)) {
+      return false;
+    }
+    entries->push_back(entry);
+    SkipBlanks(&text);
+    if (!text.empty()) {
+      if (text.front() != ';') {
+        return false;
+      }
+      text.remove_prefix(1);
+      SkipBlanks(&text);
+    }
+  }
+  return true;
+}
+
+std::string Written(const ZELO_AUTOPOWER *entries, int count) {
+  std::string text;
+  for (int i = 0; i < count; ++i) {
+    text += i == 0 ? "" : "; ";
+    for (const Field &field : kFields) {
+      text += field.at == kFields[0].at ? "" : " ";
+      text += std::to_string(entries[i].*field.at);
+    }
+  }
+  return text;
+}
+
+/* ---- the file ---- */
+
+int WritePowerList(const char *section, const std::string &times) {
+  Hash hash;
+  if (!hash.valid() || QLIBCSzHashSetValue(hash.address(), kTimesKey, times.c_str()) < 0) {
+    return -1;
+  }
+  const int set = QLIBCFileExist(kFile) == 0
+                      ? 0
+                      : QLIBCFileSetSection(kFile, section, QLIBC_FILE_SYNC, hash.get(), 0);
+  if (set != 0) {
+    return set < 0 ? -1 : 0;
+  }
+  return QLIBCFileAddSection(kFile, section, hash.get(), QLIBC_FILE_SYNC) < 0 ? -1 : 0;
+}
+
+}  // namespace
+
+int ReadPowerList(int list, std::vector<ZELO_AUTOPOWER> *entries) {
+  if (QLIBCFileExist(kFile) == 0) {
+    return 0;
+  }
+  Hash hash;
+  if (!hash.valid()) {
+    return -1;
+  }
+  const int read = QLIBCFileGetSection(kFile, SectionOf(list), hash.address());
+  if (read < 0) {
+    return -1;
+  }
+  const char *times = read > 0 ? QLIBCSzHashGetValue(hash.get(), kTimesKey) : nullptr;
+  if (times != nullptr && !Parse(times, entries)) {
+    return Fail(kMalformed);
+  }
+  return 0;
+}
+
+}  // namespace zelo
+
+int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries) {
+  if (zelo::SectionOf(list) == nullptr || capacity < 0 || pEntries == nullptr) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] {
+    std::vector<ZELO_AUTOPOWER> entries;
+    if (zelo::ReadPowerList(list, &entries) < 0) {
+      return -1;
+    }
+    const int count = static_cast<int>(std::min(entries.size(), static_cast<size_t>(capacity)));
+    std::copy_n(entries.begin(), count, pEntries);
+    return count;
+  });
+}
+
+int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries) {
+  if (zelo::SectionOf(list) == nullptr || count < 0 || (pEntries == nullptr && count > 0) ||
+      !std::all_of(pEntries, pEntries + count, zelo::IsInRange)) {
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  }
+  return zelo::AtBoundary(-1, [&] {
+    return zelo::WritePowerList(zelo::SectionOf(list), zelo::Written(pEntries, count));
+  });
+}
