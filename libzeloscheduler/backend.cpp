@@ -20,6 +20,7 @@ struct Registration {
 
 constexpr Registration kRegistrations[] = {
     {ZELO_SCHED_BACKEND_SCHEDULE, "zeloschedule", zeloschedule_init, "zeloschedule_init"},
+    {ZELO_SCHED_BACKEND_AUTOPOWER, "zeloautopower", zeloautopower_init, "zeloautopower_init"},
 };
 
 int registerBackend(const Registration &registration) {

@@ -35,6 +35,7 @@ struct Registered {
 // In the order of registration.
 constexpr Registered kRegistered[] = {
     {ZELO_SCHED_BACKEND_SCHEDULE, "zeloschedule", "zeloschedule_init"},
+    {ZELO_SCHED_BACKEND_AUTOPOWER, "zeloautopower", "zeloautopower_init"},
 };
 constexpr uint32_t kCapacity = sizeof(SchedBackends) / sizeof(SchedBackends[0]);
 constexpr auto kCount = static_cast<uint32_t>(std::size(kRegistered));
@@ -432,4 +433,10 @@ extern "C" __attribute__((visibility("default"))) int zeloschedule_init(
     const char *szName, ZELO_SCHED_BACKEND *pBackend) {
   static const auto real = reinterpret_cast<Init>(dlsym(RTLD_NEXT, "zeloschedule_init"));
   return intercepted("zeloschedule_init", real, szName, pBackend);
+}
+
+extern "C" __attribute__((visibility("default"))) int zeloautopower_init(
+    const char *szName, ZELO_SCHED_BACKEND *pBackend) {
+  static const auto real = reinterpret_cast<Init>(dlsym(RTLD_NEXT, "zeloautopower_init"));
+  return intercepted("zeloautopower_init", real, szName, pBackend);
 }

@@ -20,6 +20,7 @@
 #include "sched_surroundings.h"
 #include "sched_text.h"
 #include "sched_trigger_clock.h"
+#include "sched_wait_status.h"
 
 namespace {
 
@@ -694,31 +695,6 @@ int get_default(ZELO_SCHED_TASK *pTask) {
   return schedFillTaskFromHash(pTask, hash.get(), SCHED_HERE);
 }
 
-// What the wait status of the shell means: the code, and in the comment the exit code or the
-// signal. Three digits hold either.
-void reportWaitStatus(int status, int *pStatusCode, char *szComment) {
-  constexpr size_t kCommentCapacity = 4;
-  constexpr int kStoppedByte = 0x7F;
-  const int lowByte = status & 0xFF;
-  const int lowBits = status & 0x7F;
-  const int highByte = (status >> 8) & 0xFF;
-  const auto report = [&](int code, int number) {
-    *pStatusCode = code;
-    snprintf(szComment, kCommentCapacity, "%d", number);
-  };
-  if (status == 0) {
-    *pStatusCode = ZELO_SCHED_STATUS_FINISHED;
-  } else if (status == -1) {
-    *pStatusCode = ZELO_SCHED_STATUS_NOT_STARTED;
-  } else if (lowBits == 0 || lowBits == kStoppedByte) {
-    report(ZELO_SCHED_STATUS_EXIT_NONZERO, highByte);
-  } else if (lowByte == kStoppedByte) {
-    report(ZELO_SCHED_STATUS_STOPPED, highByte);
-  } else {
-    report(ZELO_SCHED_STATUS_KILLED, lowBits);
-  }
-}
-
 int run(ZELO_SCHED_TASK *pTask, int *pStatusCode, char *szComment, size_t cbComment) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   SCHED_CHECK_ARG(pStatusCode != nullptr, "((void *)0) != pStatusCode", -1);
@@ -729,7 +705,7 @@ int run(ZELO_SCHED_TASK *pTask, int *pStatusCode, char *szComment, size_t cbComm
   if (!ids.set()) {
     return -1;
   }
-  reportWaitStatus(system(pTask->Command), pStatusCode, szComment);
+  schedReportWaitStatus(system(pTask->Command), pStatusCode, szComment);
   return 0;
 }
 

@@ -313,6 +313,17 @@ ZELO_SCHED_API int ZELOSchedBackendInit(void);
  * 0x0D00, no code for another name. */
 ZELO_SCHED_API int zeloschedule_init(const char *szName, ZELO_SCHED_BACKEND *pBackend);
 
+/* The same for the backend "zeloautopower", which shows the machine's power
+ * schedule as tasks: "app args" says "poweron" or "poweroff", and the weekdays,
+ * the hour and the minute are the entry's.
+ *
+ * The id of a power task is made of its content and changes with it: after an
+ * edit the task is found under another id. It is
+ *   60000000 + 10000000 * enabled + 10000 * weekdays + 100 * hour + minute,
+ * and 20000000 more for power-off; bit 0 of the weekdays is Sunday, so that
+ * 71270730 is an enabled power-on at 07:30 of every day. */
+ZELO_SCHED_API int zeloautopower_init(const char *szName, ZELO_SCHED_BACKEND *pBackend);
+
 /* ---- hooks: telling plugins of changes ------------------------------------------- */
 
 /* The caller zeroes it, and frees it after ZELOSchedTaskPluginExit. */
