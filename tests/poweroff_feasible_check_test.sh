@@ -1,0 +1,82 @@
+#!/bin/bash
+# The program that cron starts at a power-off time, as it is installed.
+#
+# Functions are called by check:
+# shellcheck disable=SC2317
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+
+readonly INSTALLED=/usr/zelo/bin/zelo_poweroff_feasible_check
+readonly DATABASE=/tmp/sched_status.sqlite
+readonly GONE=4194305 # above the kernel's largest process id
+
+install_it() {
+  DESTDIR=$1 cmake -P "$BUILD_DIR/packaging/cmake_install.cmake" >/dev/null
+}
+
+sql() {
+  sqlite3 "$DATABASE" "$1"
+}
+
+# run_row PID TASK STATUS [APP]
+run_row() {
+  sql "INSERT INTO task_status(pid, timestamp, app, task_id, status_code)
+       VALUES($1, 0, '${4:-app}', $2, $3)"
+}
+
+empty_table() {
+  rm -f "$DATABASE"
+  sql "CREATE TABLE task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, timestamp INTEGER,
+       app STRING, task_id INTEGER, status_code INTEGER, comment STRING)"
+}
+
+# "STATUS OUTPUT"
+outcome() {
+  local status=0 output
+  output=$("$@" 2>&1) || status=$?
+  echo "$status $output"
+}
+
+become_zombie() {
+  bash -c 'true & echo $!; exec sleep 1000' &
+}
+
+check "the package installs it as a program" install_it /tmp/staged
+check "it is installed under the path that the crontab names" test -x "/tmp/staged$INSTALLED"
+install_it ""
+check "without a status database the machine may go off" same "$(outcome "$INSTALLED")" "0 "
+sql "PRAGMA user_version = 1"
+check "without a run ever recorded the machine may go off" same "$(outcome "$INSTALLED")" "0 "
+empty_table
+check "without a run the machine may go off" same "$(outcome "$INSTALLED")" "0 "
+
+sleep 1000 &
+live=$!
+run_row "$live" 7 3
+check "a run that has ended does not count" same "$(outcome "$INSTALLED")" "0 "
+run_row "$GONE" 8 2
+check "a run whose process is gone does not count" same "$(outcome "$INSTALLED")" "0 "
+run_row -1 8 2
+run_row 0 8 2
+check "a number that is no process does not count" same "$(outcome "$INSTALLED")" "0 "
+run_row $$ 9 2
+check "the run that started the check does not count" same "$(outcome "$INSTALLED")" "0 "
+exec {zombies}< <(become_zombie)
+read -r zombie <&"$zombies"
+while [[ $(sed -n 's/^State:\s*\(.\).*/\1/p' "/proc/$zombie/status") != Z ]]; do :; done
+run_row "$zombie" 10 2
+check "a run whose process is a zombie does not count" same "$(outcome "$INSTALLED")" "0 "
+run_row "$live" 11 2 "it''s; \$(touch /tmp/broken) '||char(10)||'an app"
+check "a live run is in the way, and told" same "$(outcome "$INSTALLED")" \
+  "1 task 11 is running as process $live (it's; \$(touch /tmp/broken)  an app)"
+check "what an application calls itself is not run" test ! -e /tmp/broken
+run_row "$live" 12 2
+check "every live run is told" same "$(outcome "$INSTALLED" | wc -l)" 2
+echo "no database" >"$DATABASE"
+check "a database that cannot be read is in the way" \
+  same "$(outcome "$INSTALLED" | tail -n 1)" "cannot read $DATABASE"
+check "and is told by the exit status" same "$(outcome "$INSTALLED" | head -c 1)" 1
+finish
