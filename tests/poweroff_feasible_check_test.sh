@@ -40,8 +40,27 @@ outcome() {
   echo "$status $output"
 }
 
-become_zombie() {
-  bash -c 'true & echo $!; exec sleep 1000' &
+# A child that ends once its parent has become a program that never asks how it ended.
+start_zombie() {
+  bash -c 'sleep 1000 & echo $$ $!; exec sleep 1000' &
+}
+
+wait_until() {
+  local tenths
+  for ((tenths = 0; tenths < 100; tenths++)); do
+    if "$@"; then return 0; fi
+    sleep 0.1
+  done
+  echo "never: $*"
+  return 1
+}
+
+is_sleep() {
+  [[ $(cat "/proc/$1/comm") == sleep ]]
+}
+
+is_zombie() {
+  grep -q '^State:.Z' "/proc/$1/status"
 }
 
 check "the package installs it as a program" install_it /tmp/staged
@@ -64,9 +83,11 @@ run_row 0 8 2
 check "a number that is no process does not count" same "$(outcome "$INSTALLED")" "0 "
 run_row $$ 9 2
 check "the run that started the check does not count" same "$(outcome "$INSTALLED")" "0 "
-exec {zombies}< <(become_zombie)
-read -r zombie <&"$zombies"
-while [[ $(sed -n 's/^State:\s*\(.\).*/\1/p' "/proc/$zombie/status") != Z ]]; do :; done
+exec {zombies}< <(start_zombie)
+read -r parent zombie <&"$zombies"
+wait_until is_sleep "$parent"
+kill "$zombie"
+wait_until is_zombie "$zombie"
 run_row "$zombie" 10 2
 check "a run whose process is a zombie does not count" same "$(outcome "$INSTALLED")" "0 "
 run_row "$live" 11 2 "it''s; \$(touch /tmp/broken) '||char(10)||'an app"

@@ -91,8 +91,8 @@ void cleanWorld() {
   resetFailingCalls();
   waitForChildRuns();
   removeStoreAndScratchFiles();
-  for (const char *path :
-       {kPersistentStore, kStatusDatabase, kLockDirectory, kCronPidFile, kPluginDirectory}) {
+  for (const char *path : {kPersistentStore, kPowerSchedule, kStatusDatabase, kLockDirectory,
+                           kCronPidFile, kPluginDirectory}) {
     std::filesystem::remove_all(path);
   }
   std::filesystem::remove_all(kCrontab);

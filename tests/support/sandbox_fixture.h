@@ -26,6 +26,7 @@ namespace support {
 inline constexpr char kCrontab[] = "/etc/crontab";
 inline constexpr char kStore[] = "/tmp/scheduled_tasks";
 inline constexpr char kPersistentStore[] = "/usr/zelo/etc/scheduled_tasks";
+inline constexpr char kPowerSchedule[] = "/usr/zelo/etc/power_sched.conf";
 inline constexpr char kStatusDatabase[] = "/tmp/sched_status.sqlite";
 inline constexpr char kLockDirectory[] = "/tmp/lock";
 inline constexpr char kCronPidFile[] = "/var/run/crond.pid";
