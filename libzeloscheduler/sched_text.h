@@ -7,10 +7,10 @@
 #include <cstdio>
 #include <cstring>
 
-// Copies szText into szBuf, cut to cbBuf - 1 characters. The two must not overlap.
+// Copies szText into szBuf, cut to cbBuf - 1 characters. The two may overlap.
 inline void copyText(char *szBuf, size_t cbBuf, const char *szText) {
   const size_t length = strnlen(szText, cbBuf - 1);
-  memcpy(szBuf, szText, length);
+  memmove(szBuf, szText, length);
   szBuf[length] = '\0';
 }
 

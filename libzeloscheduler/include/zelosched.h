@@ -209,6 +209,51 @@ ZELO_SCHED_API int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_T
  * trailing characters, or what the platform left, with the record partly filled. */
 ZELO_SCHED_API int ZELOSchedInitTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash);
 
+/* ---- JSON: a task as a text for a browser ----------------------------------- */
+
+enum {
+  ZELO_SCHED_JSON_SIZE_MIN = 40960, /* the smallest buffer that is accepted */
+  ZELO_SCHED_JSON_SIZE_ANY = 163840 /* a buffer in which every task fits whole */
+};
+
+/* Writes the task as one JSON object on one line, with a line feed at its end.
+ * Its members are the keys of the hash form ("id", "name", "run hour", "cmd" in
+ * Base64, ...). Each member is a string that holds the value written as a JSON
+ * string once before, so a reader decodes it twice: a name of a"b stands as
+ * "name":"\"a\\\"b\"\n". All characters beyond ASCII are escaped. JSON has no way
+ * to carry a byte that is not UTF-8: each becomes U+FFFD, in the command alone
+ * every byte survives.
+ *
+ * cbBuf is the size of szBuf in bytes, ZELO_SCHED_JSON_SIZE_MIN at the least.
+ * What does not fit is cut without an error; in ZELO_SCHED_JSON_SIZE_ANY
+ * everything fits. 0, or -1 with szBuf untouched: no code of its own for a null
+ * argument or a small buffer, else what the callee left. */
+ZELO_SCHED_API int ZELOSchedTaskConvertToJson(const ZELO_SCHED_TASK *pTask, char *szBuf,
+                                              size_t cbBuf);
+
+/* The same for the stored task of that id. 0, or -1 with szBuf untouched: no
+ * code of its own for a negative id, null or a small buffer; 0x2000 when no
+ * backend holds the id, or what the callee left. */
+ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t cbBuf);
+
+/* Saves the task that a JSON text in that form describes. With `create` 0 it
+ * overwrites the stored task of its id when that has the same app and name; in
+ * every other case, and always with `create` not 0, it becomes a new task. Keys
+ * that are missing have the defaults of the hash form; of a member given twice
+ * the last counts; members that are no key of a task are passed over.
+ *
+ * The text may come from anyone. A root that is no object, a member that is no
+ * string or whose string is no JSON string, half of a surrogate pair, a zero
+ * byte, too deep a nesting, and anything but blanks and comments after the end
+ * are failures, and then nothing is saved. Bytes that are not UTF-8 are saved
+ * as they are.
+ *
+ * The id of the saved task (0 or more), or -1: no code of its own for a null or
+ * empty text or one that cannot be read, else what the callee left. An object
+ * without members saves nothing and gives the id of a new record, which is -1,
+ * without a log line. */
+ZELO_SCHED_API int ZELOSchedTaskSaveFromJson(const char *szJson, int create);
+
 /* ---- enumerations ----------------------------------------------------------- */
 
 /* One value and its name; a null name ends the list. */

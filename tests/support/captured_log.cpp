@@ -12,7 +12,7 @@
 namespace support {
 namespace {
 
-constexpr size_t kLogCapacity = size_t{64} << 20;
+constexpr size_t kLogCapacity = size_t{256} << 20;  // a line can quote a text of 100 MB
 
 SharedLines &log() {
   static SharedLines lines(kLogCapacity);

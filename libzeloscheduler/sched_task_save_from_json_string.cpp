@@ -1,0 +1,183 @@
+// A task saved from the JSON text that a browser sends back. The text comes from outside: whatever
+// it holds, nothing is saved unless all of it could be read.
+#include <zelocore.h>
+#include <zelosched.h>
+
+#include <charconv>
+#include <cstring>
+#include <exception>
+#include <string>
+#include <string_view>
+
+#include "sched_guards.h"
+#include "sched_json.h"
+#include "sched_report.h"
+
+namespace {
+
+constexpr int kHashCapacity = 512;
+
+// The reader stops at the end of the value. Blanks and comments may follow, nothing else.
+bool isAllThereIs(std::string_view rest) {
+  for (;;) {
+    const size_t next = rest.find_first_not_of(" \t\r\n");
+    if (next == std::string_view::npos) {
+      return true;
+    }
+    rest.remove_prefix(next);
+    const bool isBlock = rest.starts_with("/*");
+    if (!isBlock && !rest.starts_with("//")) {
+      return false;
+    }
+    constexpr size_t kMarkLength = 2;
+    const size_t end = isBlock ? rest.find("*/", kMarkLength) : rest.find('\n');
+    if (end == std::string_view::npos) {
+      return !isBlock;
+    }
+    rest.remove_prefix(isBlock ? end + kMarkLength : end);
+  }
+}
+
+constexpr unsigned kFirstHighSurrogate = 0xD800;
+constexpr unsigned kFirstLowSurrogate = 0xDC00;
+constexpr unsigned kLastSurrogate = 0xDFFF;
+
+// The number of the escape "\uXXXX" that the text begins with, or 0, which is no surrogate either.
+unsigned escapedNumber(std::string_view text) {
+  constexpr size_t kMarkLength = 2;
+  constexpr size_t kDigits = 4;
+  constexpr int kHexadecimal = 16;
+  unsigned number = 0;
+  if (text.starts_with("\\u") && text.size() >= kMarkLength + kDigits) {
+    const char *digits = text.data() + kMarkLength;
+    std::from_chars(digits, digits + kDigits, number, kHexadecimal);
+  }
+  return number;
+}
+
+// Half of a surrogate pair stands for no character. The reader takes a second half by itself, and
+// joins a first half with whatever escape follows.
+bool hasHalfPair(std::string_view text) {
+  constexpr size_t kEscapeLength = 6;
+  for (size_t at = text.find('\\'); at < text.size(); at = text.find('\\', at)) {
+    const unsigned number = escapedNumber(text.substr(at));
+    if (number < kFirstHighSurrogate || number > kLastSurrogate) {
+      at += 2;  // past the escaped character, which may be a backslash
+      continue;
+    }
+    const unsigned second =
+        number < kFirstLowSurrogate ? escapedNumber(text.substr(at + kEscapeLength)) : 0;
+    if (second < kFirstLowSurrogate || second > kLastSurrogate) {
+      return true;
+    }
+    at += 2 * kEscapeLength;
+  }
+  return false;
+}
+
+// The reader throws where a text is nested too deeply.
+bool parse(const std::string &text, Json::Value *value) {
+  try {
+    return schedReadJson(text, value) && !hasHalfPair(text) &&
+           isAllThereIs(
+               std::string_view(text).substr(static_cast<size_t>(value->getOffsetLimit())));
+  } catch (const Json::Exception &) {
+    return false;
+  }
+}
+
+// A text for C would end at a zero byte: refused, rather than saved cut.
+bool isPlainText(const std::string &text) {
+  return text.find('\0') == std::string::npos;
+}
+
+bool decodeMember(const Json::Value &member, std::string *text) {
+  Json::Value inner;
+  if (!member.isString() || !parse(member.asString(), &inner) || !inner.isString()) {
+    return false;
+  }
+  *text = inner.asString();
+  return isPlainText(*text);
+}
+
+int fillHash(const Json::Value &root, HashGuard *hash) {
+  for (const std::string &name : root.getMemberNames()) {
+    std::string text;
+    if (!isPlainText(name) || !decodeMember(root[name], &text) ||
+        QLIBCSzHashSetValue(hash->handle(), name.c_str(), text.c_str()) < 0) {
+      SCHED_LOG("save appargs failed");
+      return -1;
+    }
+  }
+  return 0;
+}
+
+// The task that is stored under the id may be another one by now: one that another program has put
+// there. Only the same one is overwritten, where it is stored.
+bool isStored(ZELO_SCHED_TASK *pTask) {
+  ZELO_SCHED_TASK stored = {};
+  stored.Backend = pTask->Backend;
+  if (ZELOSchedTaskGetByID(pTask->ID, &stored) != 0 || strcmp(stored.App, pTask->App) != 0 ||
+      strcmp(stored.Name, pTask->Name) != 0) {
+    return false;
+  }
+  pTask->Backend = stored.Backend;
+  return true;
+}
+
+int save(ZELO_SCHED_TASK *pTask, bool create) {
+  if (!create && isStored(pTask)) {
+    if (ZELOSchedTaskEdit(pTask) != 0) {
+      SCHED_LOG("overwrite failed, task=%ld", static_cast<long>(pTask->ID));
+      return -1;
+    }
+  } else if (ZELOSchedTaskCreate(pTask) < 0) {
+    SCHED_LOG("create task failed, task id=%ld", static_cast<long>(pTask->ID));
+    return -1;
+  }
+  return pTask->ID;
+}
+
+int saveFromJson(const char *szJson, bool create) {
+  const TaskGuard task(ZELOSchedTaskAlloc());
+  if (task == nullptr) {
+    SCHED_LOG_CALLEE("alloc task failed.");
+    return -1;
+  }
+  Json::Value root;
+  if (!parse(szJson, &root) || !root.isObject()) {
+    SCHED_LOG("parse json failed, szJson=%s", szJson);
+    return -1;
+  }
+  HashGuard hash(QLIBCSzHashAlloc(kHashCapacity));
+  if (!hash) {
+    SCHED_LOG("Out of memory");
+    return -1;
+  }
+  if (fillHash(root, &hash) < 0) {
+    return -1;
+  }
+  if (root.empty()) {
+    return task->ID;
+  }
+  if (ZELOSchedInitTaskFromHash(task.get(), hash.get()) < 0) {
+    SCHED_LOG("hash to task failed, task id=%ld", static_cast<long>(task->ID));
+    return -1;
+  }
+  return save(task.get(), create);
+}
+
+}  // namespace
+
+int ZELOSchedTaskSaveFromJson(const char *szJson, int create) {
+  if (szJson == nullptr || szJson[0] == '\0') {
+    SCHED_LOG("Bad parameter");
+    return -1;
+  }
+  try {
+    return saveFromJson(szJson, create != 0);
+  } catch (const std::exception &) {  // nothing but memory can be short here
+    SCHED_LOG("Out of memory");
+    return -1;
+  }
+}

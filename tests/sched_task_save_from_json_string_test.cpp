@@ -1,0 +1,431 @@
+// A task saved from JSON, which may come from anyone.
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "fake_backends.h"
+#include "sandbox_fixture.h"
+#include "tasks.h"
+
+namespace {
+
+using support::ErrorRecord;
+using support::errorRecord;
+using support::failCall;
+using support::failCallFor;
+using support::FakeBackends;
+using support::loadTask;
+using support::logged;
+using support::makeTask;
+using support::saveTask;
+using support::setText;
+using support::Task;
+using Lines = std::vector<std::string>;
+using Members = std::vector<std::pair<std::string, std::string>>;
+
+constexpr char kUnit[] = "sched_task_save_from_json_string.cpp:N ";
+
+std::string quoted(const std::string &text) {
+  std::string result = "\"";
+  for (const char c : text) {
+    if (c == '"' || c == '\\') {
+      result += '\\';
+      result += c;
+    } else if (static_cast<unsigned char>(c) < ' ') {
+      char escape[8];
+      std::snprintf(escape, sizeof(escape), "\\u%04x", static_cast<unsigned>(c));
+      result += escape;
+    } else {
+      result += c;
+    }
+  }
+  return result + '"';
+}
+
+std::string objectOf(const Members &rawMembers) {
+  std::string text;
+  for (const auto &[key, value] : rawMembers) {
+    text += (text.empty() ? "{" : ",") + quoted(key) + ":" + value;
+  }
+  return text.empty() ? "{}" : text + "}";
+}
+
+// Every key that must be there; "cmd" is ls.
+const Members kRequired = {{"id", "-1"},     {"run hour", "1"}, {"run min", "2"},
+                           {"name", "n"},    {"app", "a"},      {"app name", "b"},
+                           {"action", "c"},  {"cmd", "bHM="},   {"state", "enabled"},
+                           {"type", "daily"}};
+
+// kRequired with members replaced or added, all written twice as a browser gives them back.
+std::string taskText(const Members &changes = {}, const std::string &without = "") {
+  Members members;
+  for (const auto &[key, value] : kRequired) {
+    if (key != without) members.emplace_back(key, quoted(quoted(value)));
+  }
+  for (const auto &[key, value] : changes) {
+    const std::string twice = quoted(quoted(value));
+    bool found = false;
+    for (auto &member : members) {
+      if (member.first == key) {
+        member.second = twice;
+        found = true;
+      }
+    }
+    if (!found) members.emplace_back(key, twice);
+  }
+  return objectOf(members);
+}
+
+// taskText() with one more member, whose value is given as it stands in the text.
+std::string textWithRawMember(const std::string &key, const std::string &value) {
+  std::string text = taskText({}, key);
+  text.pop_back();
+  return text + "," + quoted(key) + ":" + value + "}";
+}
+
+std::string jsonOf(long id) {
+  std::string buffer(ZELO_SCHED_JSON_SIZE_ANY, '\0');
+  EXPECT_EQ(ZELOSchedTaskConvertToJsonById(id, buffer.data(), buffer.size()), 0);
+  return buffer.c_str();
+}
+
+int storedTasks() {
+  ZELO_SCHED_TASK *list = nullptr;
+  const int count = ZELOSchedTaskListGet(&list, nullptr);
+  ZELOSchedTaskListFree(&list);
+  return count;
+}
+
+class TaskFromJsonTest : public support::SandboxTest {
+ protected:
+  static int save(const std::string &text, int create = 0) {
+    return ZELOSchedTaskSaveFromJson(text.c_str(), create);
+  }
+
+  // Refused with that last line, and nothing saved.
+  static void expectRefused(const std::string &text, const std::string &lastLine) {
+    support::clearLog();
+    EXPECT_EQ(save(text), -1);
+    ASSERT_FALSE(logged().empty());
+    EXPECT_TRUE(logged().back() == kUnit + lastLine) << logged().back().substr(0, 200);
+    for (const int priority : support::loggedPriorities()) EXPECT_EQ(priority, 3);
+    EXPECT_FALSE(support::fileExists(support::kStore));
+    EXPECT_FALSE(support::fileExists(support::kPersistentStore));
+    EXPECT_EQ(support::crontabLines(), Lines{});
+  }
+  static void expectNotJson(const std::string &text) {
+    SCOPED_TRACE(text.substr(0, 100));
+    expectRefused(text, "parse json failed, szJson=" + text);
+    EXPECT_EQ(logged().size(), 1U);
+  }
+  static void expectMemberRefused(const std::string &value) {
+    SCOPED_TRACE(value.substr(0, 100));
+    expectRefused(textWithRawMember("name", value), "save appargs failed");
+    EXPECT_EQ(logged().size(), 1U);
+  }
+};
+
+TEST_F(TaskFromJsonTest, ANullOrEmptyTextIsRefusedWithoutACode) {
+  expectRefused("", "Bad parameter");
+  EXPECT_EQ(ZELOSchedTaskSaveFromJson(nullptr, 1), -1);
+  EXPECT_EQ(logged(), Lines(2, std::string(kUnit) + "Bad parameter"));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+}
+
+TEST_F(TaskFromJsonTest, ANewTaskIsCreatedAndItsIdGiven) {
+  const long id = save(taskText());
+  ASSERT_EQ(id, 1);
+  const Task task = loadTask(id);
+  EXPECT_STREQ(task->Name, "n");
+  EXPECT_STREQ(task->App, "a");
+  EXPECT_STREQ(task->AppName, "b");
+  EXPECT_STREQ(task->Action, "c");
+  EXPECT_STREQ(task->Command, "ls");
+  EXPECT_EQ(task->RunHour, 1U);
+  EXPECT_EQ(task->RunMin, 2U);
+  EXPECT_EQ(task->State, ZELO_SCHED_STATE_ENABLED);
+  EXPECT_EQ(task->Type, ZELO_SCHED_TYPE_DAILY);
+  EXPECT_EQ(task->StartYear, 2012U);
+  EXPECT_STREQ(task->Week, "1111111");
+  EXPECT_EQ(support::crontabLines().size(), 1U);
+}
+
+TEST_F(TaskFromJsonTest, ATrailingLineFeedOfAValueIsAllowed) {
+  ASSERT_EQ(save(textWithRawMember("name", R"("\"n\"\n")")), 1);
+  EXPECT_STREQ(loadTask(1)->Name, "n");
+}
+
+TEST_F(TaskFromJsonTest, WhatWasWrittenOverwritesThatSameTask) {
+  Task task = makeTask("same", "echo \xFF\n");
+  setText(task->AppArgs, "{\"quoted\": \"\\\\ \xC3\xA9\xF0\x9F\x98\x80 \t\"}");
+  const long id = saveTask(task);
+  saveTask(makeTask("other", "ls"));
+  const std::string before = support::readFile(support::kStore);
+  EXPECT_EQ(save(jsonOf(id)), id);
+  EXPECT_EQ(support::readFile(support::kStore), before);
+  EXPECT_EQ(storedTasks(), 2);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(TaskFromJsonTest, WithTheSameNameAndAppAChangeIsSavedOverTheTask) {
+  ASSERT_EQ(save(taskText()), 1);
+  support::clearLog();
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"run hour", "5"}})), 1);
+  EXPECT_EQ(storedTasks(), 1);
+  EXPECT_EQ(loadTask(1)->RunHour, 5U);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(TaskFromJsonTest, AnotherNameOrAppCreatesANewTask) {
+  ASSERT_EQ(save(taskText()), 1);
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"name", "N"}})), 2);
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"app", "A"}})), 3);
+  EXPECT_STREQ(loadTask(1)->Name, "n");
+  EXPECT_STREQ(loadTask(1)->App, "a");
+}
+
+TEST_F(TaskFromJsonTest, AnIdThatIsNotStoredIsCreated) {
+  EXPECT_EQ(save(taskText({{"id", "77"}})), 1);
+  EXPECT_EQ(storedTasks(), 1);
+}
+
+TEST_F(TaskFromJsonTest, WithTheCreateFlagEvenAnExactCopyIsCreatedAnew) {
+  ASSERT_EQ(save(taskText()), 1);
+  int id = 1;
+  for (const int create : {1, -1, 2}) {
+    EXPECT_EQ(save(jsonOf(1), create), ++id);
+  }
+  EXPECT_EQ(storedTasks(), 4);
+}
+
+TEST_F(TaskFromJsonTest, ATaskOfAnotherBackendIsOverwrittenThere) {
+  FakeBackends fakes(2);
+  fakes[1].get_by_id = 1;
+  ZELO_SCHED_TASK stored = {};
+  ASSERT_EQ(ZELOSchedTaskGetByID(7, &stored), 0);
+  EXPECT_EQ(save(taskText({{"id", "7"}, {"name", stored.Name}, {"app", stored.App}})), 7);
+  EXPECT_EQ(fakes.calls().back(), "edit 1 id 7");
+}
+
+TEST_F(TaskFromJsonTest, AnEmptyObjectSavesNothingAndGivesTheIdOfANewRecord) {
+  EXPECT_EQ(save("{}"), -1);
+  EXPECT_EQ(save(" { } \n", 1), -1);
+  EXPECT_EQ(logged(), Lines{});
+  EXPECT_FALSE(support::fileExists(support::kStore));
+}
+
+TEST_F(TaskFromJsonTest, AMemberThatIsNoKeyOfATaskIsPassedOver) {
+  EXPECT_EQ(save(taskText({{"colour", "red"}, {"", "nothing"}, {"next trigger time", "x"}})), 1);
+}
+
+TEST_F(TaskFromJsonTest, OfMembersGivenTwiceTheLastCounts) {
+  ASSERT_EQ(save(textWithRawMember("name", R"("\"first\"","name":"\"last\"")")), 1);
+  EXPECT_STREQ(loadTask(1)->Name, "last");
+}
+
+TEST_F(TaskFromJsonTest, ABadMemberThatIsGivenAgainCountsAsTheLast) {
+  ASSERT_EQ(save(textWithRawMember("name", R"({"x":[1]},"name":"\"last\"")")), 1);
+  EXPECT_STREQ(loadTask(1)->Name, "last");
+}
+
+TEST_F(TaskFromJsonTest, TextThatIsNotJsonIsQuotedInTheLog) {
+  for (const char *text : {"x", "{", "{\"name\"", "{\"name\":", R"({"name":"\"n\"")", "}", "\"",
+                           "{'name':1}", "{\"a\":\"\\q\"}", "{\"a\":\"\\u12\"}", "\xFF\xFE", "%s%n",
+                           "// only a comment", "/* only a comment", "/"}) {
+    expectNotJson(text);
+  }
+}
+
+TEST_F(TaskFromJsonTest, AnythingButBlanksAndCommentsAfterTheEndIsRefused) {
+  for (const char *tail :
+       {"x", "{}", "]", ",", "/", "/x", "/*", "/* *", "/**/ x", "// \n x", "\x01"}) {
+    expectNotJson(taskText() + tail);
+  }
+  int id = 0;
+  for (const char *tail : {" \r\n\t", "// x", "//", "/**/", "/* x */ // \n /***/ \n"}) {
+    SCOPED_TRACE(tail);
+    EXPECT_EQ(save(taskText() + tail), ++id);
+  }
+}
+
+TEST_F(TaskFromJsonTest, ARootThatIsNoObjectIsRefused) {
+  for (const char *text : {"null", "true", "1", "-1.5e3", "\"text\"", "[]", "[1,{}]",
+                           R"(["{\"name\":1}"])", "1e999999"}) {
+    expectNotJson(text);
+  }
+}
+
+TEST_F(TaskFromJsonTest, AMemberThatIsNoStringIsRefused) {
+  for (const char *value :
+       {"null", "true", "1", "1.5", "{}", "[]", R"(["\"n\""])", R"({"name":"\"n\""})", "-0"}) {
+    expectMemberRefused(value);
+  }
+}
+
+TEST_F(TaskFromJsonTest, AStringThatHoldsNoJsonStringIsRefused) {
+  for (const char *inner : {"", " ", "n", "1", "null", "true", "{}", "[]", "[\"n\"]", "\"n", "n\"",
+                            "\"\\q\"", "\"n\" x", "\"n\"\"m\"", "\"n\",", "'n'"}) {
+    expectMemberRefused(quoted(inner));
+  }
+}
+
+TEST_F(TaskFromJsonTest, ABadMemberAfterGoodOnesSavesNothingOverTheStoredTask) {
+  ASSERT_EQ(save(taskText()), 1);
+  const std::string before = support::readFile(support::kStore);
+  std::string text = taskText({{"id", "1"}, {"run hour", "9"}});
+  text.pop_back();
+  EXPECT_EQ(save(text + ",\"zzz\":1}"), -1);
+  EXPECT_EQ(logged().back(), std::string(kUnit) + "save appargs failed");
+  EXPECT_EQ(support::readFile(support::kStore), before);
+}
+
+TEST_F(TaskFromJsonTest, DeepNestingIsRefused) {
+  constexpr size_t kDepth = 200000;
+  expectNotJson(std::string(kDepth, '['));
+  expectNotJson(std::string(kDepth, '[') + std::string(kDepth, ']'));
+  std::string objects;
+  for (size_t i = 0; i < kDepth; ++i) objects += "{\"a\":";
+  expectNotJson(objects);
+  expectMemberRefused(quoted(std::string(kDepth, '[')));
+  expectNotJson(textWithRawMember("name", std::string(kDepth, '[')));
+}
+
+TEST_F(TaskFromJsonTest, HalfOfASurrogatePairIsRefusedWithinAValue) {
+  for (const char *inner : {R"("\ud83d")", R"("\udc00")", R"("a\ud83d\u0041")",
+                            R"("\ud83d\ud83d\ude00")", R"("\ud83dx\ude00")", R"("\\\udc00")",
+                            R"("\ud83d\n")", R"("\uDFFF\uD800")", R"("\ud83d\ude0")"}) {
+    expectMemberRefused(quoted(inner));
+  }
+}
+
+TEST_F(TaskFromJsonTest, HalfOfASurrogatePairIsRefusedInTheTextItself) {
+  for (const char *value : {R"("\"\ud83d\"")", R"("\"\udc00\"")", R"("\"\ud83d\u0041\"")"}) {
+    expectNotJson(textWithRawMember("name", value));
+  }
+  expectNotJson(R"({"\udc00":"\"n\""})");
+}
+
+TEST_F(TaskFromJsonTest, AWholeSurrogatePairIsOneCharacter) {
+  ASSERT_EQ(save(textWithRawMember("name", quoted(R"("\ud83d\ude00\\ud83d")"))), 1);
+  EXPECT_STREQ(loadTask(1)->Name, "\xF0\x9F\x98\x80\\ud83d");
+}
+
+TEST_F(TaskFromJsonTest, AZeroByteIsRefusedRatherThanCut) {
+  expectMemberRefused(quoted(R"("n\u0000m")"));
+  expectMemberRefused(quoted(R"("\u0000")"));
+  expectMemberRefused(R"("\"n\u0000m\"")");
+  expectMemberRefused(R"("\"n\"\u0000")");
+  expectMemberRefused(R"("\u0000\"n\"")");
+  expectMemberRefused(R"("\"n\"","a\u0000b":"\"x\"")");
+}
+
+TEST_F(TaskFromJsonTest, BytesThatAreNotUtf8AreSavedAsTheyAre) {
+  ASSERT_EQ(save(taskText({{"name", "caf\xE9 \xFF\xC3"}})), 1);
+  EXPECT_STREQ(loadTask(1)->Name, "caf\xE9 \xFF\xC3");
+}
+
+TEST_F(TaskFromJsonTest, ATextCutOffAfterAHundredMegabytesIsRefusedAndQuotedWhole) {
+  constexpr size_t kSize = 100'000'000;
+  std::string text = "{\"name\":\"";
+  text.resize(kSize, 'x');
+  expectNotJson(text);
+}
+
+TEST_F(TaskFromJsonTest, ManyCommentsAreReadInLittleTime) {
+  // With comments kept this takes minutes; the time limit of the program is what fails then.
+  std::string text = taskText();
+  text.pop_back();
+  for (int i = 0; i < 500'000; ++i) text += "/**/";
+  EXPECT_EQ(save(text + "}"), 1);
+}
+
+TEST_F(TaskFromJsonTest, AMissingRequiredKeyIsRefused) {
+  for (const auto &[key, value] : kRequired) {
+    SCOPED_TRACE(key);
+    expectRefused(taskText({}, key), "hash to task failed, task id=-1");
+    EXPECT_EQ(logged().size(), 2U);
+    EXPECT_TRUE(logged()[0].starts_with("sched_task_convert.cpp:N Get hash value failed. key:[" +
+                                        key + "]. "));
+  }
+}
+
+TEST_F(TaskFromJsonTest, TheIdThatWasReadStandsInTheLine) {
+  expectRefused(taskText({{"id", "7"}, {"run hour", "5x"}}), "hash to task failed, task id=7");
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x4000, "sched_parm_table.cpp"}));
+}
+
+TEST_F(TaskFromJsonTest, AFailedAllocationOfTheTaskIsReportedWithTheRecord) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  const std::string text = taskText();
+  int result = 0;
+  {
+    support::FailingAllocation scope("calloc", {.minSize = sizeof(ZELO_SCHED_TASK)});
+    result = save(text);
+  }
+  EXPECT_EQ(result, -1);
+  ASSERT_EQ(logged().size(), 2U);
+  EXPECT_EQ(logged()[1], std::string(kUnit) + "alloc task failed.[0x0200 sched_task_alloc.cpp:N]");
+}
+
+TEST_F(TaskFromJsonTest, TheTaskIsAllocatedBeforeTheTextIsRead) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  int result = 0;
+  {
+    support::FailingAllocation scope("calloc", {.minSize = sizeof(ZELO_SCHED_TASK)});
+    result = save("not JSON");
+  }
+  EXPECT_EQ(result, -1);
+  EXPECT_EQ(logged().back(),
+            std::string(kUnit) + "alloc task failed.[0x0200 sched_task_alloc.cpp:N]");
+}
+
+TEST_F(TaskFromJsonTest, AFailedAllocationOfTheHashIsReported) {
+  ZELOSchedTaskFree(ZELOSchedTaskAlloc());
+  const unsigned forTheTask = support::callCount("QLIBCSzHashAlloc");
+  support::resetFailingCalls();
+  failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1});
+  expectRefused(taskText(), "Out of memory");
+}
+
+TEST_F(TaskFromJsonTest, AValueThatCannotBeSetIsReported) {
+  failCallFor("QLIBCSzHashSetValue", "no field", {.code = 0x0200});
+  expectRefused(taskText({{"no field", "x"}}), "save appargs failed");
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, support::kInjectedFile}));
+}
+
+TEST_F(TaskFromJsonTest, AFailedCreationIsReportedWithTheId) {
+  FakeBackends fakes(1);
+  fakes[0].create = -7;
+  EXPECT_EQ(save(taskText({{"id", "5"}}), 1), -1);
+  EXPECT_EQ(logged().back(), std::string(kUnit) + "create task failed, task id=5");
+  EXPECT_EQ(fakes.calls().back(), "create 0 id 5");
+  EXPECT_EQ(errorRecord(), (ErrorRecord{support::kFakeError, support::kFakeFile}));
+}
+
+TEST_F(TaskFromJsonTest, AFailedOverwritingIsReportedWithTheId) {
+  FakeBackends fakes(1);
+  fakes[0].get_by_id = 1;
+  ZELO_SCHED_TASK stored = {};
+  ASSERT_EQ(ZELOSchedTaskGetByID(5, &stored), 0);
+  const std::string text = taskText({{"id", "5"}, {"name", stored.Name}, {"app", stored.App}});
+  for (const int result : {-7, 1}) {
+    SCOPED_TRACE(result);
+    fakes[0].edit = result;
+    EXPECT_EQ(save(text), -1);
+    EXPECT_EQ(logged().back(), std::string(kUnit) + "overwrite failed, task=5");
+  }
+}
+
+TEST_F(TaskFromJsonTest, AnIdThatCannotBeLookedUpIsCreated) {
+  FakeBackends fakes(1);
+  fakes[0].get_by_id = -1;
+  EXPECT_EQ(save(taskText({{"id", "5"}})), 5);
+  EXPECT_EQ(fakes.calls().back(), "create 0 id 5");
+}
+
+}  // namespace
