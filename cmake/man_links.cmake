@@ -1,0 +1,17 @@
+# A manual page serves every function that its NAME section lists. Each of them gets a page of its
+# own name that leads there, so that "man FUNCTION" finds it.
+#
+#   zelo_man_links(PAGE DIRECTORY): writes the links of PAGE into DIRECTORY
+function(zelo_man_links page directory)
+  cmake_path(GET page FILENAME file)
+  cmake_path(GET page EXTENSION LAST_ONLY section)
+  string(SUBSTRING "${section}" 1 -1 section)
+  file(READ ${page} text)
+  string(REGEX MATCH "\n\\.SH NAME\n[^\\]*" names "${text}")
+  string(REGEX MATCHALL "[A-Za-z_]+" names "${names}")
+  foreach(name IN LISTS names)
+    if(name MATCHES "^(ZELO|zelo)" AND NOT "${name}.${section}" STREQUAL file)
+      file(WRITE ${directory}/${name}.${section} ".so man${section}/${file}\n")
+    endif()
+  endforeach()
+endfunction()
