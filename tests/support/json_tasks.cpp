@@ -3,6 +3,7 @@
 // json_tasks save          saves each line of standard input, which is a JSON text, as a new task
 // and
 //                          prints it again as JSON, as it was stored; the task is removed then
+#include <algorithm>
 #include <cstddef>
 #include <cstdio>
 #include <cstdlib>
