@@ -4,12 +4,15 @@
 // as SQL of its own. What keeps that harmless is the authorizer: while one of these statements is
 // compiled, the connection can do nothing but what the statement is for, and that to task_status
 // alone.
+#include <fcntl.h>
 #include <sqlite3.h>
+#include <sys/stat.h>
 #include <unistd.h>
 #include <zelocore.h>
 #include <zelosched.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
@@ -78,8 +81,12 @@ class RestrictedConnection {
   RestrictedConnection(sqlite3 *db, Purpose purpose)
       : db_(db), purpose_(purpose), changesBefore_(sqlite3_total_changes(db)) {
     sqlite3_set_authorizer(db_, authorize, this);
+    sqlite3_progress_handler(db_, kStepsBetweenQuestions, isTooLong, this);
   }
-  ~RestrictedConnection() { sqlite3_set_authorizer(db_, nullptr, nullptr); }
+  ~RestrictedConnection() {
+    sqlite3_progress_handler(db_, 0, nullptr, nullptr);
+    sqlite3_set_authorizer(db_, nullptr, nullptr);
+  }
   RestrictedConnection(const RestrictedConnection &) = delete;
   RestrictedConnection &operator=(const RestrictedConnection &) = delete;
 
@@ -98,9 +105,17 @@ class RestrictedConnection {
     return purpose_ != Purpose::kInsert || sqlite3_total_changes(db_) == changesBefore_;
   }
 
+  // A SELECT within a SELECT could go on for ever, with the run lock held.
+  static int isTooLong(void *context) {
+    return ++static_cast<RestrictedConnection *>(context)->questions_ > kMostQuestions ? 1 : 0;
+  }
+
+  static constexpr int kStepsBetweenQuestions = 10000;
+  static constexpr int kMostQuestions = 10000;  // a hundred times what a million rows take
   sqlite3 *db_;
   Purpose purpose_;
   int changesBefore_;
+  int questions_ = 0;
 };
 
 // Random, so that processes which collided do not collide again.
@@ -147,6 +162,48 @@ int execute(sqlite3 *db, Purpose purpose, const Statement &statement, RowCallbac
     return -1;
   }
   return execute(db, purpose, statement.c_str(), takeRow, context);
+}
+
+// "/tmp" is everybody's, and SQLite trusts what it finds beside a database: a journal planted there
+// would be rolled back, and files that it names deleted. So each of these files is ours, or not
+// there.
+bool isOurs(const char *szPath) {
+  struct stat info = {};
+  if (lstat(szPath, &info) != 0) {
+    return errno == ENOENT;
+  }
+  return S_ISREG(info.st_mode) && info.st_nlink == 1 &&
+         (info.st_uid == 0 || info.st_uid == geteuid()) &&
+         (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
+}
+
+constexpr char kJournal[] = "/tmp/sched_status.sqlite-journal";
+constexpr const char *kDatabaseFiles[] = {kDatabase, kJournal, "/tmp/sched_status.sqlite-wal",
+                                          "/tmp/sched_status.sqlite-shm"};
+constexpr mode_t kOwnersOnly = 0600;  // a reader's lock would keep every run from being recorded
+
+// Makes the file, when it is missing, before anyone else can. In a sticky directory it stays ours.
+void occupy(const char *szPath) {
+  const int descriptor =
+      open(szPath, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kOwnersOnly);
+  if (descriptor >= 0) {
+    close(descriptor);
+  }
+}
+
+void createDatabase() {
+  const mode_t mask = umask(static_cast<mode_t>(~kOwnersOnly) & 0777);
+  QLIBCFileTouch(kDatabase);
+  umask(mask);
+}
+
+// A journal that is kept between transactions keeps its name taken.
+void keepJournal(sqlite3 *db) {
+  sqlite3_stmt *statement = nullptr;
+  if (sqlite3_prepare_v2(db, "PRAGMA journal_mode=PERSIST", -1, &statement, nullptr) == SQLITE_OK) {
+    sqlite3_step(statement);
+  }
+  sqlite3_finalize(statement);
 }
 
 int32_t numberOf(const char *szValue) {
@@ -233,7 +290,15 @@ int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStat
 sqlite3 *ZELOSchedDBInit(void) {
   ZELOSchedRandInit();
   if (access(kDatabase, F_OK) != 0) {
-    QLIBCFileTouch(kDatabase);
+    createDatabase();
+  }
+  occupy(kJournal);
+  for (const char *szPath : kDatabaseFiles) {
+    if (!isOurs(szPath)) {
+      SCHED_SET_ERROR(kErrOpen);
+      SCHED_LOG("Can't open database: %s\n", "a file of it is not its owner's alone");
+      return nullptr;
+    }
   }
   sqlite3 *db = nullptr;
   if (sqlite3_open(kDatabase, &db) != SQLITE_OK) {
@@ -245,6 +310,8 @@ sqlite3 *ZELOSchedDBInit(void) {
   if (execute(db, Purpose::kCreate, kCreateTable, nullptr, nullptr) < 0) {
     return nullptr;  // The handle stays open, as callers have always found it.
   }
+  occupy(kJournal);  // creating the table has removed it
+  keepJournal(db);
   return db;
 }
 

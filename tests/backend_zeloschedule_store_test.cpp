@@ -1,6 +1,8 @@
 // Ordinary tasks in their store: each operation of the backend, what it copies where, and what
 // every failure leaves behind.
+#include <fcntl.h>
 #include <gtest/gtest.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -360,6 +362,80 @@ TEST_F(StoreTest, ATaskThatCannotBeReadIsReported) {
   EXPECT_EQ(errorRecord(), (ErrorRecord{kInjectedCode, kInjectedFile}));
 }
 
+// ---- "/tmp" is everybody's
+
+TEST_F(StoreTest, AStoreThatSomebodyElsePlantedIsNotRead) {
+  REQUIRE_OTHER_USERS();
+  create("own");
+  const std::string store = readFile(kStore);
+  ASSERT_EQ(chown(kStore, 65534, 65534), 0);
+  ZELO_SCHED_TASK *tasks = nullptr;
+  EXPECT_EQ(backend_.list_get(&tasks, nullptr), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
+  support::clearLog();
+  const Task task = makeTask("", "");
+  EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  EXPECT_EQ(logged(), Lines{backendLine("Get section [1] from [/tmp/scheduled_tasks] failed. "
+                                        "[0x0900 backend_zeloschedule.cpp:N]")});
+  EXPECT_EQ(backend_.edit(task.get()), -1);
+  EXPECT_EQ(readFile(kStore), store);
+}
+
+TEST_F(StoreTest, AStoreThatOthersCanWriteIsNotRead) {
+  create("own");
+  ASSERT_EQ(chmod(kStore, 0666), 0);
+  ZELO_SCHED_TASK *tasks = nullptr;
+  EXPECT_EQ(backend_.list_get(&tasks, nullptr), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
+}
+
+// A forced copy onto a directory would copy into it, through whatever link lies there.
+TEST_F(StoreTest, ADirectoryUnderTheScratchNameMakesTheChangeFail) {
+  create("own");
+  writeFile(kVictim, "untouched");
+  std::filesystem::create_directory(scratchPath());
+  std::filesystem::create_symlink(kVictim, scratchPath() + "/scheduled_tasks");
+  support::resetFailingCalls();
+  const std::string store = readFile(kStore);
+  const Task task = makeTask("new", "");
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(recordedExecs(), Lines{});
+  EXPECT_EQ(readFile(kVictim), "untouched");
+  EXPECT_EQ(readFile(kStore), store);
+  std::filesystem::remove_all(scratchPath());
+}
+
+// What is left when a copy was killed right after it had emptied its target.
+TEST_F(StoreTest, NothingIsBuiltOnAStoreWithoutBytesBesideAPersistentCopyThatHasSome) {
+  create("first");
+  const std::string whole = readFile(kPersistentStore);
+  writeFile(kStore, "");
+  const Task task = makeTask("new", "");
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0B00, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(readFile(kPersistentStore), whole);
+}
+
+TEST_F(StoreTest, AChangeWaitsForTheOneOfAnotherProcessButNotForEver) {
+  create("first");
+  const int directory = open("/usr/zelo/etc", O_RDONLY | O_DIRECTORY);
+  ASSERT_EQ(flock(directory, LOCK_EX), 0);
+  support::clearSleeps();
+  support::onSleep([&](size_t sleeps) {
+    if (sleeps == 3) flock(directory, LOCK_UN);
+  });
+  create("second");
+  EXPECT_EQ(support::recordedSleeps().size(), 3U);
+  support::onSleep({});
+  ASSERT_EQ(flock(directory, LOCK_EX), 0);
+  support::clearSleeps();
+  create("third");
+  EXPECT_EQ(support::recordedSleeps().size(), 1000U);
+  close(directory);
+  EXPECT_EQ(listedIds().size(), 3U);
+}
+
 // ---- ids
 
 TEST_F(StoreTest, ANewTaskGetsTheSmallestFreeId) {
@@ -377,9 +453,9 @@ TEST_F(StoreTest, ANewTaskGetsTheSmallestFreeId) {
       {{0}, 1},
       {{0, 2}, 1},
       {{0, 1}, 2},
-      {{-1}, 0},
-      {{-5, 3}, -4},
-      {{-3, -2}, -1},
+      {{-1}, 1},
+      {{-5, 3}, 1},
+      {{-3, -2, 1}, 2},
       {{1, 2147483646}, 2},
       {{2147483647}, 1},
   };

@@ -2,6 +2,7 @@
 #include <dlfcn.h>
 #include <gtest/gtest.h>
 #include <sqlite3.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -9,6 +10,7 @@
 #include <cstdio>
 #include <cstring>
 #include <ctime>
+#include <filesystem>
 #include <functional>
 #include <memory>
 #include <set>
@@ -1062,6 +1064,53 @@ TEST_P(InjectionTest, FailsInACommentAndIsLogged) {
   EXPECT_EQ(ZELOSchedDBSetStatus(db(), 1, 0, kFinished, comment.c_str()), -1);
   expectLogged("UPDATE task_status SET status_code=3, comment='" + comment);
   expectNothingHarmed();
+}
+
+// SQLite trusts what lies beside a database: a planted journal would be rolled back.
+TEST_F(StatusDatabaseTest, FilesOfTheDatabaseThatAreNotOursGiveNoHandle) {
+  for (const char *suffix : {"", "-journal", "-wal", "-shm"}) {
+    SCOPED_TRACE(suffix);
+    support::cleanWorld();
+    const std::string path = support::kStatusDatabase + std::string(suffix);
+    std::filesystem::remove(path);
+    std::filesystem::create_symlink("/tmp/elsewhere", path);
+    EXPECT_EQ(ZELOSchedDBInit(), nullptr);
+    EXPECT_EQ(logged(), Lines{"sched_task_db.cpp:N Can't open database: a file of it is not its "
+                              "owner's alone\n"});
+    EXPECT_EQ(support::errorRecord(), (support::ErrorRecord{0x0900, "sched_task_db.cpp"}));
+    EXPECT_FALSE(support::fileExists("/tmp/elsewhere"));
+    std::filesystem::remove(path);
+  }
+}
+
+TEST_F(StatusDatabaseTest, TheNameOfTheJournalStaysTaken) {
+  struct stat info = {};
+  ASSERT_EQ(lstat("/tmp/sched_status.sqlite-journal", &info), 0);
+  EXPECT_EQ(info.st_uid, geteuid());
+  EXPECT_EQ(info.st_mode & 0777U, 0600U);
+  EXPECT_EQ(ZELOSchedDBAddRecord(db(), support::makeTask("task", "").get(), nullptr), 0);
+  EXPECT_EQ(lstat("/tmp/sched_status.sqlite-journal", &info), 0);
+}
+
+TEST_F(StatusDatabaseTest, OthersCannotOpenADatabaseThatWasMadeHere) {
+  struct stat info = {};
+  ASSERT_EQ(stat(support::kStatusDatabase, &info), 0);
+  EXPECT_EQ(info.st_mode & 0777U, 0600U);
+}
+
+TEST_F(StatusDatabaseTest, ACheckThatWouldGoOnForEverIsEnded) {
+  for (int i = 0; i < 100; ++i) addStatusRow({.pid = 1, .app = "app", .taskId = 7});
+  const char *szApp =
+      "x' OR (SELECT count(*) FROM task_status a, task_status b, task_status c, task_status d, "
+      "task_status e)='";
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), szApp, &status_), -1);
+  szApp =
+      "x' OR (SELECT a.pid+b.pid+c.pid+d.pid+e.pid FROM task_status a, task_status b, task_status "
+      "c, task_status d, task_status e WHERE a.pid+b.pid+c.pid+d.pid+e.pid=-1)='";
+  support::clearLog();
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), szApp, &status_), -1);
+  ASSERT_EQ(logged().size(), 1U);
+  EXPECT_TRUE(logged()[0].ends_with("] error: interrupted\n")) << logged()[0];
 }
 
 // What one statement may do, another kind may not: a check must not end the runs that it looks for.

@@ -79,7 +79,7 @@ TEST_F(ZelocoreProc, TheExitStatusIsTheResult) {
   EXPECT_EQ(QLIBCExec("/bin/true", nullptr), 0);
   EXPECT_EQ(Shell("exit 7"), 7);
   EXPECT_EQ(Shell("exit 255"), 255);
-  EXPECT_EQ(QLIBCErrGet(), 0);
+  EXPECT_EQ(QLIBCErrGet(), 0x2A00);
   EXPECT_FALSE(HasChildren());
 }
 

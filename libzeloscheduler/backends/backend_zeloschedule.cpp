@@ -1,5 +1,7 @@
 // Ordinary tasks: kept as sections of a section file, one a task, and started by the cron daemon
 // from lines in the system crontab that are written anew after every change.
+#include <fcntl.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/types.h>
 #include <unistd.h>
@@ -28,9 +30,11 @@ constexpr char kName[] = "zeloschedule";
 
 // Every read uses the working copy; the persistent one is there for the next boot.
 constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
+constexpr char kPersistentDirectory[] = "/usr/zelo/etc";
 constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
 constexpr char kScratchPrefix[] = "/tmp/scheduled_tasks.tmp";
 constexpr char kCopyProgram[] = "/bin/cp";
+constexpr mode_t kStoreMode = 0644;
 
 constexpr char kCrontab[] = "/etc/crontab";
 constexpr char kCronPidFile[] = "/var/run/crond.pid";
@@ -51,6 +55,18 @@ class SectionName {
  private:
   char text_[32];
 };
+
+// "/tmp" is everybody's: a file there is ours only when nobody else made it and nobody else can
+// write to it. A link is judged by who made the link.
+bool isForeign(const char *szPath) {
+  struct stat info = {};
+  if (lstat(szPath, &info) != 0) {
+    return false;
+  }
+  const bool isOurs = info.st_uid == 0 || info.st_uid == geteuid();
+  const bool isShared = S_ISREG(info.st_mode) && (info.st_mode & (S_IWGRP | S_IWOTH)) != 0;
+  return !isOurs || isShared;
+}
 
 // ---- reading the store --------------------------------------------------------------------------
 
@@ -96,6 +112,10 @@ template <class Take>
 int forEachTask(Records use, Take take) {
   if (QLIBCFileExist(kWorkingCopy) == 0) {
     return 0;
+  }
+  if (isForeign(kWorkingCopy)) {
+    SCHED_SET_ERROR(kErrOpen);
+    return -1;
   }
   ListGuard names(QLIBCSzListAlloc(kContainerCapacity));
   HashGuard hash(QLIBCSzHashAlloc(kContainerCapacity));
@@ -155,7 +175,13 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
   if (QLIBCFileExist(kWorkingCopy) == 0) {
     return kNotFound;
   }
-  const int read = readSection(SectionName(id).c_str(), &hash);
+  const SectionName section(id);
+  if (isForeign(kWorkingCopy)) {
+    SCHED_SET_ERROR(kErrOpen);
+    SCHED_LOG_CALLEE("Get section [%s] from [%s] failed. ", section.c_str(), kWorkingCopy);
+    return -1;
+  }
+  const int read = readSection(section.c_str(), &hash);
   if (read != kFound) {
     return read;
   }
@@ -175,7 +201,11 @@ class IdArray {
   IdArray(const IdArray &) = delete;
   IdArray &operator=(const IdArray &) = delete;
 
+  // Ids are positive. One that is not was written by another program, and is nobody's neighbour.
   void add(long id) {
+    if (id < 1) {
+      return;
+    }
     if (count_ < capacity_ || grow()) {
       ids_[count_] = id;
     }
@@ -240,22 +270,39 @@ int next_id(long *pID) {
 // ---- writing the store
 // ------------------------------------------------------------------------------
 
+// Makes the file under a name that nobody else has taken. In a sticky directory it stays ours.
+bool makeOwnFile(const char *szPath) {
+  const int descriptor =
+      open(szPath, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kStoreMode);
+  return descriptor >= 0 && close(descriptor) == 0;
+}
+
 // The private copy on which one write is made. Whatever stands under its name was left or planted
-// by someone else: it is neither written through nor taken over.
+// by someone else: it is neither written through nor taken over, and what cannot be removed, a
+// directory say, makes the write fail.
 class ScratchFile {
  public:
   ScratchFile() {
     snprintf(path_, sizeof(path_), "%s.%d", kScratchPrefix, static_cast<int>(getpid()));
-    unlink(path_);
+    for (int i = 0; i < kTries && !made_; ++i) {
+      unlink(path_);
+      made_ = makeOwnFile(path_);
+    }
+    if (!made_) {
+      SCHED_SET_ERROR(kErrOpen);
+    }
   }
   ~ScratchFile() { unlink(path_); }
   ScratchFile(const ScratchFile &) = delete;
   ScratchFile &operator=(const ScratchFile &) = delete;
 
+  bool made() const { return made_; }
   const char *path() const { return path_; }
 
  private:
+  static constexpr int kTries = 10;  // against someone who plants faster than we remove
   char path_[64];
+  bool made_ = false;
 };
 
 off_t sizeOf(const char *szPath) {
@@ -263,12 +310,14 @@ off_t sizeOf(const char *szPath) {
   return stat(szPath, &info) == 0 ? info.st_size : 0;
 }
 
+int reportCopy(const char *szSource, const char *szTarget) {
+  SCHED_LOG_CALLEE("Copy sched conf failed. [%s] -> [%s] ", szSource, szTarget);
+  return -1;
+}
+
 int copyFile(const char *szSource, const char *szTarget) {
-  if (QLIBCExec(kCopyProgram, "-f", szSource, szTarget, nullptr) != 0) {
-    SCHED_LOG_CALLEE("Copy sched conf failed. [%s] -> [%s] ", szSource, szTarget);
-    return -1;
-  }
-  return 0;
+  const int result = QLIBCExec(kCopyProgram, "-f", szSource, szTarget, nullptr);
+  return result == 0 ? 0 : reportCopy(szSource, szTarget);
 }
 
 // A forced copy empties its target before it fills it. A scratch file that is empty, or shorter or
@@ -287,14 +336,20 @@ int copyWorkingCopy(const ScratchFile &scratch) {
     }
     usleep(kPause);
   }
+  // A store without bytes beside a persistent copy that has some was cut off by a copy that was
+  // killed. Nobody must build on that.
+  if (sizeOf(scratch.path()) == 0 && sizeOf(kPersistentCopy) > 0) {
+    SCHED_SET_ERROR(kErrIo);
+    return reportCopy(kWorkingCopy, scratch.path());
+  }
   return 0;
 }
 
 int fillScratch(const ScratchFile &scratch, bool stored) {
   if (stored) {
-    return copyWorkingCopy(scratch);
+    return scratch.made() ? copyWorkingCopy(scratch) : reportCopy(kWorkingCopy, scratch.path());
   }
-  if (QLIBCFileTouch(scratch.path()) < 0) {
+  if (!scratch.made() || QLIBCFileTouch(scratch.path()) < 0) {
     SCHED_LOG_CALLEE("QLIBCFileTouch [%s] failed. ", scratch.path());
     return -1;
   }
@@ -337,11 +392,16 @@ int removeSection(const ScratchFile &scratch, const SectionName &section) {
 
 // The persistent copy goes first: a failure in between leaves the working copy, which every read
 // uses, as it was.
-int publish(const ScratchFile &scratch) {
-  if (copyFile(scratch.path(), kPersistentCopy) < 0 || copyFile(scratch.path(), kWorkingCopy) < 0) {
+int publish(const ScratchFile &scratch, bool stored) {
+  if (copyFile(scratch.path(), kPersistentCopy) < 0) {
     return -1;
   }
-  return 1;
+  // Where there is no working copy yet, its name may be taken meanwhile, by a pipe or a link.
+  if (!stored && !makeOwnFile(kWorkingCopy) && isForeign(kWorkingCopy)) {
+    SCHED_SET_ERROR(kErrOpen);
+    return reportCopy(scratch.path(), kWorkingCopy);
+  }
+  return copyFile(scratch.path(), kWorkingCopy) < 0 ? -1 : 1;
 }
 
 // The one way in which the store changes: one section written, or deleted when pTask is null. 1
@@ -350,17 +410,21 @@ int write_store(long id, const ZELO_SCHED_TASK *pTask) {
   const ScratchFile scratch;
   const SectionName section(id);
   const bool stored = QLIBCFileExist(kWorkingCopy) != 0;
+  if (isForeign(kWorkingCopy)) {
+    SCHED_SET_ERROR(kErrOpen);
+    return reportCopy(kWorkingCopy, scratch.path());
+  }
   if (fillScratch(scratch, stored) < 0) {
     return -1;
   }
   if (pTask != nullptr) {
-    return writeSection(scratch, section, pTask) < 0 ? -1 : publish(scratch);
+    return writeSection(scratch, section, pTask) < 0 ? -1 : publish(scratch, stored);
   }
   if (!stored) {
     return 0;
   }
   const int removed = removeSection(scratch, section);
-  return removed > 0 ? publish(scratch) : removed;
+  return removed > 0 ? publish(scratch, stored) : removed;
 }
 
 // ---- the crontab
@@ -600,6 +664,31 @@ int syncAfterChange() {
   return 0;
 }
 
+// Keeps two processes from changing the store at once: each would copy over the other's copy, and
+// the two could mix. It is held on the persistent copy's directory, which only root can replace.
+// Whoever cannot get it in time goes on without: a change may then be lost, but none is refused.
+class StoreLock {
+ public:
+  StoreLock() : directory_(open(kPersistentDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
+    for (int i = 0; directory_ >= 0 && flock(directory_, LOCK_EX | LOCK_NB) != 0 && i < kTries;
+         ++i) {
+      usleep(kPause);
+    }
+  }
+  ~StoreLock() {
+    if (directory_ >= 0) {
+      close(directory_);
+    }
+  }
+  StoreLock(const StoreLock &) = delete;
+  StoreLock &operator=(const StoreLock &) = delete;
+
+ private:
+  static constexpr int kTries = 1000;  // five seconds in all
+  static constexpr useconds_t kPause = 5000;
+  int directory_;
+};
+
 // ---- the operations of the backend
 // --------------------------------------------------------------------
 
@@ -613,6 +702,7 @@ int storeTask(const ZELO_SCHED_TASK *pTask) {
 
 int create(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  const StoreLock lock;
   long id = 0;
   if (next_id(&id) < 0) {
     return -1;
@@ -634,10 +724,12 @@ int create(ZELO_SCHED_TASK *pTask) {
 
 int edit(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  const StoreLock lock;
   return storeTask(pTask) < 0 ? -1 : syncAfterChange();
 }
 
 int remove(long id) {
+  const StoreLock lock;
   const int removed = write_store(id, nullptr);
   if (removed < 0) {
     SCHED_LOG_CALLEE("set task failed. [%ld] ", id);

@@ -200,6 +200,7 @@ bool RunPlugin(const std::string &path, const Context &context, const char *stag
   launch.InOwnGroup();
   launch.Open(STDIN_FILENO, "/dev/null", O_RDONLY);
   launch.Open(STDOUT_FILENO, "/dev/null", O_WRONLY);
+  launch.Open(STDERR_FILENO, "/dev/null", O_WRONLY);
   launch.CloseFrom(STDERR_FILENO + 1);
   launch.ChangeDirectory("/");
   const pid_t pid = launch.Start(path.c_str(), argv.data(), envp.data());

@@ -102,7 +102,11 @@ int QLIBCExec(const char *szProgram, ...) {
   if (count > kMostArguments) {
     return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return RunAndWait(szProgram, argv);
+  const int status = RunAndWait(szProgram, argv);
+  if (status > 0) {
+    zelo::Fail(QLIBC_ERR_SYSTEM);
+  }
+  return status;
 }
 
 int QLIBCProcForkChildNoWait(void) {

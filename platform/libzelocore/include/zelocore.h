@@ -158,8 +158,8 @@ int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue,
 /* ---- processes ------------------------------------------------------------ */
 
 /* Runs szProgram with the arguments that follow, ended by NULL, and waits. The
- * exit status; 128 + N when signal N ended it; -1 when it could not be started
- * (0x2A00) or has more than 255 arguments (0x0D00). The program is not looked
+ * exit status; 128 + N when signal N ended it (0x2A00 for either, unless it is
+ * 0); -1 when it could not be started (0x2A00) or has more than 255 arguments (0x0D00). The program is not looked
  * up in PATH; it starts with default signal handling and the caller's
  * environment. SIGCHLD may be ignored or handled by the caller. */
 int QLIBCExec(const char *szProgram, ...) __attribute__((sentinel));
