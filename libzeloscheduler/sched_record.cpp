@@ -3,12 +3,17 @@
 
 #include <sys/mman.h>
 
+#include <cstdint>
 #include <cstdlib>
+#include <cstring>
+
+#include "sched_parm_table.h"
 
 namespace {
 
 constexpr int kLongestPlainList = 16;
-constexpr size_t kRecordsOfSlab = 240;  // 8 MiB: three huge pages and more, wherever it begins
+constexpr size_t kHugePage = size_t{2} << 20;
+constexpr size_t kSlabSize = 4 * kHugePage;
 
 #if defined(__SANITIZE_ADDRESS__)
 constexpr bool kSlabsAllowed = false;  // each record is watched by itself then
@@ -18,16 +23,24 @@ constexpr bool kSlabsAllowed = true;
 
 }  // namespace
 
+// Stands at the front of its memory; the records follow.
 struct SchedSlab {
   SchedSlab *next;
+  size_t recordSize;
   size_t unused;   // records not handed out yet, from the first on
   size_t holders;  // records in use, and the source that still takes from it
-  ZELO_SCHED_TASK records[kRecordsOfSlab];
 
+  uintptr_t begin() const { return reinterpret_cast<uintptr_t>(this); }
   bool holds(const ZELO_SCHED_TASK *pTask) const {
-    return pTask >= records && pTask < records + kRecordsOfSlab;
+    const auto address = reinterpret_cast<uintptr_t>(pTask);
+    return address >= begin() && address < begin() + kSlabSize;
+  }
+  ZELO_SCHED_TASK *record(size_t index) const {
+    return reinterpret_cast<ZELO_SCHED_TASK *>(begin() + sizeof(*this) + index * recordSize);
   }
 };
+static_assert(sizeof(SchedSlab) % alignof(ZELO_SCHED_TASK) == 0);
+static_assert(static_cast<size_t>(SchedRecordExtent::kSchedule) % alignof(ZELO_SCHED_TASK) == 0);
 
 namespace {
 
@@ -35,15 +48,37 @@ namespace {
 SchedSlab *slabs = nullptr;
 
 // Mapped rather than allocated: the pages come zeroed, and go back at once when the list is freed.
-SchedSlab *newSlab() {
-  void *memory = mmap(nullptr, sizeof(SchedSlab), PROT_READ | PROT_WRITE,
+// A huge page must begin at a multiple of its size, so what is mapped too much is cut off.
+void *mapSlab() {
+  constexpr size_t kMapped = kSlabSize + kHugePage;
+  void *memory = mmap(nullptr, kMapped, PROT_READ | PROT_WRITE,
                       MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
   if (memory == MAP_FAILED) {
     return nullptr;
   }
-  madvise(memory, sizeof(SchedSlab), MADV_HUGEPAGE);  // a kernel without them is only slower
+  const auto begin = reinterpret_cast<uintptr_t>(memory);
+  const uintptr_t aligned = (begin + kHugePage - 1) / kHugePage * kHugePage;
+  const size_t before = aligned - begin;
+  const size_t after = kMapped - kSlabSize - before;
+  if (before > 0) {
+    munmap(memory, before);
+  }
+  void *slab = reinterpret_cast<void *>(aligned);
+  if (after > 0) {
+    munmap(static_cast<char *>(slab) + kSlabSize, after);
+  }
+  return slab;
+}
+
+SchedSlab *newSlab(size_t recordSize) {
+  void *memory = mapSlab();
+  if (memory == nullptr) {
+    return nullptr;
+  }
+  madvise(memory, kSlabSize, MADV_HUGEPAGE);  // a kernel without them is only slower
   auto *slab = static_cast<SchedSlab *>(memory);
-  slab->unused = kRecordsOfSlab;
+  slab->recordSize = recordSize;
+  slab->unused = (kSlabSize - sizeof(*slab)) / recordSize;
   slab->holders = 1;
   slab->next = slabs;
   slabs = slab;
@@ -76,7 +111,7 @@ void unhold(SchedSlab *slab) {
     link = &(*link)->next;
   }
   *link = slab->next;
-  munmap(slab, sizeof(*slab));
+  munmap(slab, kSlabSize);
 }
 
 }  // namespace
@@ -94,8 +129,16 @@ TaskGuard schedRecordAlloc() {
   return TaskGuard(static_cast<ZELO_SCHED_TASK *>(calloc(1, sizeof(ZELO_SCHED_TASK))));
 }
 
-SchedRecordSource::SchedRecordSource(int expectedRecords)
-    : usesSlabs_(kSlabsAllowed && expectedRecords > kLongestPlainList) {}
+void schedRecordEmpty(ZELO_SCHED_TASK *pTask) {
+  pTask->next = nullptr;
+  for (const SchedParm *parm = parm_table; parm->szKey != nullptr; ++parm) {
+    memset(parm->fieldOf(pTask), 0, sizeof(int32_t));  // a number, or the beginning of a text
+  }
+}
+
+SchedRecordSource::SchedRecordSource(int expectedRecords, SchedRecordExtent extent)
+    : usesSlabs_(kSlabsAllowed && expectedRecords > kLongestPlainList),
+      recordSize_(static_cast<size_t>(extent)) {}
 
 SchedRecordSource::~SchedRecordSource() {
   if (slab_ != nullptr) {
@@ -111,10 +154,10 @@ TaskGuard SchedRecordSource::take() {
     unhold(slab_);
     slab_ = nullptr;
   }
-  if (slab_ == nullptr && (slab_ = newSlab()) == nullptr) {
+  if (slab_ == nullptr && (slab_ = newSlab(recordSize_)) == nullptr) {
     return schedRecordAlloc();  // there may still be room for a single one
   }
   // From the end on: a list that is built from its end then lies in memory as it is linked.
   ++slab_->holders;
-  return TaskGuard(&slab_->records[--slab_->unused]);
+  return TaskGuard(slab_->record(--slab_->unused));
 }

@@ -4,6 +4,7 @@
 
 #include <zelosched.h>
 
+#include <cstddef>
 #include <memory>
 
 void schedRecordFree(ZELO_SCHED_TASK *pTask);
@@ -16,6 +17,17 @@ using TaskGuard = std::unique_ptr<ZELO_SCHED_TASK, TaskDeleter>;
 // One zeroed record; null, with errno set, when memory is short.
 TaskGuard schedRecordAlloc();
 
+// Sets all numbers to 0 and all texts to "". What lies behind the texts' ends stays, which spares a
+// record that is filled over and over most of its bytes; none that a caller gets is made this way.
+void schedRecordEmpty(ZELO_SCHED_TASK *pTask);
+
+// How much of a record there is: all of it, or what says who is started when. The rest of a record,
+// its largest part, must then not be touched.
+enum class SchedRecordExtent : size_t {
+  kWhole = sizeof(ZELO_SCHED_TASK),
+  kSchedule = offsetof(ZELO_SCHED_TASK, EditDialog),
+};
+
 struct SchedSlab;
 
 // The records of one list. A record is large and mostly empty, and of many records taken one by one
@@ -24,7 +36,8 @@ struct SchedSlab;
 // are freed.
 class SchedRecordSource {
  public:
-  explicit SchedRecordSource(int expectedRecords);
+  explicit SchedRecordSource(int expectedRecords,
+                             SchedRecordExtent extent = SchedRecordExtent::kWhole);
   ~SchedRecordSource();
   SchedRecordSource(const SchedRecordSource &) = delete;
   SchedRecordSource &operator=(const SchedRecordSource &) = delete;
@@ -34,6 +47,7 @@ class SchedRecordSource {
 
  private:
   bool usesSlabs_;
+  size_t recordSize_;
   SchedSlab *slab_ = nullptr;
 };
 

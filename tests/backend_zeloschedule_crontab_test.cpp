@@ -216,6 +216,39 @@ TEST_F(CrontabTest, EachEnabledTaskHasOneLineBehindTheOthers) {
   EXPECT_EQ(lines, wanted);
 }
 
+TEST_F(CrontabTest, EachOfManyTasksHasItsOwnTimes) {
+  constexpr int kTasks = 3000;
+  std::string store;
+  Lines wanted;
+  for (int id = 1; id <= kTasks; ++id) {
+    const std::string number = std::to_string(id);
+    const std::string hour = std::to_string(id % 24);
+    const std::string minute = std::to_string(id % 60);
+    store += "[" + number + "]\nid=" + number + "\nname=n\nrun hour=" + hour +
+             "\nrun min=" + minute +
+             "\napp=a\napp name=b\naction=c\ncmd=\nstate=enabled\ntype=daily\n";
+    wanted.push_back(minute + "\t" + hour +
+                     "\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=" + number);
+  }
+  writeFile(support::kStore, store);
+  EXPECT_EQ(backend_.sync(), 0);
+  Lines lines = crontabLines();
+  std::sort(lines.begin(), lines.end());
+  std::sort(wanted.begin(), wanted.end());
+  EXPECT_EQ(lines, wanted);
+}
+
+TEST_F(CrontabTest, AnUnknownStateIsNotThatOfTheTaskBefore) {
+  create();
+  const std::string first = readFile(support::kStore);
+  writeFile(support::kStore,
+            first +
+                "[2]\nid=2\nname=n\nrun hour=1\nrun min=1\napp=a\napp name=b\naction=c\n"
+                "cmd=\nstate=unheard of\ntype=daily\n");
+  EXPECT_EQ(backend_.sync(), 0);
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab + kFirstLine);
+}
+
 TEST_F(CrontabTest, TheListIsSortedByItsIdKeyAscending) {
   create();
   Lines calls;
@@ -416,6 +449,26 @@ TEST_F(CrontabTest, AStoreThatCannotBeListedIsReportedAndLeavesTheCrontab) {
   EXPECT_EQ(backend_.sync(), -1);
   EXPECT_EQ(logged(), Lines{backendLine("get task list failed. " + kInjected)});
   EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+}
+
+TEST_F(CrontabTest, ARecordThatCannotBeAllocatedLeavesTheCrontab) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  create();
+  create();
+  writeFile(kCrontab, kPlainCrontab);
+  forget();
+  for (const unsigned failing : {1U, 2U, 3U}) {
+    SCOPED_TRACE(failing);
+    const support::FailingAllocation scope("calloc",
+                                           {.from = failing, .minSize = sizeof(ZELO_SCHED_TASK)});
+    EXPECT_EQ(backend_.sync(), -1);
+    EXPECT_EQ(logged(), (Lines{backendLine("malloc ZELO_SCHED_TASK failed. key:[" +
+                                           std::string(failing == 3 ? "2" : "1") + "]"),
+                               backendLine("get task list failed. [0x0200 "
+                                           "backend_zeloschedule.cpp:N]")}));
+    EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+    forget();
+  }
 }
 
 TEST_F(CrontabTest, AListThatCannotBeSortedIsReportedButNotPassedOn) {

@@ -815,6 +815,15 @@ class ZelocoreSectionIndex : public ZelocoreSectionFile {
     close(fd);
   }
   std::string Value() { return Section("1")["a"]; }
+
+  static constexpr int kMostDescriptors = 256;
+  static int OpenDescriptors() {
+    int count = 0;
+    for (int fd = 0; fd < kMostDescriptors; ++fd) {
+      count += fcntl(fd, F_GETFD) >= 0 ? 1 : 0;
+    }
+    return count;
+  }
 };
 
 TEST_F(ZelocoreSectionIndex, AFileThatStaysIsReadOnce) {
@@ -840,6 +849,74 @@ TEST_F(ZelocoreSectionIndex, AChangeInTheTickOfTheLastOneIsSeen) {
   Rewrite('z');
   ClockAt(kStamp, 2 * kTick);
   EXPECT_EQ(Value(), "z") << "what was read in the tick is not trusted after it either";
+}
+
+TEST_F(ZelocoreSectionIndex, InTheTickOnlyTheSectionThatIsAskedForIsReadAgain) {
+  Write("[1]\na=\"x\"\n[2]\na=\"x\"\n");
+  StampAt(kTick);
+  ClockAt(kStamp, kTick);
+  EXPECT_EQ(Value(), "x");
+  const int reads = g_calls.reads;
+  EXPECT_EQ(Section("2")["a"], "x");
+  EXPECT_EQ(Value(), "x");
+  EXPECT_EQ(g_calls.reads, reads);
+  Rewrite('y');
+  EXPECT_EQ(Section("2")["a"], "x");
+  EXPECT_EQ(g_calls.reads, reads);
+  EXPECT_EQ(Value(), "y");
+  EXPECT_GT(g_calls.reads, reads);
+}
+
+TEST_F(ZelocoreSectionIndex, ASectionThatComesInTheTickIsFound) {
+  Write("[2]\na=\"x\"\n");
+  StampAt(kTick);
+  ClockAt(kStamp, kTick);
+  EXPECT_EQ(Get("1"), 0);
+  Rewrite('y');
+  EXPECT_EQ(Value(), "y");
+  EXPECT_EQ(Get("2"), 0);
+}
+
+TEST_F(ZelocoreSectionIndex, NoFileStaysOpenAfterTheTick) {
+  Rewrite('x');
+  StampAt(kTick);
+  ClockAt(kStamp, 2 * kTick);
+  EXPECT_EQ(Value(), "x");
+  EXPECT_EQ(Value(), "x");
+  const int open_before = OpenDescriptors();
+  Rewrite('y');
+  StampAt(3 * kTick);
+  ClockAt(kStamp, 3 * kTick);
+  EXPECT_EQ(Value(), "y");
+  EXPECT_EQ(OpenDescriptors(), open_before + 1);
+  ClockAt(kStamp, 4 * kTick);
+  EXPECT_EQ(Value(), "y");
+  EXPECT_EQ(Value(), "y");
+  EXPECT_EQ(OpenDescriptors(), open_before);
+}
+
+/* As a program does that becomes a daemon. */
+TEST_F(ZelocoreSectionIndex, ADescriptorThatBecameAnotherFilesIsLeftAlone) {
+  Rewrite('x');
+  StampAt(kTick);
+  ClockAt(kStamp, kTick);
+  EXPECT_EQ(Value(), "x");
+  std::vector<int> others;
+  for (int fd = STDERR_FILENO + 1; fd < kMostDescriptors; ++fd) {
+    if (close(fd) == 0) {
+      others.push_back(fd);
+    }
+  }
+  const int null = open("/dev/null", O_RDONLY);
+  for (const int fd : others) {
+    ASSERT_EQ(dup2(null, fd), fd);
+  }
+  EXPECT_EQ(Value(), "x");
+  Rewrite('y');
+  EXPECT_EQ(Value(), "y");
+  for (const int fd : others) {
+    EXPECT_EQ(close(fd), 0);
+  }
 }
 
 TEST_F(ZelocoreSectionIndex, StampsOfWholeSecondsAreTrustedLater) {

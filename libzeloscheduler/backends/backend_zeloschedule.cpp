@@ -94,71 +94,101 @@ int fillTask(ZELO_SCHED_TASK *pTask, PSZHASH hash, SchedTriggerClock *clock) {
   return 0;
 }
 
-TaskGuard takeRecord(SchedRecordSource *records, const char *szSection) {
-  TaskGuard task = records->take();
+// Walks over the tasks of the store. A section that is unreadable, or gone since the names were
+// listed, is passed over: one bad section must not hide the others.
+class StoreWalk {
+ public:
+  StoreWalk()
+      : names_(QLIBCSzListAlloc(kContainerCapacity)), hash_(QLIBCSzHashAlloc(kContainerCapacity)) {}
+
+  // The number of sections, 0 without a store; -1 when they cannot be listed or memory is short.
+  int open() {
+    if (QLIBCFileExist(kWorkingCopy) == 0) {
+      return 0;
+    }
+    if (isForeign(kWorkingCopy)) {
+      SCHED_SET_ERROR(kErrOpen);
+      return -1;
+    }
+    if (!names_ || !hash_) {
+      return -1;
+    }
+    sections_ = QLIBCFileEnumSection(kWorkingCopy, names_.handle());
+    return sections_ < 0 ? -1 : sections_;
+  }
+
+  // Reads the next section. False at the end.
+  bool next() {
+    while (next_ < sections_) {
+      szSection_ = QLIBCSzListGet(names_.get(), next_++);
+      if (readSection(szSection_, &hash_) == kFound) {
+        return true;
+      }
+    }
+    return false;
+  }
+
+  // The section that was read, as a task. 0 or -1.
+  int fill(ZELO_SCHED_TASK *pTask) { return fillTask(pTask, hash_.get(), &clock_); }
+
+  const char *section() const { return szSection_; }
+
+ private:
+  ListGuard names_;
+  HashGuard hash_;
+  SchedTriggerClock clock_;
+  int sections_ = 0;
+  int next_ = 0;
+  const char *szSection_ = nullptr;
+};
+
+TaskGuard recordFor(const StoreWalk &walk, TaskGuard task) {
   if (task == nullptr) {
-    SCHED_LOG("malloc ZELO_SCHED_TASK failed. key:[%s]", szSection);
+    SCHED_LOG("malloc ZELO_SCHED_TASK failed. key:[%s]", walk.section());
     SCHED_SET_ERROR(kErrRecordAlloc);
   }
   return task;
 }
 
-enum class Records { kReused, kKept };  // what is done with most of the records
-
-// Gives every task of the store to `take`, as a record in `*task`, which is zeroed and may be moved
-// from. A section that is unreadable, or gone since the names were listed, is passed over: one bad
-// section must not hide the others. -1 when the names cannot be listed or memory is short.
-template <class Take>
-int forEachTask(Records use, Take take) {
-  if (QLIBCFileExist(kWorkingCopy) == 0) {
-    return 0;
-  }
-  if (isForeign(kWorkingCopy)) {
-    SCHED_SET_ERROR(kErrOpen);
-    return -1;
-  }
-  ListGuard names(QLIBCSzListAlloc(kContainerCapacity));
-  HashGuard hash(QLIBCSzHashAlloc(kContainerCapacity));
-  if (!names || !hash) {
-    return -1;
-  }
-  const int sections = QLIBCFileEnumSection(kWorkingCopy, names.handle());
-  SchedTriggerClock clock;
-  SchedRecordSource records(use == Records::kKept ? sections : 1);
+// Gives each task to `use`, in one record for all of them; `use` returns 0, or -1 to end the walk.
+// 0 or -1.
+template <class Use>
+int forEachTask(StoreWalk *walk, Use use) {
   TaskGuard task;
-  for (int i = 0; i < sections; ++i) {
-    const char *szSection = QLIBCSzListGet(names.get(), i);
-    if (readSection(szSection, &hash) != kFound) {
-      continue;
-    }
-    if (task == nullptr) {
-      task = takeRecord(&records, szSection);
-    } else {
-      memset(task.get(), 0, sizeof(*task));
-    }
-    if (task == nullptr) {
+  while (walk->next()) {
+    if (task == nullptr && (task = recordFor(*walk, schedRecordAlloc())) == nullptr) {
       return -1;
     }
-    if (fillTask(task.get(), hash.get(), &clock) == 0) {
-      take(&task);
+    schedRecordEmpty(task.get());
+    if (walk->fill(task.get()) == 0 && use(*task) < 0) {
+      return -1;
     }
   }
-  return sections < 0 ? -1 : 0;
+  return 0;
 }
 
 int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
   SCHED_CHECK_ARG(pTaskList != nullptr, "((void *)0) != pTaskList", -1);
+  StoreWalk walk;
+  const int sections = walk.open();
+  if (sections < 0) {
+    return -1;
+  }
+  SchedRecordSource records(sections);
   TaskChain tasks;
   int count = 0;
-  const int result = forEachTask(Records::kKept, [&](TaskGuard *task) {
-    if (filter == nullptr || filter(task->get()) != 0) {
-      (*task)->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
-      tasks.pushFront(std::move(*task));
+  TaskGuard task;
+  while (walk.next()) {
+    if (task != nullptr) {
+      memset(task.get(), 0, sizeof(*task));
+    } else if ((task = recordFor(walk, records.take())) == nullptr) {
+      return -1;
+    }
+    if (walk.fill(task.get()) == 0 && (filter == nullptr || filter(task.get()) != 0)) {
+      task->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
+      tasks.pushFront(std::move(task));
       ++count;
     }
-  });
-  if (result < 0) {
-    return -1;
   }
   tasks.appendTo(pTaskList);
   return count;
@@ -252,11 +282,15 @@ class IdArray {
   size_t capacity_ = 0;
 };
 
-// One record serves for all tasks here: their ids are all that is wanted, and records are large.
 int next_id(long *pID) {
   SCHED_CHECK_ARG(pID != nullptr, "((void *)0) != pID", -1);
+  StoreWalk walk;
   IdArray ids;
-  if (forEachTask(Records::kReused, [&](TaskGuard *task) { ids.add((*task)->ID); }) < 0) {
+  const auto collect = [&](const ZELO_SCHED_TASK &task) {
+    ids.add(task.ID);
+    return 0;
+  };
+  if (walk.open() < 0 || forEachTask(&walk, collect) < 0) {
     return -1;
   }
   if (!ids.isWhole()) {
@@ -635,11 +669,50 @@ void signalCron() {
   }
 }
 
+// What a crontab line says of a task.
+void copySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from) {
+  pTo->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
+  pTo->ID = from.ID;
+  pTo->State = from.State;
+  pTo->Type = from.Type;
+  memcpy(pTo->Week, from.Week, sizeof(pTo->Week));
+  pTo->StartMonth = from.StartMonth;
+  pTo->StartDay = from.StartDay;
+  pTo->RunHour = from.RunHour;
+  pTo->RunMin = from.RunMin;
+  pTo->RepeatHour = from.RepeatHour;
+  pTo->LastWorkHour = from.LastWorkHour;
+}
+
+// Every task as list_get lists it, but of each record no more than its crontab line needs: the
+// texts are most of a record, and zeroing them would be most of the work. The number of tasks, or
+// -1.
+int listSchedules(TaskChain *tasks) {
+  StoreWalk walk;
+  const int sections = walk.open();
+  if (sections < 0) {
+    return -1;
+  }
+  SchedRecordSource records(sections, SchedRecordExtent::kSchedule);
+  int count = 0;
+  const auto keep = [&](const ZELO_SCHED_TASK &task) {
+    TaskGuard kept = recordFor(walk, records.take());
+    if (kept == nullptr) {
+      return -1;
+    }
+    copySchedule(kept.get(), task);
+    tasks->pushFront(std::move(kept));
+    ++count;
+    return 0;
+  };
+  return forEachTask(&walk, keep) < 0 ? -1 : count;
+}
+
 // A crontab that could not be rewritten is told in the log alone: the task is stored, and the next
 // change or sync writes the crontab whole.
 int sync() {
   TaskChain tasks;
-  const int count = list_get(tasks.handle(), nullptr);
+  const int count = listSchedules(&tasks);
   if (count < 0) {
     SCHED_LOG_CALLEE("get task list failed. ");
     return count;

@@ -48,6 +48,10 @@ class SectionText {
   /* The first section of the name, or null. */
   const Section *Find(std::string_view name) const noexcept;
   void Read(const Section &section, QLIBC_SZHASH &hash) const;
+  /* From its name on. */
+  std::string_view Lines(const Section &section) const noexcept {
+    return std::string_view(contents_).substr(section.begin, section.end - section.begin);
+  }
 
   /* The text of the whole file with one section changed. Every other line is
    * kept byte for byte; header and trailer are made anew. */
