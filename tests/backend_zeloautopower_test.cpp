@@ -437,6 +437,21 @@ TEST_F(AutopowerTest, AListPointerMustBeGiven) {
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "backend_zeloautopower.cpp"}));
 }
 
+TEST_F(AutopowerTest, WhatWasGatheredIsFreedWhenTheListingFails) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer watches for leaks itself";
+  setLists({kDailyOn}, {kWorkdaysOff});
+  failPowerCall("ConfGet 1", {.code = kInjectedCode});
+  watchedWasFreed = false;
+  const Listed listed = list([](const ZELO_SCHED_TASK *task) {
+    watchedRecord = task;
+    return 1;
+  });
+  EXPECT_EQ(listed.result, -1);
+  EXPECT_NE(watchedRecord, nullptr);
+  EXPECT_TRUE(watchedWasFreed);
+  watchedRecord = nullptr;
+}
+
 TEST_F(AutopowerTest, AListThatCannotBeReadFailsTheListing) {
   setLists({kDailyOn}, {kWorkdaysOff});
   for (const char *call : {"ConfGet 0", "ConfGet 1"}) {
@@ -697,7 +712,47 @@ TEST_F(AutopowerTest, ATimeThatNoClockShowsIsRefusedByThePlatform) {
                                   "[0x0D00 power_schedule.cpp:N]"),
                              line("set task failed. [71272430] [0x0D00 power_schedule.cpp:N]")}));
   EXPECT_EQ(powerList(kOn), Entries{});
-  EXPECT_EQ(task->ID, -1) << "still a new task";
+  EXPECT_EQ(task->ID, 71272430) << "what was tried";
+}
+
+TEST_F(AutopowerTest, AFailedCreationIsReportedUnderTheIdOfTheEntry) {
+  const Task task = powerTask("poweron", kDailyOn);
+  failPowerCall("ConfSet", {.code = kInjectedCode});
+  EXPECT_EQ(ZELOSchedTaskCreate(task.get()), -1);
+  EXPECT_EQ(task->ID, kDailyOnId);
+  EXPECT_EQ(logged().back(), std::string("sched_task_create.cpp:N Failed to create for backend "
+                                         "[1] id:[71270730] ") +
+                                 kInjected);
+}
+
+TEST_F(AutopowerTest, TheTimeIsLookedAtBeforeTheAppArgs) {
+  const Task task = powerTask("neither", kDailyOn);
+  task->RunHour = 256;
+  EXPECT_EQ(backend().create(task.get()), -1);
+  EXPECT_EQ(ownLines().back(),
+            line("convert task from power schedule failed. [0x0D00 backend_zeloautopower.cpp:N]"));
+}
+
+TEST_F(AutopowerTest, EveryMessageIsAnError) {
+  giveList(kOn, {kWithoutId});
+  EXPECT_EQ(backend().list_get(nullptr, nullptr), -1);
+  EXPECT_EQ(backend().create(powerTask("", kDailyOn).get()), -1);
+  backend().create(powerTask("poweron", kWithoutId).get());
+  failPowerCall("PoweronSet", {.code = kInjectedCode});
+  EXPECT_EQ(backend().sync(), -1);
+  const std::vector<int> priorities = support::loggedPriorities();
+  EXPECT_EQ(priorities.size(), logged().size());
+  EXPECT_GT(priorities.size(), 3U);
+  for (const int priority : priorities) EXPECT_EQ(priority, 3);
+}
+
+TEST_F(AutopowerTest, ADefaultThatDoesNotConvertIsReportedByItsRow) {
+  constexpr int kRunHourRow = 15;
+  failCallFor("QLIBCSzHashGetValue", "run hour", {.text = "5x"});
+  const Task task = support::makeTask("", "");
+  EXPECT_EQ(backend().get_default(task.get()), -1);
+  EXPECT_EQ(logged(),
+            Lines{line("parm_table[" + std::to_string(kRunHourRow) + "].fnFromHashStr failed.")});
 }
 
 TEST_F(AutopowerTest, ANewTaskNeedsARecord) {
@@ -933,7 +988,7 @@ TEST_F(AutopowerTest, ADisabledEntryGivesNoLine) {
   EXPECT_EQ(backend().sync(), 0);
   EXPECT_EQ(powerCalls(), syncCalls(0));
   EXPECT_EQ(support::readFile(support::kCrontab), support::kPlainCrontab);
-  EXPECT_EQ(support::alarm(), "0\n");
+  EXPECT_EQ(support::alarm(), "");
   EXPECT_EQ(powerList(kOn), (Entries{{0, 127, 7, 30}})) << "it stays in the list";
 }
 

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -17,6 +18,20 @@
 #include "power.h"
 #include "sandbox_fixture.h"
 #include "zelocore.h"
+
+namespace {
+
+int killError = 0;  // with which the next signals fail
+
+}  // namespace
+
+extern "C" __attribute__((visibility("default"))) int kill(pid_t pid, int signal) noexcept {
+  if (killError != 0) {
+    errno = killError;
+    return -1;
+  }
+  return static_cast<int>(syscall(SYS_kill, pid, signal));
+}
 
 namespace {
 
@@ -132,6 +147,26 @@ TEST_F(SetLineTest, OwnerAndModeAreKept) {
   EXPECT_EQ(status.st_mode & 07777U, 0640U);
   EXPECT_EQ(status.st_uid, others ? 1234U : 0U);
   EXPECT_EQ(status.st_gid, others ? 4321U : 0U);
+}
+
+// A change of the owner clears such bits.
+TEST_F(SetLineTest, TheBitsOfTheModeOutliveTheOwner) {
+  if (!support::otherUsersExist()) GTEST_SKIP() << "needs other users";
+  writeFile(kFile, "key\n");
+  ASSERT_EQ(chown(kFile, 1234, 4321), 0);
+  ASSERT_EQ(chmod(kFile, 06755), 0);
+  EXPECT_EQ(set("key"), 1);
+  struct stat status = {};
+  ASSERT_EQ(stat(kFile, &status), 0);
+  EXPECT_EQ(status.st_mode & 07777U, 06755U);
+  EXPECT_EQ(status.st_uid, 1234U);
+}
+
+TEST_F(SetLineTest, ADirectoryThatCannotBeSyncedIsAFailureWithTheNewFileInPlace) {
+  writeFile(kFile, "a\nkey\n");
+  failCall("fsync", {.from = 2, .error = EIO});
+  EXPECT_TRUE(failedWith(set("key"), kIo));
+  EXPECT_EQ(readFile(kFile), "a\n");
 }
 
 TEST_F(SetLineTest, TheChangeIsOnTheDiskBeforeTheFileTakesItsName) {
@@ -347,6 +382,8 @@ TEST_F(PowerConfTest, AWriterThatIsKilledLeavesTheOldOrTheNewList) {
 
 // ---- the alarm
 
+constexpr unsigned char kSaturdays = 64;
+
 class PoweronSetTest : public PlatformTest {
  protected:
   void SetUp() override {
@@ -359,7 +396,7 @@ class PoweronSetTest : public PlatformTest {
     setPowerList(kOn, entries);
     EXPECT_EQ(ZELOAutoPoweronSet(), 0);
     const std::string text = alarm();
-    if (text == "0\n") return "none";
+    if (text.empty() || text == "0\n") return "none";
     const time_t moment = std::stoll(text);
     tm utc = {};
     gmtime_r(&moment, &utc);
@@ -491,6 +528,47 @@ TEST_F(PoweronSetTest, AnArmedAlarmIsDisarmedBeforeItIsArmedAnew) {
   failCall("write", {.from = 2, .error = EBUSY});  // the file of the lists is not written here
   EXPECT_TRUE(failedWith(ZELOAutoPoweronSet(), kIo));
   EXPECT_EQ(alarm(), "") << "the second write is to an emptied file";
+}
+
+TEST_F(PoweronSetTest, ItIsDisarmedByAZero) {
+  armed({{1, 127, 9, 0}});
+  support::failCallFor("open", support::kWakeAlarm, {.from = 2, .error = EBUSY});
+  EXPECT_TRUE(failedWith(ZELOAutoPoweronSet(), kOpen));
+  EXPECT_EQ(alarm(), "0\n");
+}
+
+TEST_F(PoweronSetTest, AClockThatIsNotArmedIsNotWrittenTo) {
+  for (const char *unarmed : {"", "0\n"}) {
+    writeFile(support::kWakeAlarm, unarmed);
+    setPowerList(kOn, {});
+    failCall("write", {.times = support::kAlways, .error = EROFS});
+    EXPECT_EQ(ZELOAutoPoweronSet(), 0);
+    EXPECT_EQ(alarm(), unarmed);
+    support::resetFailingCalls();
+  }
+}
+
+TEST_F(PoweronSetTest, AnArmedClockThatCannotBeDisarmedIsAFailure) {
+  armed({{1, 127, 9, 0}});
+  setPowerList(kOn, {});
+  failCall("write", {.error = EIO});
+  EXPECT_TRUE(failedWith(ZELOAutoPoweronSet(), kIo));
+}
+
+TEST_F(PoweronSetTest, ATimeSkippedBeforeMidnightComesAfterIt) {
+  setZone("<-02>2<-01>,M3.5.0/-1,M10.5.0/0");  // on Saturday from 23:00 to Sunday 00:00
+  setClock("2025-03-29 20:00");
+  EXPECT_EQ(armed({{1, kSaturdays, 23, 30}}), "2025-03-30 01:30:00");
+  setClock("2025-03-30 00:10");
+  EXPECT_EQ(armed({{1, kSaturdays, 23, 30}}), "2025-03-30 01:30:00") << "20 minutes from now";
+  setClock("2025-03-30 00:40");
+  EXPECT_EQ(armed({{1, kSaturdays, 23, 30}}), "2025-04-06 00:30:00");
+}
+
+TEST_F(PoweronSetTest, AZoneThatWasChangedSinceTheStartCounts) {
+  EXPECT_EQ(armed({{1, 127, 9, 0}}), "2013-05-07 09:00:00");
+  ASSERT_EQ(setenv("TZ", "XXX-1", 1), 0);  // and no call that takes it over
+  EXPECT_EQ(armed({{1, 127, 10, 0}}), "2013-05-07 09:00:00");
 }
 
 TEST_F(PoweronSetTest, AListWithoutATimeDisarmsTheClock) {
@@ -642,6 +720,16 @@ TEST_F(UpdateCrontabTest, TheDaemonOfThePidFileGetsAHangUpSignal) {
   EXPECT_TRUE(WIFSIGNALED(status));
   EXPECT_EQ(WTERMSIG(status), SIGHUP);
   EXPECT_EQ(update(), 0) << "it is gone now";
+}
+
+TEST_F(UpdateCrontabTest, ADaemonThatCannotBeSignalledIsAFailure) {
+  writeFile(support::kCronPidFile, std::to_string(getpid()) + "\n");
+  killError = EPERM;
+  EXPECT_TRUE(failedWith(update(), kSystem));
+  EXPECT_EQ(errorRecord().file, "crontab.cpp");
+  killError = ESRCH;
+  EXPECT_EQ(update(), 0) << "it ended meanwhile";
+  killError = 0;
 }
 
 TEST_F(UpdateCrontabTest, WithoutADaemonThereIsNothingToDo) {

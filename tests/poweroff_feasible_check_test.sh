@@ -81,8 +81,17 @@ check "a run whose process is gone does not count" same "$(outcome "$INSTALLED")
 run_row -1 8 2
 run_row 0 8 2
 check "a number that is no process does not count" same "$(outcome "$INSTALLED")" "0 "
+run_row $$ 9 2 ZELO.TOV.TaskScheduler.AutoPower
+check "the power-off run that started the check does not count" \
+  same "$(outcome "$INSTALLED")" "0 "
+run_row "$live" 9 2 ZELO.TOV.TaskScheduler.AutoPower
+check "another power-off run does" same "$(outcome "$INSTALLED")" \
+  "1 task 9 is running as process $live (ZELO.TOV.TaskScheduler.AutoPower)"
+empty_table
 run_row $$ 9 2
-check "the run that started the check does not count" same "$(outcome "$INSTALLED")" "0 "
+check "a task's run that started the check does count" same "$(outcome "$INSTALLED")" \
+  "1 task 9 is running as process $$ (app)"
+empty_table
 exec {zombies}< <(start_zombie)
 read -r parent zombie <&"$zombies"
 wait_until is_sleep "$parent"
@@ -96,6 +105,39 @@ check "a live run is in the way, and told" same "$(outcome "$INSTALLED")" \
 check "what an application calls itself is not run" test ! -e /tmp/broken
 run_row "$live" 12 2
 check "every live run is told" same "$(outcome "$INSTALLED" | wc -l)" 2
+
+# What another user may have put there before the first run.
+plant_view() {
+  rm -f "$DATABASE"
+  sql "CREATE VIEW task_status AS SELECT edit('x', '/tmp/evil') AS pid, 1 AS task_id, 'a' AS app,
+       2 AS status_code"
+}
+printf '#!/bin/sh\ntouch /tmp/evil_was_run\n' >/tmp/evil
+chmod +x /tmp/evil
+plant_view
+outcome "$INSTALLED" >/dev/null
+check "a database that starts a program does not start it" test ! -e /tmp/evil_was_run
+if ((EUID == 0)) && chown 65534 "$DATABASE" 2>/dev/null; then
+  check "another user's database is in the way, and not opened" same "$(outcome "$INSTALLED")" \
+    "1 $DATABASE is not this user's own file"
+else
+  skip "another user's database is in the way, and not opened" "needs other users"
+fi
+for plant in "mkfifo $DATABASE" "mkdir $DATABASE" "ln -s /nonexistent $DATABASE"; do
+  rm -rf "$DATABASE"
+  $plant
+  check "${plant%% *}: what is no file is in the way, and not opened" \
+    same "$(outcome timeout 10 "$INSTALLED")" "1 $DATABASE is not this user's own file"
+done
+rm -rf "$DATABASE"
+empty_table
+ln "$DATABASE" /tmp/elsewhere.sqlite
+rm "$DATABASE"
+ln -s /tmp/elsewhere.sqlite "$DATABASE"
+check "nor is a link to one of our own" same "$(outcome "$INSTALLED")" \
+  "1 $DATABASE is not this user's own file"
+rm "$DATABASE"
+
 echo "no database" >"$DATABASE"
 check "a database that cannot be read is in the way" \
   same "$(outcome "$INSTALLED" | tail -n 1)" "cannot read $DATABASE"

@@ -18,6 +18,7 @@
 #include "sched_hash.h"
 #include "sched_record.h"
 #include "sched_report.h"
+#include "sched_store_lock.h"
 #include "sched_text.h"
 #include "sched_wait_status.h"
 
@@ -357,7 +358,7 @@ int addPowerOffLines(const PowerList &list) {
   return 0;
 }
 
-int sync() {
+int applySchedule() {
   if (ZELOAutoPoweronSet() < 0) {
     SCHED_LOG_CALLEE("set auto poweron failed. ");
     return -1;
@@ -447,7 +448,7 @@ int setAndReport(long id, const ZELO_SCHED_TASK *pTask) {
 }
 
 int syncAfterChange() {
-  if (sync() < 0) {
+  if (applySchedule() < 0) {
     SCHED_LOG_CALLEE("sync power hw failed. ");
     return -1;
   }
@@ -466,8 +467,14 @@ int listOf(const ZELO_SCHED_TASK &task) {
   return -1;
 }
 
+int sync() {
+  const StoreLock lock;
+  return applySchedule();
+}
+
 int create(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  const StoreLock lock;
   PowerTime time = {};
   if (makeEntry(&time.entry, pTask) < 0) {
     SCHED_LOG_CALLEE("convert task from power schedule failed. ");
@@ -482,13 +489,11 @@ int create(ZELO_SCHED_TASK *pTask) {
     SCHED_LOG("wired id in transform [%ld] ", kNoId);
     return -1;
   }
-  const int32_t formerId = pTask->ID;
   pTask->ID = static_cast<int32_t>(*id);
   if (pTask->Name[0] == '\0') {
     copyText(pTask->Name, "Power task");
   }
   if (setAndReport(*id, pTask) < 0) {
-    pTask->ID = formerId;  // still a new task: saving it again must create it
     return -1;
   }
   return syncAfterChange();
@@ -496,10 +501,11 @@ int create(ZELO_SCHED_TASK *pTask) {
 
 int edit(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
+  const StoreLock lock;
   if (setAndReport(pTask->ID, pTask) < 0) {
     return -1;
   }
-  if (sync() < 0) {
+  if (applySchedule() < 0) {
     SCHED_LOG_CALLEE("sync hw autopower failed. ");
     return -1;
   }
@@ -507,6 +513,7 @@ int edit(ZELO_SCHED_TASK *pTask) {
 }
 
 int remove(long id) {
+  const StoreLock lock;
   const int removed = setAndReport(id, nullptr);
   if (removed <= 0) {
     return removed;

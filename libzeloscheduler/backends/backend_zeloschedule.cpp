@@ -1,7 +1,6 @@
 // Ordinary tasks: kept as sections of a section file, one a task, and started by the cron daemon
 // from lines in the system crontab that are written anew after every change.
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/types.h>
 #include <unistd.h>
@@ -19,6 +18,7 @@
 #include "sched_record.h"
 #include "sched_report.h"
 #include "sched_run_hours.h"
+#include "sched_store_lock.h"
 #include "sched_surroundings.h"
 #include "sched_text.h"
 #include "sched_trigger_clock.h"
@@ -30,7 +30,6 @@ constexpr char kName[] = "zeloschedule";
 
 // Every read uses the working copy; the persistent one is there for the next boot.
 constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
-constexpr char kPersistentDirectory[] = "/usr/zelo/etc";
 constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
 constexpr char kScratchPrefix[] = "/tmp/scheduled_tasks.tmp";
 constexpr char kCopyProgram[] = "/bin/cp";
@@ -710,7 +709,7 @@ int listSchedules(TaskChain *tasks) {
 
 // A crontab that could not be rewritten is told in the log alone: the task is stored, and the next
 // change or sync writes the crontab whole.
-int sync() {
+int writeCrontab() {
   TaskChain tasks;
   const int count = listSchedules(&tasks);
   if (count < 0) {
@@ -730,40 +729,20 @@ int sync() {
 }
 
 int syncAfterChange() {
-  if (sync() < 0) {
+  if (writeCrontab() < 0) {
     SCHED_LOG_CALLEE("sync crontab failed. ");
     return -1;
   }
   return 0;
 }
 
-// Keeps two processes from changing the store at once: each would copy over the other's copy, and
-// the two could mix. It is held on the persistent copy's directory, which only root can replace.
-// Whoever cannot get it in time goes on without: a change may then be lost, but none is refused.
-class StoreLock {
- public:
-  StoreLock() : directory_(open(kPersistentDirectory, O_RDONLY | O_DIRECTORY | O_CLOEXEC)) {
-    for (int i = 0; directory_ >= 0 && flock(directory_, LOCK_EX | LOCK_NB) != 0 && i < kTries;
-         ++i) {
-      usleep(kPause);
-    }
-  }
-  ~StoreLock() {
-    if (directory_ >= 0) {
-      close(directory_);
-    }
-  }
-  StoreLock(const StoreLock &) = delete;
-  StoreLock &operator=(const StoreLock &) = delete;
-
- private:
-  static constexpr int kTries = 1000;  // five seconds in all
-  static constexpr useconds_t kPause = 5000;
-  int directory_;
-};
-
 // ---- the operations of the backend
 // --------------------------------------------------------------------
+
+int sync() {
+  const StoreLock lock;
+  return writeCrontab();
+}
 
 int storeTask(const ZELO_SCHED_TASK *pTask) {
   if (write_store(pTask->ID, pTask) < 0) {

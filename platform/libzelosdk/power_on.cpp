@@ -5,12 +5,14 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdlib>
 #include <ctime>
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "power_schedule.h"
+#include "read_file.h"
 #include "support.h"
 
 namespace zelo {
@@ -18,9 +20,13 @@ namespace {
 
 constexpr char kWakeAlarm[] = "/sys/class/rtc/rtc0/wakealarm";
 constexpr char kDisarmed[] = "0\n";
+constexpr size_t kMostAlarmBytes = 32;
+constexpr int kDecimal = 10;
 
 /* A week, and another one for a weekday that the calendar of a place skips. */
 constexpr int kDaysAhead = 14;
+/* A time that summer time skips at the end of a day comes after midnight. */
+constexpr int kDaysBefore = 1;
 constexpr int kNoon = 12;
 constexpr int kUnknownSummerTime = -1;
 
@@ -77,7 +83,7 @@ int NextMoment(const std::vector<ZELO_AUTOPOWER> &entries, std::optional<time_t>
   if (!LocalTime(now, &today)) {
     return Fail(QLIBC_ERR_SYSTEM);
   }
-  for (int days = 0; days <= kDaysAhead; ++days) {
+  for (int days = -kDaysBefore; days <= kDaysAhead; ++days) {
     tm day{};
     if (!DayAfter(today, days, &day)) {
       return Fail(QLIBC_ERR_SYSTEM);
@@ -108,8 +114,19 @@ int WriteAlarm(const std::string &text) {
   return 0;
 }
 
+/* The kernel shows no number when no alarm is armed. One that cannot be read is
+ * taken for armed. */
+bool IsArmed() {
+  const Descriptor file(open(kWakeAlarm, O_RDONLY | O_CLOEXEC));
+  std::string text;
+  return !file.valid() || !ReadAll(file.get(), kMostAlarmBytes, &text) ||
+         std::strtoll(text.c_str(), nullptr, kDecimal) != 0;
+}
+
+/* Only an alarm that is armed is written to: a machine that cannot be woken at
+ * all, with its clock read-only, has nothing to disarm. */
 int Disarm() {
-  return QLIBCFileExist(kWakeAlarm) == 0 ? 0 : WriteAlarm(kDisarmed);
+  return QLIBCFileExist(kWakeAlarm) == 0 || !IsArmed() ? 0 : WriteAlarm(kDisarmed);
 }
 
 /* The kernel refuses a time while another one is armed. */

@@ -418,7 +418,12 @@ int QLIBCSzHashSetValue(PSZHASH *hash, const char *key, const char *value) {
 }
 
 const char *QLIBCSzHashGetValue(PSZHASH hash, const char *key) {
-  FAIL_OR_CALL(QLIBCSzHashGetValue, key, static_cast<const char *>(nullptr), hash, key);
+  if (const auto *plan = failing(Call::k_QLIBCSzHashGetValue, key)) {
+    const char *nothing = resultOf(*plan, static_cast<const char *>(nullptr));
+    return plan->hasText ? plan->text : nothing;
+  }
+  NEXT(next_QLIBCSzHashGetValue, QLIBCSzHashGetValue);
+  return next_QLIBCSzHashGetValue(hash, key);
 }
 
 int QLIBCSzHashEnumKey(PSZHASH hash, PSZLIST *list) {

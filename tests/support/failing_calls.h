@@ -53,7 +53,8 @@ struct FailPlan {
   int error = 0;                 // errno; 0 leaves it alone
   std::optional<long> result{};  // what an int call gives; without it, what it gives on failure
   int code = 0;                  // error record; 0 leaves it alone
-  const char *text = nullptr;    // sqlite3_exec: error text, or no text
+  const char *text = nullptr;    // sqlite3_exec: error text, or no text; QLIBCSzHashGetValue: what
+                                 // it gives, or nothing
   size_t minSize = 0;            // allocations: only those of at least so many bytes
 };
 

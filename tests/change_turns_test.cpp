@@ -1,0 +1,92 @@
+// Processes that change tasks of both backends at once: each change stands afterwards, in the
+// store, in the power schedule and in the crontab.
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <functional>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "power.h"
+#include "sandbox_fixture.h"
+#include "tasks.h"
+#include "zelosched.h"
+
+namespace {
+
+using support::makeTask;
+using support::setText;
+using support::Task;
+using Lines = std::vector<std::string>;
+
+constexpr int kWriters = 3;
+constexpr int kChanges = 6;
+
+class ChangeTurnsTest : public support::SandboxTest {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    support::haveClock();
+    support::realSleep(true);  // waiting for a turn leaves it to the others
+  }
+  void TearDown() override {
+    support::realSleep(false);
+    SandboxTest::TearDown();
+  }
+
+  static bool addOrdinary(int writer, int i) {
+    const Task task = makeTask("task " + std::to_string(writer) + "." + std::to_string(i), "true");
+    return ZELOSchedTaskSave(task.get()) == 0;
+  }
+
+  static bool addPowerOff(int writer, int i) {
+    const Task task = makeTask("", "");
+    task->Backend = ZELO_SCHED_BACKEND_AUTOPOWER;
+    setText(task->AppArgs, "poweroff");
+    setText(task->Week, "1111111");
+    task->RunHour = static_cast<uint32_t>(writer);
+    task->RunMin = static_cast<uint32_t>(i);
+    return ZELOSchedTaskSave(task.get()) == 0;
+  }
+
+  static pid_t startWriter(const std::function<bool(int)> &change) {
+    const pid_t pid = fork();
+    if (pid == 0) {
+      int done = 0;
+      for (int i = 0; i < kChanges; ++i) done += change(i) ? 1 : 0;
+      _exit(done == kChanges ? 0 : 1);
+    }
+    return pid;
+  }
+
+  static long linesWith(const std::string &text) {
+    const Lines lines = support::crontabLines();
+    return std::count_if(lines.begin(), lines.end(), [&](const std::string &line) {
+      return line.find(text) != std::string::npos;
+    });
+  }
+};
+
+TEST_F(ChangeTurnsTest, NoChangeOfSeveralProcessesIsLost) {
+  std::vector<pid_t> writers;
+  for (int writer = 0; writer < kWriters; ++writer) {
+    writers.push_back(startWriter([&](int i) { return addOrdinary(writer, i); }));
+    writers.push_back(startWriter([&](int i) { return addPowerOff(writer, i); }));
+  }
+  for (const pid_t pid : writers) {
+    int status = -1;
+    ASSERT_EQ(waitpid(pid, &status, 0), pid);
+    EXPECT_EQ(status, 0);
+  }
+  EXPECT_EQ(support::powerList(support::kOff).size(), size_t{kWriters * kChanges});
+  ZELO_SCHED_TASK *head = nullptr;
+  EXPECT_EQ(ZELOSchedTaskListGet(&head, nullptr), 2 * kWriters * kChanges);
+  ZELOSchedTaskListFree(&head);
+  EXPECT_EQ(linesWith("/tmp/zeloschedtask"), kWriters * kChanges);
+  EXPECT_EQ(linesWith("zelo_poweroff_feasible_check"), kWriters * kChanges);
+  EXPECT_EQ(support::logged(), Lines{});
+}
+
+}  // namespace
