@@ -286,6 +286,25 @@ TEST_F(StoreTest, OneSectionsKeysDoNotReachTheNext) {
             "sched_task_convert.cpp:N Get hash value failed. key:[run hour]. [0x0000 :N]");
 }
 
+// Its id may be somebody's, and a new task under it would take its place.
+TEST_F(StoreTest, TheIdOfASectionThatCannotBeReadIsNotFree) {
+  for (const char *section : {"1", "2"}) addSection(section, std::atoi(section));
+  failCallFor("QLIBCFileGetSection", "1", {.times = kAlways, .code = 0x0B00});
+  const Task task = makeTask("new", "true");
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(task->ID, 3);
+}
+
+TEST_F(StoreTest, TheIdsOfTasksAreNotFreeWhileThereIsNoClock) {
+  for (const char *section : {"1", "2"}) addSection(section, std::atoi(section));
+  failCall("localtime", {.times = kAlways, .error = EOVERFLOW});
+  const Task task = makeTask("new", "true");
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(task->ID, 3);
+  EXPECT_EQ(logged()[3], backendLine("Failed to obtain next trigger time. id:[1]. [0x2A00 "
+                                     "sched_util.cpp:N]"));
+}
+
 TEST_F(StoreTest, ARecordThatCannotBeAllocatedFailsTheWholeList) {
   if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer allocates itself";
   for (const char *section : {"1", "2", "3"}) addSection(section, std::atoi(section));

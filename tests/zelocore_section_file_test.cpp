@@ -628,6 +628,15 @@ TEST_F(ZelocoreSectionFile, NullAndReservedArgumentsAreRefused) {
   QLIBCSzListFree(list);
 }
 
+TEST_F(ZelocoreSectionFile, APathThatCannotBeLookedAtIsNotTakenForMissing) {
+  EXPECT_EQ(QLIBCFileExist((path_ + "/below").c_str()), 0);
+  Write("");
+  EXPECT_EQ(QLIBCFileExist((path_ + "/below").c_str()), 0) << "a file has nothing below it";
+  ASSERT_EQ(symlink("loop", (directory_ + "/loop").c_str()), 0);
+  EXPECT_EQ(QLIBCFileExist((directory_ + "/loop").c_str()), 1);
+  EXPECT_EQ(QLIBCFileExist(std::string(5000, 'x').c_str()), 1);
+}
+
 TEST_F(ZelocoreSectionFile, TouchingMakesAFileOrRenewsItsTimes) {
   EXPECT_EQ(QLIBCFileExist(path_.c_str()), 0);
   ASSERT_EQ(QLIBCFileTouch(path_.c_str()), 0);

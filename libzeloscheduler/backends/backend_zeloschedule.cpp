@@ -80,11 +80,15 @@ int readSection(const char *szSection, HashGuard *hash) {
   return result > 0 ? kFound : kNotFound;
 }
 
-int fillTask(ZELO_SCHED_TASK *pTask, PSZHASH hash, SchedTriggerClock *clock) {
+int convert(ZELO_SCHED_TASK *pTask, PSZHASH hash) {
   if (ZELOSchedInitTaskFromHash(pTask, hash) < 0) {
     SCHED_LOG_CALLEE("Init task from hash failed. ");
     return -1;
   }
+  return 0;
+}
+
+int setNextTrigger(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
   if (schedNextTriggerTime(pTask, clock) < 0) {
     SCHED_LOG_CALLEE("Failed to obtain next trigger time. id:[%ld]. ",
                      static_cast<long>(pTask->ID));
@@ -93,8 +97,8 @@ int fillTask(ZELO_SCHED_TASK *pTask, PSZHASH hash, SchedTriggerClock *clock) {
   return 0;
 }
 
-// Walks over the tasks of the store. A section that is unreadable, or gone since the names were
-// listed, is passed over: one bad section must not hide the others.
+// Walks over the sections of the store. One bad section must not hide the others: the walk goes on
+// behind one that cannot be read, and one that is gone since the names were listed is passed over.
 class StoreWalk {
  public:
   StoreWalk()
@@ -116,28 +120,36 @@ class StoreWalk {
     return sections_ < 0 ? -1 : sections_;
   }
 
-  // Reads the next section. False at the end.
+  // To the next section. False at the end.
   bool next() {
     while (next_ < sections_) {
       szSection_ = QLIBCSzListGet(names_.get(), next_++);
-      if (readSection(szSection_, &hash_) == kFound) {
+      read_ = readSection(szSection_, &hash_);
+      if (read_ != kNotFound) {
         return true;
       }
     }
     return false;
   }
 
-  // The section that was read, as a task. 0 or -1.
-  int fill(ZELO_SCHED_TASK *pTask) { return fillTask(pTask, hash_.get(), &clock_); }
-
+  bool isRead() const { return read_ == kFound; }
   const char *section() const { return szSection_; }
+  long sectionId() const { return strtol(szSection_, nullptr, kDecimal); }
+
+  // The section that was read, as a task: its stored fields, and when it runs next. Each 0 or -1.
+  int convert(ZELO_SCHED_TASK *pTask) { return ::convert(pTask, hash_.get()); }
+  int setNextTrigger(ZELO_SCHED_TASK *pTask) { return ::setNextTrigger(pTask, &clock_); }
+  int fill(ZELO_SCHED_TASK *pTask) { return convert(pTask) < 0 ? -1 : setNextTrigger(pTask); }
 
  private:
+  static constexpr int kDecimal = 10;
+
   ListGuard names_;
   HashGuard hash_;
   SchedTriggerClock clock_;
   int sections_ = 0;
   int next_ = 0;
+  int read_ = kNotFound;
   const char *szSection_ = nullptr;
 };
 
@@ -149,20 +161,12 @@ TaskGuard recordFor(const StoreWalk &walk, TaskGuard task) {
   return task;
 }
 
-// Gives each task to `use`, in one record for all of them; `use` returns 0, or -1 to end the walk.
-// 0 or -1.
-template <class Use>
-int forEachTask(StoreWalk *walk, Use use) {
-  TaskGuard task;
-  while (walk->next()) {
-    if (task == nullptr && (task = recordFor(*walk, schedRecordAlloc())) == nullptr) {
-      return -1;
-    }
-    schedRecordEmpty(task.get());
-    if (walk->fill(task.get()) == 0 && use(*task) < 0) {
-      return -1;
-    }
+// One record that serves for all tasks of a walk, emptied. 0 or -1.
+int emptyRecordFor(const StoreWalk &walk, TaskGuard *task) {
+  if (*task == nullptr && (*task = recordFor(walk, schedRecordAlloc())) == nullptr) {
+    return -1;
   }
+  schedRecordEmpty(task->get());
   return 0;
 }
 
@@ -178,6 +182,9 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
   int count = 0;
   TaskGuard task;
   while (walk.next()) {
+    if (!walk.isRead()) {
+      continue;
+    }
     if (task != nullptr) {
       memset(task.get(), 0, sizeof(*task));
     } else if ((task = recordFor(walk, records.take())) == nullptr) {
@@ -215,7 +222,7 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
     return read;
   }
   SchedTriggerClock clock;
-  return fillTask(pTask, hash.get(), &clock) < 0 ? -1 : kFound;
+  return convert(pTask, hash.get()) < 0 || setNextTrigger(pTask, &clock) < 0 ? -1 : kFound;
 }
 
 // ---- ids
@@ -281,16 +288,28 @@ class IdArray {
   size_t capacity_ = 0;
 };
 
+// A section that does not convert is nobody's, and its id is free. One that cannot be read just now
+// may be somebody's: a new task in its place would destroy it.
 int next_id(long *pID) {
   SCHED_CHECK_ARG(pID != nullptr, "((void *)0) != pID", -1);
   StoreWalk walk;
-  IdArray ids;
-  const auto collect = [&](const ZELO_SCHED_TASK &task) {
-    ids.add(task.ID);
-    return 0;
-  };
-  if (walk.open() < 0 || forEachTask(&walk, collect) < 0) {
+  if (walk.open() < 0) {
     return -1;
+  }
+  IdArray ids;
+  TaskGuard task;
+  while (walk.next()) {
+    if (!walk.isRead()) {
+      ids.add(walk.sectionId());
+      continue;
+    }
+    if (emptyRecordFor(walk, &task) < 0) {
+      return -1;
+    }
+    if (walk.convert(task.get()) == 0) {
+      ids.add(task->ID);
+      walk.setNextTrigger(task.get());  // for what it logs: a task is not lost for want of a clock
+    }
   }
   if (!ids.isWhole()) {
     SCHED_LOG_CALLEE("Alloc id slot failed. num:[%d] ", ids.count());
@@ -694,17 +713,26 @@ int listSchedules(TaskChain *tasks) {
   }
   SchedRecordSource records(sections, SchedRecordExtent::kSchedule);
   int count = 0;
-  const auto keep = [&](const ZELO_SCHED_TASK &task) {
+  TaskGuard task;
+  while (walk.next()) {
+    if (!walk.isRead()) {
+      continue;
+    }
+    if (emptyRecordFor(walk, &task) < 0) {
+      return -1;
+    }
+    if (walk.fill(task.get()) < 0) {
+      continue;
+    }
     TaskGuard kept = recordFor(walk, records.take());
     if (kept == nullptr) {
       return -1;
     }
-    copySchedule(kept.get(), task);
+    copySchedule(kept.get(), *task);
     tasks->pushFront(std::move(kept));
     ++count;
-    return 0;
-  };
-  return forEachTask(&walk, keep) < 0 ? -1 : count;
+  }
+  return count;
 }
 
 // A crontab that could not be rewritten is told in the log alone: the task is stored, and the next

@@ -25,9 +25,14 @@ int OpenOrCreate(const char *path) {
 
 }  // namespace
 
+/* A look that failed says nothing: what may be there must not be taken for missing
+ * and made anew. */
 int QLIBCFileExist(const char *szPath) {
   struct stat status;
-  return szPath != nullptr && stat(szPath, &status) == 0 ? 1 : 0;
+  if (szPath == nullptr) {
+    return 0;
+  }
+  return stat(szPath, &status) == 0 || (errno != ENOENT && errno != ENOTDIR) ? 1 : 0;
 }
 
 int QLIBCFileTouch(const char *szPath) {

@@ -7,6 +7,7 @@
 #include <cstdarg>
 #include <cstdio>
 
+#include "failing_calls.h"
 #include "shared_memory.h"
 
 namespace support {
@@ -20,6 +21,7 @@ SharedLines &log() {
 }
 
 void keep(int priority, const char *format, va_list arguments) {
+  const OwnWork own;
   // "%m" means the errno of the caller, who also finds it unchanged afterwards.
   const int entryErrno = errno;
   va_list again;

@@ -123,6 +123,7 @@ constexpr CallName kCalls[] = {
 #undef X
 };
 
+constexpr int kInjectedCode = 0x2A00;  // of the calls that fail in a step
 constexpr size_t kPlansPerCall = 8;
 constexpr size_t kKeySize = 256;
 constexpr size_t kTextSize = 256;
@@ -143,12 +144,23 @@ struct Plan {
   char text[kTextSize];
 };
 
+// Of all calls together.
+struct Step {
+  std::atomic<bool> stands;
+  std::atomic<unsigned> seen;
+  std::atomic<size_t> failed;  // the first that did, plus one
+  unsigned nth;
+  bool onwards;
+  Plan plan;  // stands for none of its own
+};
+
 struct State {
   struct PerCall {
     std::atomic<unsigned> count;
     Plan plans[kPlansPerCall];
   } calls[static_cast<size_t>(Call::kCount)];
   std::atomic<unsigned> seed;
+  Step step;
 };
 
 State &state() {
@@ -216,10 +228,41 @@ bool concerns(Call call, const Plan &plan, const char *key, size_t size) {
                                                  : std::strstr(key, plan.key) != nullptr;
 }
 
+bool canFail(Call call) {
+  constexpr Call kNever[] = {
+      Call::k_QLIBCFileExist, Call::k_QLIBCProcAlive, Call::k_QLIBCSzHashGetValue,
+      Call::k_sleep,          Call::k_usleep,         Call::k_nanosleep,
+      Call::k_rand,           Call::k_srand};
+  return std::find(std::begin(kNever), std::end(kNever), call) == std::end(kNever);
+}
+
+int errorOf(Call call) {
+  if (isAllocation(call)) return ENOMEM;
+  return call == Call::k_fork ? EAGAIN : EIO;
+}
+
+// Whether the step that stands is at this call.
+bool fallsOn(Call call) {
+  Step &step = state().step;
+  if (!step.stands || OwnWork::isGoingOn() || !canFail(call)) return false;
+  const unsigned seen = ++step.seen;
+  if (step.onwards ? seen < step.nth : seen != step.nth) return false;
+  size_t none = 0;
+  step.failed.compare_exchange_strong(none, static_cast<size_t>(call) + 1);
+  errno = errorOf(call);
+  return true;
+}
+
 // Counts the call. The plan by which it fails, or null.
 const Plan *failing(Call call, const char *key = nullptr, size_t size = 0) {
   State::PerCall &calls = slot(call);
   ++calls.count;
+  if (fallsOn(call)) {
+    if (call <= Call::k_ZELOEncodingBase64Decode) {
+      QLIBCErrSetEx(kInjectedCode, kInjectedFile, kInjectedLine);
+    }
+    return &state().step.plan;
+  }
   for (Plan &plan : calls.plans) {
     if (!concerns(call, plan, key, size)) continue;
     const unsigned nth = ++plan.matched;
@@ -253,11 +296,47 @@ bool isStandard(int descriptor) {
   return descriptor >= 0 && descriptor <= STDERR_FILENO;
 }
 
+template <class Make>
+void record(SharedLines &lines, Make make) {
+  const OwnWork own;
+  lines.append(0, make());
+}
+
+// A call's key, which is compared with that of a plan.
+class KeyOfCall {
+ public:
+  template <class Make>
+  explicit KeyOfCall(Make make) {
+    const OwnWork own;
+    take(make());
+  }
+  ~KeyOfCall() {
+    const OwnWork own;
+    delete made_;
+  }
+  KeyOfCall(const KeyOfCall &) = delete;
+  KeyOfCall &operator=(const KeyOfCall &) = delete;
+
+  const char *text() const { return text_; }
+
+ private:
+  void take(std::nullptr_t) {}
+  void take(const char *text) { text_ = text; }
+  void take(std::string text) {
+    made_ = new std::string(std::move(text));
+    text_ = made_->c_str();
+  }
+
+  const char *text_ = nullptr;
+  const std::string *made_ = nullptr;
+};
+
 constexpr long kMicrosecondsPerSecond = 1000000;
 constexpr long kNanosecondsPerMicrosecond = 1000;
 
 // Whether the caller shall really sleep.
 bool recordSleep(const char *call, long microseconds) {
+  const OwnWork own;
   sleeps().append(static_cast<int>(microseconds), call);
   if (forced().sleepAction) forced().sleepAction(sleeps().lines().size());
   return forced().reallySleep;
@@ -321,6 +400,28 @@ FailingAllocation::~FailingAllocation() {
   }
 }
 
+FailingStep::FailingStep(unsigned nth, bool onwards) {
+  Step &step = state().step;
+  step.seen = 0;
+  step.failed = 0;
+  step.nth = nth;
+  step.onwards = onwards;
+  step.plan.error = EIO;
+  allocationPlanned = true;
+  step.stands = true;
+}
+
+FailingStep::~FailingStep() {
+  state().step.stands = false;
+  allocationPlanned = false;
+}
+
+std::string FailingStep::failed() const {
+  const OwnWork own;
+  const size_t failed = state().step.failed;
+  return failed == 0 ? "" : kCalls[failed - 1].name;
+}
+
 std::vector<std::string> recordedSystemCommands() {
   return systemCommands().texts();
 }
@@ -377,13 +478,16 @@ using support::resultOf;
 
 #define REAL(name) NEXT(real_##name, name)
 
-#define FAIL_OR_CALL(name, key, failure, ...)              \
-  do {                                                     \
-    if (const auto *plan = failing(Call::k_##name, key)) { \
-      return resultOf(*plan, failure);                     \
-    }                                                      \
-    NEXT(next_##name, name);                               \
-    return next_##name(__VA_ARGS__);                       \
+// The key may be a text that is made for it, which is the test's own work; looking for the call is
+// not, and comes after it.
+#define FAIL_OR_CALL(name, key, failure, ...)                             \
+  do {                                                                    \
+    const support::KeyOfCall key_of_call([&] { return key; });            \
+    if (const auto *plan = failing(Call::k_##name, key_of_call.text())) { \
+      return resultOf(*plan, failure);                                    \
+    }                                                                     \
+    NEXT(next_##name, name);                                              \
+    return next_##name(__VA_ARGS__);                                      \
   } while (false)
 
 extern "C" {
@@ -393,18 +497,23 @@ extern "C" {
 int QLIBCExec(const char *program, ...) {
   constexpr size_t kMaxArguments = 8;
   std::array<const char *, kMaxArguments> arguments{};
-  std::string line = program != nullptr ? program : "";
   va_list list;
   va_start(list, program);
   for (size_t i = 0; i < kMaxArguments; ++i) {
-    const char *argument = va_arg(list, const char *);
-    if (argument == nullptr) break;
-    arguments[i] = argument;
-    line.append(" ").append(argument);
+    arguments[i] = va_arg(list, const char *);
+    if (arguments[i] == nullptr) break;
   }
   va_end(list);
-  support::execs().append(0, line);
-  FAIL_OR_CALL(QLIBCExec, line.c_str(), -1, program, arguments[0], arguments[1], arguments[2],
+  const auto line = [&] {
+    std::string text = program != nullptr ? program : "";
+    for (const char *argument : arguments) {
+      if (argument == nullptr) break;
+      text.append(" ").append(argument);
+    }
+    return text;
+  };
+  support::record(support::execs(), line);
+  FAIL_OR_CALL(QLIBCExec, line(), -1, program, arguments[0], arguments[1], arguments[2],
                arguments[3], arguments[4], arguments[5], arguments[6], arguments[7],
                static_cast<char *>(nullptr));
 }
@@ -476,45 +585,49 @@ int QLIBCProcForkChildNoWait(void) {
 }
 
 int QLIBCProcAlive(pid_t pid) {
-  FAIL_OR_CALL(QLIBCProcAlive, std::to_string(pid).c_str(), 0, pid);
+  FAIL_OR_CALL(QLIBCProcAlive, std::to_string(pid), 0, pid);
 }
 
 int QLIBPluginInit(const char *plugin, const char *action, void **context) {
-  std::string line = "init ";
-  line.append(plugin != nullptr ? plugin : "").append(" ").append(action != nullptr ? action : "");
-  support::pluginCalls().append(0, line);
+  support::record(support::pluginCalls(), [&] {
+    return std::string("init ") + (plugin != nullptr ? plugin : "") + " " +
+           (action != nullptr ? action : "");
+  });
   FAIL_OR_CALL(QLIBPluginInit, action, -1, plugin, action, context);
 }
 
 int QLIBPluginSetArg(void **context, const char *key, const char *value) {
-  std::string line = "arg ";
-  line.append(key != nullptr ? key : "").append("=").append(value != nullptr ? value : "");
-  support::pluginCalls().append(0, line);
+  support::record(support::pluginCalls(), [&] {
+    return std::string("arg ") + (key != nullptr ? key : "") + "=" +
+           (value != nullptr ? value : "");
+  });
   FAIL_OR_CALL(QLIBPluginSetArg, key, -1, context, key, value);
 }
 
 int QLIBPluginSetArgByInt(void **context, const char *key, int value) {
-  std::string line = "int ";
-  line.append(key != nullptr ? key : "").append("=").append(std::to_string(value));
-  support::pluginCalls().append(0, line);
+  support::record(support::pluginCalls(), [&] {
+    return std::string("int ") + (key != nullptr ? key : "") + "=" + std::to_string(value);
+  });
   FAIL_OR_CALL(QLIBPluginSetArgByInt, key, -1, context, key, value);
 }
 
 int QLIBPluginAction(int stage, void **context) {
-  const std::string key = std::to_string(stage);
-  support::pluginCalls().append(0, "action " + key);
-  FAIL_OR_CALL(QLIBPluginAction, key.c_str(), -1, stage, context);
+  support::record(support::pluginCalls(), [&] { return "action " + std::to_string(stage); });
+  FAIL_OR_CALL(QLIBPluginAction, std::to_string(stage), -1, stage, context);
 }
 
 int QLIBPluginExit(void **context) {
-  support::pluginCalls().append(0, "exit");
-  FAIL_OR_CALL(QLIBPluginExit, nullptr, -1, context);
+  support::record(support::pluginCalls(), [] { return "exit"; });
+  REAL(QLIBPluginExit);
+  const int result = real_QLIBPluginExit(context);
+  const auto *plan = failing(Call::k_QLIBPluginExit);
+  return plan != nullptr ? resultOf(*plan, -1) : result;
 }
 
 // ---- libzelosdk
 
 int ZELOUserGetByUID(uid_t uid, PZELOUSER *user) {
-  FAIL_OR_CALL(ZELOUserGetByUID, std::to_string(uid).c_str(), -1, uid, user);
+  FAIL_OR_CALL(ZELOUserGetByUID, std::to_string(uid), -1, uid, user);
 }
 
 int SzBase64EncodeFull(const char *source, size_t length, char *target, size_t capacity,
@@ -529,7 +642,7 @@ int ZELOEncodingBase64Decode(const char *source, size_t length, char *target, si
 // ---- files
 
 int rename(const char *from, const char *to) noexcept {
-  FAIL_OR_CALL(rename, (std::string(from) + " " + to).c_str(), -1, from, to);
+  FAIL_OR_CALL(rename, std::string(from) + " " + to, -1, from, to);
 }
 
 int fsync(int descriptor) {
@@ -696,11 +809,11 @@ int fprintf(FILE *stream, const char *format, ...) {
 // ---- identity and processes
 
 int seteuid(uid_t uid) noexcept {
-  FAIL_OR_CALL(seteuid, std::to_string(uid).c_str(), -1, uid);
+  FAIL_OR_CALL(seteuid, std::to_string(uid), -1, uid);
 }
 
 int setegid(gid_t gid) noexcept {
-  FAIL_OR_CALL(setegid, std::to_string(gid).c_str(), -1, gid);
+  FAIL_OR_CALL(setegid, std::to_string(gid), -1, gid);
 }
 
 int setreuid(uid_t real, uid_t effective) noexcept {
@@ -749,7 +862,7 @@ pid_t fork() noexcept {
 }
 
 int system(const char *command) {
-  support::systemCommands().append(0, command != nullptr ? command : "");
+  support::record(support::systemCommands(), [&] { return command != nullptr ? command : ""; });
   FAIL_OR_CALL(system, command, -1, command);
 }
 
@@ -823,7 +936,8 @@ void *__libc_calloc(size_t count, size_t size);
 void *__libc_realloc(void *memory, size_t size);
 
 void *malloc(size_t size) noexcept {
-  if (support::allocationPlanned && failing(Call::k_malloc, nullptr, size) != nullptr) {
+  if (support::allocationPlanned && !support::OwnWork::isGoingOn() &&
+      failing(Call::k_malloc, nullptr, size) != nullptr) {
     errno = ENOMEM;
     return nullptr;
   }
@@ -831,7 +945,8 @@ void *malloc(size_t size) noexcept {
 }
 
 void *calloc(size_t count, size_t size) noexcept {
-  if (support::allocationPlanned && failing(Call::k_calloc, nullptr, count * size) != nullptr) {
+  if (support::allocationPlanned && !support::OwnWork::isGoingOn() &&
+      failing(Call::k_calloc, nullptr, count * size) != nullptr) {
     errno = ENOMEM;
     return nullptr;
   }
@@ -839,7 +954,8 @@ void *calloc(size_t count, size_t size) noexcept {
 }
 
 void *realloc(void *memory, size_t size) noexcept {
-  if (support::allocationPlanned && failing(Call::k_realloc, nullptr, size) != nullptr) {
+  if (support::allocationPlanned && !support::OwnWork::isGoingOn() &&
+      failing(Call::k_realloc, nullptr, size) != nullptr) {
     errno = ENOMEM;
     return nullptr;
   }

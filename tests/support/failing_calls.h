@@ -28,9 +28,9 @@
 // setgroups localtime localtime_r mktime malloc calloc realloc sleep usleep nanosleep rand srand
 // setsid close_range fork getpwuid_r sqlite3_close.
 //
-// Streams and descriptors 0 to 2 are never touched. fclose and sqlite3_close that are made to fail
-// have closed all the same. sqlite3_open that is made to fail leaves a handle with a message, as
-// the real one does.
+// Streams and descriptors 0 to 2 are never touched. fclose, sqlite3_close and QLIBPluginExit that
+// are made to fail have done their work all the same. sqlite3_open that is made to fail leaves a
+// handle with a message, as the real one does.
 #pragma once
 
 #include <cstddef>
@@ -83,6 +83,37 @@ class FailingAllocation {
   ~FailingAllocation();
   FailingAllocation(const FailingAllocation &) = delete;
   FailingAllocation &operator=(const FailingAllocation &) = delete;
+};
+
+// Within the scope one of all the calls above fails, whichever it is: the nth from the beginning,
+// and all after it when `onwards`. Not counted are what cannot fail (QLIBCFileExist,
+// QLIBCProcAlive, QLIBCSzHashGetValue, sleeps, rand, srand) and what the test's own helpers do.
+//
+//   FailingStep step(3, false);
+//   act();
+//   step.failed();   "rename"; "" when there were fewer calls
+class FailingStep {
+ public:
+  FailingStep(unsigned nth, bool onwards);
+  ~FailingStep();
+  FailingStep(const FailingStep &) = delete;
+  FailingStep &operator=(const FailingStep &) = delete;
+
+  std::string failed() const;
+};
+
+// What is called while one stands is the test's own, and neither fails nor counts in a FailingStep.
+class OwnWork {
+ public:
+  OwnWork() { ++depth_; }
+  ~OwnWork() { --depth_; }
+  OwnWork(const OwnWork &) = delete;
+  OwnWork &operator=(const OwnWork &) = delete;
+
+  static bool isGoingOn() { return depth_ > 0; }
+
+ private:
+  static inline thread_local int depth_ = 0;
 };
 
 // Commands given to system(), which runs them unless a plan stands.

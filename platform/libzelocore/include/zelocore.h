@@ -113,7 +113,8 @@ int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList);
  * half of it and never empty. */
 enum { QLIBC_FILE_SYNC = 1 };
 
-/* 1 when the path exists, else 0. */
+/* 0 when the path does not exist or is null, else 1: also when nobody can tell,
+ * since the disk fails or a directory may not be searched. */
 int QLIBCFileExist(const char *szPath);
 /* Creates an empty file, or updates the times of an existing one. 0, or -1
  * (0x0D00, 0x0900). A symbolic link is not followed. A new file gets mode 0644

@@ -1,0 +1,456 @@
+// Each call that a function of the library makes fails, one after the other: once, and from then
+// on. Whatever fails, the function answers with success or with its failure, what it acknowledged
+// stands, the store and the crontab are whole (the old or the new), nothing temporary stays, and no
+// memory is lost.
+//
+// Prints for each function how many points it can fail at.
+#include <gtest/gtest.h>
+#include <malloc.h>
+#include <sqlite3.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <filesystem>
+#include <functional>
+#include <map>
+#include <set>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "power.h"
+#include "sandbox_fixture.h"
+#include "status_db.h"
+#include "tasks.h"
+#include "zelocore.h"
+#include "zelosched.h"
+
+namespace {
+
+using support::FailingStep;
+using support::makeTask;
+using support::OwnWork;
+using support::setText;
+using support::Task;
+
+constexpr int kTasks = 3;
+
+// ---- the files, before and after
+
+using Files = std::map<std::string, std::string>;
+
+const char *const kKept[] = {support::kStore, support::kPersistentStore, support::kPowerSchedule,
+                             support::kCrontab, support::kWakeAlarm};
+// These change at one stroke. The crontab does so too, but may be changed several times, and lacks
+// the line of a task that could not be read; the alarm is off while it is set.
+const char *const kAtOneStroke[] = {support::kStore, support::kPersistentStore,
+                                    support::kPowerSchedule};
+
+Files keptFiles() {
+  Files files;
+  for (const char *path : kKept) {
+    if (support::fileExists(path)) files[path] = support::readFile(path);
+  }
+  return files;
+}
+
+void putBack(const Files &files) {
+  for (const char *path : kKept) {
+    const auto found = files.find(path);
+    if (found == files.end()) {
+      std::filesystem::remove(path);
+    } else if (support::readFile(path) != found->second) {
+      support::writeFile(path, found->second);
+    }
+  }
+}
+
+std::set<std::string> namesIn(const char *directory) {
+  std::set<std::string> names;
+  for (const auto &entry : std::filesystem::directory_iterator(directory)) {
+    names.insert(entry.path());
+  }
+  return names;
+}
+
+std::set<std::string> temporaryFiles() {
+  std::set<std::string> found;
+  for (const char *directory : {"/tmp", "/etc", "/usr/zelo/etc"}) {
+    for (const std::string &name : namesIn(directory)) {
+      if (name.starts_with("/tmp/scheduled_tasks.") || name.starts_with("/etc/crontab.") ||
+          name.starts_with("/usr/zelo/etc/.") || name.find(".tmp") != std::string::npos) {
+        found.insert(name);
+      }
+    }
+  }
+  return found;
+}
+
+// ---- what is called
+
+// A database whose table cannot be made stays open: callers have always found it so.
+enum class Memory { kGivenBack, kLost };
+
+struct Scenario {
+  const char *name;
+  std::function<long()> act;  // what the function answers
+  std::set<long> good;
+  std::set<long> bad;
+  Memory memory = Memory::kGivenBack;
+};
+
+std::ostream &operator<<(std::ostream &out, const Scenario &scenario) {
+  return out << scenario.name;
+}
+
+long listAll(ZELO_SCHED_TASK_FILTER filter = nullptr) {
+  ZELO_SCHED_TASK *head = nullptr;
+  const long count = ZELOSchedTaskListGet(&head, filter);
+  ZELOSchedTaskListFree(&head);
+  return count;
+}
+
+// What the scenarios work on is there before any call fails.
+ZELO_SCHED_TASK record;
+PSZHASH hash;
+char text[1 << 16];
+
+const ZELO_SCHED_TASK &aTask(int id = -1) {
+  record = {};
+  record.Backend = ZELO_SCHED_BACKEND_SCHEDULE;
+  record.ID = id;
+  std::strcpy(record.Name, "changed");
+  std::strcpy(record.App, "app");
+  std::strcpy(record.AppName, "an app");
+  std::strcpy(record.Action, "an action");
+  std::strcpy(record.Command, "exit 0");
+  std::strcpy(record.Week, "1111111");
+  record.State = ZELO_SCHED_STATE_ENABLED;
+  record.Type = ZELO_SCHED_TYPE_DAILY;
+  record.CanRunAppSameTime = 1;
+  return record;
+}
+
+ZELO_SCHED_TASK *aPowerTask(int id = -1) {
+  aTask(id);
+  record.Backend = ZELO_SCHED_BACKEND_AUTOPOWER;
+  std::strcpy(record.AppArgs, "poweroff");
+  record.RunHour = 22;
+  return &record;
+}
+
+ZELO_SCHED_TASK *edited(int id = -1) {
+  aTask(id);
+  return &record;
+}
+
+std::string jsonOfATask() {
+  const OwnWork own;
+  ZELOSchedTaskConvertToJson(edited(), text, sizeof(text));
+  return text;
+}
+
+// Open before any call fails, in the scenarios that have one.
+sqlite3 *database = nullptr;
+
+long hookAction() {
+  ZELO_SCHED_PLUGIN plugin = {};
+  if (ZELOSchedTaskPluginInit(&plugin, "task_edit", edited(1), edited(1)) < 0) return -1;
+  const int before = ZELOSchedTaskPlugin(ZELO_SCHED_PLUGIN_PRE, &plugin);
+  const int after = ZELOSchedTaskPlugin(ZELO_SCHED_PLUGIN_POST, &plugin);
+  const int exit = ZELOSchedTaskPluginExit(&plugin);
+  return before < 0 || after < 0 || exit < 0 ? -1 : 0;
+}
+
+const Scenario kScenarios[] = {
+    {"ZELOSchedBackendInit", [] { return long{ZELOSchedBackendInit()}; }, {0}, {-1}},
+    {"ZELOSchedInitHashFromTask",
+     [] { return long{ZELOSchedInitHashFromTask(&hash, edited(1))}; },
+     {0},
+     {-1}},
+    {"ZELOSchedInitTaskFromHash",
+     [] {
+       static ZELO_SCHED_TASK filled;
+       return long{ZELOSchedInitTaskFromHash(&filled, hash)};
+     },
+     {0},
+     {-1}},
+    {"ZELOSchedNextTriggerTime",
+     [] { return long{ZELOSchedNextTriggerTime(edited(1))}; },
+     {0},
+     {-1}},
+    {"ZELOSchedDateGet",
+     [] {
+       ZELO_SCHED_DATE date;
+       return long{ZELOSchedDateGet(&date)};
+     },
+     {0},
+     {-1}},
+    {"ZELOSchedDateNormalize",
+     [] {
+       ZELO_SCHED_DATE date = {2026, 14, 35, 0, 0, 0};
+       return long{ZELOSchedDateNormalize(&date)};
+     },
+     {0},
+     {-1}},
+    {"ZELOSchedTaskAlloc",
+     [] {
+       ZELO_SCHED_TASK *task = ZELOSchedTaskAlloc();
+       if (task == nullptr) return 0L;
+       ZELOSchedTaskFree(task);
+       return 1L;
+     },
+     {1},
+     {0}},
+    {"ZELOSchedTaskGetDefault", [] { return long{ZELOSchedTaskGetDefault(edited())}; }, {0}, {-1}},
+    {"ZELOSchedTaskGetByID", [] { return long{ZELOSchedTaskGetByID(2, edited())}; }, {0}, {-1}},
+    {"ZELOSchedTaskLoad", [] { return long{ZELOSchedTaskLoad(2, edited())}; }, {0}, {-1}},
+    // A backend that cannot be listed is passed over, and so is a section.
+    {"ZELOSchedTaskListGet", [] { return listAll(); }, {kTasks + 1, 0, 1, 2, 3}, {-1}},
+    {"ZELOSchedTaskListSort",
+     [] {
+       ZELO_SCHED_TASK *head = nullptr;
+       const OwnWork own;
+       ZELOSchedTaskListGet(&head, nullptr);
+       const long result = ZELOSchedTaskListSort(&head, "name", 1);
+       ZELOSchedTaskListFree(&head);
+       return result;
+     },
+     {0},
+     {-1}},
+    {"ZELOSchedTaskCreate", [] { return long{ZELOSchedTaskCreate(edited())}; }, {0}, {-1}},
+    {"ZELOSchedTaskEdit", [] { return long{ZELOSchedTaskEdit(edited(2))}; }, {0}, {-1}},
+    {"ZELOSchedTaskSave", [] { return long{ZELOSchedTaskSave(edited(3))}; }, {0}, {-1}},
+    {"ZELOSchedTaskRemove", [] { return long{ZELOSchedTaskRemove(1)}; }, {0}, {-1}},
+    {"ZELOSchedTaskSync", [] { return long{ZELOSchedTaskSync()}; }, {0}, {-1}},
+    {"ZELOSchedTaskCreate (power)",
+     [] { return long{ZELOSchedTaskCreate(aPowerTask())}; },
+     {0},
+     {-1}},
+    {"ZELOSchedTaskRemove (power)", [] { return long{ZELOSchedTaskRemove(91272130)}; }, {0}, {-1}},
+    {"ZELOSchedTaskConvertToJson",
+     [] { return long{ZELOSchedTaskConvertToJson(edited(1), text, sizeof(text))}; },
+     {0},
+     {-1}},
+    {"ZELOSchedTaskConvertToJsonById",
+     [] { return long{ZELOSchedTaskConvertToJsonById(2, text, sizeof(text))}; },
+     {0},
+     {-1}},
+    {"ZELOSchedTaskSaveFromJson",
+     [] {
+       static const std::string json = jsonOfATask();
+       return long{ZELOSchedTaskSaveFromJson(json.c_str(), 1)};
+     },
+     {kTasks + 1},
+     {-1}},
+    {"ZELOSchedTaskPlugin", hookAction, {0}, {-1}},
+    {"ZELOSchedDBInit",
+     [] {
+       sqlite3 *opened = ZELOSchedDBInit();
+       if (opened == nullptr) return 0L;
+       sqlite3_close(opened);
+       return 1L;
+     },
+     {1},
+     {0},
+     Memory::kLost},
+    {"ZELOSchedDBAddRecord",
+     [] {
+       int id = 0;
+       return long{ZELOSchedDBAddRecord(database, edited(1), &id)};
+     },
+     {0},
+     {-1}},
+    {"ZELOSchedDBSetStatus",
+     [] { return long{ZELOSchedDBSetStatus(database, 1, 2, 3, "done")}; },
+     {0},
+     {-1}},
+    {"ZELOSchedDBGetStatusByStatusID",
+     [] {
+       int code = 0;
+       char comment[16];
+       return long{ZELOSchedDBGetStatusByStatusID(database, 1, &code, comment, sizeof(comment))};
+     },
+     {1},
+     {-1}},
+    {"ZELOSchedDBGetStatusByTaskID",
+     [] {
+       long timestamp = 0;
+       int code = 0;
+       char comment[16];
+       return long{
+           ZELOSchedDBGetStatusByTaskID(database, 1, &timestamp, &code, comment, sizeof(comment))};
+     },
+     {1},
+     {-1}},
+    {"ZELOSchedDBIsTaskRunning",
+     [] {
+       ZELO_SCHED_STATUS status = {};
+       return long{ZELOSchedDBIsTaskRunning(database, 1, &status)};
+     },
+     {0},
+     {-1}},
+    {"ZELOSchedDBIsAppRunning",
+     [] {
+       ZELO_SCHED_STATUS status = {};
+       return long{ZELOSchedDBIsAppRunning(database, "app", &status)};
+     },
+     {0},
+     {-1}},
+    {"ZELOSchedTaskRun",
+     [] {
+       const long result = ZELOSchedTaskRun(2, 0, 0);
+       const OwnWork own;
+       support::waitForChildRuns();
+       return result;
+     },
+     {0},
+     {-1}},
+};
+
+class FailingStepsTest : public support::SandboxTest, public testing::WithParamInterface<Scenario> {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    support::haveClock();
+    std::filesystem::remove_all(support::kPowerSchedule);
+    hash = QLIBCSzHashAlloc(64);
+    for (int i = 0; i < kTasks; ++i) support::saveTask(makeTask("task", "exit 0"));
+    ASSERT_EQ(ZELOSchedInitHashFromTask(&hash, edited(1)), 0);
+    support::setPowerList(support::kOff, {{1, 127, 21, 30}});
+    ASSERT_EQ(ZELOSchedTaskSync(), 0);
+    std::filesystem::remove_all(support::kStatusDatabase);
+    support::addStatusRow({.pid = 1, .timestamp = 5, .app = "app", .taskId = 1, .statusCode = 3});
+    database = ZELOSchedDBInit();
+    ASSERT_NE(database, nullptr);
+    before_ = keptFiles();
+    temporary_ = temporaryFiles();
+
+    GetParam().act();  // what is made ready once in a process's life is ready now
+    putBack(before_);
+    const long result = GetParam().act();
+    ASSERT_EQ(GetParam().good.count(result), 1U) << result;
+    after_ = keptFiles();
+    putBack(before_);
+    ASSERT_EQ(temporaryFiles(), temporary_);
+  }
+  void TearDown() override {
+    QLIBCSzHashFree(hash);
+    sqlite3_close(database);
+    std::filesystem::remove_all(support::kPowerSchedule);
+    SandboxTest::TearDown();
+  }
+
+  // The name of the call that failed, "" when there are fewer.
+  std::string step(unsigned nth, bool onwards) {
+    support::clearLog();
+    QLIBCErrSetEx(0, "", 0);
+    long result = 0;
+    std::string failed;
+    {
+      const FailingStep failing(nth, onwards);
+      result = GetParam().act();
+      failed = failing.failed();
+    }
+    SCOPED_TRACE(failed + " failed, call " + std::to_string(nth) + (onwards ? " and on" : ""));
+    check(result, failed, onwards);
+    putBack(before_);
+    return failed;
+  }
+
+  void check(long result, const std::string &failed, bool onwards) {
+    const bool succeeded = GetParam().good.count(result) == 1;
+    // A task that does not convert is nobody's, and its id is given to the next.
+    const bool isGivenAway = failed == "ZELOEncodingBase64Decode";
+    EXPECT_TRUE(succeeded || isGivenAway || GetParam().bad.count(result) == 1)
+        << "answer " << result;
+    const Files files = keptFiles();
+    for (const char *path : kAtOneStroke) {
+      const bool isOld = same(files, before_, path);
+      const bool isNew = same(files, after_, path);
+      EXPECT_TRUE(isOld || isNew || isGivenAway) << path << " is neither the old nor the new";
+    }
+    if (succeeded && !isGivenAway) {
+      for (const char *path : {support::kStore, support::kPersistentStore}) {
+        EXPECT_TRUE(same(files, after_, path)) << path << " lacks what was acknowledged";
+      }
+    }
+    checkCrontab();
+    EXPECT_EQ(pfLock, nullptr);
+    EXPECT_EQ(geteuid(), 0U);
+    if (failed == "unlink" || onwards) {
+      removeTemporaryFiles();  // nothing could
+    }
+    EXPECT_EQ(temporaryFiles(), temporary_);
+  }
+
+  void removeTemporaryFiles() const {
+    for (const std::string &name : temporaryFiles()) {
+      if (temporary_.count(name) == 0) std::filesystem::remove(name);
+    }
+  }
+
+  void checkCrontab() const {
+    const std::string crontab = support::readFile(support::kCrontab);
+    EXPECT_TRUE(crontab.starts_with(support::kPlainCrontab));
+    for (const std::string &line : support::crontabLines()) {
+      EXPECT_TRUE(holdsLine(before_, line) || holdsLine(after_, line)) << line;
+    }
+  }
+
+  static bool holdsLine(const Files &files, const std::string &line) {
+    return files.at(support::kCrontab).find("\n" + line + "\n") != std::string::npos;
+  }
+
+  static bool same(const Files &a, const Files &b, const char *path) {
+    const auto inA = a.find(path);
+    const auto inB = b.find(path);
+    if (inA == a.end() || inB == b.end()) return inA == a.end() && inB == b.end();
+    return inA->second == inB->second;
+  }
+
+  static bool watchesMemory() {
+    return support::kAllocationsCanFail && GetParam().memory == Memory::kGivenBack;
+  }
+
+  // What is lost at one step is lost again at each repetition of it.
+  bool losesMemory(unsigned nth) {
+    constexpr int kMost = 12;
+    size_t used = 0;
+    for (int i = 0; i < kMost; ++i) {
+      step(nth, false);
+      const size_t now = mallinfo2().uordblks;
+      if (i > 0 && now <= used) return false;
+      used = now;
+    }
+    return true;
+  }
+
+  Files before_;
+  Files after_;
+  std::set<std::string> temporary_;
+};
+
+TEST_P(FailingStepsTest, WhicheverCallFails) {
+  unsigned points = 0;
+  for (const bool onwards : {false, true}) {
+    unsigned nth = 1;
+    while (!step(nth, onwards).empty()) {
+      if (!onwards && watchesMemory() && losesMemory(nth)) {
+        ADD_FAILURE() << "memory is lost at call " << nth << ", " << step(nth, false);
+      }
+      if (HasFailure()) return;
+      ++nth;
+    }
+    points = nth - 1;
+  }
+  printf("%-32s %u points of failure\n", GetParam().name, points);
+}
+
+INSTANTIATE_TEST_SUITE_P(Each, FailingStepsTest, testing::ValuesIn(kScenarios),
+                         [](const testing::TestParamInfo<Scenario> &param) {
+                           std::string name = param.param.name;
+                           std::erase_if(name, [](char c) { return std::isalnum(c) == 0; });
+                           return name;
+                         });
+
+}  // namespace
