@@ -2,8 +2,11 @@
 // it holds, nothing is saved unless all of it could be read.
 #include <zelocore.h>
 #include <zelosched.h>
+#include <zelosdk.h>
 
 #include <charconv>
+#include <cstdint>
+#include <cstdlib>
 #include <cstring>
 #include <exception>
 #include <string>
@@ -11,11 +14,16 @@
 
 #include "sched_guards.h"
 #include "sched_json.h"
+#include "sched_parm_table.h"
 #include "sched_report.h"
 
 namespace {
 
 constexpr int kHashCapacity = 512;
+// The longest text of a task is a few hundred KB, and a value that is read takes up to sixty times
+// its text: a text of more than this is meant to exhaust the machine.
+constexpr size_t kLongestText = size_t{4} << 20;
+constexpr char kCommandKey[] = "cmd";
 
 // The reader stops at the end of the value. Blanks and comments may follow, nothing else.
 bool isAllThereIs(std::string_view rest) {
@@ -78,7 +86,7 @@ bool hasHalfPair(std::string_view text) {
 // The reader throws where a text is nested too deeply.
 bool parse(const std::string &text, Json::Value *value) {
   try {
-    return schedReadJson(text, value) && !hasHalfPair(text) &&
+    return text.size() <= kLongestText && schedReadJson(text, value) && !hasHalfPair(text) &&
            isAllThereIs(
                std::string_view(text).substr(static_cast<size_t>(value->getOffsetLimit())));
   } catch (const Json::Exception &) {
@@ -100,10 +108,49 @@ bool decodeMember(const Json::Value &member, std::string *text) {
   return isPlainText(*text);
 }
 
+long long numberIn(const char *szText) {
+  constexpr int kDecimal = 10;
+  return strtoll(szText, nullptr, kDecimal);
+}
+
+// A field has 32 bits, and a number that does not fit would become another one in it: uid 0 of
+// 4294967296. What is no number at all is left to the conversion.
+bool fitsNumber(const SchedParm &parm, const char *szNumber) {
+  uint32_t field = 0;
+  char szKept[32];
+  return parm.fnFromHashStr(&field, szNumber) < 0 ||
+         parm.ToHashStr(&field, szKept, sizeof(szKept)) < 0 ||
+         numberIn(szKept) == numberIn(szNumber);
+}
+
+// Half a command is another command. What is no Base64 is left to the conversion.
+bool fitsCommand(const std::string &encoded) {
+  constexpr size_t kCapacity = sizeof(ZELO_SCHED_TASK::Command);
+  if (encoded.size() >= kCapacity) {
+    return false;
+  }
+  char command[kCapacity];
+  size_t length = sizeof(command);
+  return ZELOEncodingBase64Decode(encoded.data(), encoded.size(), command, &length) == 0 ||
+         memchr(command, '\0', length) == nullptr;
+}
+
+bool fitsField(const std::string &name, const std::string &text) {
+  if (name == kCommandKey) {
+    return fitsCommand(text);
+  }
+  for (const SchedParm *parm = parm_table; parm->szKey != nullptr; ++parm) {
+    if (name == parm->szKey && parm->fnFromHashStr != nullptr) {
+      return fitsNumber(*parm, text.c_str());
+    }
+  }
+  return true;
+}
+
 int fillHash(const Json::Value &root, HashGuard *hash) {
   for (const std::string &name : root.getMemberNames()) {
     std::string text;
-    if (!isPlainText(name) || !decodeMember(root[name], &text) ||
+    if (!isPlainText(name) || !decodeMember(root[name], &text) || !fitsField(name, text) ||
         QLIBCSzHashSetValue(hash->handle(), name.c_str(), text.c_str()) < 0) {
       SCHED_LOG("save appargs failed");
       return -1;

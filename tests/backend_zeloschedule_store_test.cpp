@@ -438,20 +438,20 @@ TEST_F(StoreTest, NothingIsBuiltOnAStoreWithoutBytesBesideAPersistentCopyThatHas
 
 TEST_F(StoreTest, AChangeWaitsForTheOneOfAnotherProcessButNotForEver) {
   create("first");
-  const int directory = open("/usr/zelo/etc", O_RDONLY | O_DIRECTORY);
-  ASSERT_EQ(flock(directory, LOCK_EX), 0);
+  const int file = open("/run/zeloscheduler.lock", O_RDWR);
+  ASSERT_EQ(flock(file, LOCK_EX), 0);
   support::clearSleeps();
   support::onSleep([&](size_t sleeps) {
-    if (sleeps == 3) flock(directory, LOCK_UN);
+    if (sleeps == 3) flock(file, LOCK_UN);
   });
   create("second");
   EXPECT_EQ(support::recordedSleeps().size(), 3U);
   support::onSleep({});
-  ASSERT_EQ(flock(directory, LOCK_EX), 0);
+  ASSERT_EQ(flock(file, LOCK_EX), 0);
   support::clearSleeps();
   create("third");
   EXPECT_EQ(support::recordedSleeps().size(), 1000U);
-  close(directory);
+  close(file);
   EXPECT_EQ(listedIds().size(), 3U);
 }
 

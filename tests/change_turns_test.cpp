@@ -1,5 +1,6 @@
 // Processes that change tasks of both backends at once: each change stands afterwards, in the
 // store, in the power schedule and in the crontab.
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -87,6 +88,20 @@ TEST_F(ChangeTurnsTest, NoChangeOfSeveralProcessesIsLost) {
   EXPECT_EQ(linesWith("/tmp/zeloschedtask"), kWriters * kChanges);
   EXPECT_EQ(linesWith("zelo_poweroff_feasible_check"), kWriters * kChanges);
   EXPECT_EQ(support::logged(), Lines{});
+}
+
+TEST_F(ChangeTurnsTest, NobodyElseCanKeepTheOthersWaiting) {
+  REQUIRE_OTHER_USERS();
+  ASSERT_TRUE(addOrdinary(0, 0));
+  const pid_t other = fork();
+  if (other == 0) {
+    constexpr uid_t kOther = 65534;
+    const bool became = setresuid(kOther, kOther, kOther) == 0;
+    _exit(became && open("/run/zeloscheduler.lock", O_RDONLY) < 0 ? 0 : 1);
+  }
+  int status = -1;
+  ASSERT_EQ(waitpid(other, &status, 0), other);
+  EXPECT_EQ(status, 0);
 }
 
 }  // namespace

@@ -282,6 +282,17 @@ TEST_F(PowerConfTest, AFileWithSomethingElseThanPowerTimesIsAFailure) {
   }
 }
 
+TEST_F(PowerConfTest, AListWhoseLineWasDamagedIsAFailureAndIsNotWrittenOver) {
+  for (const char *text : {"[poweroff]\ntimes=\"1 127 22 15\n", "[poweroff]\n",
+                           "[poweroff]\n[poweroff]\ntimes=\"1 127 22 15\"\n"}) {
+    SCOPED_TRACE(text);
+    writeFile(support::kPowerSchedule, text);
+    Entry entry = {};
+    EXPECT_TRUE(failedWith(ZELOAutoPowerConfGet(kOff, 1, &entry), kMalformed));
+    EXPECT_EQ(ZELOAutoPowerConfGet(kOn, 1, &entry), 0);
+  }
+}
+
 TEST_F(PowerConfTest, AFileCutOffIsAFailureAndIsNotBuiltUpon) {
   setPowerList(kOn, {{1, 127, 7, 30}});
   const std::string whole = readFile(support::kPowerSchedule);

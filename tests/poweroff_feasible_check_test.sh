@@ -138,6 +138,16 @@ check "nor is a link to one of our own" same "$(outcome "$INSTALLED")" \
   "1 $DATABASE is not this user's own file"
 rm "$DATABASE"
 
+# SQLite reads these beside the database, and would believe them.
+empty_table
+for beside in journal wal shm; do
+  mkfifo "$DATABASE-$beside"
+  check "a planted $beside is in the way, and not opened" \
+    same "$(outcome timeout 10 "$INSTALLED")" "1 $DATABASE-$beside is not this user's own file"
+  rm "$DATABASE-$beside"
+done
+check "without them the machine may go off" same "$(outcome "$INSTALLED")" "0 "
+
 echo "no database" >"$DATABASE"
 check "a database that cannot be read is in the way" \
   same "$(outcome "$INSTALLED" | tail -n 1)" "cannot read $DATABASE"

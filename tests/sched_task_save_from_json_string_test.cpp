@@ -324,6 +324,34 @@ TEST_F(TaskFromJsonTest, AZeroByteIsRefusedRatherThanCut) {
   expectMemberRefused(R"("\"n\"","a\u0000b":"\"x\"")");
 }
 
+// 4294967296 would be uid 0 in a field of 32 bits.
+TEST_F(TaskFromJsonTest, ANumberThatDoesNotFitItsFieldIsRefusedRatherThanCut) {
+  const std::pair<const char *, const char *> kTooLarge[] = {
+      {"owner", "4294967296"},    {"owner", "-1"},
+      {"owner", "-4294967296"},   {"owner", "99999999999999999999"},
+      {"run hour", "4294967296"}, {"id", "4294967297"},
+      {"id", "2147483648"},       {"id", "-2147483649"},
+      {"listable", "4294967296"},
+  };
+  for (const auto &[key, value] : kTooLarge) {
+    SCOPED_TRACE(std::string(key) + " " + value);
+    expectRefused(taskText({{key, value}}), "save appargs failed");
+  }
+  EXPECT_EQ(save(taskText({{"owner", "4294967295"}, {"id", "2147483647"}})), 1);
+  EXPECT_EQ(loadTask(1)->Owner, 4294967295U);
+}
+
+TEST_F(TaskFromJsonTest, ACommandThatWouldBeCutIsRefused) {
+  const std::string longest(16380, 'Q');  // 12,285 bytes
+  for (const std::string &encoded :
+       {std::string("ZWNobyBoaQAgLXJm"), std::string("AA=="), longest + "QUFB", longest + "%%%%"}) {
+    SCOPED_TRACE(encoded.substr(0, 20));
+    expectRefused(taskText({{"cmd", encoded}}), "save appargs failed");
+  }
+  EXPECT_EQ(save(taskText({{"cmd", longest}})), 1);
+  EXPECT_EQ(std::string(loadTask(1)->Command).size(), 12285U);
+}
+
 TEST_F(TaskFromJsonTest, BytesThatAreNotUtf8AreSavedAsTheyAre) {
   ASSERT_EQ(save(taskText({{"name", "caf\xE9 \xFF\xC3"}})), 1);
   EXPECT_STREQ(loadTask(1)->Name, "caf\xE9 \xFF\xC3");
@@ -334,6 +362,14 @@ TEST_F(TaskFromJsonTest, ATextCutOffAfterAHundredMegabytesIsRefusedAndQuotedWhol
   std::string text = "{\"name\":\"";
   text.resize(kSize, 'x');
   expectNotJson(text);
+}
+
+// Of many small values each takes sixty times its text in memory.
+TEST_F(TaskFromJsonTest, ATextThatIsFarLongerThanAnyTaskIsRefused) {
+  const std::string good = taskText();
+  std::string tooLong = good.substr(0, good.size() - 1) + ",\"x\":[0";
+  while (tooLong.size() < (size_t{4} << 20)) tooLong += ",0";
+  expectNotJson(tooLong + "]}");
 }
 
 TEST_F(TaskFromJsonTest, ManyCommentsAreReadInLittleTime) {

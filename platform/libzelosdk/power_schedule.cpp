@@ -144,11 +144,13 @@ int ReadPowerList(int list, std::vector<ZELO_AUTOPOWER> *entries) {
   if (read < 0) {
     return -1;
   }
-  const char *times = read > 0 ? QLIBCSzHashGetValue(hash.get(), kTimesKey) : nullptr;
-  if (times != nullptr && !Parse(times, entries)) {
-    return Fail(kMalformed);
+  if (read == 0) {
+    return 0;
   }
-  return 0;
+  /* Every list that is written has its times, if none. Without them the line was
+   * damaged, and what it held must not be written over by a list without it. */
+  const char *times = QLIBCSzHashGetValue(hash.get(), kTimesKey);
+  return times != nullptr && Parse(times, entries) ? 0 : Fail(kMalformed);
 }
 
 }  // namespace zelo
