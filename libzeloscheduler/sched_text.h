@@ -23,6 +23,8 @@ void copyText(char (&szBuf)[N], const char *szText) {
 template <size_t N>
 class BoundedText {
  public:
+  BoundedText() { text_[0] = '\0'; }
+
   const char *c_str() const { return text_; }
   bool wasCut() const { return wasCut_; }
 
@@ -41,7 +43,7 @@ class BoundedText {
   }
 
  private:
-  char text_[N] = "";
+  char text_[N];
   size_t length_ = 0;
   bool wasCut_ = false;
 };

@@ -22,6 +22,10 @@ install_all() {
     { cat /tmp/install_test/log; return 1; }
 }
 
+installed_outside() {
+  grep -v "^$PREFIX/" "$BUILD_DIR/install_manifest.txt" || true
+}
+
 # Man pages are counted by their own test.
 installed_files() {
   (cd "$PREFIX" && find . -type f -o -type l) | sed 's|^\./||' | grep -v '^share/man/' | sort
@@ -43,7 +47,10 @@ include/zelosched.h
 include/zeloschedgetter.h
 include/zeloschedsetter.h
 include/zelosdk.h
+libexec/zelosched/zelo_poweroff_feasible_check
+sbin/zelosched
 sbin/zeloschedtask
+share/bash-completion/completions/zelosched
 FILES
 }
 
@@ -113,6 +120,7 @@ failed_run() {
 }
 
 check "everything is installed into an empty prefix" install_all
+check "nothing is installed outside of it" same "$(installed_outside)" ""
 lib=$(cd "$PREFIX" && dirname "$(find . -name libzeloscheduler.so.4)" | sed 's|^\./||')
 readonly lib
 build_type=$(sed -n 's/^CMAKE_BUILD_TYPE:[A-Z]*=//p' "$BUILD_DIR/CMakeCache.txt")
@@ -121,7 +129,7 @@ check "the files are the library, the platform, headers, package files and tools
 check "the name without a version leads to the library" \
   same "$(readlink "$PREFIX/$lib/libzeloscheduler.so")" libzeloscheduler.so.4
 check "nothing that is installed names the checkout" nothing_leads_out
-for file in "$lib/libzeloscheduler.so.4" "$lib/libzelosdk.so" sbin/zeloschedtask; do
+for file in "$lib/libzeloscheduler.so.4" "$lib/libzelosdk.so" sbin/zelosched sbin/zeloschedtask; do
   check "$(basename "$file") has no run path" has_no_run_path "$file"
 done
 check "the version is pkg-config's" same "$(flags --modversion zeloscheduler)" 4.0.0

@@ -319,6 +319,11 @@ TEST_F(ZelocoreSectionFile, MalformedLinesAreIgnored) {
   EXPECT_EQ(Section("1"), (Keys{{"b", "x"}}));
 }
 
+TEST_F(ZelocoreSectionFile, ALineOfQuotesIsIgnored) {
+  Write("[1]\n\"\"\"\"\"\"\na=\"b\"\n");
+  EXPECT_EQ(Section("1"), (Keys{{"a", "b"}}));
+}
+
 TEST_F(ZelocoreSectionFile, UnknownEscapesStandAsTheyAre) {
   Write("[1]\na=\"\\d\\x4\\xg1\\x00\\x41\\\"\n");
   EXPECT_EQ(Get("1"), 1);
@@ -331,6 +336,12 @@ TEST_F(ZelocoreSectionFile, UnknownEscapesStandAsTheyAre) {
 TEST_F(ZelocoreSectionFile, AZeroByteEndsItsText) {
   Write("[1]\na=\"x\0y\"\nb\0c=\"z\"\n"s);
   EXPECT_EQ(Section("1"), (Keys{{"a", "x"}, {"b", "z"}}));
+}
+
+TEST_F(ZelocoreSectionFile, AZeroByteEndsTheNameOfASection) {
+  Write(std::string("[1\0x]\na=b\n[\0]\nc=d\n", 20));
+  EXPECT_EQ(Names(), Texts{"1"});
+  EXPECT_EQ(Section("1"), (Keys{{"a", "b"}, {"c", "d"}}));
 }
 
 TEST_F(ZelocoreSectionFile, ReadingAddsToWhatTheHashHolds) {

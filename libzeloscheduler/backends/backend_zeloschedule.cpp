@@ -192,7 +192,7 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
     }
     if (walk.fill(task.get()) == 0 && (filter == nullptr || filter(task.get()) != 0)) {
       task->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
-      tasks.pushFront(std::move(task));
+      tasks.pushFront(TaskGuard(task.release()));
       ++count;
     }
   }

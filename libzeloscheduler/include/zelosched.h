@@ -246,8 +246,9 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
  * string or whose string is no JSON string, half of a surrogate pair, a zero
  * byte, too deep a nesting, anything but blanks and comments after the end, a
  * number that does not fit its field, a command of more than 12287 bytes, and a
- * text of more than 4 MiB are failures, and then nothing is saved. Bytes that are not UTF-8 are saved as they
- * are; another text that is longer than its field is cut to it.
+ * text of more than 4 MiB are failures, and then nothing is saved. Bytes that are
+ * not UTF-8 are saved as they are; another text that is longer than its field is
+ * cut to it.
  *
  * The id of the saved task (0 or more), or -1: no code of its own for a null or
  * empty text or one that cannot be read, else what the callee left. An object

@@ -15,7 +15,6 @@
 #include <cstdint>
 #include <map>
 #include <memory>
-#include <source_location>
 #include <string>
 #include <string_view>
 #include <thread>
@@ -57,8 +56,7 @@ void *MarkOf(const void *context) noexcept {
 }
 
 /* The live context, or null with 0x0D00. */
-Context *ContextOf(void **words,
-                   std::source_location where = std::source_location::current()) noexcept {
+Context *ContextOf(void **words, zelo::Place where = zelo::Place::Here()) noexcept {
   if (words == nullptr || words[kWordContext] == nullptr ||
       words[kWordMark] != MarkOf(words[kWordContext])) {
     zelo::Fail(QLIBC_ERR_BAD_PARAMETER, where);
@@ -178,6 +176,7 @@ bool EndsInTime(pid_t pid) {
 
 std::vector<char *> Pointers(std::vector<std::string> &texts) {
   std::vector<char *> pointers;
+  pointers.reserve(texts.size() + 1);
   for (std::string &text : texts) {
     pointers.push_back(text.data());
   }

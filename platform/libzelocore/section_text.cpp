@@ -198,6 +198,11 @@ bool Unquote(std::string_view text, std::string *value) {
 
 /* ---- lines ---- */
 
+/* A text for C ends at its first zero byte. */
+std::string_view UpToZero(std::string_view text) noexcept {
+  return text.substr(0, text.find('\0'));
+}
+
 /* False for a line that gives no name: it is an ordinary line then. */
 bool ParseSectionLine(std::string_view line, std::string_view *name) noexcept {
   const size_t close = line.find(']');
@@ -205,13 +210,8 @@ bool ParseSectionLine(std::string_view line, std::string_view *name) noexcept {
       !IsCommentOrEmpty(TrimLeft(line.substr(close + 1)))) {
     return false;
   }
-  *name = Trim(line.substr(1, close - 1));
+  *name = Trim(UpToZero(line.substr(1, close - 1)));
   return !name->empty();
-}
-
-/* A text for C ends at its first zero byte. */
-std::string_view UpToZero(std::string_view text) noexcept {
-  return text.substr(0, text.find('\0'));
 }
 
 /* The general way to read a line, with all that a hand may have written. */
@@ -243,7 +243,7 @@ bool ReadPlainLine(std::string_view line, QLIBC_SZHASH &hash) {
     return false;
   }
   const size_t equals = line.find('=');
-  if (equals == 0 || equals + 2 >= line.size() || line[equals + 1] != '"' ||
+  if (equals == 0 || equals >= line.size() - 2 || line[equals + 1] != '"' ||
       IsBlank(line[equals - 1])) {
     return false;
   }

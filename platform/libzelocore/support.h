@@ -9,27 +9,36 @@
 
 #include <cstring>
 #include <exception>
-#include <source_location>
 #include <utility>
 
 #include "zelocore.h"
 
 namespace zelo {
 
+/* A line of the source: that of the outermost caller, where it is a default
+ * argument. */
+struct Place {
+  const char *file;
+  int line;
+
+  static constexpr Place Here(const char *file = __builtin_FILE(),
+                              int line = __builtin_LINE()) noexcept {
+    return {file, line};
+  }
+};
+
 /* Sets the error record to the caller's own file and line; always -1, so that
  * a failing function can return the call. */
-inline int Fail(int code, std::source_location where = std::source_location::current()) noexcept {
-  const char *slash = std::strrchr(where.file_name(), '/');
-  QLIBCErrSetEx(code, slash != nullptr ? slash + 1 : where.file_name(),
-                static_cast<int>(where.line()));
+inline int Fail(int code, Place where = Place::Here()) noexcept {
+  const char *slash = std::strrchr(where.file, '/');
+  QLIBCErrSetEx(code, slash != nullptr ? slash + 1 : where.file, where.line);
   return -1;
 }
 
 /* Runs the body of an exported function. The containers throw only for want of
  * memory (bad_alloc, length_error), hence the one code. */
 template <typename Result, typename Body>
-Result AtBoundary(Result failed, Body &&body,
-                  std::source_location where = std::source_location::current()) noexcept {
+Result AtBoundary(Result failed, Body &&body, Place where = Place::Here()) noexcept {
   try {
     return std::forward<Body>(body)();
   } catch (const std::exception &) {

@@ -8,7 +8,7 @@
 #include <cstring>
 #include <limits>
 
-#include "sdk_error.h"
+#include "support.h"
 #include "zelosdk.h"
 
 namespace {
@@ -46,7 +46,8 @@ bool Decode(const char *text, size_t size, char *out, size_t room, size_t *decod
 
 int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, int /*reserved*/) {
   if (src == nullptr || dst == nullptr || !Fits(cbSrc, cbDst)) {
-    return zelo::FailWith(0, QLIBC_ERR_BAD_PARAMETER);
+    zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return 0;
   }
   base64_encode_raw(dst, cbSrc, reinterpret_cast<const uint8_t *>(src));
   dst[BASE64_ENCODE_RAW_LENGTH(cbSrc)] = '\0';
@@ -57,7 +58,8 @@ int ZELOEncodingBase64Decode(const char *src, size_t cbSrc, char *dst, size_t *p
   size_t decoded = 0;
   if (src == nullptr || dst == nullptr || pcbDst == nullptr ||
       !Decode(src, cbSrc, dst, *pcbDst, &decoded)) {
-    return zelo::FailWith(0, QLIBC_ERR_BAD_PARAMETER);
+    zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return 0;
   }
   *pcbDst = decoded;
   return 1;

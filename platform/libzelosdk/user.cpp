@@ -8,7 +8,7 @@
 #include <cstring>
 #include <memory>
 
-#include "sdk_error.h"
+#include "support.h"
 #include "zelosdk.h"
 
 namespace {
@@ -83,12 +83,12 @@ int LookUp(uid_t uid, Owned<ZELOUSER> *user) noexcept {
 
 int ZELOUserGetByUID(uid_t uid, PZELOUSER *ppUser) {
   if (ppUser == nullptr) {
-    return zelo::FailWith(-1, QLIBC_ERR_BAD_PARAMETER);
+    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
   }
   Owned<ZELOUSER> user;
   const int code = LookUp(uid, &user);
   if (code != 0) {
-    return zelo::FailWith(-1, code);
+    return zelo::Fail(code);
   }
   *ppUser = user.release();
   return 0;

@@ -160,9 +160,10 @@ int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue,
 
 /* Runs szProgram with the arguments that follow, ended by NULL, and waits. The
  * exit status; 128 + N when signal N ended it (0x2A00 for either, unless it is
- * 0); -1 when it could not be started (0x2A00) or has more than 255 arguments (0x0D00). The program is not looked
- * up in PATH; it starts with default signal handling and the caller's
- * environment. SIGCHLD may be ignored or handled by the caller. */
+ * 0); -1 when it could not be started (0x2A00) or has more than 255 arguments
+ * (0x0D00). The program is not looked up in PATH; it starts with default signal
+ * handling and the caller's environment. SIGCHLD may be ignored or handled by the
+ * caller. */
 int QLIBCExec(const char *szProgram, ...) __attribute__((sentinel));
 /* Forks a child that the caller need not wait for and that leaves no zombie:
  * 1 in the calling process, 0 in the child, -1 when there is no child

@@ -1,0 +1,702 @@
+#!/bin/bash
+# What the administrator's program does around a boot: it puts the tasks back into /tmp, keeps the
+# history, and makes up for what was missed while the machine was off.
+#
+# Functions are called by check:
+# shellcheck disable=SC2317
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+
+readonly ZELOSCHED=$BUILD_DIR/bin/zelosched
+readonly SCRATCH=/run/zelosched_boot_test
+readonly STORE=/tmp/scheduled_tasks
+readonly PROGRAM=/tmp/zeloschedtask
+readonly PERSISTENT=/usr/zelo/etc/scheduled_tasks
+readonly LAST_GOOD=/usr/zelo/etc/scheduled_tasks.last-good
+readonly STATUS=/tmp/sched_status.sqlite
+readonly KEPT=/usr/zelo/var/history.sqlite
+readonly FAKE=$BUILD_DIR/tests/fake_time.so
+readonly BOOT_ID=/proc/sys/kernel/random/boot_id
+readonly NOBODY=65534
+unset LC_ALL LANG NO_COLOR
+export TZ=UTC
+mkdir -p "$SCRATCH"
+cp /etc/crontab "$SCRATCH/crontab"
+cat "$BOOT_ID" >"$SCRATCH/boot_id"
+mount -n --bind "$SCRATCH/boot_id" "$BOOT_ID"
+
+# ---- helpers --------------------------------------------------------------------------------
+
+z() {
+  "$ZELOSCHED" "$@"
+}
+
+at() {
+  local moment=$1
+  shift
+  FAKE_TIME=$(date -u -d "$moment" +%s) LD_PRELOAD=$FAKE z "$@"
+}
+
+# Runs it and keeps status, out and err.
+try() {
+  status=0
+  "$@" >"$SCRATCH/out" 2>"$SCRATCH/err" </dev/null || status=$?
+  out=$(cat "$SCRATCH/out")
+  err=$(cat "$SCRATCH/err")
+}
+
+# The status, and a part of what is said on standard error.
+says() {
+  [[ $status == "$1" && $err == *"$2"* ]] ||
+    { printf 'status %s\nout: %s\nerr: %s\nwanted %s: %s\n' "$status" "$out" "$err" "$1" "$2"; return 1; }
+}
+
+is_done() {
+  [[ $status == 0 && -z $err ]] || { printf 'status %s\nerr: %s\n' "$status" "$err"; return 1; }
+}
+
+forget_tmp() {
+  rm -rf "$STORE" "$PROGRAM" "$STATUS"* /tmp/lock
+}
+
+clean() {
+  forget_tmp
+  rm -rf "$PERSISTENT" "$LAST_GOOD" /usr/zelo/var /usr/zelo/etc/power_sched.conf
+  cp "$SCRATCH/crontab" /etc/crontab
+}
+
+# The machine comes up: /tmp is empty, and the crontab is as it was.
+boot() {
+  forget_tmp
+  cat /proc/sys/kernel/random/uuid >"$SCRATCH/boot_id"
+}
+
+add() {
+  z add --quiet "$@" >/dev/null
+}
+
+names() {
+  z list | awk 'NR > 1 { print $NF }' | sort | tr '\n' ' '
+}
+
+owner_and_mode() {
+  stat -c '%U:%G %a' "$1"
+}
+
+task_lines() {
+  grep -c "$PROGRAM" /etc/crontab || true
+}
+
+sql() {
+  sqlite3 -separator ' ' "$@"
+}
+
+# ---- restore --------------------------------------------------------------------------------
+
+saved() {
+  clean
+  add --daily 02:30 --name one -- true
+  add --daily 03:30 --name two -- true
+}
+
+restores_after_a_boot() {
+  saved
+  boot
+  try z restore
+  is_done && same "$(names)" "one two " && cmp "$STORE" "$PERSISTENT"
+}
+
+puts_all_back_as_roots() {
+  same "$(owner_and_mode "$STORE"), $(owner_and_mode "$PROGRAM")" "root:root 644, root:root 755" &&
+    cmp "$PROGRAM" "$BUILD_DIR/bin/zeloschedtask"
+}
+
+synchronises() {
+  saved
+  boot
+  cp "$SCRATCH/crontab" /etc/crontab
+  try z restore
+  is_done && same "$(task_lines)" 2
+}
+
+is_quiet_when_nothing_was_saved() {
+  clean
+  boot
+  try z restore
+  is_done && [[ -x $PROGRAM && ! -e $STORE ]]
+}
+
+# Two tasks in the last good copy, three in the persistent one, which is then damaged by "$@".
+damaged() {
+  saved
+  z restore >/dev/null
+  add --daily 04:30 --name three -- true
+  "$@"
+  boot
+}
+
+falls_back_on_the_last_good() {
+  local why=$1
+  shift
+  damaged "$@"
+  local before
+  before=$(md5sum 2>&1 <"$PERSISTENT" || true)
+  try z restore
+  says 1 "$why" && says 1 "The tasks are those of an earlier boot" && same "$(names)" "one two " &&
+    same "$(md5sum 2>&1 <"$PERSISTENT" || true)" "$before" && same "$(task_lines)" 2 && [[ -x $PROGRAM ]]
+}
+
+cut_off() {
+  truncate -s -40 "$PERSISTENT"
+}
+
+cut_to_nothing() {
+  truncate -s 0 "$PERSISTENT"
+}
+
+zero() {
+  truncate -s 0 "$PERSISTENT"
+  truncate -s 900 "$PERSISTENT"
+}
+
+zero_the_end() {
+  truncate -s +300 "$PERSISTENT"
+}
+
+overwrite() {
+  echo 'Dear diary' >"$PERSISTENT"
+}
+
+give_away() {
+  chown "$NOBODY" "$PERSISTENT"
+}
+
+share() {
+  chmod 0666 "$PERSISTENT"
+}
+
+remove() {
+  rm "$PERSISTENT"
+}
+
+make_directory() {
+  rm "$PERSISTENT"
+  mkdir "$PERSISTENT"
+}
+
+make_fifo() {
+  rm "$PERSISTENT"
+  mkfifo "$PERSISTENT"
+}
+
+gives_up_without_a_good_copy() {
+  damaged cut_off
+  truncate -s -40 "$LAST_GOOD"
+  try z restore
+  says 1 "neither can be used" && [[ ! -e $STORE && -x $PROGRAM ]]
+}
+
+gives_up_without_a_last_good_copy() {
+  damaged cut_off
+  rm "$LAST_GOOD"
+  try z restore
+  says 1 "there is no $LAST_GOOD: no task will run" && [[ ! -e $STORE ]]
+}
+
+keeps_what_stands() {
+  saved
+  cp "$PERSISTENT" "$SCRATCH/older"
+  add --daily 04:30 --name three -- true
+  cp "$SCRATCH/older" "$PERSISTENT"
+  try z restore
+  is_done && same "$(names)" "one three two " && cmp "$LAST_GOOD" "$SCRATCH/older"
+}
+
+replaces_by_force() {
+  try z restore --force
+  is_done && same "$(names)" "one two " && same "$(task_lines)" 2
+}
+
+not_even_by_force() {
+  saved
+  truncate -s -40 "$PERSISTENT"
+  try z restore --force
+  says 1 "save a task, which writes it anew" && same "$(names)" "one two "
+}
+
+replaces_what_is_not_ours() {
+  local why=$1
+  shift
+  saved
+  boot
+  echo untouched >"$SCRATCH/victim"
+  "$@"
+  try z restore
+  [[ $status == 0 && $err == *"$STORE $why: it is not used"* ]] || { echo "$status $err"; return 1; }
+  same "$(names), $(owner_and_mode "$STORE"), $(cat "$SCRATCH/victim")" \
+    "one two , root:root 644, untouched"
+}
+
+plant_file() {
+  cp "$PERSISTENT" "$STORE"
+  chown "$NOBODY" "$STORE"
+}
+
+plant_shared() {
+  install -m 0666 "$PERSISTENT" "$STORE"
+}
+
+plant_link() {
+  ln -s "$SCRATCH/victim" "$STORE"
+}
+
+plant_fifo() {
+  mkfifo "$STORE"
+}
+
+plant_half() {
+  head -c -40 "$PERSISTENT" >"$STORE"
+}
+
+removes_what_is_not_ours() {
+  clean
+  boot
+  install -o "$NOBODY" -m 0644 /dev/null "$STORE"
+  try z restore
+  [[ $status == 0 && ! -e $STORE ]]
+}
+
+does_not_follow_a_link_for_the_program() {
+  saved
+  boot
+  echo untouched >"$SCRATCH/victim"
+  ln -s "$SCRATCH/victim" "$PROGRAM"
+  try z restore
+  is_done && [[ ! -L $PROGRAM ]] && same "$(cat "$SCRATCH/victim")" untouched && puts_all_back_as_roots
+}
+
+tells_of_a_directory() {
+  saved
+  boot
+  mkdir "$1"
+  try z restore
+  says 1 "$2" && [[ -d $1 ]]
+}
+
+does_the_rest_beside_a_directory() {
+  saved
+  boot
+  mkdir "$PROGRAM"
+  try z restore
+  says 1 "cannot replace $PROGRAM: Is a directory" && same "$(names)" "one two "
+}
+
+leaves_no_scratch_file() {
+  same "$(find /tmp /usr/zelo/etc -name '*.??????' -not -name '*.last-good' | grep -v "^$BUILD_DIR" || true)" ""
+}
+
+does_not_wear_the_memory() {
+  saved
+  z restore >/dev/null
+  local before
+  before=$(stat -c '%i %Y' "$LAST_GOOD")
+  boot
+  z restore >/dev/null
+  same "$(stat -c '%i %Y' "$LAST_GOOD")" "$before"
+}
+
+is_for_root() {
+  saved
+  boot
+  cp -r "$BUILD_DIR/bin/zelosched" /run/zelosched
+  try setpriv --reuid "$NOBODY" --clear-groups env LD_LIBRARY_PATH="$BUILD_DIR/lib" /run/zelosched "$@"
+  says 1 "takes root's rights"
+}
+
+leaves_the_old_program_on_a_full_disk() {
+  saved
+  boot
+  echo old >"$PROGRAM"
+  local used
+  used=$(df --output=used -B1 /tmp | tail -1)
+  mount -n -o "remount,size=$((used + 8192))" /tmp
+  try z restore
+  mount -n -o remount,size=50% /tmp
+  says 1 "No space left on device" && same "$(cat "$PROGRAM")" old && leaves_no_scratch_file
+}
+
+check "after a boot the tasks are put back" restores_after_a_boot
+check "with the program, and both are root's" puts_all_back_as_roots
+check "and the crontab is written" synchronises
+check "without a task ever saved only the program is put back" is_quiet_when_nothing_was_saved
+check "a persistent copy that is cut off is refused for the last good one" \
+  falls_back_on_the_last_good "reading or writing failed, or a file is cut off" cut_off
+check "so is one without bytes" falls_back_on_the_last_good "is cut off: it has no bytes" cut_to_nothing
+check "and one of zeros" falls_back_on_the_last_good "something else" zero
+check "and one that ends in zeros" falls_back_on_the_last_good "something else" zero_the_end
+check "and one that is something else" falls_back_on_the_last_good "something else" overwrite
+check "and another user's" falls_back_on_the_last_good "is not root's alone" give_away
+check "and one that others can write" falls_back_on_the_last_good "is not root's alone" share
+check "and one that is missing" falls_back_on_the_last_good "$PERSISTENT is missing" remove
+check "and a directory" falls_back_on_the_last_good "is a directory" make_directory
+check "and a FIFO" falls_back_on_the_last_good "is no regular file" make_fifo
+check "when neither copy is fit, that is said and nothing made" gives_up_without_a_good_copy
+check "and when there is no last good one" gives_up_without_a_last_good_copy
+check "tasks that stand in /tmp are kept from an older persistent copy" keeps_what_stands
+check "but not by force" replaces_by_force
+check "which a damaged persistent copy does not get" not_even_by_force
+check "another user's file in place of the store is replaced" \
+  replaces_what_is_not_ours "is not root's alone" plant_file
+check "so is one that others can write" replaces_what_is_not_ours "is not root's alone" plant_shared
+check "and a link, which is not followed" replaces_what_is_not_ours "is no regular file" plant_link
+check "and a FIFO, which is not waited for" replaces_what_is_not_ours "is no regular file" plant_fifo
+check "and half a store" replaces_what_is_not_ours "cannot be read: reading or writing failed" plant_half
+check "what is not ours goes also when there is nothing to put back" removes_what_is_not_ours
+check "a link in place of the program is not followed" does_not_follow_a_link_for_the_program
+check "a directory in place of the store is told" \
+  tells_of_a_directory "$STORE" "$STORE is a directory: no task runs until it is moved away"
+check "a directory in place of the program is told, and the store put back" does_the_rest_beside_a_directory
+check "no scratch file is left" leaves_no_scratch_file
+check "the last good copy is not written again without need" does_not_wear_the_memory
+check "restore is for root" is_for_root restore
+check "on a full disk the program stays as it was" leaves_the_old_program_on_a_full_disk
+
+# ---- history that outlives a boot -----------------------------------------------------------
+
+# run ID START STATUS [COMMENT [STATUS_ID [PID]]]: as the library records it
+run() {
+  if [[ ! -e $STATUS ]]; then
+    install -m 0600 /dev/null "$STATUS"
+    sql "$STATUS" "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);"
+  fi
+  sql "$STATUS" "INSERT INTO task_status VALUES(${5:-NULL}, ${6:-4194305},
+    $(date -u -d "$2" +%s), 'app', $1, $3, '${4:-}')"
+}
+
+history_is() {
+  same "$(z history --json | python3 -c 'import json, sys
+for run in json.load(sys.stdin): print(run["id"], run["start"], run["result"], sep=", ")')" "$1"
+}
+
+readonly NOW="2026-11-20 12:00"
+
+keep() {
+  try at "$NOW" history --keep
+}
+
+keeps_runs_over_a_boot() {
+  clean
+  run 1 "2026-11-20 08:00" 3
+  run 2 "2026-11-20 09:00" 7 5
+  keep
+  is_done && same "$out" "2 runs kept" || return 1
+  boot
+  history_is "2, 2026-11-20 09:00:00, failed with exit code 5
+1, 2026-11-20 08:00:00, finished"
+}
+
+shows_both() {
+  run 1 "2026-11-20 10:00" 6 9
+  history_is "1, 2026-11-20 10:00:00, killed by signal SIGKILL (9)
+2, 2026-11-20 09:00:00, failed with exit code 5
+1, 2026-11-20 08:00:00, finished"
+}
+
+limits_and_filters_both() {
+  same "$(z history 1 --limit 1 | wc -l), $(z history 1 | wc -l), $(z history --limit 2 | wc -l)" "2, 3, 3"
+}
+
+keeps_each_run_once() {
+  keep
+  same "$out" "1 run kept" || return 1
+  keep
+  is_done && same "$out" "" && same "$(sql "$KEPT" 'SELECT count(*) FROM run')" 3
+}
+
+# Number 1 again, which another run had before the boot.
+tells_runs_with_one_id_apart() {
+  same "$(sql "$KEPT" 'SELECT count(*) FROM run WHERE status_id = 1')" 2
+}
+
+takes_a_changed_result() {
+  clean
+  run 1 "2026-11-20 08:00" 2 "" 1 $$
+  keep
+  sql "$STATUS" "UPDATE task_status SET status_code = 7, comment = 3"
+  keep
+  same "$out" "1 run kept" || return 1
+  boot
+  history_is "1, 2026-11-20 08:00:00, failed with exit code 3"
+}
+
+knows_what_ran_at_the_shutdown() {
+  clean
+  run 1 "2026-11-20 08:00" 2 "" 1 $$
+  keep
+  boot
+  history_is "1, 2026-11-20 08:00:00, was running but its process is gone"
+}
+
+is_roots_alone() {
+  same "$(owner_and_mode "$KEPT"), $(owner_and_mode /usr/zelo/var)" "root:root 600, root:root 755"
+}
+
+drops_what_is_too_old() {
+  clean
+  run 1 "2025-11-01 08:00" 3
+  run 1 "2026-11-01 08:00" 3
+  keep
+  same "$(sql "$KEPT" 'SELECT count(*) FROM run')" 1
+}
+
+drops_what_is_too_much() {
+  sql "$KEPT" "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 100010)
+    INSERT INTO run SELECT 1790000000 + i, i, 1, 1, '', 3, '', '' FROM n"
+  keep
+  is_done && same "$(sql "$KEPT" 'SELECT count(*), max(timestamp) FROM run')" "100000 1790100010"
+}
+
+refuses_to_keep_in() {
+  local why=$1
+  shift
+  clean
+  run 1 "2026-11-20 08:00" 3
+  mkdir -p /usr/zelo/var
+  "$@"
+  keep
+  says 1 "$KEPT: $why"
+}
+
+no_database() {
+  install -m 0600 <(yes "this is no database") "$KEPT" 2>/dev/null || true
+  head -c 9000 /dev/zero | tr '\0' x >"$KEPT"
+}
+
+later_database() {
+  keep
+  sql "$KEPT" "PRAGMA user_version = 2"
+}
+
+shared_database() {
+  install -m 0666 /dev/null "$KEPT"
+}
+
+linked_database() {
+  ln -s "$SCRATCH/elsewhere" "$KEPT"
+  : >"$SCRATCH/elsewhere"
+}
+
+says_that_no_directory_can_be_made() {
+  clean
+  touch /usr/zelo/var
+  keep
+  says 1 "cannot make $KEPT: Not a directory"
+}
+
+shows_nothing_of_it_to_others() {
+  clean
+  run 1 "2026-11-20 08:00" 3
+  keep
+  boot
+  is_for_root history
+}
+
+looks_without_making() {
+  clean
+  z history >/dev/null && z status >/dev/null || true
+  [[ ! -e /usr/zelo/var ]]
+}
+
+check "runs are kept over a boot" keeps_runs_over_a_boot
+check "and shown with those after it" shows_both
+check "by task and number" limits_and_filters_both
+check "a run is kept once" keeps_each_run_once
+check "numbers that come again after a boot are told apart" tells_runs_with_one_id_apart
+check "a result that changed is taken over" takes_a_changed_result
+check "what ran when the machine went off is known to be gone" knows_what_ran_at_the_shutdown
+check "the kept history is root's alone" is_roots_alone
+check "after a year a run is dropped" drops_what_is_too_old
+check "and of more than a hundred thousand the oldest" drops_what_is_too_much
+check "a file that is no database is refused" refuses_to_keep_in "file is not a database" no_database
+check "so is that of a later version" refuses_to_keep_in "a later zelosched made it" later_database
+check "and one that others can write" refuses_to_keep_in "it is not this user's own file alone" shared_database
+check "and a link" refuses_to_keep_in "it is not this user's own file alone" linked_database
+check "a directory that cannot be made is told" says_that_no_directory_can_be_made
+check "the kept history is not shown to others" shows_nothing_of_it_to_others
+check "a look at the history makes no file" looks_without_making
+
+# ---- what was missed ------------------------------------------------------------------------
+
+if [[ -n $(sed -n 's/^ZELO_SANITIZE:STRING=//p' "$BUILD_DIR/CMakeCache.txt") ]]; then
+  skip "missed tasks are found" "libraries with sanitizers take no other before them"
+  finish
+fi
+
+# Off from one to eight o'clock on a Friday.
+readonly OFF="2026-11-20 01:00:20" ON="2026-11-20 08:00:40" LATER="2026-11-20 08:05"
+
+went_off() {
+  clean
+  "$@"
+  at "$OFF" history --keep
+  boot
+  at "$ON" restore >/dev/null
+}
+
+missed() {
+  at "$LATER" catch-up --dry-run "$@" | sed -n 's/^task [0-9]* (\(.*\)) was due at \(.*\): would.*/\1 \2/p'
+}
+
+tasks_of_all_kinds() {
+  add --daily 02:30 --name daily -- "echo daily >>$SCRATCH/ran"
+  add --daily 00:15 --every 1h --until 23 --name hourly -- "echo hourly >>$SCRATCH/ran"
+  add --once 2026-11-20T03:00 --name once -- "echo once >>$SCRATCH/ran" 2>/dev/null ||
+    at "$OFF" add --quiet --once 2026-11-20T03:00 --name once -- "echo once >>$SCRATCH/ran" >/dev/null
+  add --weekly fri 08:00 --name weekly -- "echo weekly >>$SCRATCH/ran"
+  add --daily 01:00 --name before -- true
+  add --daily 08:01 --name after -- true
+  add --weekly sat 04:00 --name saturday -- true
+  add --daily 05:00 --disabled --name disabled -- true
+  z power add on --daily 05:00 >/dev/null 2>&1 || true
+}
+
+finds_what_was_missed() {
+  went_off tasks_of_all_kinds
+  same "$(missed)" "daily 2026-11-20 02:30
+once 2026-11-20 03:00
+hourly 2026-11-20 07:15
+weekly 2026-11-20 08:00"
+}
+
+finds_what_was_missed_within() {
+  same "$(missed --within 90m)" "hourly 2026-11-20 07:15
+weekly 2026-11-20 08:00"
+}
+
+status_names_them() {
+  try at "$LATER" status
+  [[ $status == 1 && $out == *"WRONG  task 1 (daily) was due at 2026-11-20 02:30, when the machine\
+ was off: 'zelosched run 1' runs it now"* ]] || { echo "$out"; return 1; }
+  same "$(grep -c 'when the machine was off' <<<"$out")" 4
+}
+
+lists_without_running() {
+  [[ ! -e $SCRATCH/ran ]] && same "$(sql "$KEPT" 'SELECT count(*) FROM missed')" 4
+}
+
+all_ran() {
+  local tenths
+  for ((tenths = 0; tenths < 200; tenths++)); do
+    [[ $(sort "$SCRATCH/ran" 2>/dev/null | tr '\n' ' ') == "daily hourly once weekly " ]] && return
+    sleep 0.1
+  done
+  cat "$SCRATCH/ran"
+  return 1
+}
+
+runs_each_once() {
+  try at "$LATER" catch-up
+  is_done && same "$out" "task 1 (daily) was due at 2026-11-20 02:30: started
+task 3 (once) was due at 2026-11-20 03:00: started
+task 2 (hourly) was due at 2026-11-20 07:15: started
+task 4 (weekly) was due at 2026-11-20 08:00: started" && all_ran
+}
+
+finds_none_afterwards() {
+  try at "$LATER" catch-up
+  is_done && same "$out" "no run was missed" && all_ran &&
+    ! at "$LATER" status | grep 'when the machine was off'
+}
+
+one_task() {
+  add --daily 02:30 --name one -- true
+}
+
+# "$@" takes the one task out of what was missed.
+is_not_missed_any_more() {
+  went_off one_task
+  same "$(missed)" "one 2026-11-20 02:30" || return 1
+  "$@" >/dev/null
+  same "$(missed)" ""
+}
+
+removed_and_another_added() {
+  z remove 1 --yes
+  add --daily 02:30 --app other --name other -- true
+}
+
+remembers_over_another_boot() {
+  went_off one_task
+  boot
+  at "2026-11-20 08:02" restore >/dev/null
+  same "$(missed)" "one 2026-11-20 02:30"
+}
+
+restored_by_hand_misses_nothing() {
+  clean
+  one_task
+  at "$OFF" restore >/dev/null
+  at "$ON" restore >/dev/null
+  same "$(missed)" ""
+}
+
+a_task_of_later_missed_nothing() {
+  went_off true
+  one_task
+  same "$(missed)" ""
+}
+
+misses_nothing_without_an_earlier_boot() {
+  clean
+  one_task
+  boot
+  at "$ON" restore >/dev/null
+  same "$(missed)" ""
+}
+
+misses_nothing_by_a_clock_set_back() {
+  clean
+  one_task
+  at "$ON" history --keep
+  boot
+  at "$OFF" restore >/dev/null
+  same "$(missed)" ""
+}
+
+forgets_after_a_week() {
+  went_off one_task
+  same "$(at "2026-11-27 02:31" catch-up --dry-run --within 7d)" "no run was missed"
+}
+
+two_at_once_run_each_once() {
+  rm -f "$SCRATCH/ran"
+  went_off tasks_of_all_kinds
+  at "$LATER" catch-up >/dev/null &
+  at "$LATER" catch-up >/dev/null
+  wait "$!"
+  all_ran
+}
+
+check "what was due while the machine was off is found" finds_what_was_missed
+check "within the time that is asked for" finds_what_was_missed_within
+check "status names it" status_names_them
+check "nothing is run by that" lists_without_running
+check "catch-up runs each once" runs_each_once
+check "and finds none afterwards" finds_none_afterwards
+check "two at once run each once" two_at_once_run_each_once
+check "a task that ran since is not missed" is_not_missed_any_more z run 1 --wait
+check "nor one that is disabled" is_not_missed_any_more z disable 1
+check "nor one that is removed" is_not_missed_any_more z remove 1 --yes
+check "nor one of its id" is_not_missed_any_more removed_and_another_added
+check "nor one whose time is another by now" is_not_missed_any_more z edit 1 --daily 09:00
+check "a missed task is remembered over another boot" remembers_over_another_boot
+check "a restore by hand finds nothing missed" restored_by_hand_misses_nothing
+check "a task that was added later has missed nothing" a_task_of_later_missed_nothing
+check "without an earlier boot nothing was missed" misses_nothing_without_an_earlier_boot
+check "nor by a clock that was set back" misses_nothing_by_a_clock_set_back
+check "after a week it is told no more" forgets_after_a_week
+check "catch-up is for root" is_for_root catch-up
+finish

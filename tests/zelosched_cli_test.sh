@@ -1,0 +1,885 @@
+#!/bin/bash
+# The administrator's program as a script uses it: what it prints and changes, what it refuses, and
+# how it fails.
+#
+# Functions are called by check, and what stands in single quotes is for another shell:
+# shellcheck disable=SC2317,SC2016
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+
+readonly ZELOSCHED=$BUILD_DIR/bin/zelosched
+readonly SCRATCH=/tmp/zelosched_cli_test
+readonly STORE=/tmp/scheduled_tasks
+readonly PERSISTENT=/usr/zelo/etc/scheduled_tasks
+readonly FAKE=$BUILD_DIR/tests/fake_time.so
+readonly USAGE=2
+unset LC_ALL LANG NO_COLOR
+export TZ=UTC
+mkdir -p "$SCRATCH"
+cp /etc/crontab "$SCRATCH/crontab"
+
+# ---- helpers --------------------------------------------------------------------------------
+
+z() {
+  "$ZELOSCHED" "$@"
+}
+
+at() {
+  local moment=$1
+  shift
+  # Libraries with sanitizers must be loaded first, which a preloaded one prevents.
+  FAKE_TIME=$(date -u -d "$moment" +%s) LD_PRELOAD=$FAKE z "$@"
+}
+
+# Runs it and keeps status, out and err.
+try() {
+  status=0
+  "$@" >"$SCRATCH/out" 2>"$SCRATCH/err" </dev/null || status=$?
+  out=$(cat "$SCRATCH/out")
+  err=$(cat "$SCRATCH/err")
+}
+
+gives() {
+  local wanted_status=$1 wanted=$2
+  shift 2
+  try z "$@"
+  same "$status: $out$err" "$wanted_status: $wanted"
+}
+
+# The status, and a part of what is said on standard error; nothing on standard output.
+fails_saying() {
+  local wanted_status=$1 part=$2
+  shift 2
+  try "$@"
+  [[ $status == "$wanted_status" && $err == *"$part"* && -z $out ]] ||
+    { printf 'status %s\nout: %s\nerr: %s\nwanted %s: %s\n' "$status" "$out" "$err" "$wanted_status" "$part"; return 1; }
+}
+
+clean() {
+  rm -rf "$STORE" "$PERSISTENT" /tmp/sched_status.sqlite* /tmp/lock /usr/zelo/etc/power_sched.conf
+  cp "$SCRATCH/crontab" /etc/crontab
+}
+
+state_of_files() {
+  cat "$STORE" "$PERSISTENT" /etc/crontab 2>&1 | sha256sum
+}
+
+leaves_all_as_it_was() {
+  local before
+  before=$(state_of_files)
+  try "$@"
+  same "$(state_of_files)" "$before" && [[ $status != 0 ]]
+}
+
+add() {
+  z add --quiet "$@"
+}
+
+json() {
+  python3 -c "import json, sys; tasks = json.load(sys.stdin); print($1)"
+}
+
+task_lines() {
+  grep -c /tmp/zeloschedtask /etc/crontab || true
+}
+
+# ---- help, version, usage -------------------------------------------------------------------
+
+every_command_has_help() {
+  local name bad=0
+  for name in $(z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'); do
+    try z "$name" --help
+    [[ $status == 0 && $out == "usage: zelosched $name "* && -z $err ]] || { echo "$name"; bad=1; }
+  done
+  return "$bad"
+}
+
+help_fits_the_terminal() {
+  local name
+  for name in $(z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'); do z "$name" --help; done |
+    awk 'length > 90 && !/^usage/ { print; bad = 1 } END { exit bad }'
+}
+
+wrong_arguments_are_usage_errors() {
+  local bad=0 line
+  local -a words
+  while read -r line; do
+    read -ra words <<<"$line"
+    try z "${words[@]}"
+    [[ $status == "$USAGE" && -z $out && $err == *"usage: zelosched"* ]] ||
+      { echo "[$line]: $status $err"; bad=1; }
+  done <<'LINES'
+
+nonsense
+list --nonsense
+list x
+list --sort
+list --sort nonsense
+list -- x
+show
+show x
+show -1
+show 99999999999999999999
+next --count 0
+next --count x
+history --limit -5
+history 1 2
+history --keep 1
+history --keep --json
+restore x
+restore -- x
+catch-up x
+catch-up --within 12
+catch-up --within 0h
+catch-up --within 8d
+status x
+add
+add --daily 08:30
+add --daily 08:30 --
+add -- true
+add --daily 08:30 --once 2099-01-01T08:30 -- true
+add --weekly mon -- true
+add --daily 08:30 --until 18 -- true
+add --daily 08:30 --overlap maybe -- true
+add x --daily 08:30 -- true
+edit
+edit 1
+edit 1 2 --daily 08:30
+enable
+disable x
+remove
+run
+sync now
+power
+power nonsense
+power add
+power add on
+power add up --daily 08:30
+power add on --daily 08:30 --weekly mon 08:30
+import
+import a b
+export x
+completion
+completion fish
+LINES
+  return "$bad"
+}
+
+# ---- saving ---------------------------------------------------------------------------------
+
+saves_what_it_was_told() {
+  clean
+  add --weekly mon,wed,fri 08:30 --every 2h --until 18 --start 2031-01-06 --name Mirror \
+    --owner nobody --app backup --app-name Backup --app-args 'a b' --action copies \
+    --overlap yes --app-overlap no -- mirror --all >/dev/null
+  same "$(z show 1 --json | json '[tasks[k] for k in ["type", "week", "run hour", "run min",
+    "repeat hour", "last work hour", "start year", "start month", "start day", "name", "owner",
+    "app", "app name", "app args", "action", "can run task same time", "can run app same time",
+    "cmd", "state", "backend", "id"]]')" \
+    "['weekly', '0101010', 8, 30, 2, 18, 2031, 1, 6, 'Mirror', 65534, 'backup', 'Backup', 'a b',\
+ 'copies', 1, 0, 'mirror --all', 'enabled', -2, 1]"
+}
+
+command_of() {
+  z show "$1" --json | json 'tasks["cmd"]'
+}
+
+quotes_words() {
+  clean
+  add --daily 08:30 -- printf '%s|' 'a b' "it's" '$HOME' '' '*' >/dev/null
+  same "$(sh -c "$(command_of 1)")" "a b|it's|\$HOME||*|"
+}
+
+takes_one_word_as_it_is() {
+  clean
+  add --daily 08:30 -- 'echo a; exit 3' >/dev/null
+  same "$(command_of 1)" 'echo a; exit 3'
+}
+
+finds_owners() {
+  clean
+  add --daily 08:30 --owner nobody -- true >/dev/null
+  add --daily 08:30 --owner 65534 -- true >/dev/null
+  add --daily 08:30 -- true >/dev/null
+  same "$(z list --json --sort id | json '[(t["owner"], t["owner name"]) for t in tasks]')" \
+    "[(65534, 'nobody'), (65534, 'nobody'), (0, 'root')]"
+}
+
+edits_only_what_is_named() {
+  clean
+  add --weekly mon 08:30 --every 3h --name old --owner nobody -- 'echo one' >/dev/null
+  z export 1 >"$SCRATCH/before"
+  z edit 1 --name new >/dev/null
+  z export 1 | sed 's/"name":"new"/"name":"old"/' | diff "$SCRATCH/before" - &&
+    z edit 1 --daily 09:15 -- echo two >/dev/null &&
+    same "$(z show 1 --json | json '[tasks[k] for k in ["name", "type", "run hour", "run min",
+      "repeat hour", "owner", "cmd"]]')" "['new', 'daily', 9, 15, 3, 65534, 'echo two']"
+}
+
+respects_the_application() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  z export | sed 's/"can \([a-z]*\) from ui":1/"can \1 from ui":0/g; s/"can edit \([a-z]*\)":1/"can edit \1":0/g' |
+    z import - >/dev/null
+  fails_saying 1 "does not let it be edited by hand" z edit 1 --daily 09:00 &&
+    fails_saying 1 "does not let it be removed by hand" z remove 1 --yes &&
+    fails_saying 1 "does not let it be run by hand" z run 1 &&
+    z edit 1 --daily 09:00 --force >/dev/null && z run 1 --wait --force >/dev/null &&
+    z disable 1 >/dev/null && z remove 1 --yes --force >/dev/null
+}
+
+does_the_others() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  add --daily 08:30 -- true >/dev/null
+  gives 1 "task 1 (Task 1) disabled
+task 2 (Task 2) disabledzelosched: there is no task 9" disable 1 9 2 && same "$(task_lines)" 0 &&
+    gives 1 "task 2 (Task 2) enabledzelosched: there is no task 9" enable 2 9 &&
+    same "$(task_lines)" 1 && gives 0 "task 2 (Task 2) is enabled already" enable 2 &&
+    gives 1 "task 1 (Task 1) removedzelosched: there is no task 9" remove --yes 9 1
+}
+
+refuses() {
+  local bad=0
+  clean
+  add --daily 08:30 --name kept -- true >/dev/null
+  while IFS='|' read -r part line; do
+    local before
+    before=$(state_of_files)
+    eval "fails_saying 1 \"$part\" z $line" || { echo "$line"; bad=1; }
+    same "$(state_of_files)" "$before" || { echo "changed by: $line"; bad=1; }
+  done <<'LINES'
+the hour 24 is none of a day|add --daily 24:00 -- true
+the minute 60 is none of an hour|add --daily 08:60 -- true
+the last hour 24 is none of a day|add --daily 08:00 --every 2h --until 24 -- true
+day 32 is none of a month|add --monthly 32 08:30 -- true
+day 0 is none of a month|add --monthly 0 08:30 -- true
+month 13 is none of a year|add --yearly 13-01 08:30 -- true
+month 4 never has a day 31|add --yearly 04-31 08:30 -- true
+month 2 never has a day 30 in 2099|add --once 2099-02-30T08:30 -- true
+needs a day of the week|add --weekly none 08:30 -- true
+is before the first|add --daily 08:00 --every 2h --until 7 -- true
+there is no user 'no such user'|add --owner 'no such user' --daily 08:30 -- true
+there is no user '4000000000'|add --owner 4000000000 --daily 08:30 -- true
+has an apostrophe|add --app "Bob's" --daily 08:30 -- true
+is over: write a later date|add --once 2001-01-01T08:30 -- true
+shorten it to 4095|add --name $(printf %04096d 0) --daily 08:30 -- true
+shorten it to 1023|add --app $(printf %01024d 0) --daily 08:30 -- true
+only 12287 can be stored|add --daily 08:30 -- $(printf %012288d 0)
+the hour 99 is none of a day|edit 1 --daily 99:00
+is over: write a later date|edit 1 --once 2001-01-01T08:30
+has an apostrophe|edit 1 --app "'"
+there is no task 7|edit 7 --daily 08:30
+there is no task 7|enable 7
+there is no task 7|remove --yes 7
+the hour 24 is none of a day|power add on --daily 24:00
+needs a day of the week|power add off --weekly none 08:30
+LINES
+  return "$bad"
+}
+
+refuses_import_as_a_whole() {
+  clean
+  add --daily 08:30 --name kept -- true >/dev/null
+  z export >"$SCRATCH/tasks"
+  local edit bad=0
+  for edit in 's/"run hour":8/"run hour":24/' 's/"state":"enabled"/"state":"asleep"/' \
+    's/"name":"kept",//' 's/"run min":30/"run min":"x"/' 's/"run min":30/"run min":3.5/' \
+    's/"owner":0/"owner":4000000000/' 's/"app":""/"app":"'\''"/' 's/"name":"kept"/"name":[]/' \
+    's/"name":"kept"/"name":"a\\u0000b"/' 's/"week":"1111111"/"week":"11111111"/'; do
+    { echo "[$(sed '1d;$d' "$SCRATCH/tasks"),"; sed '1d;$d' "$SCRATCH/tasks" | sed "$edit"; echo "]"; } >"$SCRATCH/bad"
+    leaves_all_as_it_was z import "$SCRATCH/bad" || { echo "saved: $edit"; bad=1; }
+    [[ $err == *"object 2 of 2: "*"nothing was imported: 1 object of 2"* ]] || { echo "$edit: $err"; bad=1; }
+  done
+  return "$bad"
+}
+
+imports_what_it_exports() {
+  clean
+  add --daily 08:30 --name 'größe "漢字" \ é' -- $'echo a\nb\xff' >/dev/null
+  add --weekly sun 23:59 --disabled --owner nobody -- true >/dev/null
+  z export >"$SCRATCH/plain"
+  z export --wire >"$SCRATCH/wire"
+  local form
+  for form in plain wire; do
+    clean
+    z import - <"$SCRATCH/$form" >/dev/null || return 1
+    z export | diff "$SCRATCH/plain" - || return 1
+  done
+}
+
+imports_one_object_or_lines() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  z export | sed '1d;$d' >"$SCRATCH/one"
+  gives 0 "task 1 (Task 1) overwritten" import "$SCRATCH/one" &&
+    { cat "$SCRATCH/one"; echo; sed 's/Task 1/other/' "$SCRATCH/one"; } >"$SCRATCH/two" &&
+    gives 0 "task 1 (Task 1) overwritten
+task 2 (other) added" import "$SCRATCH/two" &&
+    gives 0 "task 3 (Task 1) added" import --new "$SCRATCH/one"
+}
+
+agrees_with_the_library_on_the_wire_form() {
+  clean
+  add --daily 08:30 --name 'a"b' -- true >/dev/null
+  same "$(z export --wire | json 'tasks["name"]' | json 'tasks')" 'a"b'
+}
+
+twenty_at_once() {
+  clean
+  local i
+  for i in {1..20}; do z add --daily 08:30 --name "n$i" -- true >/dev/null & done
+  wait
+  same "$(z list --json | json 'len({t["name"] for t in tasks})')" 20 && same "$(task_lines)" 20 &&
+    for i in {1..20}; do z edit 1 "--$([[ $((i % 2)) == 0 ]] && echo action || echo app-args)" "v$i" >/dev/null & done
+  wait
+  for i in {1..20}; do z disable "$i" >/dev/null & done
+  wait
+  same "$(z list --json --enabled)" "$(printf '[\n]')"
+}
+
+# ---- looking --------------------------------------------------------------------------------
+
+three_tasks() {
+  clean
+  add --daily 08:30 --name later -- true >/dev/null
+  add --daily 07:30 --name sooner --app backup --owner nobody -- true >/dev/null
+  add --daily 06:30 --name off --disabled -- true >/dev/null
+}
+
+lists_by_next_run() {
+  three_tasks
+  same "$(at '2026-11-21 07:00' list)" \
+    "ID  STATE     TYPE   NEXT RUN          OWNER   LAST RESULT  NAME
+ 2  enabled   daily  2026-11-21 07:30  nobody  -            sooner
+ 1  enabled   daily  2026-11-21 08:30  root    -            later
+ 3  disabled  daily  -                 root    -            off"
+}
+
+ids_of_list() {
+  z list --json "$@" | json '[t["id"] for t in tasks]'
+}
+
+lists_chosen_tasks() {
+  three_tasks
+  same "$(ids_of_list --app backup) $(ids_of_list --enabled --sort id)" "[2] [1, 2]" &&
+    z export 3 | sed 's/"listable":1/"listable":0/' | z import - >/dev/null &&
+    same "$(ids_of_list --sort id) $(ids_of_list --all --sort id)" "[1, 2] [1, 2, 3]"
+}
+
+sorts() {
+  three_tasks
+  local key found=""
+  for key in id name state type owner app result; do found+="$key $(ids_of_list --sort "$key") "; done
+  same "$found$(ids_of_list --sort name --reverse)" "id [1, 2, 3] name [1, 3, 2] state [1, 2, 3]\
+ type [1, 2, 3] owner [2, 1, 3] app [1, 3, 2] result [1, 2, 3] [2, 3, 1]"
+}
+
+shows_a_task() {
+  three_tasks
+  same "$(at '2026-11-21 07:00' show 2)" "          ID: 2
+        Name: sooner
+       State: enabled
+        Runs: daily at 07:30
+    Next run: 2026-11-21 07:30
+    Last run: none is recorded
+       Owner: nobody (65534)
+     Command: true
+         App: backup
+  Runs of it: must not overlap another run of it, may overlap others of its application"
+}
+
+shows_the_coming_runs() {
+  three_tasks
+  same "$(at '2026-11-21 08:00' next --count 3)" "2026-11-21 Saturday
+  08:30  1  later
+
+2026-11-22 Sunday
+  07:30  2  sooner
+  08:30  1  later" &&
+    same "$(at '2026-11-21 08:00' next 2 --count 1 --json | json 'tasks')" \
+      "[{'id': 2, 'name': 'sooner', 'run': '2026-11-22 07:30'}]" &&
+    fails_saying 0 "task 3 (off) is disabled" z next 3 &&
+    fails_saying 1 "there is no task 9" z next 9
+}
+
+looking_makes_no_database() {
+  three_tasks
+  try z status
+  z list >/dev/null && z show 1 >/dev/null && z history >/dev/null && [[ ! -e /tmp/sched_status.sqlite ]]
+}
+
+# ---- running --------------------------------------------------------------------------------
+
+runs_and_tells_the_result() {
+  clean
+  add --daily 08:30 --name good --disabled -- 'exit 0' >/dev/null
+  add --daily 08:30 --name bad -- 'exit 3' >/dev/null
+  add --daily 08:30 --name killed -- 'kill -9 $$' >/dev/null
+  gives 0 "task 1 (good) finished" run --wait 1 &&
+    gives 1 "zelosched: task 2 (bad) failed with exit code 3" run --wait 2 &&
+    gives 1 "zelosched: task 3 (killed) killed by signal SIGKILL (9)" run --wait 3 &&
+    gives 1 "task 1 (good) finishedzelosched: there is no task 9" run --wait 9 1
+}
+
+waits_for_its_own_run_only() {
+  clean
+  add --daily 08:30 --overlap yes -- 'sleep 0.3; exit 4' >/dev/null
+  add --daily 08:30 --overlap yes -- 'sleep 300 & exit 0' >/dev/null
+  z run 1 >/dev/null
+  gives 0 "task 2 (Task 2) finished" run --wait 2 &&
+    gives 1 "zelosched: task 1 (Task 1) failed with exit code 4" run --wait 1
+}
+
+lets_the_run_go_on() {
+  clean
+  rm -f "$SCRATCH/ran"
+  add --daily 08:30 -- "read x <$SCRATCH/fifo; echo ran >$SCRATCH/ran" >/dev/null
+  rm -f "$SCRATCH/fifo"
+  mkfifo "$SCRATCH/fifo"
+  # With a pipe that the run would hold open, this would not end.
+  same "$(z run 1)" "task 1 (Task 1) started" || return 1
+  echo go >"$SCRATCH/fifo"
+  until [[ -s $SCRATCH/ran ]]; do :; done
+}
+
+shows_the_output_when_told_to() {
+  clean
+  add --daily 08:30 -- 'echo said; echo complained >&2' >/dev/null
+  gives 0 "task 1 (Task 1) finished" run --wait 1 &&
+    gives 0 "said
+task 1 (Task 1) finishedcomplained" run --output 1
+}
+
+tells_that_a_run_gave_up() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  touch /tmp/lock # where a directory should be
+  FAKE_PATIENCE=1 LD_PRELOAD=$FAKE try z run --wait 1
+  rm /tmp/lock
+  same "$status: ${err%% (the*}" "1: zelosched: task 1 (Task 1) did not run: it could not be\
+ recorded, or other runs were in its way for too long"
+}
+
+tells_that_a_run_died() {
+  clean
+  add --daily 08:30 -- 'kill -9 $PPID' >/dev/null
+  gives 1 "zelosched: task 1 (Task 1) was running but its process is gone" run --wait 1 &&
+    same "$(z history --json | json 'tasks[0]["result"]')" "was running but its process is gone"
+}
+
+keeps_history() {
+  clean
+  add --daily 08:30 --name one -- 'exit 3' >/dev/null
+  add --daily 08:30 --name two -- true >/dev/null
+  z run --wait 1 2>/dev/null || true
+  z run --wait 2 >/dev/null
+  z remove --yes 2 >/dev/null
+  sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET timestamp = 1795161600 + status_id"
+  same "$(z history)" "START                DURATION  ID  RESULT                   NAME
+2026-11-20 08:00:02         -   2  finished                 -
+2026-11-20 08:00:01         -   1  failed with exit code 3  one" &&
+    same "$(z history 1 --json | json '[(t["id"], t["status code"], t["comment"], t["timestamp"])
+      for t in tasks]')" "[(1, 7, '3', 1795161601)]" &&
+    same "$(z history --limit 1 | wc -l)" 2 &&
+    same "$(z list | awk '/one/ { print $7, $8, $9, $10, $11 }')" "failed with exit code 3"
+}
+
+shows_how_long_a_run_goes_on() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  z run --wait 1 >/dev/null
+  sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET status_code = 2, pid = $$, timestamp = 1795161600"
+  same "$(at '2026-11-20 09:01:05' history | tail -1)" \
+    "2026-11-20 08:00:00   1:01:05   1  running  Task 1" &&
+    same "$(z status | grep running | tail -1)" \
+      "ok     task 1 (Task 1) is running since 2026-11-20 08:00 as process $$"
+}
+
+# ---- power ----------------------------------------------------------------------------------
+
+have_clock() {
+  mount -t tmpfs sys /sys && mkdir -p /sys/class/rtc/rtc0 && touch /sys/class/rtc/rtc0/wakealarm
+}
+
+looks_after_power_times() {
+  clean
+  gives 0 "power on daily at 07:30: task 71270730" power add on --daily 07:30 &&
+    gives 0 "80622300" power add off --weekly mon-fri 23:00 --disabled --quiet &&
+    same "$(at '2026-11-21 12:00' power list)" \
+      "      ID  POWER  STATE     NEXT              WHEN
+71270730  on     enabled   2026-11-22 07:30  daily at 07:30
+80622300  off    disabled  -                 weekly on Mon, Tue, Wed, Thu and Fri at 23:00" &&
+    gives 0 "task 90622300 (Poweroff 0) enabled
+it was task 80622300 before" enable 80622300 &&
+    grep -q $'^0\t23\t.*zelo_poweroff_feasible_check' /etc/crontab &&
+    gives 1 "zelosched: there is such a power time already: it is task 71270730" \
+      power add on --daily 07:30 &&
+    gives 0 "task 71270800 (Poweron 0) saved: daily at 08:00" edit 71270730 --daily 08:00 &&
+    fails_saying "$USAGE" "only --daily and --weekly" z edit 71270800 --name x --daily 09:00 &&
+    fails_saying 1 "does not let it be run by hand" z run 71270800 &&
+    gives 0 "task 71270800 (Poweron 0) removed" power remove --yes 71270800
+}
+
+power_remove_refuses_other_tasks() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  fails_saying 1 "is no power time" z power remove --yes 1 && same "$(ids_of_list)" "[1]"
+}
+
+power_lists_are_bounded() {
+  clean
+  { echo '[poweron]'; printf 'times="'; for i in {0..99}; do printf '0 127 %d %d;' $((i / 60)) $((i % 60)); done |
+    sed 's/;$//'; echo '"'; } >/usr/zelo/etc/power_sched.conf
+  fails_saying 1 "there are 100 power-on times already" z power add on --daily 23:00 &&
+    gives 0 "91272300" power add off --daily 23:00 --quiet
+}
+
+exports_power_times() {
+  clean
+  z power add on --daily 07:30 >/dev/null
+  z export >"$SCRATCH/power"
+  z power remove --yes 71270730 >/dev/null
+  z import "$SCRATCH/power" >/dev/null && same "$(ids_of_list)" "[71270730]"
+}
+
+tells_of_a_clock_that_fails() {
+  clean
+  rm /sys/class/rtc/rtc0/wakealarm
+  fails_saying 1 "it is stored all the same" z power add on --daily 07:30
+  local result=$?
+  touch /sys/class/rtc/rtc0/wakealarm
+  [[ $result == 0 ]] && z sync >/dev/null && [[ -s /sys/class/rtc/rtc0/wakealarm ]]
+}
+
+# ---- status and sync ------------------------------------------------------------------------
+
+start_something_like_cron() {
+  cp /bin/sleep "$SCRATCH/cron"
+  # No child of this shell, which waits for its own, and deaf to the library's signal.
+  (
+    trap '' HUP
+    "$SCRATCH/cron" 1000 >/dev/null 2>&1 &
+    echo $! >/var/run/crond.pid
+  )
+}
+
+all_well() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  install -m 0755 "$BUILD_DIR/bin/zeloschedtask" /tmp/zeloschedtask
+}
+
+status_is_well() {
+  all_well
+  gives 0 "ok     cron is running (process $(cat /var/run/crond.pid))
+ok     /tmp/zeloschedtask is there, and root's
+ok     the working and the persistent copy of the tasks agree
+ok     the crontab is in step with the tasks
+ok     no enabled task has a fault
+ok     no task is running
+ok     no run was missed" status
+}
+
+# What to do to a machine on which all is well, and what status then says.
+status_finds() {
+  local part=$1 damage=$2
+  all_well
+  local pid
+  pid=$(cat /var/run/crond.pid)
+  eval "$damage"
+  try z status
+  echo "$pid" >/var/run/crond.pid
+  rm -rf /tmp/zeloschedtask
+  [[ $status == 1 && $out == *"WRONG  $part"* ]] || { echo "$damage: $status $out $err"; return 1; }
+}
+
+readonly -a DAMAGES=(
+  'cron is not running' 'rm /var/run/crond.pid'
+  'cron is not running' 'echo $$ >/var/run/crond.pid'
+  'cron is not running' 'echo 99999999 >/var/run/crond.pid'
+  'cron is not running' 'echo nonsense >/var/run/crond.pid'
+  '/tmp/zeloschedtask, which cron starts, cannot be examined: No such file' 'rm /tmp/zeloschedtask'
+  '/tmp/zeloschedtask is no program' 'ln -sf /bin/true /tmp/zeloschedtask'
+  '/tmp/zeloschedtask is no program' 'chmod 0644 /tmp/zeloschedtask'
+  "/tmp/zeloschedtask is not root's alone" 'chmod 0775 /tmp/zeloschedtask'
+  '/tmp/scheduled_tasks is missing' 'rm $STORE'
+  '/usr/zelo/etc/scheduled_tasks is missing' 'rm $PERSISTENT'
+  '/usr/zelo/etc/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $PERSISTENT'
+  '/tmp/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $STORE'
+  'the working and the persistent copy of the tasks differ' 'echo "# edited" >>$PERSISTENT'
+  '/etc/crontab lacks the line: 30 8 * * * root /tmp/zeloschedtask --run id=1' 'cp $SCRATCH/crontab /etc/crontab'
+  '/etc/crontab has a line that belongs to no task: 1 1 * * * root /tmp/zeloschedtask --run id=7' 'printf "1\t1\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=7\n" >>/etc/crontab'
+  '/etc/crontab cannot be read: No such file' 'rm /etc/crontab'
+  'task 1 (Task 1): the hour 25 is none of a day' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
+  'cron may pass over all of /etc/crontab' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
+  'task 1 (Task 1): there is no user 77777' 'sed -i "s/^owner=.*/owner=\"77777\"/" $STORE'
+  '1 stored task cannot be read' 'sed -i "/^name=/d" $STORE'
+  'cannot list the tasks: a file or the database could not be opened' 'chmod 0666 $STORE'
+)
+
+a_fault_can_be_disabled_but_not_enabled() {
+  all_well
+  sed -i 's/^run hour=.*/run hour="25"/' "$STORE"
+  z disable 1 >/dev/null && fails_saying 1 "the hour 25 is none of a day" z enable 1 &&
+    same "$(task_lines)" 0
+}
+
+a_bad_task_does_not_hide_the_others() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  add --daily 08:30 -- true >/dev/null
+  sed -i '0,/^start year=/s/^start year=.*/start year="12x"/' "$STORE"
+  same "$(ids_of_list)" "[2]"
+}
+
+syncs() {
+  all_well
+  cp "$SCRATCH/crontab" /etc/crontab
+  gives 0 "the crontab and the power times are in step with the tasks" sync && same "$(task_lines)" 1
+}
+
+tells_of_a_crontab_that_cannot_be_written() {
+  all_well
+  rm /etc/crontab
+  fails_saying 1 "the tasks are saved, but cron does not know them all" z add --daily 08:30 -- true &&
+    fails_saying 1 "/etc/crontab cannot be read" z sync &&
+    same "$(ids_of_list --sort id)" "[1, 2]"
+  local result=$?
+  cp "$SCRATCH/crontab" /etc/crontab
+  return "$result"
+}
+
+# ---- failing --------------------------------------------------------------------------------
+
+tells_the_error_in_words() {
+  all_well
+  truncate -s 100 "$STORE"
+  local command bad=0
+  for command in list 'show 1' 'add --daily 08:30 -- true' 'edit 1 --daily 09:00' 'remove --yes 1' \
+    'run 1' export next; do
+    # shellcheck disable=SC2086
+    fails_saying 1 "reading or writing failed, or a file is cut off [0x0B00 " z $command || bad=1
+  done
+  return "$bad"
+}
+
+tells_of_a_store_that_cannot_be_written() {
+  all_well
+  chmod 0666 "$STORE"
+  fails_saying 1 "is not root's alone [0x0900 " z add --daily 08:30 -- true
+}
+
+tells_of_a_database_that_is_not_roots() {
+  all_well
+  install -m 0666 /dev/null /tmp/sched_status.sqlite
+  fails_saying 1 "cannot read /tmp/sched_status.sqlite: a file or the database could not be opened" z history
+}
+
+tells_of_a_database_that_is_none() {
+  all_well
+  echo "this is no database, but long enough to be looked at as one" >/tmp/sched_status.sqlite
+  chmod 0600 /tmp/sched_status.sqlite
+  fails_saying 1 "cannot read /tmp/sched_status.sqlite" z history
+}
+
+other_users_see_but_do_not_change() {
+  all_well
+  z run --wait 1 >/dev/null
+  local nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups "$ZELOSCHED")
+  if ! setpriv --reuid 65534 --regid 65534 --clear-groups test -x "$ZELOSCHED"; then
+    echo "the build directory is closed to other users"
+    install -m 0755 "$ZELOSCHED" "$SCRATCH/zelosched"
+    nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups env "LD_LIBRARY_PATH=$SCRATCH/lib" "$SCRATCH/zelosched")
+    mkdir -p "$SCRATCH/lib" && cp "$BUILD_DIR"/lib/*.so* "$SCRATCH/lib"
+  fi
+  chmod 0755 "$SCRATCH"
+  same "$("${nobody[@]}" list | tail -1 | awk '{ print $1, $7 }')" "1 ?" &&
+    fails_saying 1 "changing tasks takes root's rights" "${nobody[@]}" add --daily 08:30 -- true &&
+    fails_saying 1 "that takes root's rights" "${nobody[@]}" history
+}
+
+lock_is_no_link() {
+  all_well
+  rm -f /run/zelosched.lock
+  ln -s "$SCRATCH/victim" /run/zelosched.lock
+  leaves_all_as_it_was z add --daily 08:30 -- true
+  local result=$?
+  rm /run/zelosched.lock
+  [[ $result == 0 && $err == *"cannot open /run/zelosched.lock: "* && ! -e $SCRATCH/victim ]]
+}
+
+waiting_for_the_lock_ends() {
+  all_well
+  exec {held}>/run/zelosched.lock
+  flock "$held"
+  FAKE_PATIENCE=1 LD_PRELOAD=$FAKE leaves_all_as_it_was z add --daily 08:30 -- true
+  local result=$?
+  exec {held}>&-
+  [[ $result == 0 && $err == *"waiting for another zelosched command"*"for 30 seconds: nothing was changed"* ]]
+}
+
+import_tells_what_it_cannot_read() {
+  all_well
+  echo '{"a":' >"$SCRATCH/broken"
+  fails_saying 1 "line 1 is no JSON object" z import "$SCRATCH/broken" &&
+    fails_saying 1 "cannot open $SCRATCH/none: No such file" z import "$SCRATCH/none" &&
+    fails_saying 1 "cannot read $SCRATCH: Is a directory" z import "$SCRATCH" &&
+    { head -c 5000 /dev/zero | tr '\0' '['; } >"$SCRATCH/deep" &&
+    fails_saying 1 "is no JSON object" z import "$SCRATCH/deep" &&
+    echo '[1]' >"$SCRATCH/number" && fails_saying 1 "it is no JSON object" z import "$SCRATCH/number"
+}
+
+export_tells_of_bytes_that_json_cannot_carry() {
+  clean
+  add --daily 08:30 --name $'a\xffb' -- true >/dev/null
+  try z export
+  same "$status: $err" "0: zelosched: \"name\" of task 1 (a\\xffb) is not UTF-8: bytes that JSON cannot carry were replaced" &&
+    same "$(json 'ascii(tasks[0]["name"])' <"$SCRATCH/out")" "'a\\ufffdb'"
+}
+
+output_that_fails() {
+  all_well
+  local command bad=0
+  for command in list 'show 1' status next history export 'completion bash' --help --version 'list --help'; do
+    local full=0 closed=0
+    # shellcheck disable=SC2086
+    z $command >/dev/full 2>"$SCRATCH/err" || full=$?
+    grep -q 'cannot write the output: No space left on device' "$SCRATCH/err" || full=silent
+    # shellcheck disable=SC2086
+    z $command >&- 2>"$SCRATCH/err" || closed=$?
+    grep -q 'cannot write the output: Bad file descriptor' "$SCRATCH/err" || closed=silent
+    same "$full $closed" "1 1" || { echo "$command"; bad=1; }
+  done
+  return "$bad"
+}
+
+closed_streams_harm_nothing() {
+  all_well
+  z run --wait 1 >&- 2>&- <&- || true
+  z add --daily 09:00 -- true >&- 2>&- <&- || true
+  same "$(ids_of_list --sort id)" "[1, 2]" && z history >/dev/null
+}
+
+ends_quietly_when_the_reader_is_gone() {
+  all_well
+  same "$(z list | head -c 2)" "ID"
+}
+
+same_in_every_locale() {
+  clean
+  add --daily 08:30 --name $'größe 漢字 \e[31m\xff' -- true >/dev/null
+  local locale expected
+  expected=$(z list)
+  grep -qF 'größe 漢字 \x1b[31m\xff' <<<"$expected" || return 1
+  for locale in C C.UTF-8 no_SUCH; do
+    same "$(env LC_ALL="$locale" "$ZELOSCHED" list)" "$expected" || return 1
+  done
+  ! grep -q $'\e' <<<"$expected"
+}
+
+# ---- completion -----------------------------------------------------------------------------
+
+# Prints what bash would offer for the line.
+completions() {
+  PATH=$BUILD_DIR/bin:$PATH bash -c '
+    source <(zelosched completion bash)
+    COMP_WORDS=("$@")
+    COMP_CWORD=$(($# - 1))
+    _zelosched
+    printf "%s," "${COMPREPLY[@]}"' - "$@"
+}
+
+completes() {
+  clean
+  add --daily 08:30 --name 'Nightly backup' -- true >/dev/null
+  add --daily 08:30 --name 'Mirror' -- true >/dev/null
+  same "$(completions zelosched he)|$(completions zelosched hi)|$(completions zelosched show '')|$(
+    completions zelosched show back)|$(completions zelosched show 2)|$(completions zelosched list --s)|$(
+      completions zelosched power '')|$(completions zelosched list --sort o)" \
+    ",|history,|1  (Nightly backup),2  (Mirror),|1,|2,|--sort,|list,add,remove,|owner,"
+}
+
+every_option_is_completed() {
+  local name options bad=0
+  for name in $(z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'); do
+    options=$(z "$name" --help | grep -oE '^  (-[a-z], )?--[a-z-]+' | grep -oE -- '--[a-z-]+' | sort -u)
+    for option in $options; do
+      [[ ",$(completions zelosched "$name" "$option")" == *",$option,"* ]] || { echo "$name $option"; bad=1; }
+    done
+  done
+  return "$bad"
+}
+
+# ---------------------------------------------------------------------------------------------
+
+have_clock || { skip "everything" "this sandbox cannot hide /sys"; exit 1; }
+start_something_like_cron
+
+check "every command has its help" every_command_has_help
+check "help fits a terminal" help_fits_the_terminal
+check "the version is told" gives 0 "zelosched 4.0.0" --version
+check "wrong arguments are usage errors" wrong_arguments_are_usage_errors
+check "a task is saved as it was told" saves_what_it_was_told
+check "several words of a command reach the shell as they are" quotes_words
+check "one word of a command is a shell command line" takes_one_word_as_it_is
+check "an owner is found by name and by number" finds_owners
+check "an edit changes what is named and nothing else" edits_only_what_is_named
+check "what the application forbids takes --force" respects_the_application
+check "an unknown id does not keep the others from being done" does_the_others
+check "what would do harm is refused and changes nothing" refuses
+check "an import with one bad task changes nothing" refuses_import_as_a_whole
+check "both forms of an export are imported unchanged" imports_what_it_exports
+check "an import takes one object, or one a line" imports_one_object_or_lines
+check "the doubly encoded form is the library's" agrees_with_the_library_on_the_wire_form
+check "twenty commands at once all take effect" twenty_at_once
+check "tasks are listed by their next run" lists_by_next_run
+check "only wanted tasks are listed" lists_chosen_tasks
+check "tasks are sorted by each key" sorts
+check "a task is shown" shows_a_task
+check "the coming runs are shown day by day" shows_the_coming_runs
+check "looking makes no status database" looking_makes_no_database
+check "a run's result is told" runs_and_tells_the_result
+check "a wait is for its own run alone" waits_for_its_own_run_only
+check "without --wait the run goes on by itself" lets_the_run_go_on
+check "what a run prints is shown when wanted" shows_the_output_when_told_to
+check "a run that gave up is told" tells_that_a_run_gave_up
+check "a run that died is told" tells_that_a_run_died
+check "the history has every run" keeps_history
+check "a run that goes on has its duration" shows_how_long_a_run_goes_on
+check "power times are added, changed and removed" looks_after_power_times
+check "power remove takes power times only" power_remove_refuses_other_tasks
+check "no more power times are added than are shown" power_lists_are_bounded
+check "power times are exported and imported" exports_power_times
+check "a clock that cannot be armed is told" tells_of_a_clock_that_fails
+check "status is well when all is" status_is_well
+for ((i = 0; i < ${#DAMAGES[@]}; i += 2)); do
+  check "status finds: ${DAMAGES[i]} ($((i / 2 + 1)))" status_finds "${DAMAGES[i]}" "${DAMAGES[i + 1]}"
+done
+check "a task with a fault can be disabled but not enabled" a_fault_can_be_disabled_but_not_enabled
+check "a task that cannot be read does not hide the others" a_bad_task_does_not_hide_the_others
+check "sync writes the crontab again" syncs
+check "a crontab that cannot be written is told" tells_of_a_crontab_that_cannot_be_written
+check "the error record is told in words" tells_the_error_in_words
+check "a store that is not root's alone is refused" tells_of_a_store_that_cannot_be_written
+check "a status database that is not root's alone is refused" tells_of_a_database_that_is_not_roots
+check "a status database that is none is told" tells_of_a_database_that_is_none
+if grep -qE '^ *0 +0 +[0-9]{2,}' /proc/self/uid_map; then
+  check "other users see tasks but do not change them" other_users_see_but_do_not_change
+else
+  skip "other users see tasks but do not change them" "this sandbox has no user but 0"
+fi
+check "the lock file is no link" lock_is_no_link
+check "waiting for the lock ends" waiting_for_the_lock_ends
+check "an import that cannot be read is told" import_tells_what_it_cannot_read
+check "an export tells of bytes that JSON cannot carry" export_tells_of_bytes_that_json_cannot_carry
+check "output that cannot be written is a failure" output_that_fails
+check "closed streams harm nothing" closed_streams_harm_nothing
+check "a reader that is gone ends the output quietly" ends_quietly_when_the_reader_is_gone
+check "a pipe gets the same in every locale" same_in_every_locale
+check "commands, options and tasks are completed" completes
+check "every option of every command is completed" every_option_is_completed
+finish

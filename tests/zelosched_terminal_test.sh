@@ -1,0 +1,7 @@
+#!/bin/bash
+# The administrator's program as somebody at a terminal sees it.
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+export TZ=UTC
+exec python3 "$here/support/zelosched_terminal.py"

@@ -1,0 +1,20 @@
+// The runs that are kept over a boot.
+#pragma once
+
+#include <optional>
+#include <vector>
+
+#include "runs.h"
+
+// Carries the runs of the status database over into the kept ones: each once, also when it was
+// carried over before, and with the result that it has now. At most a year of runs are kept, and of
+// these the newest hundred thousand. Also notes that the machine is up (missed.h). The exit status.
+// Throws Failure.
+int keepHistory();
+
+// The runs of the status database and the kept ones, newest first; of one task, or of all; at most
+// `limit`. Throws Failure.
+std::vector<Run> allRuns(std::optional<long> taskId, long limit);
+
+// Both may be read.
+bool mayReadAllRuns();

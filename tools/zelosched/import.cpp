@@ -1,0 +1,126 @@
+// zelosched import
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <memory>
+
+#include "change_lock.h"
+#include "command.h"
+#include "failure.h"
+#include "json_out.h"
+#include "options.h"
+#include "save.h"
+#include "task_check.h"
+#include "task_list.h"
+#include "text.h"
+
+namespace {
+
+constexpr Option kOptions[] = {{"new"}};
+constexpr char kStandardInput[] = "-";
+constexpr char kPowerApp[] = "ZELO.TOV.TaskScheduler.AutoPower";
+constexpr size_t kMostBytes = size_t{256} << 20;  // thousands of the largest tasks
+
+struct CloseFile {
+  void operator()(FILE *file) const {
+    if (file != stdin) std::fclose(file);
+  }
+};
+
+std::string readAll(const std::string &path) {
+  const std::unique_ptr<FILE, CloseFile> file(
+      path == kStandardInput ? stdin : std::fopen(path.c_str(), "re"));
+  if (file == nullptr) {
+    throw Failure("cannot open " + printable(path) + ": " + std::strerror(errno));
+  }
+  std::string text;
+  char buffer[65536];
+  for (size_t count; (count = std::fread(buffer, 1, sizeof buffer, file.get())) > 0;) {
+    text.append(buffer, count);
+    if (text.size() > kMostBytes) throw Failure(printable(path) + " is too large");
+  }
+  if (std::ferror(file.get()) != 0) {
+    throw Failure("cannot read " + printable(path) + ": " + std::strerror(errno));
+  }
+  return text;
+}
+
+Task taskOf(const Json::Value &object) {
+  Task task = std::make_unique<TaskRecord>();
+  fillFromJson(object, task.get());
+  const bool isPowerTime = std::strcmp(task->App, kPowerApp) == 0;
+  task->Backend = isPowerTime ? ZELO_SCHED_BACKEND_AUTOPOWER : ZELO_SCHED_BACKEND_SCHEDULE;
+  requireHarmless(*task);
+  return task;
+}
+
+// As the library decides it when it saves from JSON: the stored task of the id, if it is the same.
+bool isStored(const ZELO_SCHED_TASK &task) {
+  const Task stored = findTask(task.ID);
+  return stored != nullptr && stored->Backend == task.Backend &&
+         std::strcmp(stored->App, task.App) == 0 &&
+         (isPower(task) || std::strcmp(stored->Name, task.Name) == 0);
+}
+
+std::string orderOf(size_t index, size_t count) {
+  return "object " + std::to_string(index + 1) + " of " + std::to_string(count);
+}
+
+// Nothing is saved unless every object is a task that may be saved.
+std::vector<Task> readTasks(const std::vector<Json::Value> &objects) {
+  std::vector<Task> tasks;
+  for (size_t i = 0; i < objects.size(); ++i) {
+    try {
+      tasks.push_back(taskOf(objects[i]));
+    } catch (const Failure &failure) {
+      complain(orderOf(i, objects.size()) + ": " + failure.what());
+    }
+  }
+  if (tasks.size() < objects.size()) {
+    throw Failure("nothing was imported: " + counted(objects.size() - tasks.size(), "object") +
+                  " of " + std::to_string(objects.size()) + " cannot be saved");
+  }
+  return tasks;
+}
+
+void save(ZELO_SCHED_TASK *task, bool isNew) {
+  if (!isNew && isStored(*task)) {
+    editTask(task);
+    std::printf("%s overwritten\n", titleOf(*task).c_str());
+  } else {
+    task->ID = ZELO_SCHED_ID_NEW;
+    createTask(task);
+    std::printf("%s added\n", titleOf(*task).c_str());
+  }
+}
+
+int runImport(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoCommand();
+  if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
+  const std::vector<Json::Value> objects = parseObjects(readAll(arguments.operands().front()));
+  const ChangeLock lock;
+  const std::vector<Task> tasks = readTasks(objects);
+  int status = kDone;
+  for (size_t i = 0; i < tasks.size(); ++i) {
+    try {
+      save(tasks[i].get(), arguments.has("new"));
+    } catch (const Failure &failure) {
+      status = complain(orderOf(i, tasks.size()) + ": " + failure.what());
+    }
+  }
+  return status;
+}
+
+}  // namespace
+
+const Command kImportCommand = {
+    "import", "FILE|- [--new]", "save tasks from JSON",
+    "Saves the tasks of a JSON text: an array, one object, or an object a line, in either\n"
+    "form that 'zelosched export' writes. A task overwrites the stored one of its id when\n"
+    "that has the same name and application; every other becomes a new task.\n"
+    "\n"
+    "When one of them cannot be saved, none is, and each of those is told.\n"
+    "\n"
+    "  --new                          overwrite nothing: all become new tasks\n",
+    runImport};

@@ -1,0 +1,306 @@
+#include "json_out.h"
+
+#include <zelocore.h>
+#include <zelosdk.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <cstring>
+#include <memory>
+#include <sstream>
+
+#include "failure.h"
+#include "options.h"
+#include "text.h"
+
+namespace {
+
+constexpr int kHashCapacity = 64;
+constexpr char kCommandKey[] = "cmd";
+constexpr char kCommandBase64Key[] = "cmd base64";
+constexpr char kReplacement[] = "\xEF\xBF\xBD";
+
+struct FreeHash {
+  void operator()(QLIBC_SZHASH *hash) const { QLIBCSzHashFree(hash); }
+};
+struct FreeList {
+  void operator()(QLIBC_SZLIST *list) const { QLIBCSzListFree(list); }
+};
+
+// The keys whose values are numbers; each of the others is a text.
+constexpr std::string_view kNumberKeys[] = {
+    "id",
+    "can edit owner",
+    "can edit name",
+    "listable",
+    "can run from ui",
+    "can delete from ui",
+    "can edit from ui",
+    "can run app same time",
+    "can run task same time",
+    "simple edit form",
+    "owner",
+    "start year",
+    "start month",
+    "start day",
+    "run hour",
+    "run min",
+    "repeat hour",
+    "last work hour",
+};
+
+bool isNumberKey(std::string_view key) {
+  return std::find(std::begin(kNumberKeys), std::end(kNumberKeys), key) != std::end(kNumberKeys);
+}
+
+struct Pair {
+  std::string key;
+  std::string value;
+};
+
+std::vector<Pair> hashOf(const ZELO_SCHED_TASK &task) {
+  forgetError();
+  PSZHASH rawHash = QLIBCSzHashAlloc(kHashCapacity);
+  PSZLIST rawKeys = QLIBCSzListAlloc(kHashCapacity);
+  const bool filled = rawHash != nullptr && rawKeys != nullptr &&
+                      ZELOSchedInitHashFromTask(&rawHash, &task) == 0 &&
+                      QLIBCSzHashEnumKey(rawHash, &rawKeys) >= 0;
+  const std::unique_ptr<QLIBC_SZHASH, FreeHash> hash(rawHash);
+  const std::unique_ptr<QLIBC_SZLIST, FreeList> keys(rawKeys);
+  if (!filled) throw failedTo("convert task " + std::to_string(task.ID));
+  std::vector<Pair> pairs;
+  for (int i = 0; i < QLIBCSzListCount(keys.get()); ++i) {
+    const char *key = QLIBCSzListGet(keys.get(), i);
+    pairs.push_back({key, QLIBCSzHashGetValue(hash.get(), key)});
+  }
+  return pairs;
+}
+
+std::string base64(std::string_view bytes) {
+  constexpr size_t kGroup = 3;
+  constexpr size_t kEncodedGroup = 4;
+  std::string text((bytes.size() / kGroup + 1) * kEncodedGroup + 1, '\0');
+  if (SzBase64EncodeFull(bytes.data(), bytes.size(), text.data(), text.size(), 1) != 1) {
+    throw failedTo("encode a command");
+  }
+  text.resize(std::strlen(text.c_str()));
+  return text;
+}
+
+std::string valid(std::string_view text, bool *isWhole) {
+  std::string out;
+  *isWhole = true;
+  while (!text.empty()) {
+    const size_t bytes = utf8Length(text);
+    *isWhole = *isWhole && bytes > 0;
+    out += bytes > 0 ? std::string(text.substr(0, bytes)) : kReplacement;
+    text.remove_prefix(std::max<size_t>(bytes, 1));
+  }
+  return out;
+}
+
+bool isUtf8(std::string_view text) {
+  bool isWhole = true;
+  static_cast<void>(valid(text, &isWhole));
+  return isWhole;
+}
+
+Json::Value parse(const std::string &text, std::string *errors) {
+  Json::CharReaderBuilder builder;
+  builder["collectComments"] = false;
+  builder["failIfExtra"] = true;
+  const std::unique_ptr<Json::CharReader> reader(builder.newCharReader());
+  Json::Value value;
+  try {
+    if (reader->parse(text.data(), text.data() + text.size(), &value, errors)) return value;
+  } catch (const Json::Exception &error) {
+    *errors = error.what();
+  }
+  return {};
+}
+
+// The text that a member of the doubly encoded form holds.
+bool decodeTwice(const Json::Value &member, std::string *text) {
+  if (!member.isString()) return false;
+  std::string errors;
+  const Json::Value inner = parse(member.asString(), &errors);
+  if (!inner.isString()) return false;
+  *text = inner.asString();
+  return true;
+}
+
+bool isWireForm(const Json::Value &object) {
+  std::string text;
+  return !object.empty() &&
+         std::all_of(object.begin(), object.end(),
+                     [&](const Json::Value &member) { return decodeTwice(member, &text); });
+}
+
+std::string memberText(const std::string &key, const Json::Value &member, bool isWire) {
+  std::string text;
+  if (isWire) {
+    decodeTwice(member, &text);
+  } else if (member.isString()) {
+    text = member.asString();
+  } else if (member.isInt64()) {
+    text = std::to_string(member.asInt64());
+  } else {
+    throw Failure("\"" + printable(key) + "\" is neither a text nor a whole number");
+  }
+  if (text.find('\0') != std::string::npos) {
+    throw Failure("\"" + printable(key) + "\" holds a zero byte");
+  }
+  if (isNumberKey(key) && !parseNumber(text)) {
+    throw Failure("\"" + printable(key) + "\" is no whole number");
+  }
+  return text;
+}
+
+struct Names {
+  const char *key;
+  std::vector<std::string> names;
+};
+
+// What the hash form passes over must not become some other value.
+void checkName(const std::string &key, const std::string &text) {
+  static const Names kEnumerations[] = {
+      {"state", {"disabled", "enabled"}},
+      {"type", {"once", "daily", "weekly", "monthly", "yearly"}},
+  };
+  for (const Names &known : kEnumerations) {
+    if (key != known.key) continue;
+    if (std::find(known.names.begin(), known.names.end(), text) == known.names.end()) {
+      throw Failure("\"" + key + "\" is '" + printable(text) + "', which it cannot be");
+    }
+  }
+}
+
+struct Field {
+  const char *key;
+  size_t capacity;
+};
+constexpr Field kTextFields[] = {
+    {"name", sizeof(ZELO_SCHED_TASK::Name)},
+    {"edit form", sizeof(ZELO_SCHED_TASK::EditForm)},
+    {"edit dialog", sizeof(ZELO_SCHED_TASK::EditDialog)},
+    {"app", sizeof(ZELO_SCHED_TASK::App)},
+    {"app name", sizeof(ZELO_SCHED_TASK::AppName)},
+    {"app args", sizeof(ZELO_SCHED_TASK::AppArgs)},
+    {"action", sizeof(ZELO_SCHED_TASK::Action)},
+    {"week", sizeof(ZELO_SCHED_TASK::Week)},
+};
+
+void checkLength(const std::string &key, const std::string &text) {
+  for (const Field &field : kTextFields) {
+    if (key == field.key && text.size() >= field.capacity) {
+      throw Failure("\"" + key + "\" is longer than " + std::to_string(field.capacity - 1) +
+                    " bytes");
+    }
+  }
+}
+
+constexpr const char *kRequiredKeys[] = {"run hour", "run min", "name",  "app", "app name",
+                                         "action",   "cmd",     "state", "type"};
+
+void checkRequired(PSZHASH hash) {
+  for (const char *key : kRequiredKeys) {
+    if (QLIBCSzHashGetValue(hash, key) == nullptr) {
+      throw Failure(std::string("\"") + key + "\" is missing");
+    }
+  }
+}
+
+}  // namespace
+
+Json::Value jsonText(std::string_view text) {
+  bool isWhole = true;
+  return {valid(text, &isWhole)};
+}
+
+std::vector<std::string> lossyKeysOf(const ZELO_SCHED_TASK &task) {
+  std::vector<std::string> keys;
+  for (const Pair &pair : hashOf(task)) {
+    if (!isUtf8(pair.value)) keys.push_back(pair.key);
+  }
+  return keys;
+}
+
+Json::Value jsonOf(const ZELO_SCHED_TASK &task) {
+  Json::Value object(Json::objectValue);
+  for (const Pair &pair : hashOf(task)) {
+    if (pair.key == kCommandKey) continue;
+    if (isNumberKey(pair.key)) {
+      object[pair.key] = Json::Int64(parseNumber(pair.value).value_or(0));
+    } else {
+      object[pair.key] = jsonText(pair.value);
+    }
+  }
+  if (isUtf8(task.Command)) {
+    object[kCommandKey] = jsonText(task.Command);
+  } else {
+    object[kCommandBase64Key] = base64(task.Command);
+  }
+  object["backend"] = task.Backend;
+  object["next trigger time"] = jsonText(task.NextTriggerTime);
+  return object;
+}
+
+void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task) {
+  if (!object.isObject()) throw Failure("it is no JSON object");
+  const bool isWire = isWireForm(object);
+  PSZHASH raw = QLIBCSzHashAlloc(kHashCapacity);
+  if (raw == nullptr) throw failedTo("read a task");
+  std::unique_ptr<QLIBC_SZHASH, FreeHash> hash(raw);
+  const auto set = [&](const std::string &key, const std::string &value) {
+    PSZHASH handle = hash.release();
+    const int result = QLIBCSzHashSetValue(&handle, key.c_str(), value.c_str());
+    hash.reset(handle);
+    if (result < 0) throw failedTo("read a task");
+  };
+  set("id", std::to_string(ZELO_SCHED_ID_NEW));
+  for (const std::string &key : object.getMemberNames()) {
+    if (key.empty() || key.find('\0') != std::string::npos) throw Failure("a member has no name");
+    const std::string text = memberText(key, object[key], isWire);
+    checkName(key, text);
+    checkLength(key, text);
+    const bool isPlainCommand = !isWire && key == kCommandKey;
+    set(key == kCommandBase64Key ? kCommandKey : key, isPlainCommand ? base64(text) : text);
+  }
+  checkRequired(hash.get());
+  forgetError();
+  if (ZELOSchedInitTaskFromHash(task, hash.get()) < 0) {
+    throw Failure("it is no task: " + errorInWords());
+  }
+}
+
+std::vector<Json::Value> parseObjects(const std::string &text) {
+  std::string errors;
+  const Json::Value whole = parse(text, &errors);
+  if (whole.isArray()) return {whole.begin(), whole.end()};
+  if (whole.isObject()) return {whole};
+  std::vector<Json::Value> objects;
+  std::istringstream lines(text);
+  std::string line;
+  for (size_t number = 1; std::getline(lines, line); ++number) {
+    if (line.find_first_not_of(" \t\r") == std::string::npos) continue;
+    Json::Value object = parse(line, &errors);
+    if (!object.isObject()) throw Failure("line " + std::to_string(number) + " is no JSON object");
+    objects.push_back(std::move(object));
+  }
+  return objects;
+}
+
+std::string onOneLine(const Json::Value &value) {
+  Json::StreamWriterBuilder builder;
+  builder["indentation"] = "";
+  builder["emitUTF8"] = false;  // nothing that could upset a terminal
+  return Json::writeString(builder, value);
+}
+
+void printJson(const std::vector<Json::Value> &objects) {
+  std::fputs("[", stdout);
+  for (size_t i = 0; i < objects.size(); ++i) {
+    std::printf("%s\n%s", i == 0 ? "" : ",", onOneLine(objects[i]).c_str());
+  }
+  std::fputs("\n]\n", stdout);
+}

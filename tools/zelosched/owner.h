@@ -1,0 +1,15 @@
+// Users by name and by number.
+#pragma once
+
+#include <sys/types.h>
+
+#include <optional>
+#include <string>
+
+// The user of that name, else of that number; nothing when there is neither.
+std::optional<uid_t> findUser(const std::string &nameOrNumber);
+
+bool userExists(uid_t uid);
+
+// The user's name, or the number of one that has none.
+std::string userName(uid_t uid);

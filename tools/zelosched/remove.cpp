@@ -1,0 +1,67 @@
+// zelosched remove
+#include "remove.h"
+
+#include <unistd.h>
+
+#include <cstdio>
+#include <string>
+
+#include "change_lock.h"
+#include "for_each_id.h"
+#include "options.h"
+#include "save.h"
+#include "task_list.h"
+
+namespace {
+
+constexpr Option kOptions[] = {{"yes", Option::kNone, 'y'}, {"force"}};
+
+bool isYes(const std::string &answer) {
+  return answer == "y" || answer == "Y" || answer == "yes";
+}
+
+// Asked on standard error, so that it is seen whatever the output is.
+bool isConfirmed(const ZELO_SCHED_TASK &task) {
+  std::fprintf(stderr, "Remove %s? [y/N] ", titleOf(task).c_str());
+  std::fflush(stderr);
+  std::string answer;
+  for (int c; (c = std::getchar()) != EOF && c != '\n';) answer += static_cast<char>(c);
+  return isYes(answer);
+}
+
+// The lock is not held while an answer is waited for.
+void removeOne(long id, const RemoveRules &rules) {
+  const Task task = loadTask(id);
+  if (rules.powerOnly && !isPower(*task)) throw Failure(titleOf(*task) + " is no power time");
+  requirePermission(*task, task->CanDeleteFromUI, "removed", rules.insists);
+  if (!rules.isSure && !isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");
+  const ChangeLock lock;
+  static_cast<void>(loadTask(id));
+  removeTask(*task);
+  std::printf("%s removed\n", titleOf(*task).c_str());
+}
+
+int runRemove(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoCommand();
+  return removeTasks(parseIds(arguments.operands()),
+                     {arguments.has("yes"), arguments.has("force"), false});
+}
+
+}  // namespace
+
+int removeTasks(const std::vector<long> &ids, const RemoveRules &rules) {
+  if (!rules.isSure && isatty(STDIN_FILENO) != 1) {
+    throw UsageError("there is nobody to ask: give --yes to remove without a question");
+  }
+  return forEachId(ids, [&](long id) { removeOne(id, rules); });
+}
+
+const Command kRemoveCommand = {
+    "remove", "ID... [--yes]", "delete tasks",
+    "Deletes the tasks. Asks before each when the standard input is a terminal; refuses\n"
+    "without --yes when it is none.\n"
+    "\n"
+    "  -y, --yes                      do not ask\n"
+    "  --force                        even if its application does not let it be removed\n",
+    runRemove};

@@ -1,0 +1,10 @@
+// How a run went, in words.
+#pragma once
+
+#include <string>
+
+// "finished", "failed with exit code 3", "killed by signal SIGKILL (9)", ...
+std::string resultInWords(int statusCode, const std::string &comment);
+
+// The run is over and did not end well.
+bool isBadResult(int statusCode);

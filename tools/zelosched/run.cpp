@@ -1,0 +1,194 @@
+// zelosched run
+#include <dirent.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <fstream>
+#include <iterator>
+#include <map>
+#include <sstream>
+#include <thread>
+
+#include "command.h"
+#include "for_each_id.h"
+#include "options.h"
+#include "result_text.h"
+#include "runs.h"
+#include "save.h"
+#include "start_run.h"
+#include "task_list.h"
+#include "terminal.h"
+#include "text.h"
+
+namespace {
+
+constexpr Option kOptions[] = {{"wait", Option::kNone, 'w'}, {"output"}, {"force"}};
+constexpr std::chrono::milliseconds kPause(50);
+constexpr char kClearLine[] = "\r\033[K";
+
+using Clock = std::chrono::steady_clock;
+
+// ---- the process of a run -------------------------------------------------------------------
+// The library leaves its process to itself. As the one that takes in orphans we become its parent,
+// learn of its end at once, and tell its row in the status database from those of other runs.
+
+struct ProcessStat {
+  pid_t parent = 0;
+  unsigned long long started = 0;
+};
+
+ProcessStat statOf(const std::string &pid) {
+  constexpr int kFieldsBetween = 17;  // between the parent and the start in /proc/PID/stat
+  std::ifstream file("/proc/" + pid + "/stat");
+  const std::string text(std::istreambuf_iterator<char>(file), {});
+  const size_t name = text.rfind(')');  // the name before it may hold anything
+  if (name == std::string::npos) return {};
+  std::istringstream fields(text.substr(name + 1));
+  ProcessStat stat;
+  std::string skipped;
+  fields >> skipped >> stat.parent;
+  for (int i = 0; i < kFieldsBetween; ++i) fields >> skipped;
+  fields >> stat.started;
+  return stat;
+}
+
+std::map<pid_t, ProcessStat> children() {
+  std::map<pid_t, ProcessStat> found;
+  DIR *directory = opendir("/proc");
+  if (directory == nullptr) return found;
+  while (const dirent *entry = readdir(directory)) {
+    const std::optional<long> pid = parseNumber(entry->d_name);
+    if (!pid) continue;
+    const ProcessStat stat = statOf(entry->d_name);
+    if (stat.parent == getpid()) found[static_cast<pid_t>(*pid)] = stat;
+  }
+  closedir(directory);
+  return found;
+}
+
+// The run's own process is older than whatever its command has left to us by now.
+pid_t newChild(const std::map<pid_t, ProcessStat> &before) {
+  pid_t oldest = 0;
+  unsigned long long started = 0;
+  for (const auto &[pid, stat] : children()) {
+    if (before.count(pid) != 0) continue;
+    if (oldest == 0 || stat.started < started) {
+      oldest = pid;
+      started = stat.started;
+    }
+  }
+  return oldest;
+}
+
+// ---- waiting --------------------------------------------------------------------------------
+
+// One line that is written over, on a terminal only, and not where the command itself writes.
+class Progress {
+ public:
+  Progress(std::string title, bool isShown) : title_(std::move(title)), isShown_(isShown) {}
+  ~Progress() { clear(); }
+  Progress(const Progress &) = delete;
+  Progress &operator=(const Progress &) = delete;
+
+  void show(const char *what) {
+    const std::optional<size_t> columns = isShown_ ? terminalColumns() : std::nullopt;
+    const auto seconds =
+        std::chrono::duration_cast<std::chrono::seconds>(Clock::now() - start_).count();
+    if (!columns || seconds == shown_) return;
+    shown_ = seconds;
+    const std::string line = title_ + " " + what + ", " + std::to_string(seconds) + " s";
+    std::printf("%s%s", kClearLine, fitted(line, *columns - 1).c_str());
+    std::fflush(stdout);
+  }
+
+ private:
+  void clear() const {
+    if (shown_ < 0) return;
+    std::fputs(kClearLine, stdout);
+    std::fflush(stdout);
+  }
+
+  std::string title_;
+  bool isShown_;
+  Clock::time_point start_ = Clock::now();
+  long shown_ = -1;
+};
+
+void waitForEnd(pid_t process, long lastStatusId, const RunDatabase &database, Progress *progress) {
+  bool isRecorded = false;
+  while (waitpid(process, nullptr, WNOHANG) == 0) {
+    isRecorded = isRecorded || database.runOfProcess(process, lastStatusId).has_value();
+    progress->show(isRecorded ? "is running" : "waits for its turn");
+    std::this_thread::sleep_for(kPause);
+  }
+}
+
+void runAndWait(const ZELO_SCHED_TASK &task, bool showsOutput) {
+  // Makes the database when it is missing, lest it appear unseen.
+  forgetError();
+  sqlite3_close(ZELOSchedDBInit());
+  const RunDatabase database;
+  const long lastStatusId = database.lastStatusId();
+  const std::map<pid_t, ProcessStat> before = children();
+  if (showsOutput) {
+    startRun(task);
+  } else {
+    startRunUnseen(task);
+  }
+  const pid_t process = newChild(before);
+  if (process == 0)
+    throw Failure(titleOf(task) + " was started, but its process is not to be found");
+  {
+    Progress progress(titleOf(task), !showsOutput);
+    waitForEnd(process, lastStatusId, database, &progress);
+  }
+  const std::optional<Run> run = database.runOfProcess(process, lastStatusId);
+  if (!run) {
+    throw Failure(titleOf(task) +
+                  " did not run: it could not be recorded, or other runs were in its way for too "
+                  "long (the system log says which)");
+  }
+  const std::string result = titleOf(task) + " " + resultInWords(run->statusCode, run->comment);
+  if (run->statusCode != ZELO_SCHED_STATUS_FINISHED) throw Failure(result);
+  std::puts(result.c_str());
+}
+
+void runOne(long id, const Arguments &arguments) {
+  const Task task = loadTask(id);
+  requirePermission(*task, task->CanRunFromUI, "run", arguments.has("force"));
+  if (arguments.has("wait") || arguments.has("output")) {
+    runAndWait(*task, arguments.has("output"));
+  } else {
+    startRunUnseen(*task);
+    std::printf("%s started\n", titleOf(*task).c_str());
+  }
+}
+
+int runRun(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoCommand();
+  const std::vector<long> ids = parseIds(arguments.operands());
+  prctl(PR_SET_CHILD_SUBREAPER, 1);
+  return forEachId(ids, [&](long id) { runOne(id, arguments); });
+}
+
+}  // namespace
+
+const Command kRunCommand = {
+    "run", "ID... [--wait] [--output]", "run tasks now",
+    "Runs the tasks now, whatever their times say and also when they are disabled. A run\n"
+    "waits for others that must not overlap with it, as always.\n"
+    "\n"
+    "Without --wait the run goes on by itself, and 'zelosched history' tells how it\n"
+    "ended. With --wait several tasks run one after the other.\n"
+    "\n"
+    "  -w, --wait                     wait for the end and tell the result; the exit status\n"
+    "                                 is 0 only when the command exited with 0\n"
+    "  --output                       wait, and show what the command prints; else that is\n"
+    "                                 seen by nobody\n"
+    "  --force                        even if its application does not let it be run\n",
+    runRun};

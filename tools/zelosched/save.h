@@ -1,0 +1,21 @@
+// Changing the store. Whoever changes it holds a ChangeLock from reading on. What would do harm is
+// refused before anything is written; what was written is compared with the crontab afterwards,
+// since the library reports a crontab that it could not rewrite in the log alone.
+#pragma once
+
+#include <zelosched.h>
+
+// Throws Failure, with every fault in a sentence, for a task that would do harm.
+void requireHarmless(const ZELO_SCHED_TASK &task);
+
+// Each throws Failure. The task's id is the new one afterwards: that of a power time is made of its
+// content and changes with it.
+void createTask(ZELO_SCHED_TASK *task);
+void editTask(ZELO_SCHED_TASK *task);
+void removeTask(const ZELO_SCHED_TASK &task);
+
+// The crontab is in step with the store. Throws Failure.
+void requireCrontabInStep();
+
+// What the application allows by hand, unless the administrator insists. Throws Failure.
+void requirePermission(const ZELO_SCHED_TASK &task, int32_t flag, const char *what, bool insists);

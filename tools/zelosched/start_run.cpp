@@ -1,0 +1,56 @@
+#include "start_run.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <iterator>
+
+#include "failure.h"
+#include "task_list.h"
+
+namespace {
+
+// While one of these lives, the standard streams lead nowhere.
+class NoStreams {
+ public:
+  NoStreams() {
+    const int nowhere = open("/dev/null", O_RDWR | O_CLOEXEC);
+    for (size_t i = 0; i < std::size(kept_); ++i) {
+      const int stream = static_cast<int>(i);
+      kept_[i] = fcntl(stream, F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
+      dup2(nowhere, stream);
+    }
+    close(nowhere);
+  }
+  ~NoStreams() {
+    for (size_t i = 0; i < std::size(kept_); ++i) {
+      dup2(kept_[i], static_cast<int>(i));
+      close(kept_[i]);
+    }
+  }
+  NoStreams(const NoStreams &) = delete;
+  NoStreams &operator=(const NoStreams &) = delete;
+
+ private:
+  int kept_[STDERR_FILENO + 1];
+};
+
+}  // namespace
+
+void startRun(const ZELO_SCHED_TASK &task) {
+  // The run's process begins as a copy of this one.
+  std::fflush(stdout);
+  forgetError();
+  constexpr int kAnyTime = 0;
+  constexpr int kDisabledToo = 0;
+  if (ZELOSchedTaskRun(task.ID, kAnyTime, kDisabledToo) < 0) {
+    throw failedTo("run " + titleOf(task));
+  }
+}
+
+void startRunUnseen(const ZELO_SCHED_TASK &task) {
+  std::fflush(stdout);
+  const NoStreams nowhere;
+  startRun(task);
+}

@@ -1,0 +1,225 @@
+// zelosched status
+#include <sys/stat.h>
+#include <unistd.h>
+#include <zelocore.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <fstream>
+#include <iterator>
+
+#include "coming_runs.h"
+#include "command.h"
+#include "crontab_check.h"
+#include "failure.h"
+#include "history_keep.h"
+#include "missed.h"
+#include "options.h"
+#include "runs.h"
+#include "task_check.h"
+#include "task_list.h"
+#include "terminal.h"
+#include "text.h"
+
+namespace {
+
+constexpr char kCronPidFile[] = "/var/run/crond.pid";
+constexpr char kTaskProgram[] = "/tmp/zeloschedtask";
+constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
+constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
+constexpr int kAlive = 1;
+
+struct Finding {
+  bool isWell;
+  std::string text;
+};
+using Findings = std::vector<Finding>;
+
+Finding well(const std::string &text) {
+  return {true, text};
+}
+
+Finding wrong(const std::string &text) {
+  return {false, text};
+}
+
+std::string contents(const std::string &path) {
+  std::ifstream file(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
+
+std::string firstLine(const std::string &path) {
+  const std::string text = contents(path);
+  return text.substr(0, text.find_first_of(" \n"));
+}
+
+// A number that another program has got since must not pass for cron's.
+bool isCron(long pid) {
+  return firstLine("/proc/" + std::to_string(pid) + "/comm").find("cron") != std::string::npos;
+}
+
+Findings cronRuns() {
+  const std::string text = firstLine(kCronPidFile);
+  const std::optional<long> pid = parseNumber(text);
+  const bool isRunning = pid && *pid > 0 && *pid <= INT32_MAX &&
+                         QLIBCProcAlive(static_cast<pid_t>(*pid)) == kAlive && isCron(*pid);
+  if (isRunning) return {well("cron is running (process " + text + ")")};
+  return {wrong("cron is not running: no task will start by itself")};
+}
+
+Findings programIsThere() {
+  struct stat info {};
+  if (lstat(kTaskProgram, &info) != 0) {
+    return {wrong(std::string(kTaskProgram) +
+                  ", which cron starts, cannot be examined: " + std::strerror(errno))};
+  }
+  const bool isProgram = S_ISREG(info.st_mode) && (info.st_mode & S_IXUSR) != 0;
+  if (!isProgram) return {wrong(std::string(kTaskProgram) + " is no program")};
+  if (info.st_uid != 0 || (info.st_mode & (S_IWGRP | S_IWOTH)) != 0) {
+    return {wrong(std::string(kTaskProgram) +
+                  " is not root's alone: whoever can write it runs commands as root")};
+  }
+  return {well(std::string(kTaskProgram) + " is there, and root's")};
+}
+
+bool exists(const char *path) {
+  return QLIBCFileExist(path) != 0;
+}
+
+bool isWhole(const char *path, int *sections) {
+  PSZLIST names = QLIBCSzListAlloc(1);
+  forgetError();
+  *sections = QLIBCFileEnumSection(path, &names);
+  QLIBCSzListFree(names);
+  return *sections >= 0;
+}
+
+Findings copiesAgree() {
+  if (!exists(kWorkingCopy) && !exists(kPersistentCopy)) return {well("no task was ever saved")};
+  for (const char *path : {kWorkingCopy, kPersistentCopy}) {
+    int sections = 0;
+    if (!exists(path)) return {wrong(std::string(path) + " is missing")};
+    if (!isWhole(path, &sections)) {
+      return {wrong(std::string(path) + " cannot be read: " + errorInWords())};
+    }
+  }
+  if (contents(kWorkingCopy) == contents(kPersistentCopy)) {
+    return {well("the working and the persistent copy of the tasks agree")};
+  }
+  return {
+      wrong("the working and the persistent copy of the tasks differ: save a task again, or "
+            "what was changed last is lost at the next boot")};
+}
+
+Findings tasksAreReadable(const TaskList &list) {
+  int sections = 0;
+  if (!exists(kWorkingCopy) || !isWhole(kWorkingCopy, &sections)) return {};
+  int stored = 0;
+  for (const ZELO_SCHED_TASK *task : list.tasks()) stored += isPower(*task) ? 0 : 1;
+  if (stored == sections) return {};
+  return {wrong(counted(static_cast<size_t>(sections - stored), "stored task") +
+                " cannot be read, and will not run (the system log says why)")};
+}
+
+Findings crontabIsInStep(const TaskList &list) {
+  const std::vector<std::string> differences = crontabDifferences(list.tasks());
+  if (differences.empty()) return {well("the crontab is in step with the tasks")};
+  Findings findings;
+  for (const std::string &difference : differences) findings.push_back(wrong(difference));
+  findings.push_back(wrong("'zelosched sync' writes the crontab again"));
+  return findings;
+}
+
+// One field that cron cannot read can stop every other task too.
+Findings tasksAreHarmless(const TaskList &list) {
+  Findings findings;
+  for (const ZELO_SCHED_TASK *task : list.tasks()) {
+    if (!isEnabled(*task)) continue;
+    const bool stopsCron = !unreadableFieldsOf(*task).empty();
+    for (const std::string &harm : harmsOf(*task)) {
+      findings.push_back(wrong(titleOf(*task) + ": " + harm));
+    }
+    if (stopsCron) {
+      findings.push_back(wrong("cron may pass over all of /etc/crontab for that line: edit " +
+                               titleOf(*task) + " or disable it"));
+    }
+  }
+  if (findings.empty()) findings.push_back(well("no enabled task has a fault"));
+  return findings;
+}
+
+Findings runsInProgress(const TaskList &list) {
+  if (!mayReadRuns()) return {well("whether a task is running, only root may see")};
+  Findings findings;
+  for (const Run &run : RunDatabase().running()) {
+    std::string title = "task " + std::to_string(run.taskId);
+    for (const ZELO_SCHED_TASK *task : list.tasks()) {
+      if (task->ID == run.taskId) title = titleOf(*task);
+    }
+    findings.push_back(well(title + " is running since " + minuteText(localMinute(run.start)) +
+                            " as process " + std::to_string(run.pid)));
+  }
+  if (findings.empty()) findings.push_back(well("no task is running"));
+  return findings;
+}
+
+Findings runsMissed(const TaskList &list) {
+  if (!mayReadAllRuns()) return {well("whether a run was missed, only root may see")};
+  Findings findings;
+  for (const MissedTask &missed : missedTasks(list, time(nullptr) - kMissedRemembered)) {
+    findings.push_back(wrong(titleOf(*missed.task) + " was due at " +
+                             minuteText(localMinute(missed.due)) +
+                             ", when the machine was off: 'zelosched run " +
+                             std::to_string(missed.task->ID) + "' runs it now"));
+  }
+  if (findings.empty()) findings.push_back(well("no run was missed"));
+  return findings;
+}
+
+int report(const Findings &findings) {
+  const bool colour = showsColour();
+  int status = kDone;
+  for (const Finding &finding : findings) {
+    const char *mark = finding.isWell ? "ok   " : colour ? "\033[31mWRONG\033[0m" : "WRONG";
+    std::printf("%s  %s\n", mark, printable(finding.text).c_str());
+    if (!finding.isWell) status = kFailed;
+  }
+  return status;
+}
+
+int runStatus(int argc, char **argv) {
+  const Arguments arguments(argc, argv, {});
+  arguments.requireNoOperands();
+  arguments.requireNoCommand();
+  Findings all;
+  const auto add = [&](const Findings &findings) {
+    all.insert(all.end(), findings.begin(), findings.end());
+  };
+  add(cronRuns());
+  add(programIsThere());
+  add(copiesAgree());
+  try {
+    const TaskList list;
+    add(tasksAreReadable(list));
+    add(crontabIsInStep(list));
+    add(tasksAreHarmless(list));
+    add(runsInProgress(list));
+    add(runsMissed(list));
+  } catch (const Failure &failure) {
+    add({wrong(failure.what())});
+  }
+  return report(all);
+}
+
+}  // namespace
+
+const Command kStatusCommand = {
+    "status", "", "say whether all is well",
+    "Prints a line for each check: whether cron is running, whether the program that it\n"
+    "starts is there and root's, whether both copies of the tasks agree, whether the\n"
+    "crontab is in step with them, whether an enabled task has a fault, which tasks are\n"
+    "running, and which were due while the machine was off.\n"
+    "\n"
+    "Exit status: 0 when all is well, 1 when something is wrong.\n",
+    runStatus};

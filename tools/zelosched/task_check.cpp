@@ -1,0 +1,182 @@
+#include "task_check.h"
+
+#include <chrono>
+#include <cstring>
+
+#include "coming_runs.h"
+#include "owner.h"
+#include "schedule_text.h"
+#include "text.h"
+
+namespace {
+
+constexpr uint32_t kLastHour = 23;
+constexpr uint32_t kLastMinute = 59;
+constexpr uint32_t kMonths = 12;
+constexpr uint32_t kMostDays = 31;
+constexpr size_t kDaysOfWeek = 7;
+constexpr uint32_t kLastYear = 9999;
+constexpr int kLeapYear = 2024;
+constexpr size_t kMostCommandBytes = 12287;  // of a longer one only so many survive being stored
+
+bool hasDayOfMonth(const ZELO_SCHED_TASK &task) {
+  return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_MONTHLY ||
+         task.Type == ZELO_SCHED_TYPE_YEARLY;
+}
+
+bool hasMonth(const ZELO_SCHED_TASK &task) {
+  return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_YEARLY;
+}
+
+bool isDay(const ZELO_SCHED_TASK &task) {
+  return task.StartDay >= 1 && task.StartDay <= kMostDays;
+}
+
+bool isMonth(const ZELO_SCHED_TASK &task) {
+  return task.StartMonth >= 1 && task.StartMonth <= kMonths;
+}
+
+size_t weekLength(const ZELO_SCHED_TASK &task) {
+  return strnlen(task.Week, sizeof task.Week);
+}
+
+bool isWeekEmpty(const ZELO_SCHED_TASK &task) {
+  return std::string(task.Week, weekLength(task)).find_first_not_of('0') == std::string::npos;
+}
+
+// The day is looked for in a leap year when the task runs every year, as 29 February comes then.
+bool dayExists(const ZELO_SCHED_TASK &task) {
+  const int year = task.Type == ZELO_SCHED_TYPE_ONCE ? static_cast<int>(task.StartYear) : kLeapYear;
+  return std::chrono::year_month_day(std::chrono::year(year), std::chrono::month(task.StartMonth),
+                                     std::chrono::day(task.StartDay))
+      .ok();
+}
+
+std::string number(uint32_t value) {
+  return std::to_string(value);
+}
+
+// ---- what cron could not read ---------------------------------------------------------------
+
+std::string badHour(const ZELO_SCHED_TASK &task) {
+  if (task.RunHour <= kLastHour) return "";
+  return "the hour " + number(task.RunHour) + " is none of a day: write a time from 00:00 to 23:59";
+}
+
+std::string badMinute(const ZELO_SCHED_TASK &task) {
+  if (task.RunMin <= kLastMinute) return "";
+  return "the minute " + number(task.RunMin) +
+         " is none of an hour: write minutes from 00 to 59, as in 08:30";
+}
+
+std::string badLastHour(const ZELO_SCHED_TASK &task) {
+  if (task.RepeatHour == 0 || task.LastWorkHour <= kLastHour) return "";
+  return "the last hour " + number(task.LastWorkHour) +
+         " is none of a day: write --until with an hour from 0 to 23";
+}
+
+std::string badDay(const ZELO_SCHED_TASK &task) {
+  if (!hasDayOfMonth(task) || isDay(task)) return "";
+  return "day " + number(task.StartDay) + " is none of a month: write a day from 1 to 31";
+}
+
+std::string badMonth(const ZELO_SCHED_TASK &task) {
+  if (!hasMonth(task) || isMonth(task)) return "";
+  return "month " + number(task.StartMonth) +
+         " is none of a year: write a month from 01 to 12, as in 02-29 for 29 February";
+}
+
+std::string noWeekday(const ZELO_SCHED_TASK &task) {
+  if (task.Type != ZELO_SCHED_TYPE_WEEKLY || !isWeekEmpty(task)) return "";
+  return "a weekly task needs a day of the week: write --weekly mon,wed,fri 08:30";
+}
+
+// ---- what makes the task itself useless -----------------------------------------------------
+
+std::string neverExists(const ZELO_SCHED_TASK &task) {
+  if (!hasMonth(task) || !isDay(task) || !isMonth(task)) return "";
+  const bool isYear = task.Type != ZELO_SCHED_TYPE_ONCE || task.StartYear <= kLastYear;
+  if (isYear && dayExists(task)) return "";
+  if (!isYear) return "the year " + number(task.StartYear) + " never comes: write one up to 9999";
+  return "month " + number(task.StartMonth) + " never has a day " + number(task.StartDay) +
+         (task.Type == ZELO_SCHED_TYPE_ONCE ? " in " + number(task.StartYear) : "") +
+         ": write a day that it has";
+}
+
+std::string badWeek(const ZELO_SCHED_TASK &task) {
+  if (task.Type != ZELO_SCHED_TYPE_WEEKLY || weekLength(task) == kDaysOfWeek) return "";
+  return "the days of the week '" + printable(task.Week) +
+         "' are not seven: write one character for each day from Sunday on, 0 for off";
+}
+
+std::string badType(const ZELO_SCHED_TASK &task) {
+  if (task.Type >= ZELO_SCHED_TYPE_ONCE && task.Type <= ZELO_SCHED_TYPE_YEARLY) return "";
+  return "type " + std::to_string(task.Type) +
+         " is unknown: write once, daily, weekly, monthly or yearly";
+}
+
+std::string badState(const ZELO_SCHED_TASK &task) {
+  if (task.State == ZELO_SCHED_STATE_DISABLED || task.State == ZELO_SCHED_STATE_ENABLED) return "";
+  return "state " + std::to_string(task.State) + " is unknown: write enabled or disabled";
+}
+
+std::string earlyEnd(const ZELO_SCHED_TASK &task) {
+  const bool isSet = task.RepeatHour != 0 && task.LastWorkHour < task.RunHour;
+  if (!isSet) return "";
+  return "the last hour " + number(task.LastWorkHour) + " is before the first, " +
+         number(task.RunHour) + ": write a later --until, or --every off for one run a day";
+}
+
+std::string unknownOwner(const ZELO_SCHED_TASK &task) {
+  if (userExists(task.Owner)) return "";
+  return "there is no user " + number(task.Owner) +
+         ", under whose rights the task would run: write --owner with the name of a user";
+}
+
+std::string apostrophe(const ZELO_SCHED_TASK &task) {
+  if (std::strchr(task.App, '\'') == nullptr) return "";
+  return "the application '" + printable(task.App) +
+         "' has an apostrophe, with which no run could be recorded: write it without";
+}
+
+std::string longCommand(const ZELO_SCHED_TASK &task) {
+  const size_t length = strnlen(task.Command, sizeof task.Command);
+  if (length <= kMostCommandBytes) return "";
+  return "the command is " + std::to_string(length) + " bytes long, and only " +
+         std::to_string(kMostCommandBytes) + " can be stored: put it into a script";
+}
+
+using Check = std::string (*)(const ZELO_SCHED_TASK &task);
+constexpr Check kUnreadable[] = {badHour, badMinute, badLastHour, badDay, badMonth, noWeekday};
+constexpr Check kUseless[] = {neverExists, badWeek,      badType,    badState,
+                              earlyEnd,    unknownOwner, apostrophe, longCommand};
+
+template <size_t count>
+void collect(const Check (&checks)[count], const ZELO_SCHED_TASK &task,
+             std::vector<std::string> *found) {
+  for (const Check check : checks) {
+    std::string sentence = check(task);
+    if (!sentence.empty()) found->push_back(std::move(sentence));
+  }
+}
+
+}  // namespace
+
+std::vector<std::string> harmsOf(const ZELO_SCHED_TASK &task) {
+  std::vector<std::string> found = unreadableFieldsOf(task);
+  collect(kUseless, task, &found);
+  return found;
+}
+
+std::vector<std::string> unreadableFieldsOf(const ZELO_SCHED_TASK &task) {
+  std::vector<std::string> found;
+  collect(kUnreadable, task, &found);
+  return found;
+}
+
+std::string pastSchedule(const ZELO_SCHED_TASK &task, time_t now) {
+  if (task.Type != ZELO_SCHED_TYPE_ONCE || !harmsOf(task).empty()) return "";
+  if (!comingRuns(task, localMinute(now), 1).empty()) return "";
+  return "the task would never run, as " + scheduleInWords(task).substr(strlen("once on ")) +
+         " is over: write a later date";
+}

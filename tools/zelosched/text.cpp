@@ -1,0 +1,180 @@
+#include "text.h"
+
+#include <wchar.h>
+
+#include <algorithm>
+#include <array>
+#include <clocale>
+#include <cstdint>
+#include <cstdio>
+#include <optional>
+
+#include "terminal.h"
+
+namespace {
+
+struct Character {
+  uint32_t code;
+  size_t bytes;
+};
+
+struct Lead {
+  unsigned char mask;
+  unsigned char bits;
+  uint32_t least;  // a longer form than needed could hide a control character
+};
+constexpr Lead kLeads[] = {
+    {0x80, 0x00, 0}, {0xE0, 0xC0, 0x80}, {0xF0, 0xE0, 0x800}, {0xF8, 0xF0, 0x10000}};
+constexpr unsigned char kTailMask = 0xC0;
+constexpr unsigned char kTail = 0x80;
+constexpr unsigned kTailBits = 6;
+constexpr uint32_t kLastCharacter = 0x10FFFF;
+
+struct Range {
+  uint32_t first;
+  uint32_t last;
+};
+// Control characters, surrogates, and the marks that turn the direction of writing or break lines.
+constexpr Range kUnsafe[] = {{0x00, 0x1F},     {0x7F, 0x9F},     {0x061C, 0x061C},
+                             {0x200E, 0x200F}, {0x2028, 0x202E}, {0x2066, 0x2069},
+                             {0xD800, 0xDFFF}, {0xFEFF, 0xFEFF}, {0xFFF9, 0xFFFB}};
+
+unsigned char byteAt(std::string_view text, size_t index) {
+  return static_cast<unsigned char>(text[index]);
+}
+
+// The character that the text begins with; nothing when that is no UTF-8.
+std::optional<Character> firstCharacter(std::string_view text) {
+  const unsigned char first = byteAt(text, 0);
+  for (size_t tails = 0; tails < std::size(kLeads); ++tails) {
+    const Lead &lead = kLeads[tails];
+    if ((first & lead.mask) != lead.bits) continue;
+    if (text.size() <= tails) return std::nullopt;
+    uint32_t code = first & static_cast<unsigned char>(~lead.mask);
+    for (size_t i = 1; i <= tails; ++i) {
+      if ((byteAt(text, i) & kTailMask) != kTail) return std::nullopt;
+      code = code << kTailBits | (byteAt(text, i) & static_cast<unsigned char>(~kTailMask));
+    }
+    if (code < lead.least || code > kLastCharacter) return std::nullopt;
+    return Character{code, tails + 1};
+  }
+  return std::nullopt;
+}
+
+bool isUnsafe(uint32_t code) {
+  return std::any_of(std::begin(kUnsafe), std::end(kUnsafe),
+                     [&](const Range &range) { return code >= range.first && code <= range.last; });
+}
+
+constexpr uint32_t kLastAscii = 0x7E;
+
+bool canBeShown(uint32_t code) {
+  return !isUnsafe(code) && (code <= kLastAscii || showsUnicode());
+}
+
+void appendEscaped(std::string *out, std::string_view bytes) {
+  constexpr std::string_view kNamed = "\n\t\r";
+  constexpr std::string_view kNames = "ntr";
+  for (const char byte : bytes) {
+    const size_t named = kNamed.find(byte);
+    if (named != std::string_view::npos) {
+      *out += '\\';
+      *out += kNames[named];
+      continue;
+    }
+    char escaped[8];
+    std::snprintf(escaped, sizeof escaped, "\\x%02x",
+                  static_cast<unsigned>(static_cast<unsigned char>(byte)));
+    *out += escaped;
+  }
+}
+
+// Widths do not depend on the user's locale, but the C library knows them in a UTF-8 one only.
+int columnsOf(uint32_t code) {
+  static const locale_t unicode = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
+  if (code <= kLastAscii || unicode == nullptr) return 1;
+  const locale_t users = uselocale(unicode);
+  const int columns = wcwidth(static_cast<wchar_t>(code));
+  uselocale(users);
+  return columns < 0 ? 1 : columns;
+}
+
+// Walks over the characters until `take` says no; bytes that are none count as one each.
+template <class Take>
+void forEachCharacter(std::string_view text, Take take) {
+  while (!text.empty()) {
+    const Character next = firstCharacter(text).value_or(Character{0, 1});
+    if (!take(text.substr(0, next.bytes), next.code)) return;
+    text.remove_prefix(next.bytes);
+  }
+}
+
+bool needsQuotes(std::string_view word) {
+  constexpr std::string_view kPlain =
+      "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789@%+:,./-_";
+  return word.empty() || word.find_first_not_of(kPlain) != std::string_view::npos;
+}
+
+}  // namespace
+
+std::string printable(std::string_view text) {
+  std::string out;
+  while (!text.empty()) {
+    const std::optional<Character> next = firstCharacter(text);
+    const size_t bytes = next ? next->bytes : 1;
+    if (next && canBeShown(next->code)) {
+      out += text.substr(0, bytes);
+    } else {
+      appendEscaped(&out, text.substr(0, bytes));
+    }
+    text.remove_prefix(bytes);
+  }
+  return out;
+}
+
+size_t utf8Length(std::string_view text) {
+  const std::optional<Character> first = firstCharacter(text);
+  const bool isCharacter = first && (first->code < 0xD800 || first->code > 0xDFFF);
+  return isCharacter ? first->bytes : 0;
+}
+
+size_t widthOf(std::string_view printable) {
+  size_t width = 0;
+  forEachCharacter(printable, [&](std::string_view, uint32_t code) {
+    width += static_cast<size_t>(columnsOf(code));
+    return true;
+  });
+  return width;
+}
+
+std::string fitted(const std::string &printable, size_t columns) {
+  if (widthOf(printable) <= columns) return printable;
+  const std::string ellipsis = showsUnicode() ? "\u2026" : "...";
+  const size_t room = columns - std::min(columns, widthOf(ellipsis));
+  size_t width = 0;
+  std::string out;
+  forEachCharacter(printable, [&](std::string_view bytes, uint32_t code) {
+    width += static_cast<size_t>(columnsOf(code));
+    if (width > room) return false;
+    out += bytes;
+    return true;
+  });
+  return room == 0 ? out : out + ellipsis;
+}
+
+std::string counted(size_t number, const char *word) {
+  return std::to_string(number) + " " + word + (number == 1 ? "" : "s");
+}
+
+std::string shellQuoted(std::string_view word) {
+  if (!needsQuotes(word)) return std::string(word);
+  std::string quoted = "'";
+  for (const char c : word) {
+    if (c == '\'') {
+      quoted += "'\\''";
+    } else {
+      quoted += c;
+    }
+  }
+  return quoted + "'";
+}

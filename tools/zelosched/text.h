@@ -1,0 +1,25 @@
+// Text for people: what is safe to print, and how wide it is.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+// The text with everything escaped that could change more than its own place on a terminal: control
+// characters (\n, \t, \x1b, ...), marks that turn the direction of writing, and bytes that are no
+// UTF-8.
+std::string printable(std::string_view text);
+
+// The bytes of the character that a text begins with; 0 when that is no UTF-8.
+size_t utf8Length(std::string_view text);
+
+// Columns that a printable text takes.
+size_t widthOf(std::string_view printable);
+
+// The text, cut to so many columns where it is wider, which an ellipsis shows.
+std::string fitted(const std::string &printable, size_t columns);
+
+// "word", or its plural for every number but one.
+std::string counted(size_t number, const char *word);
+
+// A word that a shell reads back as this very word; unquoted where that does no harm.
+std::string shellQuoted(std::string_view word);
