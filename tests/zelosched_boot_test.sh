@@ -506,7 +506,8 @@ shows_nothing_of_it_to_others() {
 
 looks_without_making() {
   clean
-  z history >/dev/null && z status >/dev/null || true
+  z history >/dev/null
+  z status >/dev/null || true
   [[ ! -e /usr/zelo/var ]]
 }
 
