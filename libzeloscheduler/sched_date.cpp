@@ -40,8 +40,14 @@ bool isDayOfYear(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
 }
 
 TriggerText written(const ZELO_SCHED_DATE &date) {
+  constexpr size_t kYearDigits = 4;
+  constexpr size_t kDigits = 2;
   TriggerText text;
-  text.append("%04u-%02u-%02u %02u:%02u", date.year, date.month, date.day, date.hour, date.minute);
+  text.appendNumber(date.year, kYearDigits).appendText("-");
+  text.appendNumber(date.month, kDigits).appendText("-");
+  text.appendNumber(date.day, kDigits).appendText(" ");
+  text.appendNumber(date.hour, kDigits).appendText(":");
+  text.appendNumber(date.minute, kDigits);
   return text;
 }
 
@@ -109,7 +115,7 @@ ZELO_SCHED_DATE nextDay(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now)
 int ZELOSchedNextRunEstimate(const ZELO_SCHED_TASK &task, SchedTriggerClock *clock,
                              TriggerText *result) {
   if (task.Type == ZELO_SCHED_TYPE_ONCE) {
-    result->append("%s", kNever);
+    result->appendText(kNever);
     return 0;
   }
   ZELO_SCHED_DATE date = nextDay(task, clock->now());

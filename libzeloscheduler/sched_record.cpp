@@ -21,12 +21,37 @@ constexpr bool kSlabsAllowed = false;  // each record is watched by itself then
 constexpr bool kSlabsAllowed = true;
 #endif
 
+// How far the records of a slab are apart, where the last byte of one ends, and whether a list of
+// them fills huge pages.
+struct Layout {
+  size_t stride;
+  size_t end;
+  bool fillsHugePages;
+};
+
+constexpr Layout kWholeLayout = {sizeof(ZELO_SCHED_TASK), sizeof(ZELO_SCHED_TASK), true};
+
+// A schedule is the fields before the name and those behind the next trigger time. The two texts
+// are not used, so that other records' fields may lie there, if only no two records share a byte.
+constexpr size_t kHeadEnd = offsetof(ZELO_SCHED_TASK, Name);
+constexpr size_t kTailBegin = offsetof(ZELO_SCHED_TASK, State);
+constexpr size_t kTailEnd = offsetof(ZELO_SCHED_TASK, LastWorkHour) + sizeof(uint32_t);
+constexpr Layout kScheduleLayout = {128, kTailEnd, false};
+static_assert(kTailBegin % kScheduleLayout.stride >= kHeadEnd);
+static_assert(kTailBegin % kScheduleLayout.stride + (kTailEnd - kTailBegin) <=
+              kScheduleLayout.stride);
+static_assert(kScheduleLayout.stride % alignof(ZELO_SCHED_TASK) == 0);
+
+constexpr Layout layoutOf(SchedRecordExtent extent) {
+  return extent == SchedRecordExtent::kWhole ? kWholeLayout : kScheduleLayout;
+}
+
 }  // namespace
 
 // Stands at the front of its memory; the records follow.
 struct SchedSlab {
   SchedSlab *next;
-  size_t recordSize;
+  size_t stride;
   size_t unused;   // records not handed out yet, from the first on
   size_t holders;  // records in use, and the source that still takes from it
 
@@ -36,11 +61,10 @@ struct SchedSlab {
     return address >= begin() && address < begin() + kSlabSize;
   }
   ZELO_SCHED_TASK *record(size_t index) const {
-    return reinterpret_cast<ZELO_SCHED_TASK *>(begin() + sizeof(*this) + index * recordSize);
+    return reinterpret_cast<ZELO_SCHED_TASK *>(begin() + sizeof(*this) + index * stride);
   }
 };
 static_assert(sizeof(SchedSlab) % alignof(ZELO_SCHED_TASK) == 0);
-static_assert(static_cast<size_t>(SchedRecordExtent::kSchedule) % alignof(ZELO_SCHED_TASK) == 0);
 
 namespace {
 
@@ -70,15 +94,16 @@ void *mapSlab() {
   return slab;
 }
 
-SchedSlab *newSlab(size_t recordSize) {
+SchedSlab *newSlab(Layout layout) {
   void *memory = mapSlab();
   if (memory == nullptr) {
     return nullptr;
   }
-  madvise(memory, kSlabSize, MADV_HUGEPAGE);  // a kernel without them is only slower
+  // A kernel without huge pages is only slower.
+  madvise(memory, kSlabSize, layout.fillsHugePages ? MADV_HUGEPAGE : MADV_NOHUGEPAGE);
   auto *slab = static_cast<SchedSlab *>(memory);
-  slab->recordSize = recordSize;
-  slab->unused = (kSlabSize - sizeof(*slab)) / recordSize;
+  slab->stride = layout.stride;
+  slab->unused = (kSlabSize - sizeof(*slab) - layout.end) / layout.stride + 1;
   slab->holders = 1;
   slab->next = slabs;
   slabs = slab;
@@ -137,8 +162,7 @@ void schedRecordEmpty(ZELO_SCHED_TASK *pTask) {
 }
 
 SchedRecordSource::SchedRecordSource(int expectedRecords, SchedRecordExtent extent)
-    : usesSlabs_(kSlabsAllowed && expectedRecords > kLongestPlainList),
-      recordSize_(static_cast<size_t>(extent)) {}
+    : usesSlabs_(kSlabsAllowed && expectedRecords > kLongestPlainList), extent_(extent) {}
 
 SchedRecordSource::~SchedRecordSource() {
   if (slab_ != nullptr) {
@@ -154,7 +178,7 @@ TaskGuard SchedRecordSource::take() {
     unhold(slab_);
     slab_ = nullptr;
   }
-  if (slab_ == nullptr && (slab_ = newSlab(recordSize_)) == nullptr) {
+  if (slab_ == nullptr && (slab_ = newSlab(layoutOf(extent_))) == nullptr) {
     return schedRecordAlloc();  // there may still be room for a single one
   }
   // From the end on: a list that is built from its end then lies in memory as it is linked.

@@ -22,11 +22,8 @@ TaskGuard schedRecordAlloc();
 void schedRecordEmpty(ZELO_SCHED_TASK *pTask);
 
 // How much of a record there is: all of it, or what says who is started when. The rest of a record,
-// its largest part, must then not be touched.
-enum class SchedRecordExtent : size_t {
-  kWhole = sizeof(ZELO_SCHED_TASK),
-  kSchedule = offsetof(ZELO_SCHED_TASK, EditDialog),
-};
+// its largest part, must then not be touched: the next records lie in it.
+enum class SchedRecordExtent { kWhole, kSchedule };
 
 struct SchedSlab;
 
@@ -47,7 +44,7 @@ class SchedRecordSource {
 
  private:
   bool usesSlabs_;
-  size_t recordSize_;
+  SchedRecordExtent extent_;
   SchedSlab *slab_ = nullptr;
 };
 

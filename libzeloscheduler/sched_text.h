@@ -2,10 +2,15 @@
 #ifndef SCHED_TEXT_H
 #define SCHED_TEXT_H
 
+#include <algorithm>
+#include <charconv>
 #include <cstdarg>
 #include <cstddef>
+#include <cstdint>
 #include <cstdio>
 #include <cstring>
+#include <iterator>
+#include <limits>
 
 // Copies szText into szBuf, cut to cbBuf - 1 characters. The two may overlap.
 inline void copyText(char *szBuf, size_t cbBuf, const char *szText) {
@@ -42,7 +47,32 @@ class BoundedText {
     length_ += static_cast<size_t>(wanted);
   }
 
+  // As append with "%0*u", which a list of many tasks would spend much of its time in.
+  BoundedText &appendNumber(uint32_t number, size_t width = 1) {
+    char digits[std::numeric_limits<uint32_t>::digits10 + 1];
+    const auto end = std::to_chars(digits, std::end(digits), number).ptr;
+    const auto count = static_cast<size_t>(end - digits);
+    for (size_t i = count; i < width; ++i) {
+      appendBytes("0", 1);
+    }
+    appendBytes(digits, count);
+    return *this;
+  }
+  BoundedText &appendText(const char *szText) {
+    appendBytes(szText, strlen(szText));
+    return *this;
+  }
+
  private:
+  void appendBytes(const char *bytes, size_t count) {
+    const size_t room = N - 1 - length_;
+    wasCut_ = wasCut_ || count > room;
+    const size_t taken = std::min(count, room);
+    memcpy(text_ + length_, bytes, taken);
+    length_ += taken;
+    text_[length_] = '\0';
+  }
+
   char text_[N];
   size_t length_ = 0;
   bool wasCut_ = false;

@@ -250,6 +250,31 @@ TEST_F(StoreTest, AFilterKeepsWhatItAnswersNonZeroFor) {
   EXPECT_EQ(listedIds([](const ZELO_SCHED_TASK *) { return 0; }), Ids{});
 }
 
+// A list is of one moment, unless its own filter changes the store.
+TEST_F(StoreTest, AListShowsWhatItsFilterChanged) {
+  for (int i = 0; i < 3; ++i) {
+    create("old");
+  }
+  ZELO_SCHED_TASK *head = nullptr;
+  EXPECT_EQ(backend_.list_get(&head,
+                              [](const ZELO_SCHED_TASK *task) {
+                                if (task->ID != 1) {
+                                  return 1;
+                                }
+                                ZELO_SCHED_BACKEND backend = {};
+                                EXPECT_EQ(zeloschedule_init("zeloschedule", &backend), 0);
+                                const Task changed = makeTask("new", "true");
+                                changed->ID = 2;
+                                EXPECT_EQ(backend.edit(changed.get()), 0);
+                                EXPECT_EQ(backend.remove(3), 1);
+                                return 1;
+                              }),
+            2);
+  const TaskList list(head);
+  EXPECT_STREQ(head->Name, "new");
+  EXPECT_EQ(head->ID, 2);
+}
+
 TEST_F(StoreTest, ASectionThatCannotBeReadIsReportedAndSkipped) {
   for (const char *section : {"1", "2", "3"}) addSection(section, std::atoi(section));
   fail("QLIBCFileGetSection", "2", {.code = kInjectedCode});

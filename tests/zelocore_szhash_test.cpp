@@ -151,6 +151,32 @@ TEST_F(ZelocoreSzHash, RemovingAllLeavesNothing) {
   EXPECT_EQ(Get("a"), "2");
 }
 
+TEST_F(ZelocoreSzHash, WhatItHeldBeforeDoesNotShow) {
+  constexpr int kKeys = 12;
+  std::mt19937 random(7);
+  for (int round = 0; round < 3000; ++round) {
+    QLIBCHashRemoveAll(hash_);
+    std::unordered_map<std::string, std::string> expected;
+    const bool in_order = random() % 2 == 0;
+    for (unsigned i = 0; i < random() % kKeys; ++i) {
+      const std::string key = "key" + std::to_string(in_order ? i : random() % kKeys);
+      const std::string value(random() % 300, static_cast<char>('a' + round % 26));
+      ASSERT_EQ(Set(key, value), 0);
+      expected[key] = value;
+    }
+    for (int i = 0; i < kKeys; ++i) {
+      const std::string key = "key" + std::to_string(i);
+      const auto found = expected.find(key);
+      ASSERT_EQ(Get(key), found != expected.end() ? found->second : "(none)") << round;
+    }
+    QLIBCSzListFree(list_);
+    list_ = QLIBCSzListAlloc(4);
+    ASSERT_EQ(QLIBCSzHashEnumKey(hash_, &list_), static_cast<int>(expected.size()));
+    const std::vector<std::string> keys = Listed();
+    ASSERT_EQ(std::set<std::string>(keys.begin(), keys.end()).size(), expected.size());
+  }
+}
+
 TEST_F(ZelocoreSzHash, ItsOwnTextsCanBeSet) {
   Set("a", std::string(1000, 'v'));
   for (int i = 0; i < 200; ++i) {

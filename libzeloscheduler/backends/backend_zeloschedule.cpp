@@ -24,6 +24,12 @@
 #include "sched_trigger_clock.h"
 #include "sched_wait_status.h"
 
+// A platform that has no holds looks at the file once a section, and is slower for it.
+extern "C" {
+__attribute__((weak)) void QLIBCFileHoldBegin(void);
+__attribute__((weak)) void QLIBCFileHoldEnd(void);
+}
+
 namespace {
 
 constexpr char kName[] = "zeloschedule";
@@ -97,6 +103,27 @@ int setNextTrigger(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
   return 0;
 }
 
+// The store as it was when it was last looked at. Nobody's code but ours runs in between: a filter
+// may change the store, and sees what it changed.
+class StoreHold {
+ public:
+  StoreHold() {
+    if (isKnown()) {
+      QLIBCFileHoldBegin();
+    }
+  }
+  ~StoreHold() {
+    if (isKnown()) {
+      QLIBCFileHoldEnd();
+    }
+  }
+  StoreHold(const StoreHold &) = delete;
+  StoreHold &operator=(const StoreHold &) = delete;
+
+ private:
+  static bool isKnown() { return QLIBCFileHoldBegin != nullptr && QLIBCFileHoldEnd != nullptr; }
+};
+
 // Walks over the sections of the store. One bad section must not hide the others: the walk goes on
 // behind one that cannot be read, and one that is gone since the names were listed is passed over.
 class StoreWalk {
@@ -122,6 +149,7 @@ class StoreWalk {
 
   // To the next section. False at the end.
   bool next() {
+    const StoreHold hold;
     while (next_ < sections_) {
       szSection_ = QLIBCSzListGet(names_.get(), next_++);
       read_ = readSection(szSection_, &hash_);
@@ -511,11 +539,13 @@ WeekdayList weekdayList(const ZELO_SCHED_TASK &task) {
 }
 
 void appendTime(CronLine *line, const ZELO_SCHED_TASK &task) {
+  line->appendNumber(task.RunMin).appendText("\t");
   if (task.RepeatHour == 0) {
-    line->append("%u\t%u\t", task.RunMin, task.RunHour);
+    line->appendNumber(task.RunHour);
   } else {
-    line->append("%u\t%s\t", task.RunMin, hourList(task).c_str());
+    line->appendText(hourList(task).c_str());
   }
+  line->appendText("\t");
 }
 
 // A crontab line cannot say a year: a task that runs once is started on its day every year, and the
@@ -524,16 +554,17 @@ void appendDays(CronLine *line, const ZELO_SCHED_TASK &task) {
   switch (task.Type) {
     case ZELO_SCHED_TYPE_ONCE:
     case ZELO_SCHED_TYPE_YEARLY:
-      line->append("%u\t%u\t*\t", task.StartDay, task.StartMonth);
+      line->appendNumber(task.StartDay).appendText("\t");
+      line->appendNumber(task.StartMonth).appendText("\t*\t");
       break;
     case ZELO_SCHED_TYPE_MONTHLY:
-      line->append("%u\t*\t*\t", task.StartDay);
+      line->appendNumber(task.StartDay).appendText("\t*\t*\t");
       break;
     case ZELO_SCHED_TYPE_WEEKLY:
-      line->append("*\t*\t%s\t", weekdayList(task).c_str());
+      line->appendText("*\t*\t").appendText(weekdayList(task).c_str()).appendText("\t");
       break;
     default:
-      line->append("*\t*\t*\t");
+      line->appendText("*\t*\t*\t");
       break;
   }
 }

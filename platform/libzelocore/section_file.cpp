@@ -3,7 +3,8 @@
  *
  * A list of n sections is one enumeration and n reads. The last file that was
  * read is therefore kept with an index of its sections, and each call costs one
- * stat and one look-up for as long as the file is the same.
+ * stat and one look-up for as long as the file is the same, and the look-up alone
+ * while it is held.
  */
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -59,45 +60,7 @@ bool SameContents(const struct stat &a, const struct stat &b) noexcept {
 
 /* ---- reading ---- */
 
-/* A file that stays open from one call to the next. Its descriptor is the
- * program's to see, and some programs close all that they do not know: what has
- * become another file's by then is left alone. */
-class HeldFile {
- public:
-  HeldFile() = default;
-  HeldFile(int fd, const struct stat &status) noexcept : fd_(fd), status_(status) {}
-  HeldFile(HeldFile &&other) noexcept : fd_(std::exchange(other.fd_, -1)), status_(other.status_) {}
-  HeldFile &operator=(HeldFile &&other) noexcept {
-    Release();
-    fd_ = std::exchange(other.fd_, -1);
-    status_ = other.status_;
-    return *this;
-  }
-  ~HeldFile() { Release(); }
-
-  void Release() noexcept {
-    struct stat now;
-    if (fd_ >= 0 && fstat(fd_, &now) == 0 && now.st_dev == status_.st_dev &&
-        now.st_ino == status_.st_ino) {
-      close(fd_);
-    }
-    fd_ = -1;
-  }
-
-  /* Whether these bytes stand in the file at this place. */
-  bool Holds(std::string_view expected, size_t at, std::string *scratch) const {
-    scratch->resize(expected.size());
-    const ssize_t count = pread(fd_, scratch->data(), scratch->size(), static_cast<off_t>(at));
-    return count >= 0 && static_cast<size_t>(count) == expected.size() && *scratch == expected;
-  }
-
- private:
-  int fd_ = -1;
-  struct stat status_ = {};
-};
-
 struct Snapshot {
-  HeldFile file;
   std::string contents;
   struct stat status; /* before the first byte was read */
   int64_t opened;     /* the clock that stamps files, before the file was opened */
@@ -125,7 +88,6 @@ int ReadSnapshot(const std::string &path, int flags, Snapshot *snapshot) {
     return Fail(QLIBC_ERR_IO);
   }
   snapshot->steady = SameContents(snapshot->status, after);
-  snapshot->file = HeldFile(file.Take(), snapshot->status);
   return 0;
 }
 
@@ -136,8 +98,6 @@ struct CachedFile {
   struct stat status;
   int64_t opened;
   SectionText text;
-  mutable HeldFile file; /* until the stamps tell the file's state by themselves */
-  mutable std::string scratch;
 };
 
 bool IsSameFile(const CachedFile &cached, const std::string_view path,
@@ -145,17 +105,10 @@ bool IsSameFile(const CachedFile &cached, const std::string_view path,
   return cached.path == path && SameContents(cached.status, status);
 }
 
-/* What equal stamps say of a file. Alone they do not say that it still holds
- * what was read: stamps advance by clock ticks, and a change in the tick of the
- * last one leaves the same. */
-enum class Stamps {
-  kTell,    /* it holds what was read */
-  kSilent,  /* nothing, as long as this tick lasts */
-  kWillTell /* nothing yet, but they will once it is read anew */
-};
-
-/* The stamp must lie outside the time from the reading until now, in which such
- * a change would be stamped:
+/* Equal stamps alone do not say that the file still holds what was read: stamps
+ * advance by clock ticks, and a change in the tick of the last one leaves the
+ * same. The stamp must lie outside the time from the reading until now, in which
+ * such a change would be stamped:
  *
  *  - before it, which is usual as soon as a tick has gone by;
  *  - or well after now, when the clock was set back since the file was written.
@@ -164,23 +117,13 @@ enum class Stamps {
  *
  * A clock that went back since the reading says nothing; the file is read again
  * once, by the new time. */
-Stamps Ask(const CachedFile &cached, const struct stat &status) noexcept {
+bool StampsTell(const CachedFile &cached, const struct stat &status) noexcept {
   const int64_t stamp = Nanoseconds(status.st_ctim);
   const int64_t granularity = status.st_ctim.tv_nsec == 0 ? kCoarseStamp : 0;
   const int64_t now = Now(CLOCK_REALTIME_COARSE);
   const bool stamped_before = stamp + granularity < cached.opened && cached.opened <= now;
   const bool stamped_after = now + kClockSlack < stamp;
-  if (stamped_before || stamped_after) {
-    return Stamps::kTell;
-  }
-  return stamp + granularity < now ? Stamps::kWillTell : Stamps::kSilent;
-}
-
-/* Until the stamps tell, what is asked for is read again, and no more than that:
- * a list read right after a change would else read the whole file at each of
- * its sections. */
-bool StillHolds(const CachedFile &cached, const Section &section) {
-  return cached.file.Holds(cached.text.Lines(section), section.begin, &cached.scratch);
+  return stamped_before || stamped_after;
 }
 
 /* Never destroyed, so that exit handlers can still read. */
@@ -216,12 +159,8 @@ std::unique_ptr<const CachedFile> Load(const char *path) {
       return nullptr;
     }
     /* Made in place, since its names are views into itself. */
-    std::unique_ptr<const CachedFile> file(new CachedFile{path,
-                                                          snapshot.status,
-                                                          snapshot.opened,
-                                                          SectionText(std::move(snapshot.contents)),
-                                                          std::move(snapshot.file),
-                                                          {}});
+    std::unique_ptr<const CachedFile> file(new CachedFile{
+        path, snapshot.status, snapshot.opened, SectionText(std::move(snapshot.contents))});
     if (pauses < kMostPauses && IsYoung(snapshot.status) &&
         LooksTorn(snapshot, file->text.form())) {
       Pause();
@@ -235,26 +174,12 @@ std::unique_ptr<const CachedFile> Load(const char *path) {
   }
 }
 
-/* Whether the file that was read last is the file as it is now: all of it, or
- * the section of that name when there is one. */
-bool IsCurrent(const CachedFile &cached, const char *path, const struct stat &status,
-               const char *name) {
-  if (!IsSameFile(cached, path, status)) {
-    return false;
-  }
-  const Stamps stamps = Ask(cached, status);
-  if (stamps == Stamps::kTell) {
-    cached.file.Release();
-    return true;
-  }
-  const Section *section =
-      stamps == Stamps::kSilent && name != nullptr ? cached.text.Find(name) : nullptr;
-  return section != nullptr && StillHolds(cached, *section);
+bool IsCurrent(const CachedFile &cached, const char *path, const struct stat &status) noexcept {
+  return IsSameFile(cached, path, status) && StampsTell(cached, status);
 }
 
-/* The text of the file as it is now, at least in the section of that name; with
- * no name, in all of it. Null on failure (0x0900, 0x0B00). */
-const SectionText *Current(const char *path, const char *name = nullptr) {
+/* The text of the file as it is now. Null on failure (0x0900, 0x0B00). */
+const SectionText *Current(const char *path) {
   std::unique_ptr<const CachedFile> &cache = Cache();
   struct stat status;
   if (stat(path, &status) != 0 || !S_ISREG(status.st_mode)) {
@@ -262,11 +187,19 @@ const SectionText *Current(const char *path, const char *name = nullptr) {
     Fail(QLIBC_ERR_OPEN);
     return nullptr;
   }
-  if (cache == nullptr || !IsCurrent(*cache, path, status, name)) {
+  if (cache == nullptr || !IsCurrent(*cache, path, status)) {
     cache.reset(); /* first, so that two large files are never held at once */
     cache = Load(path);
   }
   return cache == nullptr ? nullptr : &cache->text;
+}
+
+int holds = 0;
+
+/* As Current; while the file that was read last is held, as it was then. */
+const SectionText *HeldOrCurrent(const char *path) {
+  const std::unique_ptr<const CachedFile> &cache = Cache();
+  return holds > 0 && cache != nullptr && cache->path == path ? &cache->text : Current(path);
 }
 
 /* ---- writing ---- */
@@ -384,12 +317,20 @@ int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
   return count;
 }
 
+void QLIBCFileHoldBegin(void) {
+  ++zelo::holds;
+}
+
+void QLIBCFileHoldEnd(void) {
+  --zelo::holds;
+}
+
 int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHash) {
   if (szPath == nullptr || szSection == nullptr || ppHash == nullptr || *ppHash == nullptr) {
     return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
   }
   return zelo::AtBoundary(-1, [&] {
-    const zelo::SectionText *text = zelo::Current(szPath, szSection);
+    const zelo::SectionText *text = zelo::HeldOrCurrent(szPath);
     if (text == nullptr) {
       return -1;
     }

@@ -17,12 +17,15 @@ constexpr std::string_view kTrailerMiddle = " sections, checksum ";
 constexpr const char *kTrailerFormat = "# end of file: %zu sections, checksum %016llx\n";
 constexpr size_t kChecksumDigits = 16;
 constexpr size_t kTrailerRoom = 96;
-/* The carriage return is blank so that files edited elsewhere read the same. */
-constexpr std::string_view kBlank = " \t\r";
-constexpr std::string_view kCommentMarks = "#;";
+constexpr char kTrailerMark = '#';
 
+/* The carriage return is blank so that files edited elsewhere read the same. */
 constexpr bool IsBlank(char c) noexcept {
-  return kBlank.find(c) != std::string_view::npos;
+  return c == ' ' || c == '\t' || c == '\r';
+}
+
+constexpr bool IsCommentMark(char c) noexcept {
+  return c == '#' || c == ';';
 }
 
 constexpr bool IsControl(char c) noexcept {
@@ -52,7 +55,7 @@ bool HasBlankEdge(std::string_view text) noexcept {
 }
 
 bool IsCommentOrEmpty(std::string_view trimmed) noexcept {
-  return trimmed.empty() || kCommentMarks.find(trimmed.front()) != std::string_view::npos;
+  return trimmed.empty() || IsCommentMark(trimmed.front());
 }
 
 /* A line with a bracket in front that names no section is no key either. */
@@ -73,8 +76,8 @@ std::string_view LineAt(std::string_view text, size_t begin, size_t end) noexcep
 }
 
 /* The last one before `end`, or npos. */
-size_t LastCommentMark(std::string_view text, size_t end) noexcept {
-  const auto *mark = static_cast<const char *>(memrchr(text.data(), kCommentMarks[0], end));
+size_t LastTrailerMark(std::string_view text, size_t end) noexcept {
+  const auto *mark = static_cast<const char *>(memrchr(text.data(), kTrailerMark, end));
   return mark == nullptr ? std::string_view::npos : static_cast<size_t>(mark - text.data());
 }
 
@@ -305,21 +308,21 @@ void SectionText::IndexSections() {
       if (!sections_.empty()) {
         sections_.back().end = begin;
       }
-      sections_.push_back({name, begin, end, text.size()});
+      sections_.push_back({name, begin, end, text.size(), false});
     }
     at = text.find('[', end);
   }
   first_of_name_.reserve(sections_.size());
   for (size_t i = 0; i < sections_.size(); ++i) {
-    first_of_name_.emplace(sections_[i].name, i);
+    sections_[i].is_first = first_of_name_.emplace(sections_[i].name, i).second;
   }
 }
 
 /* What a hand appended may follow the trailer, so any line can be it. */
 void SectionText::FindTrailer() {
   const std::string_view text(contents_);
-  for (size_t at = LastCommentMark(text, text.size()); at != std::string_view::npos && at >= start_;
-       at = LastCommentMark(text, at)) {
+  for (size_t at = LastTrailerMark(text, text.size()); at != std::string_view::npos && at >= start_;
+       at = LastTrailerMark(text, at)) {
     Trailer trailer{};
     const bool begins_line = at == 0 || text[at - 1] == '\n';
     if (begins_line && ParseTrailer(LineAt(text, at, LineEnd(text, at)), &trailer)) {
@@ -358,8 +361,16 @@ SectionForm SectionText::Judge() {
 }
 
 const Section *SectionText::Find(std::string_view name) const noexcept {
+  if (expected_ < sections_.size() && sections_[expected_].is_first &&
+      sections_[expected_].name == name) {
+    return &sections_[expected_++];
+  }
   const auto found = first_of_name_.find(name);
-  return found == first_of_name_.end() ? nullptr : &sections_[found->second];
+  if (found == first_of_name_.end()) {
+    return nullptr;
+  }
+  expected_ = found->second + 1;
+  return &sections_[found->second];
 }
 
 void SectionText::Read(const Section &section, QLIBC_SZHASH &hash) const {

@@ -29,6 +29,7 @@ struct Section {
   size_t begin; /* of the line with the name */
   size_t body;
   size_t end;
+  bool is_first; /* of those with its name */
 };
 
 /* Can stand between the brackets and be read back. */
@@ -48,10 +49,6 @@ class SectionText {
   /* The first section of the name, or null. */
   const Section *Find(std::string_view name) const noexcept;
   void Read(const Section &section, QLIBC_SZHASH &hash) const;
-  /* From its name on. */
-  std::string_view Lines(const Section &section) const noexcept {
-    return std::string_view(contents_).substr(section.begin, section.end - section.begin);
-  }
 
   /* The text of the whole file with one section changed. Every other line is
    * kept byte for byte; header and trailer are made anew. */
@@ -73,6 +70,7 @@ class SectionText {
   size_t trailer_end_ = 0;
   std::vector<Section> sections_;
   std::unordered_map<std::string_view, size_t> first_of_name_;
+  mutable size_t expected_ = 0; /* sections are mostly asked for in file order */
   SectionForm form_ = SectionForm::kEmpty;
 };
 

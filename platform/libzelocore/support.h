@@ -57,8 +57,6 @@ class Descriptor {
   bool valid() const noexcept { return fd_ >= 0; }
   int get() const noexcept { return fd_; }
 
-  int Take() noexcept { return std::exchange(fd_, -1); }
-
   /* For writers: some file systems report a full disk only here. */
   bool Close() noexcept { return fd_ < 0 || close(std::exchange(fd_, -1)) == 0; }
 

@@ -72,17 +72,43 @@ uint32_t QLIBC_SZHASH::FindSlot(std::string_view key, uint32_t hash) const noexc
   return slot;
 }
 
+/* The place of the entry plus one, or 0. A remembered key is none until it is set
+ * again. */
+uint32_t QLIBC_SZHASH::Search(std::string_view key) const noexcept {
+  const uint32_t place = slots_[FindSlot(key, HashText(key))];
+  return place <= count_ ? place : 0;
+}
+
 const char *QLIBC_SZHASH::Find(std::string_view key) const noexcept {
-  const uint32_t index = slots_[FindSlot(key, HashText(key))];
-  return index == 0 ? nullptr : arena_.get() + entries_[index - 1].value;
+  uint32_t &answer = answers_[questions_++ % kRememberedQuestions];
+  if (answer == 0 || answer > count_ || Key(entries_[answer - 1]) != key) {
+    answer = Search(key);
+  }
+  return answer == 0 ? nullptr : arena_.get() + entries_[answer - 1].value;
 }
 
 void QLIBC_SZHASH::Clear() noexcept {
-  for (const Entry &entry : entries_) {
-    slots_[entry.slot] = 0;
-  }
-  entries_.clear();
+  count_ = 0;
   arena_used_ = 0;
+  questions_ = 0;
+}
+
+/* The present keys are those before it, so one that is remembered there is not
+ * among them. */
+inline bool QLIBC_SZHASH::IsRemembered(std::string_view key) const noexcept {
+  return count_ < entries_.size() && Key(entries_[count_]) == key;
+}
+
+/* What was added last is on nobody's way through the slots. */
+void QLIBC_SZHASH::ForgetRemembered() noexcept {
+  if (count_ == entries_.size()) {
+    return;
+  }
+  for (size_t i = count_; i < entries_.size(); ++i) {
+    slots_[entries_[i].slot] = 0;
+  }
+  keys_.resize(entries_[count_].key);
+  entries_.resize(count_);
 }
 
 void QLIBC_SZHASH::GrowTable() {
@@ -99,16 +125,23 @@ void QLIBC_SZHASH::GrowTable() {
   slots_.swap(wider);
 }
 
-/* Moves to a larger arena when `size` more bytes do not fit, leaving replaced
- * values behind. The arena that was left is handed to the caller, who may still
- * be reading a text in it. */
+/* There is room for it. */
+inline void QLIBC_SZHASH::Place(Entry &entry, std::string_view value) noexcept {
+  char *at = arena_.get() + arena_used_;
+  std::copy(value.begin(), value.end(), at);
+  at[value.size()] = '\0';
+  entry.value = static_cast<uint32_t>(arena_used_);
+  entry.value_size = static_cast<uint32_t>(value.size());
+  entry.value_room = entry.value_size;
+  arena_used_ += value.size() + 1;
+}
+
+/* Moves to a larger arena, leaving replaced values behind. The arena that was left
+ * is handed to the caller, who may still be reading a text in it. */
 std::unique_ptr<char[]> QLIBC_SZHASH::MakeRoom(size_t size) {
-  if (size <= arena_room_ - arena_used_) {
-    return nullptr;
-  }
   size_t live = 0;
-  for (const Entry &entry : entries_) {
-    live += entry.key_size + entry.value_size + 2;
+  for (const Entry &entry : entries()) {
+    live += entry.value_size + 1;
   }
   if (size > kMostArena - live) {
     throw std::bad_alloc();
@@ -118,59 +151,69 @@ std::unique_ptr<char[]> QLIBC_SZHASH::MakeRoom(size_t size) {
   arena_.swap(left);
   arena_room_ = room;
   arena_used_ = 0;
-  for (Entry &entry : entries_) {
-    entry.key = Store({left.get() + entry.key, entry.key_size});
-    entry.value = Store({left.get() + entry.value, entry.value_size});
-    entry.value_room = entry.value_size;
+  for (size_t i = 0; i < count_; ++i) {
+    Place(entries_[i], {left.get() + entries_[i].value, entries_[i].value_size});
   }
   return left;
 }
 
-uint32_t QLIBC_SZHASH::Store(std::string_view text) noexcept {
-  const size_t at = arena_used_;
-  if (!text.empty()) {
-    std::memcpy(arena_.get() + at, text.data(), text.size());
-  }
-  arena_[at + text.size()] = '\0';
-  arena_used_ += text.size() + 1;
-  return static_cast<uint32_t>(at);
+void QLIBC_SZHASH::StoreValue(Entry &entry, std::string_view value) {
+  const auto left = HasRoom(value.size() + 1) ? nullptr : MakeRoom(value.size() + 1);
+  Place(entry, value);
 }
 
 void QLIBC_SZHASH::Replace(Entry &entry, std::string_view value) {
-  if (value.size() <= entry.value_room) {
-    /* The new text may be a part of the old one. */
-    std::memmove(arena_.get() + entry.value, value.data(), value.size());
-    arena_[entry.value + value.size()] = '\0';
-  } else {
-    const auto left = MakeRoom(value.size() + 1);
-    entry.value = Store(value);
-    entry.value_room = static_cast<uint32_t>(value.size());
+  if (value.size() > entry.value_room) {
+    StoreValue(entry, value);
+    return;
   }
+  /* The new text may be a part of the old one. */
+  std::memmove(arena_.get() + entry.value, value.data(), value.size());
+  arena_[entry.value + value.size()] = '\0';
   entry.value_size = static_cast<uint32_t>(value.size());
 }
 
+/* The key is stored after the value, which may be one of the keys. */
+void QLIBC_SZHASH::Add(std::string_view key, uint32_t hash, uint32_t slot, std::string_view value) {
+  if (key.size() >= kMostArena - keys_.size()) {
+    throw std::bad_alloc();
+  }
+  const auto left = HasRoom(value.size() + 1) ? nullptr : MakeRoom(value.size() + 1);
+  Entry entry{.hash = hash,
+              .slot = slot,
+              .key = static_cast<uint32_t>(keys_.size()),
+              .key_size = static_cast<uint32_t>(key.size()),
+              .value = 0,
+              .value_size = 0,
+              .value_room = 0};
+  Place(entry, value);
+  keys_.append(key).push_back('\0');
+  try {
+    entries_.push_back(entry);
+  } catch (...) {
+    keys_.resize(entry.key);
+    throw;
+  }
+  slots_[slot] = static_cast<uint32_t>(++count_);
+}
+
 void QLIBC_SZHASH::Set(std::string_view key, std::string_view value) {
+  if (IsRemembered(key)) {
+    StoreValue(entries_[count_], value);
+    ++count_;
+    return;
+  }
   const uint32_t hash = HashText(key);
   uint32_t slot = FindSlot(key, hash);
-  if (slots_[slot] != 0) {
+  if (slots_[slot] != 0 && slots_[slot] <= count_) {
     Replace(entries_[slots_[slot] - 1], value);
     return;
   }
+  ForgetRemembered();
   if (2 * (entries_.size() + 1) > slots_.size()) {
     GrowTable();
-    slot = FindSlot(key, hash);
   }
-  const auto left = MakeRoom(key.size() + value.size() + 2);
-  entries_.emplace_back();
-  Entry &entry = entries_.back();
-  entry.hash = hash;
-  entry.slot = slot;
-  entry.key = Store(key);
-  entry.key_size = static_cast<uint32_t>(key.size());
-  entry.value = Store(value);
-  entry.value_size = static_cast<uint32_t>(value.size());
-  entry.value_room = entry.value_size;
-  slots_[slot] = static_cast<uint32_t>(entries_.size());
+  Add(key, hash, FindSlot(key, hash), value);
 }
 
 PSZHASH QLIBCSzHashAlloc(int capacity) {

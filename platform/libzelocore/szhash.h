@@ -5,22 +5,28 @@
 #ifndef ZELOCORE_SZHASH_H
 #define ZELOCORE_SZHASH_H
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
+#include <span>
+#include <string>
 #include <string_view>
 #include <vector>
 
 #include "zelocore.h"
 
-/* One hash serves thousands of small sections in turn. All texts therefore lie
- * in one arena, and emptying the hash only winds it back: after the largest
- * section nothing is allocated any more. */
+/* One hash serves thousands of small sections in turn, nearly all with the same
+ * keys in the same order, which are asked for in the same order too. Emptying it
+ * therefore keeps the keys: one that comes where it came last time is neither hashed
+ * nor stored again, and one that is asked for where it was asked for last time is not
+ * searched. The values lie in one arena that is wound back. After the largest section
+ * nothing is allocated any more. */
 struct QLIBC_SZHASH {
  public:
   struct Entry {
     uint32_t hash;
-    uint32_t slot; /* where slots_ refers to this entry, so that Clear touches only these */
+    uint32_t slot; /* where slots_ refers to this entry */
     uint32_t key;
     uint32_t key_size;
     uint32_t value;
@@ -36,26 +42,39 @@ struct QLIBC_SZHASH {
   const char *Find(std::string_view key) const noexcept;
   void Clear() noexcept;
 
-  const std::vector<Entry> &entries() const noexcept { return entries_; }
+  std::span<const Entry> entries() const noexcept { return {entries_.data(), count_}; }
   std::string_view Key(const Entry &entry) const noexcept {
-    return {arena_.get() + entry.key, entry.key_size};
+    return {keys_.data() + entry.key, entry.key_size};
   }
   std::string_view Value(const Entry &entry) const noexcept {
     return {arena_.get() + entry.value, entry.value_size};
   }
 
  private:
+  static constexpr size_t kRememberedQuestions = 64;
+
+  bool IsRemembered(std::string_view key) const noexcept;
+  uint32_t Search(std::string_view key) const noexcept;
+  void ForgetRemembered() noexcept;
   uint32_t FindSlot(std::string_view key, uint32_t hash) const noexcept;
+  void Add(std::string_view key, uint32_t hash, uint32_t slot, std::string_view value);
   void Replace(Entry &entry, std::string_view value);
   void GrowTable();
+  bool HasRoom(size_t size) const noexcept { return size <= arena_room_ - arena_used_; }
   std::unique_ptr<char[]> MakeRoom(size_t size);
-  uint32_t Store(std::string_view text) noexcept;
+  void StoreValue(Entry &entry, std::string_view value);
+  void Place(Entry &entry, std::string_view value) noexcept;
 
-  std::vector<Entry> entries_;
+  std::vector<Entry> entries_;  /* the present ones, then those remembered */
+  size_t count_ = 0;            /* of the present ones */
   std::vector<uint32_t> slots_; /* index of the entry plus one; 0 is free */
+  std::string keys_;            /* each ended by a zero, in the order of the entries */
   std::unique_ptr<char[]> arena_;
   size_t arena_room_ = 0;
   size_t arena_used_ = 0;
+  /* Of the n-th question since the hash was emptied, the place of the answer plus one. */
+  mutable std::array<uint32_t, kRememberedQuestions> answers_{};
+  mutable size_t questions_ = 0;
 };
 
 #endif
