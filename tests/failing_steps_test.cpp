@@ -16,6 +16,7 @@
 #include <set>
 
 #include "captured_log.h"
+#include "expected_leak.h"
 #include "failing_calls.h"
 #include "power.h"
 #include "sandbox_fixture.h"
@@ -245,6 +246,7 @@ const Scenario kScenarios[] = {
     {"ZELOSchedTaskPlugin", hookAction, {0}, {-1}},
     {"ZELOSchedDBInit",
      [] {
+       const support::ExpectedLeak handleLeftOpen;
        sqlite3 *opened = ZELOSchedDBInit();
        if (opened == nullptr) return 0L;
        sqlite3_close(opened);

@@ -339,7 +339,7 @@ TEST_F(ZelocoreSectionFile, AZeroByteEndsItsText) {
 }
 
 TEST_F(ZelocoreSectionFile, AZeroByteEndsTheNameOfASection) {
-  Write(std::string("[1\0x]\na=b\n[\0]\nc=d\n", 20));
+  Write("[1\0x]\na=b\n[\0]\nc=d\n"s);
   EXPECT_EQ(Names(), Texts{"1"});
   EXPECT_EQ(Section("1"), (Keys{{"a", "b"}, {"c", "d"}}));
 }

@@ -19,6 +19,7 @@ readonly LAST_GOOD=/usr/zelo/etc/scheduled_tasks.last-good
 readonly STATUS=/tmp/sched_status.sqlite
 readonly KEPT=/usr/zelo/var/history.sqlite
 readonly FAKE=$BUILD_DIR/tests/fake_time.so
+readonly NO_FORK=$BUILD_DIR/tests/no_fork.so
 readonly BOOT_ID=/proc/sys/kernel/random/boot_id
 readonly NOBODY=65534
 unset LC_ALL LANG NO_COLOR
@@ -30,8 +31,18 @@ mount -n --bind "$SCRATCH/boot_id" "$BOOT_ID"
 
 # ---- helpers --------------------------------------------------------------------------------
 
+# What takes other users' files, or a file system made smaller.
+check_as_root() {
+  if grep -qE '^ *0 +0 +[0-9]{2,}' /proc/self/uid_map; then
+    check "$@"
+  else
+    skip "$1" "this sandbox has no user but 0"
+  fi
+}
+
+# What hangs shall fail.
 z() {
-  "$ZELOSCHED" "$@"
+  timeout 60 "$ZELOSCHED" "$@"
 }
 
 at() {
@@ -52,6 +63,24 @@ try() {
 says() {
   [[ $status == "$1" && $err == *"$2"* ]] ||
     { printf 'status %s\nout: %s\nerr: %s\nwanted %s: %s\n' "$status" "$out" "$err" "$1" "$2"; return 1; }
+}
+
+# The usage is told, and nothing is done.
+is_refused_as() {
+  local why=$1
+  shift
+  try z "$@"
+  says 2 "$why" && says 2 "usage: zelosched $1"
+}
+
+explains() {
+  local command=$1 option
+  shift
+  try z "$command" --help
+  is_done || return 1
+  for option; do
+    grep -q -e "^  $option " <<<"$out" || { echo "$command --help lacks $option"; return 1; }
+  done
 }
 
 is_done() {
@@ -138,15 +167,21 @@ damaged() {
   boot
 }
 
+# What it is, and of a file what is in it. Reading a FIFO would not end.
+persistent_copy() {
+  stat -c %F "$PERSISTENT" 2>/dev/null || true
+  if [[ -f $PERSISTENT ]]; then md5sum <"$PERSISTENT"; fi
+}
+
 falls_back_on_the_last_good() {
   local why=$1
   shift
   damaged "$@"
   local before
-  before=$(md5sum 2>&1 <"$PERSISTENT" || true)
+  before=$(persistent_copy)
   try z restore
   says 1 "$why" && says 1 "The tasks are those of an earlier boot" && same "$(names)" "one two " &&
-    same "$(md5sum 2>&1 <"$PERSISTENT" || true)" "$before" && same "$(task_lines)" 2 && [[ -x $PROGRAM ]]
+    same "$(persistent_copy)" "$before" && same "$(task_lines)" 2 && [[ -x $PROGRAM ]]
 }
 
 cut_off() {
@@ -235,7 +270,7 @@ replaces_what_is_not_ours() {
   echo untouched >"$SCRATCH/victim"
   "$@"
   try z restore
-  [[ $status == 0 && $err == *"$STORE $why: it is not used"* ]] || { echo "$status $err"; return 1; }
+  [[ $status == 0 && $err == *"$STORE $why"*": it is not used"* ]] || { echo "$status $err"; return 1; }
   same "$(names), $(owner_and_mode "$STORE"), $(cat "$SCRATCH/victim")" \
     "one two , root:root 644, untouched"
 }
@@ -311,21 +346,136 @@ does_not_wear_the_memory() {
 is_for_root() {
   saved
   boot
-  cp -r "$BUILD_DIR/bin/zelosched" /run/zelosched
+  refuses_others "$@" && says 1 "takes root's rights"
+}
+
+refuses_others() {
+  cp "$BUILD_DIR/bin/zelosched" /run/zelosched
   try setpriv --reuid "$NOBODY" --clear-groups env LD_LIBRARY_PATH="$BUILD_DIR/lib" /run/zelosched "$@"
-  says 1 "takes root's rights"
+  says 1 ""
 }
 
 leaves_the_old_program_on_a_full_disk() {
   saved
   boot
   echo old >"$PROGRAM"
-  local used
-  used=$(df --output=used -B1 /tmp | tail -1)
-  mount -n -o "remount,size=$((used + 8192))" /tmp
+  leave_room /tmp 8192
   try z restore
-  mount -n -o remount,size=50% /tmp
-  says 1 "No space left on device" && same "$(cat "$PROGRAM")" old && leaves_no_scratch_file
+  leave_room /tmp
+  says 1 "cannot write $PROGRAM" && says 1 "No space left on device" && same "$(cat "$PROGRAM")" old &&
+    leaves_no_scratch_file
+}
+
+# Bytes, or as much as is usual.
+leave_room() {
+  local used
+  used=$(df --output=used -B1 "$1" | tail -1)
+  local size=50%
+  if (($# > 1)); then size=$((used + $2)); fi
+  mount -n -o "remount,size=$size" "$1"
+}
+
+makes_no_half_store_on_a_full_disk() {
+  saved
+  boot
+  fallocate -l 64K /tmp/filler
+  leave_room /tmp 0
+  try z restore
+  leave_room /tmp
+  rm /tmp/filler
+  says 1 "cannot write $STORE" && [[ ! -e $STORE ]] && leaves_no_scratch_file
+}
+
+# Where zelosched is, but the program that it puts back is as the last command makes it.
+restore_from_elsewhere() {
+  saved
+  boot
+  rm -rf /run/elsewhere
+  mkdir /run/elsewhere
+  cp "$BUILD_DIR/bin/zelosched" /run/elsewhere
+  "$@"
+  try env LD_LIBRARY_PATH="$BUILD_DIR/lib" /run/elsewhere/zelosched restore
+}
+
+tells_of_the_program() {
+  local why=$1
+  shift
+  restore_from_elsewhere "$@"
+  says 1 "$why" && [[ ! -e $PROGRAM ]] && same "$(names)" "one two "
+}
+
+make_large_program() {
+  truncate -s 300M /run/elsewhere/zeloschedtask
+}
+
+takes_the_usual_program() {
+  mount -n -t tmpfs -o mode=0755 sbin /usr/sbin
+  install -m 0700 "$BUILD_DIR/bin/zeloschedtask" /usr/sbin
+  restore_from_elsewhere true
+  umount -n /usr/sbin
+  is_done && puts_all_back_as_roots
+}
+
+# A file on which something is mounted can be neither replaced nor removed.
+in_the_way() {
+  install -o "$NOBODY" -m 0644 /dev/null "$STORE"
+  mount -n --bind "$SCRATCH/foreign" "$STORE"
+  try z restore
+  umount -n "$STORE"
+}
+
+tells_what_cannot_be_replaced() {
+  saved
+  boot
+  install -o "$NOBODY" -m 0644 /dev/null "$SCRATCH/foreign"
+  in_the_way
+  says 1 "cannot replace $STORE: Device or resource busy" && [[ -x $PROGRAM ]] && leaves_no_scratch_file
+}
+
+tells_what_cannot_be_removed() {
+  clean
+  boot
+  in_the_way
+  says 1 "cannot remove $STORE: Device or resource busy"
+}
+
+puts_back_without_a_last_good_copy() {
+  saved
+  boot
+  mount -n --bind /usr/zelo/etc /usr/zelo/etc
+  mount -n -o remount,bind,ro /usr/zelo/etc
+  try z restore
+  umount -n /usr/zelo/etc
+  says 1 "cannot make a file beside $LAST_GOOD: Read-only file system" && same "$(names)" "one two "
+}
+
+puts_back_without_a_crontab() {
+  saved
+  boot
+  rm /etc/crontab
+  mkdir /etc/crontab
+  try z restore
+  rmdir /etc/crontab
+  [[ $status == 1 && -n $err ]] && same "$(names)" "one two "
+}
+
+puts_back_without_knowing_the_boot() {
+  saved
+  boot
+  umount -n "$BOOT_ID"
+  mount -n --bind /dev/null "$BOOT_ID"
+  try z restore
+  umount -n "$BOOT_ID"
+  mount -n --bind "$SCRATCH/boot_id" "$BOOT_ID"
+  says 1 "$BOOT_ID" && same "$(names)" "one two "
+}
+
+puts_back_without_a_history() {
+  saved
+  touch /usr/zelo/var
+  boot
+  try z restore
+  says 1 "cannot make $KEPT: Not a directory" && same "$(names)" "one two "
 }
 
 check "after a boot the tasks are put back" restores_after_a_boot
@@ -338,7 +488,7 @@ check "so is one without bytes" falls_back_on_the_last_good "is cut off: it has 
 check "and one of zeros" falls_back_on_the_last_good "something else" zero
 check "and one that ends in zeros" falls_back_on_the_last_good "something else" zero_the_end
 check "and one that is something else" falls_back_on_the_last_good "something else" overwrite
-check "and another user's" falls_back_on_the_last_good "is not root's alone" give_away
+check_as_root "and another user's" falls_back_on_the_last_good "is not root's alone" give_away
 check "and one that others can write" falls_back_on_the_last_good "is not root's alone" share
 check "and one that is missing" falls_back_on_the_last_good "$PERSISTENT is missing" remove
 check "and a directory" falls_back_on_the_last_good "is a directory" make_directory
@@ -348,21 +498,36 @@ check "and when there is no last good one" gives_up_without_a_last_good_copy
 check "tasks that stand in /tmp are kept from an older persistent copy" keeps_what_stands
 check "but not by force" replaces_by_force
 check "which a damaged persistent copy does not get" not_even_by_force
-check "another user's file in place of the store is replaced" \
+check_as_root "another user's file in place of the store is replaced" \
   replaces_what_is_not_ours "is not root's alone" plant_file
 check "so is one that others can write" replaces_what_is_not_ours "is not root's alone" plant_shared
 check "and a link, which is not followed" replaces_what_is_not_ours "is no regular file" plant_link
 check "and a FIFO, which is not waited for" replaces_what_is_not_ours "is no regular file" plant_fifo
 check "and half a store" replaces_what_is_not_ours "cannot be read: reading or writing failed" plant_half
-check "what is not ours goes also when there is nothing to put back" removes_what_is_not_ours
+check_as_root "what is not ours goes also when there is nothing to put back" removes_what_is_not_ours
 check "a link in place of the program is not followed" does_not_follow_a_link_for_the_program
 check "a directory in place of the store is told" \
   tells_of_a_directory "$STORE" "$STORE is a directory: no task runs until it is moved away"
 check "a directory in place of the program is told, and the store put back" does_the_rest_beside_a_directory
 check "no scratch file is left" leaves_no_scratch_file
 check "the last good copy is not written again without need" does_not_wear_the_memory
-check "restore is for root" is_for_root restore
-check "on a full disk the program stays as it was" leaves_the_old_program_on_a_full_disk
+check_as_root "restore is for root" is_for_root restore
+check "a program that is missing is told, and the store put back" \
+  tells_of_the_program "cannot open /usr/sbin/zeloschedtask: No such file" true
+check "so is one without bytes" tells_of_the_program "is cut off" touch /run/elsewhere/zeloschedtask
+check "and a FIFO" tells_of_the_program "is no regular file" mkfifo /run/elsewhere/zeloschedtask
+check "and one of no likely size" tells_of_the_program "is too large" make_large_program
+check "when it is not beside zelosched, it is taken from its usual place" takes_the_usual_program
+check_as_root "what stands in the way of the store is told" tells_what_cannot_be_replaced
+check_as_root "also when there is nothing to put back" tells_what_cannot_be_removed
+check "without a last good copy being kept, the tasks are put back" puts_back_without_a_last_good_copy
+check "so they are without a crontab" puts_back_without_a_crontab
+check "and without a history" puts_back_without_a_history
+check "and without the kernel's name for the boot" puts_back_without_knowing_the_boot
+check_as_root "on a full disk no half store is made" makes_no_half_store_on_a_full_disk
+check "restore takes no operand" is_refused_as "'now' is more than" restore now
+check "and explains its option" explains restore --force
+check_as_root "on a full disk the program stays as it was" leaves_the_old_program_on_a_full_disk
 
 # ---- history that outlives a boot -----------------------------------------------------------
 
@@ -440,6 +605,16 @@ knows_what_ran_at_the_shutdown() {
   history_is "1, 2026-11-20 08:00:00, was running but its process is gone"
 }
 
+knows_what_ran_before_a_boot_that_left_tmp() {
+  clean
+  run 1 "2026-11-20 08:00" 2 "" 1 $$
+  keep
+  history_is "1, 2026-11-20 08:00:00, running" || return 1
+  cat /proc/sys/kernel/random/uuid >"$SCRATCH/boot_id"
+  keep
+  history_is "1, 2026-11-20 08:00:00, was running but its process is gone"
+}
+
 is_roots_alone() {
   same "$(owner_and_mode "$KEPT"), $(owner_and_mode /usr/zelo/var)" "root:root 600, root:root 755"
 }
@@ -449,14 +624,23 @@ drops_what_is_too_old() {
   run 1 "2025-11-01 08:00" 3
   run 1 "2026-11-01 08:00" 3
   keep
-  same "$(sql "$KEPT" 'SELECT count(*) FROM run')" 1
+  same "$(sql "$KEPT" 'SELECT count(*) FROM run'), $out" "1, 1 run kept"
 }
 
+drops_what_became_too_old() {
+  try at "2028-01-01 12:00" history --keep
+  is_done && same "$(sql "$KEPT" 'SELECT count(*) FROM run')" 0
+}
+
+# Many are of one second, as when the clock stood.
 drops_what_is_too_much() {
-  sql "$KEPT" "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 100010)
-    INSERT INTO run SELECT 1790000000 + i, i, 1, 1, '', 3, '', '' FROM n"
+  clean
   keep
-  is_done && same "$(sql "$KEPT" 'SELECT count(*), max(timestamp) FROM run')" "100000 1790100010"
+  sql "$KEPT" "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < 100010)
+    INSERT INTO run SELECT 1790000000 + max(i, 30), i, 1, 1, '', 3, '', '' FROM n"
+  keep
+  is_done && same "$(sql "$KEPT" 'SELECT count(*), min(status_id), max(status_id) FROM run')" \
+    "100000 11 100010"
 }
 
 refuses_to_keep_in() {
@@ -467,12 +651,25 @@ refuses_to_keep_in() {
   mkdir -p /usr/zelo/var
   "$@"
   keep
-  says 1 "$KEPT: $why"
+  says 1 "$KEPT: $why" || return 1
+  try z history
+  says 1 "$KEPT: $why" || return 1
+  try at "$NOW" status
+  [[ $status == 1 && $out == *"WRONG  cannot "*"$KEPT: $why"* ]] || { echo "$out"; return 1; }
 }
 
 no_database() {
-  install -m 0600 <(yes "this is no database") "$KEPT" 2>/dev/null || true
+  install -m 0600 /dev/null "$KEPT"
   head -c 9000 /dev/zero | tr '\0' x >"$KEPT"
+}
+
+given_away_database() {
+  install -m 0600 -o "$NOBODY" /dev/null "$KEPT"
+}
+
+shared_directory() {
+  keep
+  chmod 0777 /usr/zelo/var
 }
 
 later_database() {
@@ -501,7 +698,63 @@ shows_nothing_of_it_to_others() {
   run 1 "2026-11-20 08:00" 3
   keep
   boot
-  is_for_root history
+  refuses_others history && says 1 "takes root's rights"
+}
+
+keeps_none_for_others() {
+  clean
+  refuses_others history --keep && says 1 "cannot make /usr/zelo/var: Permission denied"
+}
+
+knows_that_it_is_up_beside_a_planted_status_database() {
+  clean
+  install -m 0600 -o "$NOBODY" /dev/null "$STATUS"
+  keep
+  says 1 "cannot read $STATUS" && same "$(sql "$KEPT" 'SELECT seen FROM up')" "$(date -u -d "$NOW" +%s)"
+}
+
+keeps_what_is_kept_on_a_full_disk() {
+  clean
+  mkdir /usr/zelo/var
+  mount -n -t tmpfs -o mode=0755,size=64k var /usr/zelo/var
+  run 1 "2026-11-20 08:00" 3
+  keep
+  boot
+  run 2 "2026-11-20 09:00" 6 "$(head -c 70000 /dev/zero | tr '\0' x)"
+  keep
+  rm "$STATUS"
+  local kept
+  kept=$(z history --json | grep -c finished)
+  umount -n /usr/zelo/var
+  says 1 "database or disk is full" && same "$kept" 1
+}
+
+gives_up_on_a_held_history() {
+  clean
+  run 1 "2026-11-20 08:00" 3
+  keep
+  run 2 "2026-11-20 08:00" 3
+  python3 - "$KEPT" "$ZELOSCHED" "$FAKE" >"$SCRATCH/out" 2>"$SCRATCH/err" <<'HOLD' && status=0 || status=$?
+import os, sqlite3, subprocess, sys
+held = sqlite3.connect(sys.argv[1], isolation_level=None)
+held.execute("BEGIN EXCLUSIVE")
+sys.exit(subprocess.run([sys.argv[2], "history", "--keep"], timeout=60,
+    env=dict(os.environ, LD_PRELOAD=sys.argv[3], FAKE_PATIENCE="1")).returncode)
+HOLD
+  err=$(cat "$SCRATCH/err") out=$(cat "$SCRATCH/out")
+  says 1 "$KEPT: database is locked"
+}
+
+reads_what_cannot_be_written() {
+  clean
+  run 1 "2026-11-20 08:00" 3
+  keep
+  boot
+  mount -n --bind /usr/zelo/var /usr/zelo/var
+  mount -n -o remount,bind,ro /usr/zelo/var
+  history_is "1, 2026-11-20 08:00:00, finished" && keep
+  umount -n /usr/zelo/var
+  says 1 "cannot "
 }
 
 looks_without_making() {
@@ -518,23 +771,33 @@ check "a run is kept once" keeps_each_run_once
 check "numbers that come again after a boot are told apart" tells_runs_with_one_id_apart
 check "a result that changed is taken over" takes_a_changed_result
 check "what ran when the machine went off is known to be gone" knows_what_ran_at_the_shutdown
+check "also where /tmp outlived the boot and another process has its number" \
+  knows_what_ran_before_a_boot_that_left_tmp
 check "the kept history is root's alone" is_roots_alone
-check "after a year a run is dropped" drops_what_is_too_old
+check "of more than a year ago none is kept" drops_what_is_too_old
+check "and after a year it is dropped" drops_what_became_too_old
 check "and of more than a hundred thousand the oldest" drops_what_is_too_much
 check "a file that is no database is refused" refuses_to_keep_in "file is not a database" no_database
 check "so is that of a later version" refuses_to_keep_in "a later zelosched made it" later_database
 check "and one that others can write" refuses_to_keep_in "it is not this user's own file alone" shared_database
+check_as_root "and another user's" refuses_to_keep_in "it is not this user's own file alone" given_away_database
+check "and one where others can put files beside it" \
+  refuses_to_keep_in "its directory is not this user's alone" shared_directory
 check "and a link" refuses_to_keep_in "it is not this user's own file alone" linked_database
 check "a directory that cannot be made is told" says_that_no_directory_can_be_made
-check "the kept history is not shown to others" shows_nothing_of_it_to_others
+check_as_root "the kept history is not shown to others" shows_nothing_of_it_to_others
+check_as_root "nor made by them" keeps_none_for_others
+check_as_root "beside a status database that is refused, that the machine is up is noted" \
+  knows_that_it_is_up_beside_a_planted_status_database
+check "on a full disk what is kept stays" keeps_what_is_kept_on_a_full_disk
+check "a history that another holds for too long is told" gives_up_on_a_held_history
+check "one that cannot be written is shown" reads_what_cannot_be_written
+check "keeping stands alone" is_refused_as "'--keep' stands alone" history --keep --json
+check "and takes no id" is_refused_as "'3' is more than" history --keep 3
+check "and is explained" explains history --keep
 check "a look at the history makes no file" looks_without_making
 
 # ---- what was missed ------------------------------------------------------------------------
-
-if [[ -n $(sed -n 's/^ZELO_SANITIZE:STRING=//p' "$BUILD_DIR/CMakeCache.txt") ]]; then
-  skip "missed tasks are found" "libraries with sanitizers take no other before them"
-  finish
-fi
 
 # Off from one to eight o'clock on a Friday.
 readonly OFF="2026-11-20 01:00:20" ON="2026-11-20 08:00:40" LATER="2026-11-20 08:05"
@@ -612,6 +875,12 @@ finds_none_afterwards() {
     ! at "$LATER" status | grep 'when the machine was off'
 }
 
+# As while a run waits for its turn.
+finds_none_before_it_is_recorded() {
+  rm "$STATUS"
+  same "$(missed)" ""
+}
+
 one_task() {
   add --daily 02:30 --name one -- true
 }
@@ -672,6 +941,40 @@ forgets_after_a_week() {
   same "$(at "2026-11-27 02:31" catch-up --dry-run --within 7d)" "no run was missed"
 }
 
+misses_what_passed_until_the_tasks_were_back() {
+  clean
+  one_task
+  at "$OFF" history --keep
+  truncate -s -40 "$PERSISTENT"
+  boot
+  at "2026-11-20 02:00" restore >/dev/null 2>&1 && return 1
+  at "2026-11-20 02:10" history --keep
+  same "$(sql "$KEPT" "SELECT seen FROM up")" "$(date -u -d "$OFF" +%s)" || return 1
+  rm "$PERSISTENT"
+  one_task
+  at "$ON" history --keep
+  same "$(missed)" "one 2026-11-20 02:30"
+}
+
+tells_what_cannot_be_started() {
+  went_off one_task
+  FAKE_TIME=$(date -u -d "$LATER" +%s) LD_PRELOAD="$FAKE $NO_FORK" try "$ZELOSCHED" catch-up
+  says 1 "cannot run task 1 (one)" && same "$(missed)" "one 2026-11-20 02:30"
+}
+
+one_long_task() {
+  add --daily 02:30 --name one -- "echo \$\$ >$SCRATCH/long; exec sleep 100"
+}
+
+holds_nobody_up() {
+  rm -f "$SCRATCH/long"
+  went_off one_long_task
+  try at "$LATER" catch-up
+  is_done || return 1
+  until [[ -s $SCRATCH/long ]]; do sleep 0.05; done
+  flock -n /run/zelosched.lock kill "$(cat "$SCRATCH/long")"
+}
+
 two_at_once_run_each_once() {
   rm -f "$SCRATCH/ran"
   went_off tasks_of_all_kinds
@@ -687,6 +990,7 @@ check "status names it" status_names_them
 check "nothing is run by that" lists_without_running
 check "catch-up runs each once" runs_each_once
 check "and finds none afterwards" finds_none_afterwards
+check "also before the runs are recorded" finds_none_before_it_is_recorded
 check "two at once run each once" two_at_once_run_each_once
 check "a task that ran since is not missed" is_not_missed_any_more z run 1 --wait
 check "nor one that is disabled" is_not_missed_any_more z disable 1
@@ -699,5 +1003,13 @@ check "a task that was added later has missed nothing" a_task_of_later_missed_no
 check "without an earlier boot nothing was missed" misses_nothing_without_an_earlier_boot
 check "nor by a clock that was set back" misses_nothing_by_a_clock_set_back
 check "after a week it is told no more" forgets_after_a_week
-check "catch-up is for root" is_for_root catch-up
+check "what passed before the tasks were back is missed too" misses_what_passed_until_the_tasks_were_back
+check "a run that cannot be started is told, and remains missed" tells_what_cannot_be_started
+check "a run that goes on keeps nobody from changing tasks" holds_nobody_up
+check_as_root "catch-up is for root" is_for_root catch-up
+for span in 8d 169h 0m -1h 12 h 1.5h ''; do
+  check "a time of '$span' is refused" is_refused_as "takes a time from 1m to 7d" catch-up --within "$span"
+done
+check "catch-up takes no operand" is_refused_as "'1' is more than" catch-up 1
+check "and explains its options" explains catch-up "--within TIME" --dry-run
 finish

@@ -253,8 +253,11 @@ bool fallsOn(Call call) {
   return true;
 }
 
+thread_local bool countsAreWritten = false;
+
 // Counts the call. The plan by which it fails, or null.
 const Plan *failing(Call call, const char *key = nullptr, size_t size = 0) {
+  if (countsAreWritten) return nullptr;
   State::PerCall &calls = slot(call);
   ++calls.count;
   if (fallsOn(call)) {
@@ -963,6 +966,11 @@ void *realloc(void *memory, size_t size) noexcept {
 }
 
 #endif
+
+// ---- the build that counts what is run
+
+// Called by its libraries around the writing of the counts.
+void zelo_tests_let_be(int begin) { support::countsAreWritten = begin != 0; }
 
 // ---- SQLite
 

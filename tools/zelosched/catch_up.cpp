@@ -21,7 +21,7 @@ struct Unit {
   char letter;
   long seconds;
 };
-constexpr Unit kUnits[] = {{'m', 60}, {'h', 60 * 60}, {'d', 24 * 60 * 60}};
+constexpr Unit kUnits[] = {{'m', 60}, {'h', 60L * 60}, {'d', 24L * 60 * 60}};
 
 // "90m", "12h", "2d".
 long parseSpan(const std::string &text) {
@@ -39,7 +39,7 @@ long parseSpan(const std::string &text) {
 // Runs the task, unless it is only to be listed.
 void catchUp(const MissedTask &missed, bool isDryRun) {
   if (!isDryRun) {
-    startRunUnseen(*missed.task);
+    startRunUnseen(*missed.task, Disabled::kIsSkipped);
     forgetMissed(*missed.task);
   }
   std::printf("%s was due at %s: %s\n", titleOf(*missed.task).c_str(),

@@ -4,6 +4,8 @@
 #include <stdexcept>
 #include <string>
 
+#include "command.h"
+
 // Ends the sub-command: said on standard error, exit status kFailed.
 class Failure : public std::runtime_error {
  public:
@@ -21,3 +23,14 @@ Failure failedTo(const std::string &what);
 
 // One line on standard error, with the program's name in front. Gives kFailed.
 int complain(const std::string &sentence);
+
+// Takes a step whose failure is said, and does not keep the steps after it from being taken.
+template <class Step>
+int attempt(Step step) {
+  try {
+    step();
+    return kDone;
+  } catch (const Failure &failure) {
+    return complain(failure.what());
+  }
+}

@@ -9,6 +9,7 @@
 #include <tuple>
 
 #include "command.h"
+#include "failure.h"
 #include "kept_database.h"
 #include "missed.h"
 #include "text.h"
@@ -19,18 +20,23 @@ constexpr long kMostRuns = 100000;
 constexpr long kLongest = 366L * 24 * 60 * 60;  // seconds
 constexpr int kAlive = 1;
 
+#define RUN_KEY "timestamp, status_id, pid, task_id, app"
+
 constexpr char kKeep[] =
-    "INSERT INTO run(timestamp, status_id, pid, task_id, app, status_code, comment, boot)"
+    "INSERT INTO run(" RUN_KEY
+    ", status_code, comment, boot)"
     " VALUES(?, ?, ?, ?, ?, ?, ?, ?)"
     " ON CONFLICT DO UPDATE SET status_code = excluded.status_code, comment = excluded.comment"
     " WHERE status_code <> excluded.status_code OR comment <> excluded.comment";
 constexpr char kDropOld[] = "DELETE FROM run WHERE timestamp < ?";
 constexpr char kDropMany[] =
-    "DELETE FROM run WHERE timestamp <"
-    " (SELECT timestamp FROM run ORDER BY timestamp DESC LIMIT 1 OFFSET ?)";
+    "DELETE FROM run WHERE (" RUN_KEY
+    ") <"
+    " (SELECT " RUN_KEY
+    " FROM run ORDER BY timestamp DESC, status_id DESC, pid DESC, task_id DESC,"
+    " app DESC LIMIT 1 OFFSET ?)";
 
-#define SELECT_RUNS \
-  "SELECT timestamp, status_id, pid, task_id, app, status_code, comment, boot FROM run "
+#define SELECT_RUNS "SELECT " RUN_KEY ", status_code, comment, boot FROM run "
 constexpr char kNewest[] = SELECT_RUNS "ORDER BY timestamp DESC, status_id DESC LIMIT ?";
 constexpr char kNewestOfTask[] =
     SELECT_RUNS "WHERE task_id = ? ORDER BY timestamp DESC, status_id DESC LIMIT ?";
@@ -67,6 +73,7 @@ std::vector<Run> keptRuns(std::optional<long> taskId, long limit) {
   return runs;
 }
 
+// What tells it from every other; it never changes.
 auto identityOf(const Run &run) {
   return std::tie(run.start, run.statusId, run.pid, run.taskId, run.app);
 }
@@ -79,35 +86,54 @@ bool isNewer(const Run &a, const Run &b) {
   return identityOf(a) > identityOf(b);
 }
 
-}  // namespace
+// Leaves one of each two that are the same. Of a run that is in both databases, the row of the
+// status database comes first and has the later result. But where that database outlived a boot, a
+// run that is "running" there may have the number of a process of today, and only the kept row
+// knows.
+std::vector<Run> withoutDoubles(const std::vector<Run> &sorted) {
+  std::vector<Run> runs;
+  for (const Run &run : sorted) {
+    if (runs.empty() || !isSame(runs.back(), run)) {
+      runs.push_back(run);
+    } else if (runs.back().statusCode == ZELO_SCHED_STATUS_RUNNING) {
+      runs.back().statusCode = run.statusCode;
+    }
+  }
+  return runs;
+}
 
-int keepHistory() {
-  markMachineUp();
+void keepRuns() {
   const std::vector<Run> runs = RunDatabase().newest(std::nullopt, kMostRuns);
   const KeptDatabase kept(KeptDatabase::kChange);
   const std::string boot = bootId();
+  const long oldest = time(nullptr) - kLongest;
   Transaction transaction(kept);
   Query keep(kept, kKeep);
   long count = 0;
   for (const Run &run : runs) {
+    if (run.start < oldest) continue;
     keep.with(run.start).with(run.statusId).with(run.pid).with(run.taskId).with(run.app);
     count += keep.with(run.statusCode).with(run.comment).with(boot).run();
   }
-  Query(kept, kDropOld).with(time(nullptr) - kLongest).run();
+  Query(kept, kDropOld).with(oldest).run();
   Query(kept, kDropMany).with(kMostRuns - 1).run();
   transaction.commit();
   // A timer calls this: nothing new is nothing to fill the log with.
   if (count > 0) std::printf("%s kept\n", counted(static_cast<size_t>(count), "run").c_str());
-  return kDone;
+}
+
+}  // namespace
+
+int keepHistory() {
+  return std::max(attempt(keepRuns), attempt(markMachineUp));
 }
 
 std::vector<Run> allRuns(std::optional<long> taskId, long limit) {
   std::vector<Run> runs = RunDatabase().newest(taskId, limit);
   const std::vector<Run> kept = keptRuns(taskId, limit);
   runs.insert(runs.end(), kept.begin(), kept.end());
-  // Of a run that is in both, the row of the status database is the later one, and comes first.
   std::stable_sort(runs.begin(), runs.end(), isNewer);
-  runs.erase(std::unique(runs.begin(), runs.end(), isSame), runs.end());
+  runs = withoutDoubles(runs);
   if (runs.size() > static_cast<size_t>(limit)) runs.resize(static_cast<size_t>(limit));
   return runs;
 }

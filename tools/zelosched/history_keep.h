@@ -8,8 +8,8 @@
 
 // Carries the runs of the status database over into the kept ones: each once, also when it was
 // carried over before, and with the result that it has now. At most a year of runs are kept, and of
-// these the newest hundred thousand. Also notes that the machine is up (missed.h). The exit status.
-// Throws Failure.
+// these the newest hundred thousand. Also notes that the machine is up (missed.h). What failed is
+// said; the exit status.
 int keepHistory();
 
 // The runs of the status database and the kept ones, newest first; of one task, or of all; at most

@@ -13,7 +13,7 @@
 namespace {
 
 constexpr char kPath[] = "/usr/zelo/var/history.sqlite";
-constexpr const char *kDirectories[] = {"/usr/zelo", "/usr/zelo/var"};
+constexpr char kDirectory[] = "/usr/zelo/var";
 constexpr mode_t kDirectoryMode = 0755;
 constexpr mode_t kMode = 0600;  // command results are nobody else's business
 constexpr char kBootId[] = "/proc/sys/kernel/random/boot_id";
@@ -37,7 +37,7 @@ Failure cannot(const char *what, const char *why) {
 }
 
 void makeDirectories() {
-  for (const char *directory : kDirectories) {
+  for (const char *directory : {"/usr/zelo", kDirectory}) {
     if (mkdir(directory, kDirectoryMode) != 0 && errno != EEXIST) {
       const int reason = errno;
       throw Failure(std::string("cannot make ") + directory + ": " + std::strerror(reason));
@@ -56,11 +56,19 @@ void makeFile() {
   }
 }
 
+bool isOurs(const struct stat &info) {
+  return info.st_uid == geteuid() && (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
+}
+
+// Whoever can write the directory can put a journal there, from which SQLite would take rows.
 void requireOurFile() {
-  struct stat info {};
-  if (lstat(kPath, &info) != 0) throw cannot("open", std::strerror(errno));
-  if (!S_ISREG(info.st_mode) || info.st_uid != geteuid() ||
-      (info.st_mode & (S_IWGRP | S_IWOTH)) != 0) {
+  struct stat file {};
+  struct stat directory {};
+  if (lstat(kPath, &file) != 0 || stat(kDirectory, &directory) != 0) {
+    throw cannot("open", std::strerror(errno));
+  }
+  if (!isOurs(directory)) throw cannot("open", "its directory is not this user's alone");
+  if (!S_ISREG(file.st_mode) || !isOurs(file)) {
     throw cannot("open", "it is not this user's own file alone");
   }
 }
@@ -83,7 +91,7 @@ void makeTables(const KeptDatabase &database) {
 }  // namespace
 
 bool isKeptFromUs() {
-  return access(kPath, F_OK) == 0 && access(kPath, R_OK | W_OK) != 0;
+  return access(kPath, F_OK) == 0 && access(kPath, R_OK) != 0;
 }
 
 std::string bootId() {

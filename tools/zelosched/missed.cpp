@@ -1,10 +1,13 @@
 #include "missed.h"
 
+#include <unistd.h>
+
 #include <algorithm>
 
 #include "coming_runs.h"
 #include "history_keep.h"
 #include "kept_database.h"
+#include "store_files.h"
 
 namespace {
 
@@ -28,6 +31,13 @@ void noteMissed(const KeptDatabase &kept, time_t lastUp, time_t now) {
   Query(kept, "DELETE FROM missed WHERE due < ?").with(now - kMissedRemembered).run();
 }
 
+// They could not be put back, or nobody tried so far. No time of theirs may count as passed over
+// until they are.
+bool areTasksLost() {
+  return access(kWorkingCopy, F_OK) != 0 &&
+         (access(kPersistentCopy, F_OK) == 0 || access(kLastGoodCopy, F_OK) == 0);
+}
+
 bool hasRunAt(const TaskRecord &task, time_t due) {
   return lastRunBetween(task, due - kMinute, due).has_value();
 }
@@ -40,6 +50,7 @@ bool ranSince(const TaskRecord &task, time_t due) {
 }  // namespace
 
 void markMachineUp() {
+  if (areTasksLost()) return;
   const KeptDatabase kept(KeptDatabase::kChange);
   const std::string boot = bootId();
   const time_t now = time(nullptr);

@@ -17,7 +17,8 @@ struct MissedTask {
 // Notes that the machine is up. The first call after a boot also notes the enabled tasks that were
 // due since the last call before it: right then the tasks are those that the machine went off with,
 // and one that is added later has missed nothing. Power times are no tasks that could be made up
-// for. Throws Failure.
+// for. As long as the tasks are missing from /tmp it notes nothing at all, so that the first call
+// with them finds what they missed. Throws Failure.
 void markMachineUp();
 
 // The tasks of the list that were due since that moment while the machine was off, are enabled and

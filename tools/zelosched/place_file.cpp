@@ -15,6 +15,7 @@ namespace {
 
 constexpr uid_t kRoot = 0;
 constexpr gid_t kRootsGroup = 0;
+constexpr size_t kMostBytes = 256 << 20;  // far above every store: what is larger is none
 
 Failure cannot(const char *what, const std::string &path) {
   const int reason = errno;
@@ -79,12 +80,19 @@ void syncDirectoryOf(const std::string &path) {
   if (file.get() < 0 || fsync(file.get()) != 0) throw cannot("write", directory);
 }
 
+void requireFile(int file, const std::string &path) {
+  struct stat info {};
+  if (fstat(file, &info) != 0) throw cannot("examine", path);
+  if (!S_ISREG(info.st_mode)) throw Failure(path + " is no regular file");
+}
+
 }  // namespace
 
 std::string contentsOf(const std::string &path) {
   // Not blocking, for a FIFO would hang the open.
   const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   if (file.get() < 0) throw cannot("open", path);
+  requireFile(file.get(), path);
   std::string contents;
   char block[1 << 16];
   for (;;) {
@@ -93,6 +101,7 @@ std::string contentsOf(const std::string &path) {
     if (count < 0) throw cannot("read", path);
     if (count == 0) return contents;
     contents.append(block, static_cast<size_t>(count));
+    if (contents.size() > kMostBytes) throw Failure(path + " is too large");
   }
 }
 

@@ -8,6 +8,7 @@
 
 // Each throws Failure.
 
+// Of a regular file, or of one that a link leads to.
 std::string contentsOf(const std::string &path);
 
 // The file, root's and with that mode, on the disk when the call returns. It replaces a file or a

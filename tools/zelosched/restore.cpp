@@ -18,19 +18,17 @@
 #include "options.h"
 #include "place_file.h"
 #include "save.h"
+#include "store_files.h"
 #include "text.h"
 
 namespace {
 
 constexpr Option kOptions[] = {{"force"}};
 
-constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
-constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
-constexpr char kLastGoodCopy[] = "/usr/zelo/etc/scheduled_tasks.last-good";
 constexpr mode_t kStoreMode = 0644;
 
-constexpr char kTaskProgram[] = "/tmp/zeloschedtask";
 constexpr char kTaskProgramName[] = "zeloschedtask";
+constexpr char kUsualDirectory[] = "/usr/sbin/";
 constexpr mode_t kProgramMode = 0755;
 
 // ---- is a copy of the tasks fit to be used? ---------------------------------------------------
@@ -118,7 +116,10 @@ void placeWorkingCopy(const char *source) {
 
 // What somebody else has put there would keep the library from saving any task.
 void removeForeign(const Copy &working) {
-  if (working.condition == Copy::kForeign) unlink(kWorkingCopy);
+  if (working.condition != Copy::kForeign || unlink(kWorkingCopy) == 0) return;
+  const int reason = errno;
+  throw Failure(std::string("cannot remove ") + kWorkingCopy + ": " + std::strerror(reason) +
+                ": no task can be saved until it is gone");
 }
 
 void putLastGoodBack(const Copy &working, const Copy &persistent) {
@@ -145,11 +146,12 @@ void putLastGoodBack(const Copy &working, const Copy &persistent) {
 
 // A working copy that stands may hold a change that the persistent one lacks.
 void keepWorkingCopy(const Copy &persistent) {
-  std::printf("%s is there and whole: it stays (--force replaces it)\n", kWorkingCopy);
   if (persistent.isWhole()) {
+    std::printf("%s is there and whole: it stays (--force replaces it)\n", kWorkingCopy);
     keepLastGood();
     return;
   }
+  std::printf("%s is there and whole: it stays\n", kWorkingCopy);
   const std::string why = persistent.why.empty() ? "is missing" : persistent.why;
   throw Failure(std::string(kPersistentCopy) + " " + why +
                 ": save a task, which writes it anew, or all are lost at the next boot");
@@ -180,18 +182,27 @@ void putStoreBack(bool isForced) {
 
 // ---- the program that cron starts ---------------------------------------------------------------
 
-// It is installed beside this one.
-std::string installedProgram() {
+// Empty when /proc does not tell.
+std::string ownDirectory() {
   char self[PATH_MAX];
   const ssize_t length = readlink("/proc/self/exe", self, sizeof self);
-  if (length <= 0) throw Failure("cannot tell where zelosched is installed: is /proc there?");
-  const std::string path(self, static_cast<size_t>(length));
-  return path.substr(0, path.rfind('/') + 1) + kTaskProgramName;
+  const std::string path(self, static_cast<size_t>(std::max<ssize_t>(length, 0)));
+  return path.substr(0, path.rfind('/') + 1);
+}
+
+// It is installed beside this one.
+std::string installedProgram() {
+  const std::string directory = ownDirectory();
+  const std::string beside = directory + kTaskProgramName;
+  const bool isBeside = !directory.empty() && access(beside.c_str(), F_OK) == 0;
+  return isBeside ? beside : std::string(kUsualDirectory) + kTaskProgramName;
 }
 
 void putProgramBack() {
   const std::string installed = installedProgram();
-  placeFile(kTaskProgram, contentsOf(installed), kProgramMode);
+  const std::string program = contentsOf(installed);
+  if (program.empty()) throw Failure(installed + " is cut off: it has no bytes");
+  placeFile(kTaskProgram, program, kProgramMode);
   std::printf("%s was put back from %s\n", kTaskProgram, installed.c_str());
 }
 
@@ -203,23 +214,13 @@ void synchronise() {
   requireCrontabInStep();
 }
 
-// One step that fails does not keep the others from being taken: as much as can be shall run.
-template <class Step>
-int attempt(Step step) {
-  try {
-    step();
-    return kDone;
-  } catch (const Failure &failure) {
-    return complain(failure.what());
-  }
-}
-
 int runRestore(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   const bool isForced = arguments.has("force");
   const ChangeLock lock;
+  // As much as can be shall run.
   const int results[] = {
       attempt(putProgramBack),
       attempt([&] { putStoreBack(isForced); }),

@@ -38,19 +38,18 @@ class NoStreams {
 
 }  // namespace
 
-void startRun(const ZELO_SCHED_TASK &task) {
+void startRun(const ZELO_SCHED_TASK &task, Disabled disabled) {
   // The run's process begins as a copy of this one.
   std::fflush(stdout);
   forgetError();
   constexpr int kAnyTime = 0;
-  constexpr int kDisabledToo = 0;
-  if (ZELOSchedTaskRun(task.ID, kAnyTime, kDisabledToo) < 0) {
+  if (ZELOSchedTaskRun(task.ID, kAnyTime, static_cast<int>(disabled)) < 0) {
     throw failedTo("run " + titleOf(task));
   }
 }
 
-void startRunUnseen(const ZELO_SCHED_TASK &task) {
+void startRunUnseen(const ZELO_SCHED_TASK &task, Disabled disabled) {
   std::fflush(stdout);
   const NoStreams nowhere;
-  startRun(task);
+  startRun(task, disabled);
 }

@@ -17,6 +17,7 @@
 #include "missed.h"
 #include "options.h"
 #include "runs.h"
+#include "store_files.h"
 #include "task_check.h"
 #include "task_list.h"
 #include "terminal.h"
@@ -25,9 +26,6 @@
 namespace {
 
 constexpr char kCronPidFile[] = "/var/run/crond.pid";
-constexpr char kTaskProgram[] = "/tmp/zeloschedtask";
-constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
-constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
 constexpr int kAlive = 1;
 
 struct Finding {

@@ -1,0 +1,44 @@
+#!/bin/bash
+# The tests once more, against a build that the address and the undefined-behaviour sanitizer watch.
+# Left out are the tests of what is built and installed, for that is never built like this.
+#
+# Functions are called by check:
+# shellcheck disable=SC2317
+set -euo pipefail
+
+root=$(cd "$(dirname "$0")/.." && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$root/tests/support/shell_test.sh"
+
+readonly SANITIZED=$BUILD_DIR/sanitized
+readonly SCRIPTS=(json_python_test poweroff_feasible_check_test power_crontab_cron_test
+  zelosched_boot_test zelosched_cli_test zelosched_terminal_test)
+
+# Optimising would cost more time than it saves.
+build() {
+  BUILD_DIR=$SANITIZED JOBS=1 "$root/scripts/build" -DCMAKE_BUILD_TYPE=Debug \
+    -DCMAKE_CXX_FLAGS_DEBUG="-O0 -g1" -DCMAKE_C_FLAGS_DEBUG="-O0 -g1" \
+    -DZELO_SANITIZE=address,undefined >"$BUILD_DIR/sanitized.log" 2>&1 ||
+    { tail -50 "$BUILD_DIR/sanitized.log"; return 1; }
+}
+
+programs() {
+  awk '$1 == "gtest" { print $2 }' "$SANITIZED/test-programs"
+  printf '%s\n' "${SCRIPTS[@]}"
+}
+
+# The libraries that some tests preload come before the sanitizers' own.
+run_tests() {
+  local log=$SANITIZED/tests.log
+  local -a names
+  mapfile -t names < <(programs)
+  BUILD_DIR=$SANITIZED PROGRAMS_AT_ONCE=1 UBSAN_OPTIONS=print_stacktrace=1 \
+    ASAN_OPTIONS=verify_asan_link_order=0:detect_stack_use_after_return=1 \
+    "$root/scripts/run-tests" "${names[@]}" >"$log" 2>&1 ||
+    { sed -n '/^FAILED/,/^ok/p' "$log"; tail -1 "$log"; return 1; }
+  echo "    $(tail -1 "$log")"
+}
+
+check "the product is built with sanitizers" build
+check "all tests pass, and no sanitizer objects" run_tests
+finish
