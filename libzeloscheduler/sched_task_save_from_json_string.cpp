@@ -123,15 +123,18 @@ bool fitsNumber(const SchedParm &parm, const char *szNumber) {
          numberIn(szKept) == numberIn(szNumber);
 }
 
-// Half a command is another command. What is no Base64 is left to the conversion.
-bool fitsCommand(const std::string &encoded) {
-  constexpr size_t kCapacity = sizeof(ZELO_SCHED_TASK::Command);
-  if (encoded.size() >= kCapacity) {
+// Half a command is another command. Of the longest one that fits, the field drops padding at the
+// end, which carries nothing. What is no Base64 is left to the conversion.
+bool fitsCommand(std::string_view encoded) {
+  constexpr size_t kLongest = sizeof(ZELO_SCHED_TASK::Command) - 1;
+  constexpr char kPadding = '=';
+  const std::string_view kept = encoded.substr(0, kLongest);
+  if (encoded.find_first_not_of(kPadding, kept.size()) != std::string_view::npos) {
     return false;
   }
-  char command[kCapacity];
+  char command[sizeof(ZELO_SCHED_TASK::Command)];
   size_t length = sizeof(command);
-  return ZELOEncodingBase64Decode(encoded.data(), encoded.size(), command, &length) == 0 ||
+  return ZELOEncodingBase64Decode(kept.data(), kept.size(), command, &length) == 0 ||
          memchr(command, '\0', length) == nullptr;
 }
 
@@ -140,7 +143,7 @@ bool fitsField(const std::string &name, const std::string &text) {
     return fitsCommand(text);
   }
   for (const SchedParm *parm = parm_table; parm->szKey != nullptr; ++parm) {
-    if (name == parm->szKey && parm->fnFromHashStr != nullptr) {
+    if (name == parm->szKey && parm->inHash && parm->fnFromHashStr != nullptr) {
       return fitsNumber(*parm, text.c_str());
     }
   }
@@ -163,7 +166,6 @@ int fillHash(const Json::Value &root, HashGuard *hash) {
 // there. Only the same one is overwritten, where it is stored.
 bool isStored(ZELO_SCHED_TASK *pTask) {
   ZELO_SCHED_TASK stored = {};
-  stored.Backend = pTask->Backend;
   if (ZELOSchedTaskGetByID(pTask->ID, &stored) != 0 || strcmp(stored.App, pTask->App) != 0 ||
       strcmp(stored.Name, pTask->Name) != 0) {
     return false;

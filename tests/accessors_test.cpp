@@ -422,6 +422,7 @@ TEST_F(AccessorsTest, ATextGetterReadsAFieldThatIsFull) {
   for (const auto &row : kTextGetters) {
     SCOPED_TRACE(row.name);
     const std::string text(row.capacity - 1, 'y');
+    std::memset(textAt(0), 'x', sizeof(task));  // no other field has that text
     std::memcpy(textAt(row.offset), text.c_str(), row.capacity);
     std::vector<char> read(row.capacity + 1, '#');
     EXPECT_EQ(row.call(read.data(), row.capacity, &task), 0);
@@ -434,6 +435,7 @@ TEST_F(AccessorsTest, ATextGetterReadsAFieldThatIsFull) {
 TEST_F(AccessorsTest, ATextGetterCutsToTheBufferLessOneAndWritesNoFurther) {
   for (const auto &row : kTextGetters) {
     SCOPED_TRACE(row.name);
+    std::memset(textAt(0), 'x', sizeof(task));
     std::memcpy(textAt(row.offset), "abcdef", sizeof("abcdef"));
     char read[] = "#######";
     EXPECT_EQ(row.call(read, 4, &task), 0);

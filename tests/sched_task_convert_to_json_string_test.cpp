@@ -202,6 +202,7 @@ TEST_F(TaskToJsonTest, AShortageOfMemoryForHashOrListIsReported) {
     Buffer buffer(kSmallest);
     expectRefused(ZELOSchedTaskConvertToJson(task.get(), buffer.data(), buffer.size()), buffer,
                   Lines{std::string(kUnit) + "Out of memory"});
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
   }
 }
 
@@ -261,6 +262,14 @@ TEST_F(TaskToJsonTest, ByIdZeroIsAcceptedAndAnIdThatIsNotStoredIsReported) {
   }
 }
 
+TEST_F(TaskToJsonTest, AnIdOfMoreThan32BitsIsAnother) {
+  saveTask(namedTask("stored"));
+  Buffer buffer(kSmallest);
+  EXPECT_EQ(ZELOSchedTaskConvertToJsonById((1L << 32) + 1, buffer.data(), buffer.size()), -1);
+  EXPECT_EQ(logged().back(), std::string(kUnit) + "cannot get scheduler task, id=4294967297");
+  EXPECT_TRUE(buffer.isUntouched());
+}
+
 TEST_F(TaskToJsonTest, ByIdAFailedAllocationIsReported) {
   if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
   Buffer buffer(kSmallest);
@@ -282,6 +291,7 @@ TEST_F(TaskToJsonTest, ByIdAFailedConversionIsReportedWithTheId) {
   expectRefused(ZELOSchedTaskConvertToJsonById(id, buffer.data(), buffer.size()), buffer,
                 Lines{std::string(kUnit) + "enum hash key failed",
                       std::string(kUnit) + "scheduler task to json failed, task=1"});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, support::kInjectedFile}));
 }
 
 }  // namespace

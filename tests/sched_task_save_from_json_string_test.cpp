@@ -1,7 +1,9 @@
 // A task saved from JSON, which may come from anyone.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdio>
+#include <filesystem>
 #include <string>
 #include <utility>
 #include <vector>
@@ -9,6 +11,7 @@
 #include "captured_log.h"
 #include "failing_calls.h"
 #include "fake_backends.h"
+#include "power.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
 
@@ -122,6 +125,7 @@ class TaskFromJsonTest : public support::SandboxTest {
     SCOPED_TRACE(text.substr(0, 100));
     expectRefused(text, "parse json failed, szJson=" + text);
     EXPECT_EQ(logged().size(), 1U);
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
   }
   static void expectMemberRefused(const std::string &value) {
     SCOPED_TRACE(value.substr(0, 100));
@@ -153,6 +157,15 @@ TEST_F(TaskFromJsonTest, ANewTaskIsCreatedAndItsIdGiven) {
   EXPECT_EQ(task->StartYear, 2012U);
   EXPECT_STREQ(task->Week, "1111111");
   EXPECT_EQ(support::crontabLines().size(), 1U);
+}
+
+TEST_F(TaskFromJsonTest, LookingForTheStoredTaskOfANewOneLeavesALineAndACode) {
+  ASSERT_EQ(save(taskText()), 1);
+  EXPECT_EQ(logged(), Lines{"sched_task_get.cpp:N No get_by_id backend is found for task [-1] "});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x2000, "sched_task_get.cpp"}));
+  support::clearLog();
+  ASSERT_EQ(save(taskText(), 1), 2);
+  EXPECT_EQ(logged(), Lines{}) << "with the create flag none is looked for";
 }
 
 TEST_F(TaskFromJsonTest, ATrailingLineFeedOfAValueIsAllowed) {
@@ -189,6 +202,12 @@ TEST_F(TaskFromJsonTest, AnotherNameOrAppCreatesANewTask) {
   EXPECT_STREQ(loadTask(1)->App, "a");
 }
 
+TEST_F(TaskFromJsonTest, NameAndAppAreComparedToTheirEnds) {
+  ASSERT_EQ(save(taskText({{"name", "a long name"}, {"app", "a long app"}})), 1);
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"name", "a long name 2"}, {"app", "a long app"}})), 2);
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"name", "a long name"}, {"app", "a long ap"}})), 3);
+}
+
 TEST_F(TaskFromJsonTest, AnIdThatIsNotStoredIsCreated) {
   EXPECT_EQ(save(taskText({{"id", "77"}})), 1);
   EXPECT_EQ(storedTasks(), 1);
@@ -212,15 +231,36 @@ TEST_F(TaskFromJsonTest, ATaskOfAnotherBackendIsOverwrittenThere) {
   EXPECT_EQ(fakes.calls().back(), "edit 1 id 7");
 }
 
+// Of a listed one the name is another than by its id; here it is taken by its id.
+TEST_F(TaskFromJsonTest, APowerTaskIsOverwrittenInItsPlaceOrBecomesAnOrdinaryTask) {
+  support::haveClock();
+  support::setPowerList(support::kOn, {{1, 127, 5, 7}, {1, 127, 6, 8}});
+  constexpr long kFirst = 71270507;
+  const std::string text = jsonOf(kFirst);
+  EXPECT_NE(text.find(R"("app args":"\"poweron\"\n")"), std::string::npos) << text;
+  EXPECT_EQ(save(text), kFirst);
+  EXPECT_EQ(support::powerList(support::kOn).size(), 2U);
+  EXPECT_FALSE(support::fileExists(support::kStore));
+  EXPECT_EQ(save(text, 1), 1);
+  EXPECT_EQ(loadTask(1)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
+  EXPECT_STREQ(loadTask(1)->Command, "");
+  EXPECT_EQ(support::powerList(support::kOn).size(), 2U);
+  std::filesystem::remove_all(support::kPowerSchedule);
+}
+
 TEST_F(TaskFromJsonTest, AnEmptyObjectSavesNothingAndGivesTheIdOfANewRecord) {
   EXPECT_EQ(save("{}"), -1);
   EXPECT_EQ(save(" { } \n", 1), -1);
   EXPECT_EQ(logged(), Lines{});
   EXPECT_FALSE(support::fileExists(support::kStore));
+  const FakeBackends fakes(1);  // whose new records have the id 0
+  EXPECT_EQ(save("{}"), 0);
 }
 
 TEST_F(TaskFromJsonTest, AMemberThatIsNoKeyOfATaskIsPassedOver) {
   EXPECT_EQ(save(taskText({{"colour", "red"}, {"", "nothing"}, {"next trigger time", "x"}})), 1);
+  EXPECT_EQ(save(taskText({{"backend", "99999999999"}})), 2);
+  EXPECT_EQ(loadTask(2)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
 }
 
 TEST_F(TaskFromJsonTest, OfMembersGivenTwiceTheLastCounts) {
@@ -342,14 +382,25 @@ TEST_F(TaskFromJsonTest, ANumberThatDoesNotFitItsFieldIsRefusedRatherThanCut) {
 }
 
 TEST_F(TaskFromJsonTest, ACommandThatWouldBeCutIsRefused) {
-  const std::string longest(16380, 'Q');  // 12,285 bytes
-  for (const std::string &encoded :
-       {std::string("ZWNobyBoaQAgLXJm"), std::string("AA=="), longest + "QUFB", longest + "%%%%"}) {
+  const std::string longest = std::string(16383, 'Q');  // 12,287 bytes
+  for (const std::string &encoded : {std::string("ZWNobyBoaQAgLXJm"), std::string("AA=="),
+                                     longest + "Q", longest + "=Q", longest + "%"}) {
     SCOPED_TRACE(encoded.substr(0, 20));
     expectRefused(taskText({{"cmd", encoded}}), "save appargs failed");
   }
-  EXPECT_EQ(save(taskText({{"cmd", longest}})), 1);
-  EXPECT_EQ(std::string(loadTask(1)->Command).size(), 12285U);
+  EXPECT_EQ(save(taskText({{"cmd", longest + "="}})), 1);
+  EXPECT_EQ(std::string(loadTask(1)->Command).size(), 12287U);
+}
+
+TEST_F(TaskFromJsonTest, EveryCommandThatIsStoredCanBeSavedBack) {
+  for (const size_t size : {1U, 12284U, 12285U, 12286U, 12287U, 12288U, 13000U}) {
+    SCOPED_TRACE(size);
+    const long id = saveTask(makeTask("long", std::string(size, 'c')));
+    const std::string stored = loadTask(id)->Command;
+    EXPECT_EQ(stored.size(), std::min(size, size_t{12287}));
+    EXPECT_EQ(save(jsonOf(id)), id);
+    EXPECT_EQ(std::string(loadTask(id)->Command), stored);
+  }
 }
 
 TEST_F(TaskFromJsonTest, BytesThatAreNotUtf8AreSavedAsTheyAre) {
@@ -424,8 +475,15 @@ TEST_F(TaskFromJsonTest, AFailedAllocationOfTheHashIsReported) {
   ZELOSchedTaskFree(ZELOSchedTaskAlloc());
   const unsigned forTheTask = support::callCount("QLIBCSzHashAlloc");
   support::resetFailingCalls();
-  failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1});
-  expectRefused(taskText(), "Out of memory");
+  for (const std::string &text : {taskText(), std::string("{}")}) {
+    support::resetFailingCalls();
+    failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1});
+    expectRefused(text, "Out of memory");
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+  }
+  support::resetFailingCalls();
+  failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1, .times = support::kAlways});
+  expectNotJson("not JSON");
 }
 
 TEST_F(TaskFromJsonTest, AValueThatCannotBeSetIsReported) {
@@ -443,6 +501,13 @@ TEST_F(TaskFromJsonTest, AFailedCreationIsReportedWithTheId) {
   EXPECT_EQ(errorRecord(), (ErrorRecord{support::kFakeError, support::kFakeFile}));
 }
 
+TEST_F(TaskFromJsonTest, ACreationThatAnswersMoreThanZeroGivesTheId) {
+  FakeBackends fakes(1);
+  fakes[0].create = 3;
+  EXPECT_EQ(save(taskText({{"id", "5"}}), 1), 5);
+  EXPECT_EQ(logged(), Lines{});
+}
+
 TEST_F(TaskFromJsonTest, AFailedOverwritingIsReportedWithTheId) {
   FakeBackends fakes(1);
   fakes[0].get_by_id = 1;
@@ -454,6 +519,7 @@ TEST_F(TaskFromJsonTest, AFailedOverwritingIsReportedWithTheId) {
     fakes[0].edit = result;
     EXPECT_EQ(save(text), -1);
     EXPECT_EQ(logged().back(), std::string(kUnit) + "overwrite failed, task=5");
+    EXPECT_EQ(errorRecord(), (ErrorRecord{support::kFakeError, support::kFakeFile}));
   }
 }
 

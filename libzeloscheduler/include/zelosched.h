@@ -238,7 +238,8 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
 
 /* Saves the task that a JSON text in that form describes. With `create` 0 it
  * overwrites the stored task of its id when that has the same app and name; in
- * every other case, and always with `create` not 0, it becomes a new task. Keys
+ * every other case, and always with `create` not 0, it becomes a new task, which
+ * the crontab backend keeps also when the text was made of a power task. Keys
  * that are missing have the defaults of the hash form; of a member given twice
  * the last counts; members that are no key of a task are passed over.
  *
@@ -253,7 +254,9 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
  * The id of the saved task (0 or more), or -1: no code of its own for a null or
  * empty text or one that cannot be read, else what the callee left. An object
  * without members saves nothing and gives the id of a new record, which is -1,
- * without a log line. */
+ * without a log line. Looking for the stored task of an id that nobody has, as
+ * that of a new task is, leaves a log line and 0x2000 also where a new task is
+ * then created. */
 ZELO_SCHED_API int ZELOSchedTaskSaveFromJson(const char *szJson, int create);
 
 /* ---- enumerations ----------------------------------------------------------- */
