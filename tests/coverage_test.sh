@@ -26,7 +26,7 @@ build() {
 run_tests() {
   local log=$COVERED/tests.log
   local -a names
-  mapfile -t names < <(awk '$1 == "gtest" && !/zelosched_/ { print $2 }' "$BUILD_DIR/test-programs")
+  mapfile -t names <<<"$(awk '$1 == "gtest" && !/zelosched_/ { print $2 }' "$BUILD_DIR/test-programs")"
   TEST_RESULTS=$COVERED/test-results PROGRAMS_AT_ONCE=1 GCOV_ERROR_FILE=/dev/null \
     LD_LIBRARY_PATH=$COVERED/lib "$root/scripts/run-tests" "${names[@]}" >"$log" 2>&1 ||
     { sed -n '/^FAILED/,/^ok/p' "$log"; tail -1 "$log"; return 1; }

@@ -31,7 +31,7 @@ programs() {
 run_tests() {
   local log=$SANITIZED/tests.log
   local -a names
-  mapfile -t names < <(programs)
+  mapfile -t names <<<"$(programs)"
   BUILD_DIR=$SANITIZED PROGRAMS_AT_ONCE=1 UBSAN_OPTIONS=print_stacktrace=1 \
     ASAN_OPTIONS=verify_asan_link_order=0:detect_stack_use_after_return=1 \
     "$root/scripts/run-tests" "${names[@]}" >"$log" 2>&1 ||

@@ -10,12 +10,13 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 . "$here/support/shell_test.sh"
 
 cd "$here/.."
-mapfile -t units < <(find libzeloscheduler platform tools -name '*.cpp' | sort)
-mapfile -t formatted < <(find libzeloscheduler platform tools tests bench examples fuzz \
-  \( -name '*.cpp' -o -name '*.h' -o -name '*.c' \) -not -path 'fuzz/corpus/*' | sort)
-mapfile -t scripts < <(grep -lrE --include='*.sh' '^#!/bin/(ba)?sh' tests packaging | sort
+# Here-strings, as a chroot without /proc has no /dev/fd.
+mapfile -t units <<<"$(find libzeloscheduler platform tools -name '*.cpp' | sort)"
+mapfile -t formatted <<<"$(find libzeloscheduler platform tools tests bench examples fuzz \
+  \( -name '*.cpp' -o -name '*.h' -o -name '*.c' \) -not -path 'fuzz/corpus/*' | sort)"
+mapfile -t scripts <<<"$(grep -lrE --include='*.sh' '^#!/bin/(ba)?sh' tests packaging | sort
   find scripts .ci -type f | sort
-  find debian -name '*.postinst' -o -name '*.p*rm' | sort)
+  find debian -name '*.postinst' -o -name '*.p*rm' | sort)"
 
 have() {
   command -v "$1" >/dev/null || { skip "$2" "$1 is not installed"; return 1; }

@@ -62,15 +62,16 @@ class SectionName {
 };
 
 // "/tmp" is everybody's: a file there is ours only when nobody else made it and nobody else can
-// write to it. A link is judged by who made the link.
+// write to it. A link is judged by who made the link; a file with a second name may be any file of
+// root's, which would be shown to all and written over.
 bool isForeign(const char *szPath) {
   struct stat info = {};
   if (lstat(szPath, &info) != 0) {
     return false;
   }
   const bool isOurs = info.st_uid == 0 || info.st_uid == geteuid();
-  const bool isShared = S_ISREG(info.st_mode) && (info.st_mode & (S_IWGRP | S_IWOTH)) != 0;
-  return !isOurs || isShared;
+  const bool isShared = (info.st_mode & (S_IWGRP | S_IWOTH)) != 0 || info.st_nlink > 1;
+  return !isOurs || (S_ISREG(info.st_mode) && isShared);
 }
 
 // ---- reading the store --------------------------------------------------------------------------
