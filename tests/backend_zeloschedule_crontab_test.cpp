@@ -156,6 +156,24 @@ TEST_F(CrontabTest, EachTypeHasItsDayFields) {
   }
 }
 
+// A text with a line feed would else be a line of its own, which cron starts as root.
+TEST_F(CrontabTest, NoTextOfATaskReachesTheCrontab) {
+  create([](ZELO_SCHED_TASK *task) {
+    const std::string hostile = "\n* * * * * root /bin/hostile\n";
+    setText(task->Name, hostile);
+    setText(task->App, hostile);
+    setText(task->AppName, hostile);
+    setText(task->AppArgs, hostile);
+    setText(task->Action, hostile);
+    setText(task->Command, hostile);
+    setText(task->EditForm, hostile);
+    setText(task->EditDialog, hostile);
+    task->Type = ZELO_SCHED_TYPE_WEEKLY;
+    setText(task->Week, "\n* * *");
+  });
+  EXPECT_EQ(crontabLines(), Lines{"0\t0\t*\t*\t0,1,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=1"});
+}
+
 TEST_F(CrontabTest, RepeatedHoursAreListedUpToTheLast) {
   struct {
     uint32_t first;

@@ -349,7 +349,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
     long result = 0;
     std::string failed;
     {
-      const FailingStep failing(nth, onwards);
+      const FailingStep failing(nth, onwards, error_);
       result = GetParam().act();
       failed = failing.failed();
     }
@@ -427,6 +427,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
     return true;
   }
 
+  int error_ = EIO;
   Files before_;
   Files after_;
   std::set<std::string> temporary_;
@@ -446,6 +447,19 @@ TEST_P(FailingStepsTest, WhicheverCallFails) {
     points = nth - 1;
   }
   printf("%-32s %u points of failure\n", GetParam().name, points);
+}
+
+// A full disk, a spent quota and a file system that has become read-only. (The one above is the
+// disk that fails.)
+TEST_P(FailingStepsTest, WhicheverCallFindsNoRoom) {
+  for (const int error : {ENOSPC, EDQUOT, EROFS}) {
+    SCOPED_TRACE(strerrorname_np(error));
+    error_ = error;
+    for (const bool onwards : {false, true}) {
+      for (unsigned nth = 1; !step(nth, onwards).empty() && !HasFailure(); ++nth) {
+      }
+    }
+  }
 }
 
 INSTANTIATE_TEST_SUITE_P(Each, FailingStepsTest, testing::ValuesIn(kScenarios),

@@ -7,6 +7,7 @@
 
 #include "captured_log.h"
 #include "failing_calls.h"
+#include "power.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
 
@@ -206,6 +207,34 @@ TEST_F(TaskToJsonTest, AShortageOfMemoryForHashOrListIsReported) {
   }
 }
 
+TEST_F(TaskToJsonTest, AShortageOfMemoryForTheTextIsReported) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  Task task = namedTask("long");
+  setText(task->AppArgs, std::string(sizeof(task->AppArgs), '\x01'));
+  constexpr size_t kMoreThanTheHashTakes = 40000;
+  Buffer buffer(kSmallest);
+  int result = 0;
+  {
+    support::FailingAllocation scope("malloc", {.minSize = kMoreThanTheHashTakes});
+    result = ZELOSchedTaskConvertToJson(task.get(), buffer.data(), buffer.size());
+  }
+  expectRefused(result, buffer, Lines{std::string(kUnit) + "Out of memory"});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+}
+
+// Nothing else here takes so much: the hash need not grow while it is filled.
+TEST_F(TaskToJsonTest, TheHashHasRoomFor512KeysFromTheStart) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  const Task task = namedTask("a");
+  Buffer buffer(kSmallest);
+  int result = 0;
+  {
+    support::FailingAllocation scope("malloc", {.minSize = 512 * sizeof(char *)});
+    result = ZELOSchedTaskConvertToJson(task.get(), buffer.data(), buffer.size());
+  }
+  expectRefused(result, buffer, Lines{std::string(kUnit) + "Out of memory"});
+}
+
 TEST_F(TaskToJsonTest, AFailureToMakeTheHashFormIsReportedAfterItsOwnLine) {
   const Task task = namedTask("a");
   failCall("SzBase64EncodeFull", {.code = 0x0D00});
@@ -234,6 +263,15 @@ TEST_F(TaskToJsonTest, AStoredTaskIsConvertedByItsId) {
   EXPECT_EQ(std::string(buffer.data()), jsonOf(task));
   EXPECT_TRUE(contains(buffer.data(), R"("id":"\"1\"\n")"));
   EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(TaskToJsonTest, APowerTaskIsConvertedLikeAnyOther) {
+  support::haveClock();
+  support::setPowerList(support::kOn, {{1, 127, 5, 7}});
+  Buffer buffer(kSmallest);
+  EXPECT_EQ(ZELOSchedTaskConvertToJsonById(71270507, buffer.data(), buffer.size()), 0);
+  EXPECT_TRUE(contains(buffer.data(), R"("app args":"\"poweron\"\n")")) << buffer.data();
+  EXPECT_TRUE(contains(buffer.data(), R"("id":"\"71270507\"\n")")) << buffer.data();
 }
 
 TEST_F(TaskToJsonTest, ByIdANullBufferANegativeIdAndASmallSizeAreRefused) {
@@ -266,6 +304,7 @@ TEST_F(TaskToJsonTest, AnIdOfMoreThan32BitsIsAnother) {
   saveTask(namedTask("stored"));
   Buffer buffer(kSmallest);
   EXPECT_EQ(ZELOSchedTaskConvertToJsonById((1L << 32) + 1, buffer.data(), buffer.size()), -1);
+  ASSERT_FALSE(logged().empty());
   EXPECT_EQ(logged().back(), std::string(kUnit) + "cannot get scheduler task, id=4294967297");
   EXPECT_TRUE(buffer.isUntouched());
 }

@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <filesystem>
 #include <string>
 #include <utility>
 #include <vector>
@@ -206,6 +205,8 @@ TEST_F(TaskFromJsonTest, NameAndAppAreComparedToTheirEnds) {
   ASSERT_EQ(save(taskText({{"name", "a long name"}, {"app", "a long app"}})), 1);
   EXPECT_EQ(save(taskText({{"id", "1"}, {"name", "a long name 2"}, {"app", "a long app"}})), 2);
   EXPECT_EQ(save(taskText({{"id", "1"}, {"name", "a long name"}, {"app", "a long ap"}})), 3);
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"name", "a long nam"}, {"app", "a long app"}})), 4);
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"name", "a long name"}, {"app", "a long app 2"}})), 5);
 }
 
 TEST_F(TaskFromJsonTest, AnIdThatIsNotStoredIsCreated) {
@@ -238,14 +239,32 @@ TEST_F(TaskFromJsonTest, APowerTaskIsOverwrittenInItsPlaceOrBecomesAnOrdinaryTas
   constexpr long kFirst = 71270507;
   const std::string text = jsonOf(kFirst);
   EXPECT_NE(text.find(R"("app args":"\"poweron\"\n")"), std::string::npos) << text;
-  EXPECT_EQ(save(text), kFirst);
-  EXPECT_EQ(support::powerList(support::kOn).size(), 2U);
+  const std::string enabled = R"("state":"\"enabled\"\n")";
+  std::string changed = text;
+  ASSERT_NE(text.find(enabled), std::string::npos) << text;
+  changed.replace(text.find(enabled), enabled.size(), R"("state":"\"disabled\"\n")");
+  EXPECT_EQ(save(changed), kFirst);
+  EXPECT_EQ(support::powerList(support::kOn), (support::Entries{{0, 127, 5, 7}, {1, 127, 6, 8}}));
   EXPECT_FALSE(support::fileExists(support::kStore));
   EXPECT_EQ(save(text, 1), 1);
   EXPECT_EQ(loadTask(1)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
   EXPECT_STREQ(loadTask(1)->Command, "");
   EXPECT_EQ(support::powerList(support::kOn).size(), 2U);
-  std::filesystem::remove_all(support::kPowerSchedule);
+}
+
+// What a backend leaves alone must not look like what is stored.
+TEST_F(TaskFromJsonTest, TheStoredTaskIsReadIntoAZeroFilledRecord) {
+  const FakeBackends fakes(1);
+  static bool wasZeroFilled;
+  wasZeroFilled = false;
+  SchedBackends[0].get_by_id = [](long, ZELO_SCHED_TASK *stored) {
+    const auto *bytes = reinterpret_cast<const char *>(stored);
+    wasZeroFilled =
+        std::all_of(bytes, bytes + sizeof(*stored), [](char byte) { return byte == 0; });
+    return 0;
+  };
+  EXPECT_EQ(save(taskText({{"id", "5"}})), 5);
+  EXPECT_TRUE(wasZeroFilled);
 }
 
 TEST_F(TaskFromJsonTest, AnEmptyObjectSavesNothingAndGivesTheIdOfANewRecord) {
@@ -484,6 +503,35 @@ TEST_F(TaskFromJsonTest, AFailedAllocationOfTheHashIsReported) {
   support::resetFailingCalls();
   failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1, .times = support::kAlways});
   expectNotJson("not JSON");
+}
+
+TEST_F(TaskFromJsonTest, AShortageOfMemoryForTheTextIsReported) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  constexpr size_t kBlanks = size_t{1} << 20;
+  const std::string text = taskText() + std::string(kBlanks, ' ');
+  int result = 0;
+  {
+    support::FailingAllocation scope("malloc", {.minSize = kBlanks});
+    result = save(text);
+  }
+  EXPECT_EQ(result, -1);
+  EXPECT_EQ(logged(), Lines{std::string(kUnit) + "Out of memory"});
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+  EXPECT_FALSE(support::fileExists(support::kStore));
+}
+
+// Nothing else here takes so much: the hash need not grow while it is filled.
+TEST_F(TaskFromJsonTest, TheHashHasRoomFor512KeysFromTheStart) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  const FakeBackends fakes(1);
+  const std::string text = taskText({{"id", "5"}});
+  int result = 0;
+  {
+    support::FailingAllocation scope("malloc", {.minSize = 512 * sizeof(char *)});
+    result = save(text);
+  }
+  EXPECT_EQ(result, -1);
+  EXPECT_EQ(logged(), Lines{std::string(kUnit) + "Out of memory"});
 }
 
 TEST_F(TaskFromJsonTest, AValueThatCannotBeSetIsReported) {

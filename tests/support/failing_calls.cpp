@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <grp.h>
 #include <pwd.h>
+#include <signal.h>
 #include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -151,6 +152,8 @@ struct Step {
   std::atomic<size_t> failed;  // the first that did, plus one
   unsigned nth;
   bool onwards;
+  bool kills;
+  int error;
   Plan plan;  // stands for none of its own
 };
 
@@ -238,7 +241,7 @@ bool canFail(Call call) {
 
 int errorOf(Call call) {
   if (isAllocation(call)) return ENOMEM;
-  return call == Call::k_fork ? EAGAIN : EIO;
+  return call == Call::k_fork ? EAGAIN : state().step.error;
 }
 
 // Whether the step that stands is at this call.
@@ -247,6 +250,7 @@ bool fallsOn(Call call) {
   if (!step.stands || OwnWork::isGoingOn() || !canFail(call)) return false;
   const unsigned seen = ++step.seen;
   if (step.onwards ? seen < step.nth : seen != step.nth) return false;
+  if (step.kills) kill(0, SIGKILL);
   size_t none = 0;
   step.failed.compare_exchange_strong(none, static_cast<size_t>(call) + 1);
   errno = errorOf(call);
@@ -403,15 +407,21 @@ FailingAllocation::~FailingAllocation() {
   }
 }
 
-FailingStep::FailingStep(unsigned nth, bool onwards) {
+FailingStep::FailingStep(unsigned nth, bool onwards, int error) {
   Step &step = state().step;
   step.seen = 0;
   step.failed = 0;
   step.nth = nth;
   step.onwards = onwards;
-  step.plan.error = EIO;
+  step.kills = false;
+  step.error = error;
+  step.plan.error = error;
   allocationPlanned = true;
   step.stands = true;
+}
+
+KillingStep::KillingStep(unsigned nth) : FailingStep(nth, false, EIO) {
+  state().step.kills = true;
 }
 
 FailingStep::~FailingStep() {
@@ -970,7 +980,9 @@ void *realloc(void *memory, size_t size) noexcept {
 // ---- the build that counts what is run
 
 // Called by its libraries around the writing of the counts.
-void zelo_tests_let_be(int begin) { support::countsAreWritten = begin != 0; }
+void zelo_tests_let_be(int begin) {
+  support::countsAreWritten = begin != 0;
+}
 
 // ---- SQLite
 

@@ -33,6 +33,7 @@
 // handle with a message, as the real one does.
 #pragma once
 
+#include <cerrno>
 #include <cstddef>
 #include <functional>
 #include <optional>
@@ -94,12 +95,19 @@ class FailingAllocation {
 //   step.failed();   "rename"; "" when there were fewer calls
 class FailingStep {
  public:
-  FailingStep(unsigned nth, bool onwards);
+  // What a call reports that has no error of its own, as short memory has.
+  FailingStep(unsigned nth, bool onwards, int error = EIO);
   ~FailingStep();
   FailingStep(const FailingStep &) = delete;
   FailingStep &operator=(const FailingStep &) = delete;
 
   std::string failed() const;
+};
+
+// As FailingStep, but before the nth call the whole process group is killed.
+class KillingStep : public FailingStep {
+ public:
+  explicit KillingStep(unsigned nth);
 };
 
 // What is called while one stands is the test's own, and neither fails nor counts in a FailingStep.
