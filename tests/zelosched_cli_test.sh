@@ -277,6 +277,11 @@ there is no task 7|enable 7
 there is no task 7|remove --yes 7
 the hour 24 is none of a day|power add on --daily 24:00
 needs a day of the week|power add off --weekly none 08:30
+the start date 2027-13-01 does not exist|add --daily 08:30 --start 2027-13-01 -- true
+the start date 2027-02-31 does not exist|add --weekly mon 08:30 --start 2027-02-31 -- true
+the start date 2027-02-31 does not exist|add --monthly 31 08:30 --start 2027-02-31 -- true
+the name has a line feed|add --name $'a\nb' --daily 08:30 -- true
+the action has a line feed|edit 1 --action $'a\nb'
 LINES
   return "$bad"
 }
@@ -289,12 +294,55 @@ refuses_import_as_a_whole() {
   for edit in 's/"run hour":8/"run hour":24/' 's/"state":"enabled"/"state":"asleep"/' \
     's/"name":"kept",//' 's/"run min":30/"run min":"x"/' 's/"run min":30/"run min":3.5/' \
     's/"owner":0/"owner":4000000000/' 's/"app":""/"app":"'\''"/' 's/"name":"kept"/"name":[]/' \
-    's/"name":"kept"/"name":"a\\u0000b"/' 's/"week":"1111111"/"week":"11111111"/'; do
+    's/"name":"kept"/"name":"a\\u0000b"/' 's/"week":"1111111"/"week":"11111111"/' \
+    's/"owner":0/"owner":4294967296/' 's/"id":1/"id":4294967297/' 's/"run hour":8/"run hour":4294967304/' \
+    's/"start year":0/"start year":4294969323/' 's/"owner":0/"owner":-1/' 's/"start day":0/"start day":32/' \
+    's/"name":"kept"/"name":"a\\nb"/' 's/"cmd":"true"/"cmd":" "/' 's/"cmd":"true"/"cmd base64":"AA=="/' \
+    's/"cmd":"true"/"cmd":"true","cmd base64":"dHJ1ZQ=="/' "s/\"cmd\":\"true\"/\"cmd\":\"$(printf %012288d 0)\"/" \
+    's/"type":"daily"/"type":"once"/;s/"start day":0,//' 's/"type":"daily"/"type":"weekly"/;s/,"week":"1111111"//'; do
     { echo "[$(sed '1d;$d' "$SCRATCH/tasks"),"; sed '1d;$d' "$SCRATCH/tasks" | sed "$edit"; echo "]"; } >"$SCRATCH/bad"
     leaves_all_as_it_was z import "$SCRATCH/bad" || { echo "saved: $edit"; bad=1; }
     [[ $err == *"object 2 of 2: "*"nothing was imported: 1 object of 2"* ]] || { echo "$edit: $err"; bad=1; }
   done
   return "$bad"
+}
+
+imports_power_times_whole_or_not_at_all() {
+  clean
+  z power add on --daily 07:00 >/dev/null && z power add off --daily 23:00 >/dev/null
+  z export >"$SCRATCH/power"
+  local edit bad=0
+  add --daily 08:30 -- true >/dev/null
+  for edit in '' 's/"run hour":7/"run hour":6/;s/"app args":"poweroff"/"app args":"sideways"/' \
+    's/"run hour":7/"run hour":6/;s/"run hour":23/"run hour":6/;s/poweroff/poweron/'; do
+    { echo "[$(z export 1 | sed '1d;$d'),"; sed '1d;$d' "$SCRATCH/power" | sed "$edit"; echo "]"; } >"$SCRATCH/bad"
+    local before
+    before=$(z list | sort)
+    try z import --new "$SCRATCH/bad"
+    [[ $status == 1 && $err == *"nothing was imported"* && $(z list | sort) == "$before" ]] ||
+      { echo "$edit: $status $out $err"; bad=1; }
+  done
+  sed '1d;$d' "$SCRATCH/power" | grep poweron | sed 's/,$//' >"$SCRATCH/on"
+  { echo "["; for i in {1..104}; do sed "s/\"run hour\":7/\"run hour\":$((i / 60))/;s/\"run min\":0/\"run min\":$((i % 60))/" "$SCRATCH/on"; echo ","; done; cat "$SCRATCH/on"; echo "]"; } |
+    tr '\n' ' ' >"$SCRATCH/many"
+  fails_saying 1 "no more are shown" z import --new "$SCRATCH/many" || bad=1
+  return "$bad"
+}
+
+imports_to_the_end_when_the_reader_is_gone() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  { echo "["; for i in {1..60}; do z export 1 | sed '1d;$d'; echo ","; done; z export 1 | sed '1d;$d'; echo "]"; } >"$SCRATCH/many"
+  { z import --new "$SCRATCH/many" 2>/dev/null || true; } | true
+  same "$(task_lines)" 62
+}
+
+an_empty_import_is_told() {
+  clean
+  fails_saying 1 "it holds no task" z import /dev/null && echo "[]" >"$SCRATCH/no_task" &&
+    gives 0 "there is no task to import" import "$SCRATCH/no_task" &&
+    printf '[{"a":1},\n{"b":2},\n{"c":}]\n' >"$SCRATCH/broken" &&
+    fails_saying 1 "it is no JSON: Line 3" z import "$SCRATCH/broken"
 }
 
 imports_what_it_exports() {
@@ -339,6 +387,89 @@ twenty_at_once() {
   for i in {1..20}; do z disable "$i" >/dev/null & done
   wait
   same "$(z list --json --enabled)" "$(printf '[\n]')"
+}
+
+# The crontab that works is better than one that cron may pass over.
+writes_no_line_that_cron_cannot_read() {
+  all_well
+  add --daily 09:30 -- true >/dev/null
+  sed -i '0,/^run hour=.*/s//run hour="25"/' "$STORE"
+  local before
+  before=$(cat /etc/crontab)
+  fails_saying 1 "the hour 25 is none of a day" z sync && same "$(cat /etc/crontab)" "$before" &&
+    sed -i '/zeloschedtask/d' /etc/crontab && try z status &&
+    [[ $out == *"once no task has a field that cron cannot read"* ]]
+}
+
+tells_of_a_clock_that_is_not_armed() {
+  all_well
+  local alarm=/sys/class/rtc/rtc0/wakealarm result=0
+  z power add on --daily 07:00 >/dev/null && try z status && [[ $out != *"not armed for"* ]] || return 1
+  : >"$alarm"
+  try z status
+  [[ $out == *"WRONG  the machine's clock is not armed for the next power-on time"* ]] || result=1
+  rm "$alarm"
+  try z status
+  [[ $out == *"WRONG  the machine has no clock that could be armed"* ]] || result=1
+  fails_saying_of_all "the machine has no clock" z sync || result=1
+  touch "$alarm"
+  gives 0 "the crontab is in step with the tasks" sync && return "$result"
+}
+
+# Of one that does some of its work.
+fails_saying_of_all() {
+  local part=$1
+  shift
+  try "$@"
+  [[ $status == 1 && $err == *"$part"* ]] || { echo "$status: $out$err"; return 1; }
+}
+
+nothing_but_what_was_shown_is_removed() {
+  clean
+  add --daily 08:30 --name first -- true >/dev/null
+  add --daily 09:30 --name shown -- true >/dev/null
+  python3 - "$ZELOSCHED" >"$SCRATCH/log" <<'PTY'
+import os, pty, subprocess, sys
+zelosched = sys.argv[1]
+pid, terminal = pty.fork()
+if pid == 0:
+    os.execv(zelosched, [zelosched, "remove", "2"])
+seen = b""
+while b"[y/N]" not in seen:
+    seen += os.read(terminal, 1024)
+subprocess.run([zelosched, "remove", "--yes", "2"], check=True)
+subprocess.run([zelosched, "add", "--daily", "10:30", "--name", "precious", "--", "true"], check=True)
+os.write(terminal, b"y\n")
+try:
+    while chunk := os.read(terminal, 1024):
+        seen += chunk
+except OSError:
+    pass
+print(seen.decode(), os.waitstatus_to_exitcode(os.waitpid(pid, 0)[1]))
+PTY
+  grep -q "stays: it has been changed meanwhile" "$SCRATCH/log" &&
+    same "$(z list --json | json '[t["name"] for t in tasks]')" "['first', 'precious']"
+}
+
+next_of_several_tells_what_is_missing() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  try z next 1 99
+  [[ $status == 1 && $out == *"Task 1"* && $err == *"there is no task 99"* ]]
+}
+
+next_of_many_is_quick() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  { echo "["; for i in {1..400}; do z export 1 | sed "1d;\$d;s/\"run min\":30/\"run min\":$((i % 60))/"; echo ","; done; z export 1 | sed '1d;$d'; echo "]"; } >"$SCRATCH/many"
+  z import --new "$SCRATCH/many" >/dev/null
+  same "$(timeout 20 "$ZELOSCHED" next --count 10000 --json | json 'len(tasks)')" 10000 &&
+    same "$("$ZELOSCHED" next --count 5 --json | json '[t["run"][11:13] for t in tasks]')" "['08', '08', '08', '08', '08']"
+}
+
+a_minute_that_never_comes_is_told() {
+  TZ=CET-1CEST,M3.5.0,M10.5.0/3 fails_saying 1 "does not come, as the clocks go forward" \
+    z add --once 2099-03-29T02:30 -- true
 }
 
 # ---- looking --------------------------------------------------------------------------------
@@ -580,6 +711,7 @@ ok     /tmp/zeloschedtask is there, and root's
 ok     the working and the persistent copy of the tasks agree
 ok     the crontab is in step with the tasks
 ok     no enabled task has a fault
+ok     no power-on time waits for a clock that is not armed
 ok     no task is running
 ok     no run was missed" status
 }
@@ -639,7 +771,7 @@ a_bad_task_does_not_hide_the_others() {
 syncs() {
   all_well
   cp "$SCRATCH/crontab" /etc/crontab
-  gives 0 "the crontab and the power times are in step with the tasks" sync && same "$(task_lines)" 1
+  gives 0 "the crontab is in step with the tasks" sync && same "$(task_lines)" 1
 }
 
 tells_of_a_crontab_that_cannot_be_written() {
@@ -699,6 +831,9 @@ other_users_see_but_do_not_change() {
   chmod 0755 "$SCRATCH"
   same "$("${nobody[@]}" list | tail -1 | awk '{ print $1, $7 }')" "1 ?" &&
     fails_saying 1 "changing tasks takes root's rights" "${nobody[@]}" add --daily 08:30 -- true &&
+    rm -rf /tmp/sched_status.sqlite* /tmp/lock &&
+    fails_saying 1 "running tasks takes root's rights" "${nobody[@]}" run 1 &&
+    [[ ! -e /tmp/sched_status.sqlite && ! -e /tmp/lock ]] && z run --wait 1 >/dev/null &&
     fails_saying 1 "that takes root's rights" "${nobody[@]}" history
 }
 
@@ -725,11 +860,11 @@ waiting_for_the_lock_ends() {
 import_tells_what_it_cannot_read() {
   all_well
   echo '{"a":' >"$SCRATCH/broken"
-  fails_saying 1 "line 1 is no JSON object" z import "$SCRATCH/broken" &&
+  fails_saying 1 "it is no JSON: Line 2, Column 1" z import "$SCRATCH/broken" &&
     fails_saying 1 "cannot open $SCRATCH/none: No such file" z import "$SCRATCH/none" &&
     fails_saying 1 "cannot read $SCRATCH: Is a directory" z import "$SCRATCH" &&
     { head -c 5000 /dev/zero | tr '\0' '['; } >"$SCRATCH/deep" &&
-    fails_saying 1 "is no JSON object" z import "$SCRATCH/deep" &&
+    fails_saying 1 "it is no JSON: " z import "$SCRATCH/deep" &&
     echo '[1]' >"$SCRATCH/number" && fails_saying 1 "it is no JSON object" z import "$SCRATCH/number"
 }
 
@@ -832,6 +967,13 @@ check "what the application forbids takes --force" respects_the_application
 check "an unknown id does not keep the others from being done" does_the_others
 check "what would do harm is refused and changes nothing" refuses
 check "an import with one bad task changes nothing" refuses_import_as_a_whole
+check "nor does one with a power time that has no room" imports_power_times_whole_or_not_at_all
+check "an import goes on when its reader is gone" imports_to_the_end_when_the_reader_is_gone
+check "an import without tasks is told" an_empty_import_is_told
+check "a minute that never comes is told" a_minute_that_never_comes_is_told
+check "nothing but what was shown is removed" nothing_but_what_was_shown_is_removed
+check "of several tasks the missing ones are told" next_of_several_tells_what_is_missing
+check "the coming runs of many tasks are quick" next_of_many_is_quick
 check "both forms of an export are imported unchanged" imports_what_it_exports
 check "an import takes one object, or one a line" imports_one_object_or_lines
 check "the doubly encoded form is the library's" agrees_with_the_library_on_the_wire_form
@@ -862,6 +1004,8 @@ done
 check "a task with a fault can be disabled but not enabled" a_fault_can_be_disabled_but_not_enabled
 check "a task that cannot be read does not hide the others" a_bad_task_does_not_hide_the_others
 check "sync writes the crontab again" syncs
+check "but no line that cron cannot read" writes_no_line_that_cron_cannot_read
+check "a clock that is not armed is told" tells_of_a_clock_that_is_not_armed
 check "a crontab that cannot be written is told" tells_of_a_crontab_that_cannot_be_written
 check "the error record is told in words" tells_the_error_in_words
 check "a store that is not root's alone is refused" tells_of_a_store_that_cannot_be_written

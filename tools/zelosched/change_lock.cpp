@@ -1,6 +1,7 @@
 #include "change_lock.h"
 
 #include <fcntl.h>
+#include <signal.h>
 #include <sys/file.h>
 #include <unistd.h>
 
@@ -35,6 +36,8 @@ int openLockFile() {
 }  // namespace
 
 ChangeLock::ChangeLock() : file_(openLockFile()) {
+  // A reader that goes away must not end us between two changes.
+  signal(SIGPIPE, SIG_IGN);
   const Clock::time_point start = Clock::now();
   bool isSaid = false;
   while (flock(file_, LOCK_EX | LOCK_NB) != 0) {

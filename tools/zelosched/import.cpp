@@ -9,6 +9,7 @@
 #include "failure.h"
 #include "json_out.h"
 #include "options.h"
+#include "power_room.h"
 #include "save.h"
 #include "task_check.h"
 #include "task_list.h"
@@ -45,11 +46,16 @@ std::string readAll(const std::string &path) {
   return text;
 }
 
+bool isBlank(const char *text) {
+  return text[std::strspn(text, " \t\r\n")] == '\0';
+}
+
 Task taskOf(const Json::Value &object) {
   Task task = std::make_unique<TaskRecord>();
   fillFromJson(object, task.get());
   const bool isPowerTime = std::strcmp(task->App, kPowerApp) == 0;
   task->Backend = isPowerTime ? ZELO_SCHED_BACKEND_AUTOPOWER : ZELO_SCHED_BACKEND_SCHEDULE;
+  if (!isPowerTime && isBlank(task->Command)) throw Failure("there is no command");
   requireHarmless(*task);
   return task;
 }
@@ -66,12 +72,16 @@ std::string orderOf(size_t index, size_t count) {
   return "object " + std::to_string(index + 1) + " of " + std::to_string(count);
 }
 
-// Nothing is saved unless every object is a task that may be saved.
-std::vector<Task> readTasks(const std::vector<Json::Value> &objects) {
+// Nothing is saved unless every object is a task that may be saved, beside the others of the file.
+std::vector<Task> readTasks(const std::vector<Json::Value> &objects, bool areNew) {
   std::vector<Task> tasks;
+  PowerRoom room;
   for (size_t i = 0; i < objects.size(); ++i) {
     try {
-      tasks.push_back(taskOf(objects[i]));
+      Task task = taskOf(objects[i]);
+      const bool isKnown = !areNew && isStored(*task);
+      if (isPower(*task) && !(isKnown && powerId(*task) == task->ID)) room.take(*task);
+      tasks.push_back(std::move(task));
     } catch (const Failure &failure) {
       complain(orderOf(i, objects.size()) + ": " + failure.what());
     }
@@ -100,8 +110,9 @@ int runImport(int argc, char **argv) {
   if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
   const std::vector<Json::Value> objects = parseObjects(readAll(arguments.operands().front()));
   const ChangeLock lock;
-  const std::vector<Task> tasks = readTasks(objects);
+  const std::vector<Task> tasks = readTasks(objects, arguments.has("new"));
   int status = kDone;
+  if (tasks.empty()) std::puts("there is no task to import");
   for (size_t i = 0; i < tasks.size(); ++i) {
     try {
       save(tasks[i].get(), arguments.has("new"));

@@ -4,6 +4,7 @@
 #include <zelosdk.h>
 
 #include <algorithm>
+#include <cstdint>
 #include <cstdio>
 #include <cstring>
 #include <memory>
@@ -11,6 +12,7 @@
 
 #include "failure.h"
 #include "options.h"
+#include "task_check.h"
 #include "text.h"
 
 namespace {
@@ -27,30 +29,43 @@ struct FreeList {
   void operator()(QLIBC_SZLIST *list) const { QLIBCSzListFree(list); }
 };
 
-// The keys whose values are numbers; each of the others is a text.
-constexpr std::string_view kNumberKeys[] = {
-    "id",
-    "can edit owner",
-    "can edit name",
-    "listable",
-    "can run from ui",
-    "can delete from ui",
-    "can edit from ui",
-    "can run app same time",
-    "can run task same time",
-    "simple edit form",
-    "owner",
-    "start year",
-    "start month",
-    "start day",
-    "run hour",
-    "run min",
-    "repeat hour",
-    "last work hour",
+// The keys whose values are numbers, with what their fields hold; each of the others is a text.
+struct NumberKey {
+  const char *key;
+  long least;
+  long most;
+};
+constexpr NumberKey signedKey(const char *key) {
+  return {key, INT32_MIN, INT32_MAX};
+}
+constexpr NumberKey unsignedKey(const char *key) {
+  return {key, 0, UINT32_MAX};
+}
+constexpr NumberKey kNumberKeys[] = {
+    signedKey("id"),
+    signedKey("can edit owner"),
+    signedKey("can edit name"),
+    signedKey("listable"),
+    signedKey("can run from ui"),
+    signedKey("can delete from ui"),
+    signedKey("can edit from ui"),
+    signedKey("can run app same time"),
+    signedKey("can run task same time"),
+    signedKey("simple edit form"),
+    unsignedKey("owner"),
+    unsignedKey("start year"),
+    unsignedKey("start month"),
+    unsignedKey("start day"),
+    unsignedKey("run hour"),
+    unsignedKey("run min"),
+    unsignedKey("repeat hour"),
+    unsignedKey("last work hour"),
 };
 
-bool isNumberKey(std::string_view key) {
-  return std::find(std::begin(kNumberKeys), std::end(kNumberKeys), key) != std::end(kNumberKeys);
+const NumberKey *numberKey(std::string_view key) {
+  const auto *found = std::find_if(std::begin(kNumberKeys), std::end(kNumberKeys),
+                                   [&](const NumberKey &known) { return known.key == key; });
+  return found != std::end(kNumberKeys) ? found : nullptr;
 }
 
 struct Pair {
@@ -136,6 +151,18 @@ bool isWireForm(const Json::Value &object) {
                      [&](const Json::Value &member) { return decodeTwice(member, &text); });
 }
 
+// One that does not fit would become another number: uid 0 of 4294967296.
+void requireNumber(const std::string &key, const std::string &text) {
+  const NumberKey *known = numberKey(key);
+  if (known == nullptr) return;
+  const std::optional<long> number = parseNumber(text);
+  if (!number) throw Failure("\"" + key + "\" is no whole number");
+  if (*number < known->least || *number > known->most) {
+    throw Failure("\"" + key + "\" is " + printable(text) + ", and must be from " +
+                  std::to_string(known->least) + " to " + std::to_string(known->most));
+  }
+}
+
 std::string memberText(const std::string &key, const Json::Value &member, bool isWire) {
   std::string text;
   if (isWire) {
@@ -150,10 +177,21 @@ std::string memberText(const std::string &key, const Json::Value &member, bool i
   if (text.find('\0') != std::string::npos) {
     throw Failure("\"" + printable(key) + "\" holds a zero byte");
   }
-  if (isNumberKey(key) && !parseNumber(text)) {
-    throw Failure("\"" + printable(key) + "\" is no whole number");
-  }
+  requireNumber(key, text);
   return text;
+}
+
+// Half a command is another command. What is no Base64 is left to the conversion.
+void requireWholeCommand(const std::string &encoded) {
+  std::string command(encoded.size() + 1, '\0');
+  size_t length = command.size();
+  if (ZELOEncodingBase64Decode(encoded.data(), encoded.size(), command.data(), &length) == 0)
+    return;
+  if (command.find('\0') < length) throw Failure("\"cmd\" holds a zero byte");
+  if (length > kMostCommandBytes) {
+    throw Failure("\"cmd\" is " + std::to_string(length) + " bytes long, and only " +
+                  std::to_string(kMostCommandBytes) + " can be stored: put it into a script");
+  }
 }
 
 struct Names {
@@ -202,12 +240,41 @@ void checkLength(const std::string &key, const std::string &text) {
 constexpr const char *kRequiredKeys[] = {"run hour", "run min", "name",  "app", "app name",
                                          "action",   "cmd",     "state", "type"};
 
-void checkRequired(PSZHASH hash) {
-  for (const char *key : kRequiredKeys) {
-    if (QLIBCSzHashGetValue(hash, key) == nullptr) {
-      throw Failure(std::string("\"") + key + "\" is missing");
-    }
+// What a schedule cannot do without; the library would take a default of its own.
+constexpr struct {
+  const char *type;
+  const char *key;
+} kScheduleKeys[] = {
+    {"once", "start year"},  {"once", "start month"},  {"once", "start day"},
+    {"weekly", "week"},      {"monthly", "start day"}, {"yearly", "start month"},
+    {"yearly", "start day"},
+};
+
+void require(PSZHASH hash, const char *key) {
+  if (QLIBCSzHashGetValue(hash, key) == nullptr) {
+    throw Failure(std::string("\"") + key + "\" is missing");
   }
+}
+
+void checkRequired(PSZHASH hash) {
+  for (const char *key : kRequiredKeys) require(hash, key);
+  const std::string type = QLIBCSzHashGetValue(hash, "type");
+  for (const auto &needed : kScheduleKeys) {
+    if (type == needed.type) require(hash, needed.key);
+  }
+}
+
+// "Line 3, Column 5: Missing ',' ..." of what the reader says in several lines.
+std::string firstError(const std::string &errors) {
+  std::istringstream lines(errors);
+  std::string where;
+  std::string what;
+  std::getline(lines, where);
+  std::getline(lines, what);
+  const size_t word = where.find_first_not_of("* ");
+  const size_t sentence = what.find_first_not_of(' ');
+  return (word == std::string::npos ? "" : where.substr(word)) +
+         (sentence == std::string::npos ? "" : ": " + what.substr(sentence));
 }
 
 }  // namespace
@@ -229,7 +296,7 @@ Json::Value jsonOf(const ZELO_SCHED_TASK &task) {
   Json::Value object(Json::objectValue);
   for (const Pair &pair : hashOf(task)) {
     if (pair.key == kCommandKey) continue;
-    if (isNumberKey(pair.key)) {
+    if (numberKey(pair.key) != nullptr) {
       object[pair.key] = Json::Int64(parseNumber(pair.value).value_or(0));
     } else {
       object[pair.key] = jsonText(pair.value);
@@ -263,8 +330,16 @@ void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task) {
     const std::string text = memberText(key, object[key], isWire);
     checkName(key, text);
     checkLength(key, text);
-    const bool isPlainCommand = !isWire && key == kCommandKey;
-    set(key == kCommandBase64Key ? kCommandKey : key, isPlainCommand ? base64(text) : text);
+    if (key != kCommandKey && key != kCommandBase64Key) {
+      set(key, text);
+      continue;
+    }
+    const std::string encoded = !isWire && key == kCommandKey ? base64(text) : text;
+    requireWholeCommand(encoded);
+    set(kCommandKey, encoded);
+  }
+  if (object.isMember(kCommandKey) && object.isMember(kCommandBase64Key)) {
+    throw Failure("give one of \"cmd\" and \"cmd base64\"");
   }
   checkRequired(hash.get());
   forgetError();
@@ -278,13 +353,20 @@ std::vector<Json::Value> parseObjects(const std::string &text) {
   const Json::Value whole = parse(text, &errors);
   if (whole.isArray()) return {whole.begin(), whole.end()};
   if (whole.isObject()) return {whole};
+  const std::string wholeError = firstError(errors);
+  const size_t first = text.find_first_not_of(" \t\r\n");
+  if (first == std::string::npos) throw Failure("it holds no task");
+  if (text[first] == '[') throw Failure("it is no JSON: " + wholeError);
   std::vector<Json::Value> objects;
   std::istringstream lines(text);
   std::string line;
   for (size_t number = 1; std::getline(lines, line); ++number) {
     if (line.find_first_not_of(" \t\r") == std::string::npos) continue;
     Json::Value object = parse(line, &errors);
-    if (!object.isObject()) throw Failure("line " + std::to_string(number) + " is no JSON object");
+    if (!object.isObject()) {
+      throw Failure(objects.empty() ? "it is no JSON: " + wholeError
+                                    : "line " + std::to_string(number) + " is no JSON object");
+    }
     objects.push_back(std::move(object));
   }
   return objects;

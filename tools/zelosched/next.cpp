@@ -6,6 +6,7 @@
 #include "coming_runs.h"
 #include "command.h"
 #include "failure.h"
+#include "for_each_id.h"
 #include "json_out.h"
 #include "options.h"
 #include "task_list.h"
@@ -27,36 +28,65 @@ struct Entry {
   }
 };
 
-void add(const ZELO_SCHED_TASK &task, const LocalMinute &now, size_t count,
-         std::vector<Entry> *entries) {
-  for (const LocalMinute &run : comingRuns(task, now, count)) {
-    entries->push_back({run, task.ID, task.Name});
+// The first runs of several tasks. Of a task that comes later, only those before the last of them
+// are worked out.
+class FirstRuns {
+ public:
+  FirstRuns(const LocalMinute &now, size_t count) : now_(now), count_(count) {}
+
+  void add(const ZELO_SCHED_TASK &task) {
+    const std::vector<LocalMinute> runs =
+        last_ ? runsBetween(task, now_, *last_) : comingRuns(task, now_, count_);
+    for (const LocalMinute &run : runs) entries_.push_back({run, task.ID, task.Name});
+    if (entries_.size() > 2 * count_) prune();
+  }
+
+  std::vector<Entry> take() {
+    prune();
+    return std::move(entries_);
+  }
+
+ private:
+  void prune() {
+    std::sort(entries_.begin(), entries_.end());
+    if (entries_.size() < count_) return;
+    entries_.erase(entries_.begin() + static_cast<long>(count_), entries_.end());
+    last_ = entries_.back().run;
+  }
+
+  LocalMinute now_;
+  size_t count_;
+  std::vector<Entry> entries_;
+  std::optional<LocalMinute> last_;
+};
+
+void addNamed(long id, FirstRuns *runs) {
+  const Task task = loadTask(id);
+  if (isEnabled(*task)) {
+    runs->add(*task);
+  } else {
+    complain(titleOf(*task) + " is disabled: it will not run");
   }
 }
 
-std::vector<Entry> entriesOf(const Arguments &arguments, size_t count) {
-  const LocalMinute now = localMinute(time(nullptr));
-  std::vector<Entry> entries;
-  if (arguments.operands().empty()) {
-    const TaskList list;
-    for (const ZELO_SCHED_TASK *task : list.tasks()) {
-      if (isEnabled(*task)) add(*task, now, count, &entries);
-    }
-  } else {
-    for (const long id : parseIds(arguments.operands())) {
-      const Task task = loadTask(id);
-      if (!isEnabled(*task)) complain(titleOf(*task) + " is disabled: it will not run");
-      if (isEnabled(*task)) add(*task, now, count, &entries);
-    }
+// Disabled tasks and those that are not there are told.
+int addTasks(const Arguments &arguments, FirstRuns *runs) {
+  if (!arguments.operands().empty()) {
+    return forEachId(parseIds(arguments.operands()), [&](long id) { addNamed(id, runs); });
   }
-  std::sort(entries.begin(), entries.end());
-  if (entries.size() > count)
-    entries.erase(entries.begin() + static_cast<long>(count), entries.end());
-  return entries;
+  const TaskList list;
+  for (const ZELO_SCHED_TASK *task : list.tasks()) {
+    if (isEnabled(*task)) runs->add(*task);
+  }
+  return kDone;
 }
 
 void print(const std::vector<Entry> &entries) {
   const size_t columns = terminalColumns().value_or(0);
+  size_t idWidth = 0;
+  for (const Entry &entry : entries) {
+    idWidth = std::max(idWidth, std::to_string(entry.id).size());
+  }
   std::string day;
   for (const Entry &entry : entries) {
     if (dayText(entry.run) != day) {
@@ -64,8 +94,10 @@ void print(const std::vector<Entry> &entries) {
       day = dayText(entry.run);
       std::printf("%s %s\n", day.c_str(), weekdayName(entry.run));
     }
-    const std::string line =
-        "  " + timeText(entry.run) + "  " + std::to_string(entry.id) + "  " + printable(entry.name);
+    const std::string id = std::to_string(entry.id);
+    const std::string line = "  " + timeText(entry.run) + "  " +
+                             std::string(idWidth - id.size(), ' ') + id + "  " +
+                             printable(entry.name);
     std::puts((columns == 0 ? line : fitted(line, columns)).c_str());
   }
 }
@@ -87,13 +119,15 @@ int runNext(int argc, char **argv) {
   arguments.requireNoCommand();
   const auto count =
       static_cast<size_t>(arguments.number("count", 1, kMostRuns).value_or(kUsualCount));
-  const std::vector<Entry> entries = entriesOf(arguments, count);
+  FirstRuns runs(localMinute(time(nullptr)), count);
+  const int status = addTasks(arguments, &runs);
+  const std::vector<Entry> entries = runs.take();
   if (arguments.has("json")) {
     printAsJson(entries);
   } else {
     print(entries);
   }
-  return kDone;
+  return status;
 }
 
 }  // namespace

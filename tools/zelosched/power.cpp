@@ -1,5 +1,4 @@
 // zelosched power
-#include <algorithm>
 #include <cstdio>
 #include <cstring>
 #include <ctime>
@@ -10,6 +9,7 @@
 #include "failure.h"
 #include "json_out.h"
 #include "options.h"
+#include "power_room.h"
 #include "remove.h"
 #include "save.h"
 #include "schedule_text.h"
@@ -19,12 +19,7 @@
 namespace {
 
 constexpr char kPowerApp[] = "ZELO.TOV.TaskScheduler.AutoPower";
-constexpr size_t kMostTimes = 100;  // of each list; the library shows no more
 constexpr char kNothing[] = "-";
-
-std::string directionOf(const ZELO_SCHED_TASK &task) {
-  return std::strcmp(task.AppArgs, "poweroff") == 0 ? "off" : "on";
-}
 
 // ---- list -----------------------------------------------------------------------------------
 
@@ -63,18 +58,6 @@ int runPowerList(int argc, char **argv) {
 
 // ---- add ------------------------------------------------------------------------------------
 
-void requireRoom(const ZELO_SCHED_TASK &task) {
-  const TaskList list;
-  const auto taken =
-      std::count_if(list.tasks().begin(), list.tasks().end(), [&](const ZELO_SCHED_TASK *other) {
-        return isPower(*other) && std::strcmp(other->AppArgs, task.AppArgs) == 0;
-      });
-  if (static_cast<size_t>(taken) >= kMostTimes) {
-    throw Failure("there are " + std::to_string(taken) + " power-" + directionOf(task) +
-                  " times already, and no more are shown: remove one first");
-  }
-}
-
 std::string direction(const Arguments &arguments) {
   const std::vector<std::string> &words = arguments.operands();
   if (words.size() != 1 || (words[0] != "on" && words[0] != "off")) {
@@ -101,7 +84,6 @@ int runPowerAdd(int argc, char **argv) {
   if (const auto text = arguments.value("daily")) setDaily(task.get(), *text);
   if (const auto text = arguments.value("weekly")) setWeekly(task.get(), *text);
   if (arguments.has("disabled")) task->State = ZELO_SCHED_STATE_DISABLED;
-  requireRoom(*task);
   createTask(task.get());
   if (arguments.has("quiet")) {
     std::printf("%d\n", task->ID);

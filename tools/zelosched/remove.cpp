@@ -8,6 +8,7 @@
 
 #include "change_lock.h"
 #include "for_each_id.h"
+#include "json_out.h"
 #include "options.h"
 #include "save.h"
 #include "task_list.h"
@@ -29,6 +30,13 @@ bool isConfirmed(const ZELO_SCHED_TASK &task) {
   return isYes(answer);
 }
 
+// The id may have been given to another task since.
+bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
+  Json::Value members[] = {jsonOf(one), jsonOf(other)};
+  for (Json::Value &object : members) object.removeMember("next trigger time");
+  return members[0] == members[1];
+}
+
 // The lock is not held while an answer is waited for.
 void removeOne(long id, const RemoveRules &rules) {
   const Task task = loadTask(id);
@@ -36,7 +44,9 @@ void removeOne(long id, const RemoveRules &rules) {
   requirePermission(*task, task->CanDeleteFromUI, "removed", rules.insists);
   if (!rules.isSure && !isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");
   const ChangeLock lock;
-  static_cast<void>(loadTask(id));
+  if (!isSame(*task, *loadTask(id))) {
+    throw Failure(titleOf(*task) + " stays: it has been changed meanwhile");
+  }
   removeTask(*task);
   std::printf("%s removed\n", titleOf(*task).c_str());
 }

@@ -19,6 +19,7 @@
 #include "place_file.h"
 #include "save.h"
 #include "store_files.h"
+#include "sync.h"
 #include "text.h"
 
 namespace {
@@ -207,12 +208,6 @@ void putProgramBack() {
 }
 
 // ---- all together -------------------------------------------------------------------------------
-
-void synchronise() {
-  forgetError();
-  if (ZELOSchedTaskSync() < 0) throw failedTo("write the tasks out");
-  requireCrontabInStep();
-}
 
 int runRestore(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);

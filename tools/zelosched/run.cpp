@@ -172,6 +172,8 @@ int runRun(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
   const std::vector<long> ids = parseIds(arguments.operands());
+  // What a plain user's run leaves in /tmp would be in the way of everybody's.
+  if (geteuid() != 0) throw Failure("running tasks takes root's rights");
   prctl(PR_SET_CHILD_SUBREAPER, 1);
   return forEachId(ids, [&](long id) { runOne(id, arguments); });
 }

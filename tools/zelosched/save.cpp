@@ -4,6 +4,7 @@
 
 #include "crontab_check.h"
 #include "failure.h"
+#include "power_room.h"
 #include "task_check.h"
 #include "task_list.h"
 #include "text.h"
@@ -11,30 +12,10 @@
 namespace {
 
 constexpr int kFlagYes = 1;
-constexpr char kDayOff = '0';
 
-// The library's rule; see zeloautopower_init.
-int32_t powerId(const ZELO_SCHED_TASK &task) {
-  constexpr int32_t kPowerOn = 60000000;
-  constexpr int32_t kPowerOff = 80000000;
-  constexpr int32_t kEnabled = 10000000;
-  constexpr int32_t kWeekdays = 10000;
-  constexpr int32_t kHour = 100;
-  constexpr int kDays = 7;
-  int32_t weekdays = 0;
-  for (int day = 0; day < kDays; ++day) {
-    if (task.Week[day] != kDayOff) weekdays |= 1 << day;
-  }
-  const int32_t base = std::strcmp(task.AppArgs, "poweroff") == 0 ? kPowerOff : kPowerOn;
-  return base + (isEnabled(task) ? kEnabled : 0) + weekdays * kWeekdays +
-         static_cast<int32_t>(task.RunHour) * kHour + static_cast<int32_t>(task.RunMin);
-}
-
-void requireNew(const ZELO_SCHED_TASK &task) {
-  const int32_t id = powerId(task);
-  if (id != task.ID && findTask(id) != nullptr) {
-    throw Failure("there is such a power time already: it is task " + std::to_string(id));
-  }
+// An entry that is edited into one like another would be one less.
+void requireUnlike(const ZELO_SCHED_TASK &task) {
+  if (powerId(task) != task.ID) PowerRoom().take(task);
 }
 
 bool isStored(long id) {
@@ -63,7 +44,7 @@ void requireHarmless(const ZELO_SCHED_TASK &task) {
 
 void createTask(ZELO_SCHED_TASK *task) {
   requireHarmless(*task);
-  if (isPower(*task)) requireNew(*task);
+  if (isPower(*task)) PowerRoom().take(*task);
   forgetError();
   if (ZELOSchedTaskCreate(task) < 0) {
     throwFailedChange(failedTo("save the task"),
@@ -73,7 +54,7 @@ void createTask(ZELO_SCHED_TASK *task) {
 }
 
 void editTask(ZELO_SCHED_TASK *task) {
-  if (isPower(*task)) requireNew(*task);
+  if (isPower(*task)) requireUnlike(*task);
   forgetError();
   if (ZELOSchedTaskEdit(task) < 0) {
     throwFailedChange(failedTo("save " + titleOf(*task)),

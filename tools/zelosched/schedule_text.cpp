@@ -3,12 +3,14 @@
 #include <algorithm>
 #include <cctype>
 #include <charconv>
+#include <chrono>
 #include <cstdio>
 #include <cstring>
 #include <optional>
 #include <string_view>
 #include <vector>
 
+#include "failure.h"
 #include "options.h"
 #include "text.h"
 
@@ -294,6 +296,12 @@ void setStart(ZELO_SCHED_TASK *task, const std::string &text) {
   if (task->Type == ZELO_SCHED_TYPE_ONCE || isDayFixed) {
     throw UsageError("'--start' must be a day on which the task runs, which " + printable(text) +
                      " is not");
+  }
+  const std::chrono::year_month_day day(std::chrono::year(static_cast<int>(date.year)),
+                                        std::chrono::month(date.month), std::chrono::day(date.day));
+  if (!day.ok()) {
+    throw Failure("not saved: the start date " + printable(text) +
+                  " does not exist: write a day that its month has");
   }
   setDate(task, date);
 }

@@ -3,12 +3,14 @@
 #include <unistd.h>
 #include <zelocore.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <fstream>
 #include <iterator>
 
+#include "alarm_check.h"
 #include "coming_runs.h"
 #include "command.h"
 #include "crontab_check.h"
@@ -125,7 +127,13 @@ Findings crontabIsInStep(const TaskList &list) {
   if (differences.empty()) return {well("the crontab is in step with the tasks")};
   Findings findings;
   for (const std::string &difference : differences) findings.push_back(wrong(difference));
-  findings.push_back(wrong("'zelosched sync' writes the crontab again"));
+  const bool isReadable =
+      std::none_of(list.tasks().begin(), list.tasks().end(), [](const ZELO_SCHED_TASK *task) {
+        return isEnabled(*task) && !unreadableFieldsOf(*task).empty();
+      });
+  findings.push_back(wrong(isReadable ? "'zelosched sync' writes the crontab again"
+                                      : "'zelosched sync' writes the crontab again once no task "
+                                        "has a field that cron cannot read"));
   return findings;
 }
 
@@ -145,6 +153,12 @@ Findings tasksAreHarmless(const TaskList &list) {
   }
   if (findings.empty()) findings.push_back(well("no enabled task has a fault"));
   return findings;
+}
+
+Findings clockIsArmed(const TaskList &list) {
+  const std::string fault = alarmFault(list);
+  if (!fault.empty()) return {wrong(fault)};
+  return {well("no power-on time waits for a clock that is not armed")};
 }
 
 Findings runsInProgress(const TaskList &list) {
@@ -202,6 +216,7 @@ int runStatus(int argc, char **argv) {
     add(tasksAreReadable(list));
     add(crontabIsInStep(list));
     add(tasksAreHarmless(list));
+    add(clockIsArmed(list));
     add(runsInProgress(list));
     add(runsMissed(list));
   } catch (const Failure &failure) {
@@ -216,8 +231,9 @@ const Command kStatusCommand = {
     "status", "", "say whether all is well",
     "Prints a line for each check: whether cron is running, whether the program that it\n"
     "starts is there and root's, whether both copies of the tasks agree, whether the\n"
-    "crontab is in step with them, whether an enabled task has a fault, which tasks are\n"
-    "running, and which were due while the machine was off.\n"
+    "crontab is in step with them, whether an enabled task has a fault, whether the clock is\n"
+    "armed for the next power-on time, which tasks are running, and which were due while\n"
+    "the machine was off.\n"
     "\n"
     "Exit status: 0 when all is well, 1 when something is wrong.\n",
     runStatus};

@@ -6,6 +6,7 @@
 #include "coming_runs.h"
 #include "owner.h"
 #include "schedule_text.h"
+#include "task_list.h"
 #include "text.h"
 
 namespace {
@@ -17,7 +18,6 @@ constexpr uint32_t kMostDays = 31;
 constexpr size_t kDaysOfWeek = 7;
 constexpr uint32_t kLastYear = 9999;
 constexpr int kLeapYear = 2024;
-constexpr size_t kMostCommandBytes = 12287;  // of a longer one only so many survive being stored
 
 bool hasDayOfMonth(const ZELO_SCHED_TASK &task) {
   return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_MONTHLY ||
@@ -44,12 +44,15 @@ bool isWeekEmpty(const ZELO_SCHED_TASK &task) {
   return std::string(task.Week, weekLength(task)).find_first_not_of('0') == std::string::npos;
 }
 
-// The day is looked for in a leap year when the task runs every year, as 29 February comes then.
-bool dayExists(const ZELO_SCHED_TASK &task) {
-  const int year = task.Type == ZELO_SCHED_TYPE_ONCE ? static_cast<int>(task.StartYear) : kLeapYear;
-  return std::chrono::year_month_day(std::chrono::year(year), std::chrono::month(task.StartMonth),
+bool dayExists(int year, const ZELO_SCHED_TASK &task) {
+  return isMonth(task) && isDay(task) &&
+         std::chrono::year_month_day(std::chrono::year(year), std::chrono::month(task.StartMonth),
                                      std::chrono::day(task.StartDay))
-      .ok();
+             .ok();
+}
+
+bool dateExists(const ZELO_SCHED_TASK &task) {
+  return dayExists(static_cast<int>(task.StartYear), task);
 }
 
 std::string number(uint32_t value) {
@@ -96,11 +99,23 @@ std::string noWeekday(const ZELO_SCHED_TASK &task) {
 std::string neverExists(const ZELO_SCHED_TASK &task) {
   if (!hasMonth(task) || !isDay(task) || !isMonth(task)) return "";
   const bool isYear = task.Type != ZELO_SCHED_TYPE_ONCE || task.StartYear <= kLastYear;
-  if (isYear && dayExists(task)) return "";
+  // 29 February comes in leap years, to a task that runs every year.
+  const bool comes =
+      task.Type == ZELO_SCHED_TYPE_ONCE ? dateExists(task) : dayExists(kLeapYear, task);
+  if (isYear && comes) return "";
   if (!isYear) return "the year " + number(task.StartYear) + " never comes: write one up to 9999";
   return "month " + number(task.StartMonth) + " never has a day " + number(task.StartDay) +
          (task.Type == ZELO_SCHED_TYPE_ONCE ? " in " + number(task.StartYear) : "") +
          ": write a day that it has";
+}
+
+// Of the other types the start date is the schedule, which is looked at above.
+std::string badStart(const ZELO_SCHED_TASK &task) {
+  const bool isFree = task.Type == ZELO_SCHED_TYPE_DAILY || task.Type == ZELO_SCHED_TYPE_WEEKLY;
+  const bool isSet = task.StartYear != 0 || task.StartMonth != 0 || task.StartDay != 0;
+  if (!isFree || !isSet || (task.StartYear <= kLastYear && dateExists(task))) return "";
+  return "the start date " + number(task.StartYear) + "-" + number(task.StartMonth) + "-" +
+         number(task.StartDay) + " does not exist: write --start with a day that its month has";
 }
 
 std::string badWeek(const ZELO_SCHED_TASK &task) {
@@ -146,10 +161,40 @@ std::string longCommand(const ZELO_SCHED_TASK &task) {
          std::to_string(kMostCommandBytes) + " can be stored: put it into a script";
 }
 
+// The store keeps a value a line: a line feed would be a blank in what is stored.
+std::string lineFeed(const ZELO_SCHED_TASK &task) {
+  const struct {
+    const char *what;
+    const char *text;
+  } texts[] = {{"name", task.Name},
+               {"application", task.App},
+               {"application's name", task.AppName},
+               {"arguments", task.AppArgs},
+               {"action", task.Action},
+               {"form", task.EditForm},
+               {"dialog", task.EditDialog},
+               {"days of the week", task.Week}};
+  for (const auto &[what, text] : texts) {
+    if (std::strchr(text, '\n') != nullptr) {
+      return std::string("the ") + what + " has a line feed: write it on one line";
+    }
+  }
+  return "";
+}
+
+std::string badDirection(const ZELO_SCHED_TASK &task) {
+  if (!isPower(task) || std::strcmp(task.AppArgs, "poweron") == 0 ||
+      std::strcmp(task.AppArgs, "poweroff") == 0) {
+    return "";
+  }
+  return "a power time is poweron or poweroff, and not '" + printable(task.AppArgs) + "'";
+}
+
 using Check = std::string (*)(const ZELO_SCHED_TASK &task);
 constexpr Check kUnreadable[] = {badHour, badMinute, badLastHour, badDay, badMonth, noWeekday};
-constexpr Check kUseless[] = {neverExists, badWeek,      badType,    badState,
-                              earlyEnd,    unknownOwner, apostrophe, longCommand};
+constexpr Check kUseless[] = {neverExists, badStart, badWeek,      badType,
+                              badState,    earlyEnd, unknownOwner, apostrophe,
+                              longCommand, lineFeed, badDirection};
 
 template <size_t count>
 void collect(const Check (&checks)[count], const ZELO_SCHED_TASK &task,
@@ -158,6 +203,16 @@ void collect(const Check (&checks)[count], const ZELO_SCHED_TASK &task,
     std::string sentence = check(task);
     if (!sentence.empty()) found->push_back(std::move(sentence));
   }
+}
+
+// A minute that the change to summer time leaves out.
+bool isSkipped(const ZELO_SCHED_TASK &task) {
+  const std::chrono::year_month_day date(std::chrono::year(static_cast<int>(task.StartYear)),
+                                         std::chrono::month(task.StartMonth),
+                                         std::chrono::day(task.StartDay));
+  const LocalMinute minute{std::chrono::sys_days(date), static_cast<int>(task.RunHour),
+                           static_cast<int>(task.RunMin)};
+  return task.RepeatHour == 0 && !momentOf(minute);
 }
 
 }  // namespace
@@ -177,6 +232,10 @@ std::vector<std::string> unreadableFieldsOf(const ZELO_SCHED_TASK &task) {
 std::string pastSchedule(const ZELO_SCHED_TASK &task, time_t now) {
   if (task.Type != ZELO_SCHED_TYPE_ONCE || !harmsOf(task).empty()) return "";
   if (!comingRuns(task, localMinute(now), 1).empty()) return "";
+  if (isSkipped(task)) {
+    return scheduleInWords(task).substr(strlen("once on ")) +
+           " does not come, as the clocks go forward then: write another time";
+  }
   return "the task would never run, as " + scheduleInWords(task).substr(strlen("once on ")) +
          " is over: write a later date";
 }

@@ -6,9 +6,13 @@
 
 #include <zelosched.h>
 
+#include <cstddef>
 #include <ctime>
 #include <string>
 #include <vector>
+
+// Of a longer command only so many bytes survive being stored.
+inline constexpr size_t kMostCommandBytes = 12287;
 
 // A sentence for each fault, which says what is wrong and what to write instead. None: the task is
 // fit to be saved.

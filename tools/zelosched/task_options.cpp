@@ -87,7 +87,8 @@ void applyOwner(const Arguments &arguments, ZELO_SCHED_TASK *task) {
 void applyCommand(const Arguments &arguments, ZELO_SCHED_TASK *task) {
   if (!arguments.afterDashes()) return;
   const std::string command = commandLine(*arguments.afterDashes());
-  if (command.empty()) throw UsageError("there is no command after '--'");
+  if (command.find_first_not_of(" \t\r\n") == std::string::npos)
+    throw UsageError("there is no command after '--'");
   setText(task->Command, "command", command);
 }
 

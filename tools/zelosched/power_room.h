@@ -1,0 +1,27 @@
+// Which power times can still be added: no two alike, and no more of a direction than are shown.
+#pragma once
+
+#include <zelosched.h>
+
+#include <cstddef>
+#include <set>
+#include <string>
+
+// "on" or "off".
+std::string directionOf(const ZELO_SCHED_TASK &task);
+
+// The id that the library makes of a power time's content; see zeloautopower_init.
+int32_t powerId(const ZELO_SCHED_TASK &task);
+
+// The stored power times, and those that are to be added to them.
+class PowerRoom {
+ public:
+  // Throws Failure.
+  PowerRoom();
+
+  // Throws Failure when the power time has no room, and counts it otherwise.
+  void take(const ZELO_SCHED_TASK &task);
+
+ private:
+  std::set<int32_t> ids_;
+};
