@@ -195,6 +195,7 @@ SharedLines &sleeps() {
 
 struct Forced {
   bool reallySleep = false;
+  unsigned timesShorter = 1;
   std::function<void(size_t)> sleepAction;
   std::vector<int> randValues;
   size_t randNext = 0;
@@ -459,8 +460,17 @@ void clearSleeps() {
   sleeps().clear();
 }
 
-void realSleep(bool really) {
+std::map<pid_t, unsigned> sleepsByProcess(const std::string &call) {
+  std::map<pid_t, unsigned> counts;
+  for (const SharedLines::Line &line : sleeps().lines()) {
+    if (line.text == call) ++counts[line.process];
+  }
+  return counts;
+}
+
+void realSleep(bool really, unsigned timesShorter) {
   forced().reallySleep = really;
+  forced().timesShorter = timesShorter;
 }
 
 void onSleep(std::function<void(size_t)> action) {
@@ -899,6 +909,12 @@ unsigned sleep(unsigned seconds) {
       support::recordSleep("sleep", long{seconds} * support::kMicrosecondsPerSecond);
   if (plan != nullptr) return resultOf(*plan, seconds);
   if (!really) return 0;
+  const unsigned timesShorter = support::forced().timesShorter;
+  if (timesShorter > 1) {
+    REAL(usleep);
+    real_usleep(static_cast<useconds_t>(seconds * support::kMicrosecondsPerSecond / timesShorter));
+    return 0;
+  }
   REAL(sleep);
   return real_sleep(seconds);
 }
@@ -909,7 +925,7 @@ int usleep(useconds_t microseconds) {
   if (plan != nullptr) return resultOf(*plan, -1);
   if (!really) return 0;
   REAL(usleep);
-  return real_usleep(microseconds);
+  return real_usleep(microseconds / support::forced().timesShorter);
 }
 
 int nanosleep(const timespec *wanted, timespec *left) {

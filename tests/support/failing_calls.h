@@ -33,9 +33,12 @@
 // handle with a message, as the real one does.
 #pragma once
 
+#include <sys/types.h>
+
 #include <cerrno>
 #include <cstddef>
 #include <functional>
+#include <map>
 #include <optional>
 #include <string>
 #include <vector>
@@ -138,7 +141,10 @@ std::vector<std::string> recordedPluginCalls();
 // number of sleeps recorded so far (from 1): the place to end what the library is waiting for.
 std::vector<long> recordedSleeps(const std::string &call = "");
 void clearSleeps();
-void realSleep(bool really);
+// How often each process has slept, of those that have.
+std::map<pid_t, unsigned> sleepsByProcess(const std::string &call);
+// Sleeps are real, or so many times shorter than real.
+void realSleep(bool really, unsigned timesShorter = 1);
 void onSleep(std::function<void(size_t)> action);
 
 // rand() gives these values in turn, over and over; an empty list gives rand() back.

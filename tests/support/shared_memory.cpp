@@ -1,6 +1,7 @@
 #include "shared_memory.h"
 
 #include <sys/mman.h>
+#include <unistd.h>
 
 #include <atomic>
 #include <cstdint>
@@ -20,6 +21,7 @@ namespace {
 struct Header {
   int32_t number;
   uint32_t length;
+  pid_t process;
 };
 
 constexpr size_t kAlignment = alignof(Header);
@@ -45,7 +47,7 @@ void SharedLines::append(int number, std::string_view text) {
     area_->reserved.fetch_sub(size);
     return;
   }
-  const Header header{number, static_cast<uint32_t>(text.size())};
+  const Header header{number, static_cast<uint32_t>(text.size()), getpid()};
   std::memcpy(area_->records + start + sizeof(header), text.data(), text.size());
   std::memcpy(area_->records + start, &header, sizeof(header));
 }
@@ -56,7 +58,7 @@ std::vector<SharedLines::Line> SharedLines::lines() const {
   for (size_t at = 0; at < end;) {
     Header header;
     std::memcpy(&header, area_->records + at, sizeof(header));
-    lines.push_back({header.number, {area_->records + at + sizeof(header), header.length}});
+    lines.push_back({header.number, {area_->records + at + sizeof(header), header.length}, header.process});
     at += recordSize(header.length);
   }
   return lines;

@@ -3,6 +3,8 @@
 // what was logged and called there.
 #pragma once
 
+#include <sys/types.h>
+
 #include <cstddef>
 #include <string>
 #include <string_view>
@@ -19,6 +21,7 @@ class SharedLines {
   struct Line {
     int number;
     std::string text;
+    pid_t process;  // that appended it
   };
 
   explicit SharedLines(size_t capacity);
