@@ -818,6 +818,43 @@ tells_of_a_database_that_is_none() {
   fails_saying 1 "cannot read /tmp/sched_status.sqlite" z history
 }
 
+tasks_are_listed_beside_a_database_that_cannot_be_read() {
+  tells_of_a_database_that_is_not_roots || return 1
+  try z list
+  [[ $status == 1 && $(tail -1 <<<"$out" | awk '{ print $1, $7 }') == "1 ?" && $err == *"cannot read /tmp/sched_status.sqlite"* ]]
+}
+
+every_result_is_told_in_words() {
+  all_well
+  z run --wait 1 >/dev/null
+  local code bad=0
+  while IFS='|' read -r code comment words; do
+    sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET status_code=$code, comment='$comment', pid=${pid:-$$}"
+    [[ $(z history 1 | tail -1) == *"$words"* ]] || { echo "$code: $(z history 1)"; bad=1; }
+  done <<'RESULTS'
+0||ended without a result
+3||finished
+4||could not start
+5|19|stopped by signal SIGSTOP (19)
+6|9|killed by signal SIGKILL (9)
+6|77|killed by signal 77
+7|3|failed with exit code 3
+9||ended with the unknown status 9
+2||running
+RESULTS
+  for pid in -1 0 4294967297; do
+    sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET status_code=2, pid=$pid"
+    [[ $(z history 1 | tail -1) == *"was running but its process is gone"* ]] || { echo "$pid"; bad=1; }
+  done
+  return "$bad"
+}
+
+options_stand_behind_ids_always() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  same "$(POSIXLY_CORRECT=1 "$ZELOSCHED" show 1 --json | json 'tasks["id"]')" 1
+}
+
 other_users_see_but_do_not_change() {
   all_well
   z run --wait 1 >/dev/null
@@ -1011,6 +1048,9 @@ check "the error record is told in words" tells_the_error_in_words
 check "a store that is not root's alone is refused" tells_of_a_store_that_cannot_be_written
 check "a status database that is not root's alone is refused" tells_of_a_database_that_is_not_roots
 check "a status database that is none is told" tells_of_a_database_that_is_none
+check "and tasks are listed beside it" tasks_are_listed_beside_a_database_that_cannot_be_read
+check "every result is told in words" every_result_is_told_in_words
+check "options stand behind ids always" options_stand_behind_ids_always
 if grep -qE '^ *0 +0 +[0-9]{2,}' /proc/self/uid_map; then
   check "other users see tasks but do not change them" other_users_see_but_do_not_change
 else

@@ -58,7 +58,8 @@ std::vector<SharedLines::Line> SharedLines::lines() const {
   for (size_t at = 0; at < end;) {
     Header header;
     std::memcpy(&header, area_->records + at, sizeof(header));
-    lines.push_back({header.number, {area_->records + at + sizeof(header), header.length}, header.process});
+    lines.push_back(
+        {header.number, {area_->records + at + sizeof(header), header.length}, header.process});
     at += recordSize(header.length);
   }
   return lines;

@@ -47,10 +47,11 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
               isDryRun ? "would be started" : "started");
 }
 
-int catchUpAll(time_t since, bool isDryRun) {
+int catchUpAll(const std::string &span, bool isDryRun) {
+  const time_t since = time(nullptr) - parseSpan(span);
   const TaskList list;
   const std::vector<MissedTask> all = missedTasks(list, since);
-  if (all.empty()) std::puts("no run was missed");
+  if (all.empty()) std::printf("no run was missed within %s\n", span.c_str());
   int status = kDone;
   for (const MissedTask &missed : all) {
     try {
@@ -66,11 +67,11 @@ int runCatchUp(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoOperands();
   arguments.requireNoCommand();
-  const time_t since = time(nullptr) - parseSpan(arguments.value("within", kUsualSpan));
-  if (arguments.has("dry-run")) return catchUpAll(since, true);
+  const std::string span = arguments.value("within", kUsualSpan);
+  if (arguments.has("dry-run")) return catchUpAll(span, true);
   // Of two at once, the second finds nothing left to do.
   const ChangeLock lock;
-  return catchUpAll(since, false);
+  return catchUpAll(span, false);
 }
 
 }  // namespace

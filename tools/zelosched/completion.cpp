@@ -86,7 +86,7 @@ _zelosched_ids() {
   if ((${#COMPREPLY[@]} == 1)); then COMPREPLY=("${COMPREPLY[0]%%  (*}"); fi
 }
 
-complete -F _zelosched zelosched
+complete -o default -F _zelosched zelosched
 )BASH";
 
 int printScript() {

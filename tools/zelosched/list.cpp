@@ -6,6 +6,7 @@
 
 #include "coming_runs.h"
 #include "command.h"
+#include "failure.h"
 #include "json_out.h"
 #include "options.h"
 #include "owner.h"
@@ -25,14 +26,19 @@ constexpr char kNothing[] = "-";
 
 struct Row {
   const ZELO_SCHED_TASK *task;
-  std::string next;  // empty sorts as never
+  std::optional<LocalMinute> next;
   std::string owner;
   std::string result;
   bool isBad;
 };
 
-std::string comparable(const std::string &next) {
-  return next.empty() ? "~" : next;  // after every digit
+// What never runs comes last.
+bool isSooner(const Row &a, const Row &b) {
+  return a.next && (!b.next || *a.next < *b.next);
+}
+
+std::string nextText(const Row &row) {
+  return row.next ? minuteText(*row.next) : "";
 }
 
 struct SortKey {
@@ -40,7 +46,7 @@ struct SortKey {
   bool (*isBefore)(const Row &a, const Row &b);
 };
 constexpr SortKey kSortKeys[] = {
-    {"next", [](const Row &a, const Row &b) { return comparable(a.next) < comparable(b.next); }},
+    {"next", isSooner},
     {"id", [](const Row &a, const Row &b) { return a.task->ID < b.task->ID; }},
     {"name", [](const Row &a, const Row &b) { return strcmp(a.task->Name, b.task->Name) < 0; }},
     {"state", [](const Row &a, const Row &b) { return a.task->State > b.task->State; }},
@@ -65,17 +71,33 @@ bool isWanted(const Arguments &arguments, const ZELO_SCHED_TASK &task) {
   return arguments.value("app", task.App) == task.App;
 }
 
-std::vector<Row> rowsOf(const Arguments &arguments, const TaskList &list) {
-  const bool isKnown = mayReadRuns();
-  const std::map<long, Run> latest = isKnown ? RunDatabase().latestOfEach() : std::map<long, Run>{};
+// The status database is in "/tmp", where anybody can be in its way: the tasks are shown without
+// it.
+struct LatestRuns {
+  bool isKnown = mayReadRuns();
+  int status = kDone;
+  std::map<long, Run> ofEach;
+
+  LatestRuns() {
+    if (!isKnown) return;
+    try {
+      ofEach = RunDatabase().latestOfEach();
+    } catch (const Failure &failure) {
+      isKnown = false;
+      status = complain(failure.what());
+    }
+  }
+};
+
+std::vector<Row> rowsOf(const Arguments &arguments, const TaskList &list,
+                        const LatestRuns &latest) {
   const LocalMinute now = localMinute(time(nullptr));
   std::vector<Row> rows;
   for (const ZELO_SCHED_TASK *task : list.tasks()) {
     if (!isWanted(arguments, *task)) continue;
-    const std::optional<LocalMinute> next = nextRun(*task, now);
-    Row row{task, next ? minuteText(*next) : "", userName(task->Owner),
-            isKnown ? kNothing : kUnknown, false};
-    if (const auto run = latest.find(task->ID); run != latest.end()) {
+    Row row{task, nextRun(*task, now), userName(task->Owner), latest.isKnown ? kNothing : kUnknown,
+            false};
+    if (const auto run = latest.ofEach.find(task->ID); run != latest.ofEach.end()) {
       row.result = resultInWords(run->second.statusCode, run->second.comment);
       row.isBad = isBadResult(run->second.statusCode);
     }
@@ -97,7 +119,7 @@ void printTable(const std::vector<Row> &rows) {
     table.add({{std::to_string(row.task->ID)},
                {stateName(*row.task), dim},
                {typeName(*row.task)},
-               {row.next.empty() ? kNothing : row.next},
+               {row.next ? minuteText(*row.next) : kNothing},
                {row.owner},
                {row.result, row.isBad ? Emphasis::kBad : Emphasis::kNone},
                {row.task->Name}});
@@ -109,7 +131,7 @@ void printAsJson(const std::vector<Row> &rows) {
   std::vector<Json::Value> objects;
   for (const Row &row : rows) {
     Json::Value object = jsonOf(*row.task);
-    object["next run"] = row.next;
+    object["next run"] = nextText(row);
     object["owner name"] = jsonText(row.owner);
     object["last result"] = jsonText(row.result);
     objects.push_back(std::move(object));
@@ -123,7 +145,8 @@ int runList(int argc, char **argv) {
   arguments.requireNoCommand();
   const SortKey &key = sortKey(arguments.value("sort", "next"));
   const TaskList list;
-  std::vector<Row> rows = rowsOf(arguments, list);
+  const LatestRuns latest;
+  std::vector<Row> rows = rowsOf(arguments, list, latest);
   std::stable_sort(rows.begin(), rows.end(), key.isBefore);
   if (arguments.has("reverse")) std::reverse(rows.begin(), rows.end());
   if (arguments.has("json")) {
@@ -131,7 +154,7 @@ int runList(int argc, char **argv) {
   } else {
     printTable(rows);
   }
-  return kDone;
+  return latest.status;
 }
 
 }  // namespace

@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <clocale>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <exception>
 
@@ -81,6 +82,7 @@ int main(int argc, char **argv) {
   occupyStandardStreams();
   std::setlocale(LC_ALL, "");
   openlog("zelosched", LOG_PID, LOG_CRON);
+  unsetenv("POSIXLY_CORRECT");  // options may stand behind ids
   try {
     return afterPrinting(runCommand(argc, argv));
   } catch (const std::exception &error) {

@@ -4,6 +4,8 @@
 #include <zelocore.h>
 #include <zelosched.h>
 
+#include <cstdint>
+
 #include "failure.h"
 #include "text.h"
 
@@ -28,8 +30,9 @@ std::string textOf(sqlite3_stmt *statement, int column) {
 }
 
 bool isGone(const Run &run) {
-  return run.statusCode == ZELO_SCHED_STATUS_RUNNING && run.pid > 0 &&
-         QLIBCProcAlive(static_cast<pid_t>(run.pid)) != kAlive;
+  const bool isProcess = run.pid > 0 && run.pid <= INT32_MAX;
+  return run.statusCode == ZELO_SCHED_STATUS_RUNNING &&
+         (!isProcess || QLIBCProcAlive(static_cast<pid_t>(run.pid)) != kAlive);
 }
 
 Run runOf(sqlite3_stmt *statement) {

@@ -34,10 +34,12 @@ struct Range {
   uint32_t first;
   uint32_t last;
 };
-// Control characters, surrogates, and the marks that turn the direction of writing or break lines.
-constexpr Range kUnsafe[] = {{0x00, 0x1F},     {0x7F, 0x9F},     {0x061C, 0x061C},
-                             {0x200E, 0x200F}, {0x2028, 0x202E}, {0x2066, 0x2069},
-                             {0xD800, 0xDFFF}, {0xFEFF, 0xFEFF}, {0xFFF9, 0xFFFB}};
+// Control characters, surrogates, the marks that turn the direction of writing or break lines, and
+// what cannot be seen, by which two names that look alike differ.
+constexpr Range kUnsafe[] = {
+    {0x00, 0x1F},     {0x7F, 0x9F},     {0xAD, 0xAD},      {0x061C, 0x061C}, {0x200B, 0x200B},
+    {0x200E, 0x200F}, {0x2028, 0x202E}, {0x2060, 0x2064},  {0x2066, 0x2069}, {0xD800, 0xDFFF},
+    {0xFEFF, 0xFEFF}, {0xFFF9, 0xFFFB}, {0xE0000, 0xE007F}};
 
 unsigned char byteAt(std::string_view text, size_t index) {
   return static_cast<unsigned char>(text[index]);
