@@ -205,13 +205,18 @@ TEST_F(ClockChangesTest, TwelveHoursBehindTheDayIsTheLocalOne) {
 
 // ---- leap days
 
-TEST_F(ClockChangesTest, TheTwentyNinthOfFebruaryIsDueInLeapYearsOnlyUpTo2100) {
-  setZone("UTC");
+Task onLeapDays() {
   Task task = makeTask("leap day", "true");
   task->Type = ZELO_SCHED_TYPE_YEARLY;
   task->StartYear = 2012;
   task->StartMonth = 2;
   task->StartDay = 29;
+  return task;
+}
+
+TEST_F(ClockChangesTest, TheTwentyNinthOfFebruaryIsDueInLeapYearsOnlyUpTo2100) {
+  setZone("UTC");
+  const Task task = onLeapDays();
   const long id = saveTask(task);
   for (int year = 2012; year <= 2100; ++year) {
     const bool isLeap = year % 4 == 0 && year != 2100;
@@ -227,11 +232,7 @@ TEST_F(ClockChangesTest, TheTwentyNinthOfFebruaryIsDueInLeapYearsOnlyUpTo2100) {
 
 TEST_F(ClockChangesTest, ALeapDayThatAYearLacksIsShownAsTheFirstOfMarch) {
   setZone("UTC");
-  Task task = makeTask("leap day", "true");
-  task->Type = ZELO_SCHED_TYPE_YEARLY;
-  task->StartYear = 2012;
-  task->StartMonth = 2;
-  task->StartDay = 29;
+  const Task task = onLeapDays();
   for (int year = 2012; year < 2100; ++year) {
     setClock(std::to_string(year) + "-03-01 00:00");
     const std::string following = std::to_string(year + 1);

@@ -39,6 +39,7 @@ covers_enough() {
     --fail-under-branch "$LEAST_BRANCHES" --print-summary "$COVERED" \
     >"$COVERED/coverage.txt" 2>"$COVERED/coverage.err" || status=$?
   sed 's/^/    /' "$COVERED/coverage.txt" "$COVERED/coverage.err"
+  grep -E '^(lines|branches): ' "$COVERED/coverage.txt" | sed 's/^/# /'
   return "$status"
 }
 

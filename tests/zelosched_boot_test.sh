@@ -9,8 +9,9 @@ set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
+# shellcheck source=tests/support/zelosched_test.sh
+. "$here/support/zelosched_test.sh"
 
-readonly ZELOSCHED=$BUILD_DIR/bin/zelosched
 readonly SCRATCH=/run/zelosched_boot_test
 readonly STORE=/tmp/scheduled_tasks
 readonly PROGRAM=/tmp/zeloschedtask
@@ -18,7 +19,6 @@ readonly PERSISTENT=/usr/zelo/etc/scheduled_tasks
 readonly LAST_GOOD=/usr/zelo/etc/scheduled_tasks.last-good
 readonly STATUS=/tmp/sched_status.sqlite
 readonly KEPT=/usr/zelo/var/history.sqlite
-readonly FAKE=$BUILD_DIR/tests/fake_time.so
 readonly NO_FORK=$BUILD_DIR/tests/no_fork.so
 readonly BOOT_ID=/proc/sys/kernel/random/boot_id
 readonly NOBODY=65534
@@ -38,25 +38,6 @@ check_as_root() {
   else
     skip "$1" "this sandbox has no user but 0"
   fi
-}
-
-# What hangs shall fail.
-z() {
-  timeout 60 "$ZELOSCHED" "$@"
-}
-
-at() {
-  local moment=$1
-  shift
-  FAKE_TIME=$(date -u -d "$moment" +%s) LD_PRELOAD=$FAKE z "$@"
-}
-
-# Runs it and keeps status, out and err.
-try() {
-  status=0
-  "$@" >"$SCRATCH/out" 2>"$SCRATCH/err" </dev/null || status=$?
-  out=$(cat "$SCRATCH/out")
-  err=$(cat "$SCRATCH/err")
 }
 
 # The status, and a part of what is said on standard error.

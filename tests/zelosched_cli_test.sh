@@ -9,12 +9,12 @@ set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
+# shellcheck source=tests/support/zelosched_test.sh
+. "$here/support/zelosched_test.sh"
 
-readonly ZELOSCHED=$BUILD_DIR/bin/zelosched
 readonly SCRATCH=/tmp/zelosched_cli_test
 readonly STORE=/tmp/scheduled_tasks
 readonly PERSISTENT=/usr/zelo/etc/scheduled_tasks
-readonly FAKE=$BUILD_DIR/tests/fake_time.so
 readonly USAGE=2
 unset LC_ALL LANG NO_COLOR
 export TZ=UTC
@@ -22,25 +22,6 @@ mkdir -p "$SCRATCH"
 cp /etc/crontab "$SCRATCH/crontab"
 
 # ---- helpers --------------------------------------------------------------------------------
-
-z() {
-  "$ZELOSCHED" "$@"
-}
-
-at() {
-  local moment=$1
-  shift
-  # Libraries with sanitizers must be loaded first, which a preloaded one prevents.
-  FAKE_TIME=$(date -u -d "$moment" +%s) LD_PRELOAD=$FAKE z "$@"
-}
-
-# Runs it and keeps status, out and err.
-try() {
-  status=0
-  "$@" >"$SCRATCH/out" 2>"$SCRATCH/err" </dev/null || status=$?
-  out=$(cat "$SCRATCH/out")
-  err=$(cat "$SCRATCH/err")
-}
 
 gives() {
   local wanted_status=$1 wanted=$2
