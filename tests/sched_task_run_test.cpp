@@ -758,20 +758,26 @@ TEST_F(TaskRunTest, ALockThatTheCallerHoldsCountsAsHeld) {
   pfLock = nullptr;
 }
 
+// It wants the lock to itself: one that is shared with others is not enough.
 TEST_F(TaskRunTest, ARunWaitsWhileAnotherProcessHoldsTheLock) {
-  const long id = saveRanTask();
-  writeFile(kLockFile, "");
-  const int held = open(kLockFile, O_RDONLY | O_CLOEXEC);
-  ASSERT_EQ(flock(held, LOCK_EX), 0);
-  ASSERT_EQ(ZELOSchedTaskRun(id, 0, 0), 0);
-  // The kernel marks who waits for a lock by an arrow.
-  while (readFile("/proc/locks").find("->") == std::string::npos) sched_yield();
-  EXPECT_EQ(statusRows(), std::vector<StatusRow>{});
-  EXPECT_FALSE(ran());
-  close(held);
-  waitForChildRuns();
-  EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
-  EXPECT_EQ(recordedSleeps(), std::vector<long>{});
+  for (const int kind : {LOCK_EX, LOCK_SH}) {
+    SCOPED_TRACE(kind);
+    cleanWorld();
+    std::remove(kRanFile);
+    const long id = saveRanTask();
+    writeFile(kLockFile, "");
+    const int held = open(kLockFile, O_RDONLY | O_CLOEXEC);
+    ASSERT_EQ(flock(held, kind), 0);
+    ASSERT_EQ(ZELOSchedTaskRun(id, 0, 0), 0);
+    // The kernel marks who waits for a lock by an arrow.
+    while (readFile("/proc/locks").find("->") == std::string::npos && !ran()) sched_yield();
+    EXPECT_EQ(statusRows(), std::vector<StatusRow>{});
+    EXPECT_FALSE(ran());
+    close(held);
+    waitForChildRuns();
+    EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
+    EXPECT_EQ(recordedSleeps(), std::vector<long>{});
+  }
 }
 
 // A look-up that fails without a code of its own shows the record that the release left.
