@@ -452,7 +452,12 @@ TEST_P(FailingStepsTest, WhicheverCallFails) {
 // A full disk, a spent quota and a file system that has become read-only. (The one above is the
 // disk that fails.)
 TEST_P(FailingStepsTest, WhicheverCallFindsNoRoom) {
-  for (const int error : {ENOSPC, EDQUOT, EROFS}) {
+  // In a short run one of them stands for all.
+  const char *factor = getenv("ZELO_SOAK_FACTOR");
+  const bool isShort = factor != nullptr && std::atof(factor) < 1;
+  const std::vector<int> errors =
+      isShort ? std::vector<int>{ENOSPC} : std::vector<int>{ENOSPC, EDQUOT, EROFS};
+  for (const int error : errors) {
     SCOPED_TRACE(strerrorname_np(error));
     error_ = error;
     for (const bool onwards : {false, true}) {

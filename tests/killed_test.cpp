@@ -4,7 +4,7 @@
 // to be, nothing is built on a copy that was cut off, the crontab is the old or the new one, and no
 // lock stays held.
 //
-// ZELO_SOAK_FACTOR=100 makes the random part that much longer.
+// ZELO_SOAK_FACTOR=100 makes the random part that much longer, 0.1 shorter.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -38,9 +38,9 @@ constexpr int kMostTasks = 12;
 constexpr int kLongestLifeMicroseconds = 14000;
 constexpr char kChangeLock[] = "/run/zeloscheduler.lock";
 
-int soakFactor() {
+double soakFactor() {
   const char *factor = getenv("ZELO_SOAK_FACTOR");
-  return factor != nullptr ? std::max(1, std::atoi(factor)) : 1;
+  return factor != nullptr ? std::atof(factor) : 1;
 }
 
 // ---- the tasks, as acknowledged
@@ -308,7 +308,7 @@ class Worker {
 TEST_F(KilledTest, AtAnyMomentNothingAcknowledgedIsLost) {
   RandomChanges random(kSeed);
   build(kMostTasks / 2);
-  const int kills = kRandomKills * soakFactor();
+  const int kills = static_cast<int>(kRandomKills * soakFactor());
   int acknowledged = 0;
   int underWay = 0;
   for (int round = 0; round < kills && !HasFailure(); ++round) {
