@@ -22,6 +22,11 @@ build() {
     { tail -50 "$BUILD_DIR/sanitized.log"; return 1; }
 }
 
+# Debian's cron, where scripts/deps has unpacked it.
+lend_cron() {
+  if [[ -e $BUILD_DIR/cron ]]; then ln -sfn "$BUILD_DIR/cron" "$SANITIZED/cron"; fi
+}
+
 programs() {
   awk '$1 == "gtest" { print $2 }' "$SANITIZED/test-programs"
   printf '%s\n' "${SCRIPTS[@]}"
@@ -31,6 +36,7 @@ programs() {
 # sanitizers' own.
 run_tests() {
   local log=$SANITIZED/tests.log
+  lend_cron
   local -a names
   mapfile -t names <<<"$(programs)"
   BUILD_DIR=$SANITIZED PROGRAMS_AT_ONCE=1 ZELO_SOAK_FACTOR=0.1 UBSAN_OPTIONS=print_stacktrace=1 \

@@ -9,6 +9,8 @@ set -euo pipefail
 here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
+# shellcheck source=tests/support/have_terminals.sh
+. "$here/support/have_terminals.sh"
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 

@@ -84,12 +84,24 @@ TEST_F(ZeloschedTaskCheckTest, EachFaultIsSaidWithWhatToWriteInstead) {
        "the last hour 7 is before the first, 8: write a later --until, or --every off for one run "
        "a day",
        false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 2027, 2, 29); },
+       "the start date 2027-2-29 does not exist: write --start with a day that its month has",
+       false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_WEEKLY, 0, 99, 99); },
+       "the start date 0-99-99 does not exist: write --start with a day that its month has", false},
+      {[](auto &task) { setText(task.Action, "a\nb"); },
+       "the action has a line feed: write it on one line", false},
+      {[](auto &task) {
+         task.Backend = ZELO_SCHED_BACKEND_AUTOPOWER;
+         setText(task.AppArgs, "sideways");
+       },
+       "a power time is poweron or poweroff, and not 'sideways'", false},
       {[](auto &task) { task.Owner = 3999999999U; },
        "there is no user 3999999999, under whose rights the task would run: write --owner with "
        "the name of a user",
        false},
-      {[](auto &task) { setText(task.App, "Bob's\n"); },
-       "the application 'Bob's\\n' has an apostrophe, with which no run could be recorded: write "
+      {[](auto &task) { setText(task.App, "Bob's\t"); },
+       "the application 'Bob's\\t' has an apostrophe, with which no run could be recorded: write "
        "it without",
        false},
       {[](auto &task) { setText(task.Command, std::string(12288, 'x')); },
@@ -115,8 +127,9 @@ TEST_F(ZeloschedTaskCheckTest, WhatIsJustInRangeIsFit) {
       [](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 0, 0, 31); },
       [](auto &task) { setDay(task, ZELO_SCHED_TYPE_YEARLY, 0, 2, 29); },
       [](auto &task) { setDay(task, ZELO_SCHED_TYPE_ONCE, 2028, 2, 29); },
-      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 0, 99, 99); },  // not in its line
-      [](auto &task) { setText(task.Week, "0000000"); },                   // nor the days in this
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 0, 0, 0); },
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_WEEKLY, 2028, 2, 29); },
+      [](auto &task) { setText(task.Week, "0000000"); },  // of a daily task
       [](auto &task) { task.State = ZELO_SCHED_STATE_DISABLED; },
       [](auto &task) { setText(task.Command, std::string(12287, 'x')); },
   };

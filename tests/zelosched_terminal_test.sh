@@ -3,5 +3,7 @@
 set -euo pipefail
 
 here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/have_terminals.sh
+. "$here/support/have_terminals.sh"
 export TZ=UTC
 exec python3 "$here/support/zelosched_terminal.py"
