@@ -171,7 +171,8 @@ TEST_F(CrontabTest, NoTextOfATaskReachesTheCrontab) {
     task->Type = ZELO_SCHED_TYPE_WEEKLY;
     setText(task->Week, "\n* * *");
   });
-  EXPECT_EQ(crontabLines(), Lines{"0\t0\t*\t*\t0,1,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=1"});
+  EXPECT_EQ(crontabLines(),
+            Lines{"0\t0\t*\t*\t0,1,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=1"});
 }
 
 TEST_F(CrontabTest, RepeatedHoursAreListedUpToTheLast) {

@@ -25,10 +25,8 @@
 #include "sched_wait_status.h"
 
 // A platform that has no holds looks at the file once a section, and is slower for it.
-extern "C" {
-__attribute__((weak)) void QLIBCFileHoldBegin(void);
-__attribute__((weak)) void QLIBCFileHoldEnd(void);
-}
+#pragma weak QLIBCFileHoldBegin
+#pragma weak QLIBCFileHoldEnd
 
 namespace {
 
