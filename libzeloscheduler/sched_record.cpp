@@ -118,6 +118,7 @@ SchedSlab *moveToFront(SchedSlab **link) {
   return slab;
 }
 
+// Which then stands in front.
 SchedSlab *slabOf(const ZELO_SCHED_TASK *pTask) {
   for (SchedSlab **link = &slabs; *link != nullptr; link = &(*link)->next) {
     if ((*link)->holds(pTask)) {
@@ -131,11 +132,7 @@ void unhold(SchedSlab *slab) {
   if (--slab->holders > 0) {
     return;
   }
-  SchedSlab **link = &slabs;
-  while (*link != slab) {
-    link = &(*link)->next;
-  }
-  *link = slab->next;
+  slabs = slabOf(slab->record(0))->next;
   munmap(slab, kSlabSize);
 }
 

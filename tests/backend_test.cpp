@@ -90,7 +90,7 @@ class BackendTest : public support::SandboxTest {
       inits = {};
       body();
       std::fflush(nullptr);
-      _exit(testing::Test::HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);
+      std::exit(testing::Test::HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);
     }
     int status = -1;
     ASSERT_EQ(waitpid(child, &status, 0), child);

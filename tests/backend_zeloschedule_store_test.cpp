@@ -965,6 +965,25 @@ TEST_F(StoreTest, AFilePlantedUnderTheScratchNameIsNotTakenOver) {
   EXPECT_EQ(readFile(kStore).find("planted"), std::string::npos);
 }
 
+TEST_F(StoreTest, ALinkPlantedWhileTheFirstStoreIsPublishedIsNotWrittenThrough) {
+  REQUIRE_OTHER_USERS();
+  writeFile(kVictim, "untouched");
+  support::onExec([](const std::string &line) {
+    if (line.ends_with(support::kPersistentStore)) {
+      ASSERT_EQ(symlink(kVictim.c_str(), support::kStore), 0);
+      ASSERT_EQ(lchown(support::kStore, 65534, 65534), 0);
+    }
+  });
+  EXPECT_EQ(backend_.create(makeTask("first", "true").get()), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(logged(),
+            (Lines{backendLine("Copy sched conf failed. [" + scratchPath() +
+                               "] -> [/tmp/scheduled_tasks] [0x0900 backend_zeloschedule.cpp:N]"),
+                   backendLine("set task failed. [1] [0x0900 backend_zeloschedule.cpp:N]")}));
+  EXPECT_EQ(readFile(kVictim), "untouched");
+  EXPECT_NE(readFile(support::kPersistentStore).find("first"), std::string::npos);
+}
+
 TEST_F(StoreTest, AHardLinkPlantedUnderTheScratchNameIsNotWrittenThrough) {
   writeFile(kVictim, "untouched");
   create("first");

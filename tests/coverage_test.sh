@@ -11,8 +11,8 @@ root=$(cd "$(dirname "$0")/.." && pwd -P)
 . "$root/tests/support/shell_test.sh"
 
 readonly COVERED=$BUILD_DIR/covered
-readonly LEAST_LINES=98
-readonly LEAST_BRANCHES=92
+readonly LEAST_LINES=99
+readonly LEAST_BRANCHES=94
 
 build() {
   BUILD_DIR=$COVERED JOBS=1 "$root/scripts/build" -DCMAKE_BUILD_TYPE=Debug \
@@ -22,12 +22,13 @@ build() {
   find "$COVERED" -name '*.gcda' -delete
 }
 
-# Some of them are run by users who may not write what is counted.
+# A tenth of what takes long by its number finds the same lines. Some are run by users who may not
+# write what is counted.
 run_tests() {
   local log=$COVERED/tests.log
   local -a names
   mapfile -t names <<<"$(awk '$1 == "gtest" && !/zelosched_/ { print $2 }' "$BUILD_DIR/test-programs")"
-  TEST_RESULTS=$COVERED/test-results PROGRAMS_AT_ONCE=1 GCOV_ERROR_FILE=/dev/null \
+  TEST_RESULTS=$COVERED/test-results PROGRAMS_AT_ONCE=1 ZELO_SOAK_FACTOR=0.1 GCOV_ERROR_FILE=/dev/null \
     LD_LIBRARY_PATH=$COVERED/lib "$root/scripts/run-tests" "${names[@]}" >"$log" 2>&1 ||
     { sed -n '/^FAILED/,/^ok/p' "$log"; tail -1 "$log"; return 1; }
 }

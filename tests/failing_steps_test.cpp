@@ -4,6 +4,7 @@
 // memory is lost.
 //
 // Prints for each function how many points it can fail at.
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <malloc.h>
 #include <sqlite3.h>
@@ -334,6 +335,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
     after_ = keptFiles();
     putBack(before_);
     ASSERT_EQ(temporaryFiles(), temporary_);
+    descriptors_ = openDescriptors();
   }
   void TearDown() override {
     QLIBCSzHashFree(hash);
@@ -379,6 +381,9 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
     checkCrontab();
     EXPECT_EQ(pfLock, nullptr);
     EXPECT_EQ(geteuid(), 0U);
+    if (GetParam().memory == Memory::kGivenBack) {
+      EXPECT_EQ(openDescriptors(), descriptors_);
+    }
     if (failed == "unlink" || onwards) {
       removeTemporaryFiles();  // nothing could
     }
@@ -410,6 +415,15 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
     return inA->second == inB->second;
   }
 
+  static std::set<int> openDescriptors() {
+    constexpr int kMost = 256;
+    std::set<int> open;
+    for (int i = 0; i < kMost; ++i) {
+      if (fcntl(i, F_GETFD) >= 0) open.insert(i);
+    }
+    return open;
+  }
+
   static bool watchesMemory() {
     return support::kAllocationsCanFail && GetParam().memory == Memory::kGivenBack;
   }
@@ -431,6 +445,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
   Files before_;
   Files after_;
   std::set<std::string> temporary_;
+  std::set<int> descriptors_;
 };
 
 TEST_P(FailingStepsTest, WhicheverCallFails) {

@@ -107,6 +107,17 @@ TEST_F(SetLineTest, TheFirstAndTheLastLineAreRemovedWhole) {
   EXPECT_EQ(readFile(kFile), "b\n");
 }
 
+TEST_F(SetLineTest, AFileOfTheWorkingDirectoryIsNamedWithoutIt) {
+  writeFile(kFile, "a\nkey 1\n");
+  const std::filesystem::path before = std::filesystem::current_path();
+  const std::filesystem::path file(kFile);
+  std::filesystem::current_path(file.parent_path());
+  const int result = QLIBCFileSetLine(file.filename().c_str(), "key", "key 2", 0);
+  std::filesystem::current_path(before);
+  EXPECT_EQ(result, 1);
+  EXPECT_EQ(readFile(kFile), "a\nkey 2\n");
+}
+
 TEST_F(SetLineTest, OtherLinesStayByteForByte) {
   const std::string before("\r\n\n\0x\xff\t\n", 8);
   writeFile(kFile, before + "key\nlast without its end");

@@ -359,6 +359,29 @@ TEST_F(SurroundingsTest, AVariableThatCannotBeAllocatedRunsNothing) {
                              "sched_surroundings.cpp:N]"}));
 }
 
+TEST_F(SurroundingsTest, WithoutADirectoryToBeInNothingIsRun) {
+  const long id = save(0, kListEnvironment);
+  failCall("chdir", {.times = kAlways, .error = EIO});
+  clearLog();
+  EXPECT_EQ(outputOf(id), "");
+  EXPECT_EQ(recordedSystemCommands(), Lines{});
+  EXPECT_EQ(logged(), (Lines{"sched_surroundings.cpp:N Failed to change directory: [0] "
+                             "Input/output error",
+                             "sched_task_run.cpp:N Failed to set user context. uid:[0] [0x2A00 "
+                             "sched_surroundings.cpp:N]"}));
+}
+
+TEST_F(SurroundingsTest, ACallersDescriptorsThatCannotBeClosedRunNothing) {
+  const long id = save(0, kListEnvironment);
+  failCall("close_range", {.times = kAlways, .error = ENOSYS});
+  failCall("sysconf", {.times = kAlways, .error = EINVAL});
+  clearLog();
+  EXPECT_EQ(outputOf(id), "");
+  EXPECT_EQ(recordedSystemCommands(), Lines{});
+  EXPECT_EQ(logged(), (Lines{"sched_surroundings.cpp:N Failed to close descriptors. "
+                             "Invalid argument"}));
+}
+
 // ---- directory and mask
 
 TEST_F(SurroundingsTest, TheCommandStartsInTheOwnersHome) {

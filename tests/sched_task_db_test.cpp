@@ -509,6 +509,20 @@ TEST_F(RunningTest, ALiveRunIsFoundWithItsNumbers) {
   EXPECT_EQ(status_.statusCode, 0);
 }
 
+TEST_F(RunningTest, AnApplicationThatAsksForOtherColumnsIsAnsweredWithTheNumbersOnly) {
+  const long id = addStatusRow(
+      {.pid = getpid(), .timestamp = 5, .app = "app", .taskId = 1234, .statusCode = 2});
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(
+                db(), "x'; SELECT app,comment,timestamp,pid,task_id,status_id FROM task_status; --",
+                &status_),
+            0);
+  EXPECT_EQ(status_.found, 1);
+  EXPECT_EQ(status_.pid, getpid());
+  EXPECT_EQ(status_.statusID, id);
+  EXPECT_EQ(status_.taskID, 1234);
+  EXPECT_STREQ(status_.szApp, "");
+}
+
 TEST_F(RunningTest, ALiveRunOfAnyTaskOfTheApplicationIsFound) {
   const long id = addStatusRow(
       {.pid = getpid(), .timestamp = 5, .app = "app", .taskId = 1234, .statusCode = 2});

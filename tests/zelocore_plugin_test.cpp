@@ -5,10 +5,13 @@
 #include <poll.h>
 #include <signal.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
+#include <time.h>
 #include <unistd.h>
 #include <zelocore.h>
 
 #include <cerrno>
+#include <cstdarg>
 #include <cstdlib>
 #include <fstream>
 #include <functional>
@@ -20,6 +23,9 @@ namespace {
 std::function<int()> g_on_poll;
 int g_poll_timeout = 0;
 int g_pidfd_error = 0;
+int g_fcntl_error = 0;
+std::function<void()> g_on_waitid;
+time_t g_seconds_ahead = 0;
 
 }  // namespace
 
@@ -41,6 +47,36 @@ int pidfd_open(pid_t pid, unsigned flags) {
     return -1;
   }
   return real(pid, flags);
+}
+
+int fcntl(int fd, int command, ...) {
+  static auto *const real = reinterpret_cast<int (*)(int, int, ...)>(dlsym(RTLD_NEXT, "fcntl"));
+  va_list arguments;
+  va_start(arguments, command);
+  void *argument = va_arg(arguments, void *);
+  va_end(arguments);
+  if (command == F_DUPFD_CLOEXEC && g_fcntl_error != 0) {
+    errno = g_fcntl_error;
+    return -1;
+  }
+  return real(fd, command, argument);
+}
+
+int waitid(idtype_t type, id_t id, siginfo_t *info, int options) {
+  static auto *const real =
+      reinterpret_cast<int (*)(idtype_t, id_t, siginfo_t *, int)>(dlsym(RTLD_NEXT, "waitid"));
+  if (g_on_waitid) {
+    g_on_waitid();
+  }
+  return real(type, id, info, options);
+}
+
+int clock_gettime(clockid_t clock, timespec *time) noexcept {
+  static auto *const real =
+      reinterpret_cast<int (*)(clockid_t, timespec *)>(dlsym(RTLD_NEXT, "clock_gettime"));
+  const int result = real(clock, time);
+  time->tv_sec += g_seconds_ahead;
+  return result;
 }
 }
 #pragma GCC visibility pop
@@ -65,7 +101,9 @@ class ZelocorePlugin : public testing::Test {
   }
   void TearDown() override {
     g_on_poll = nullptr;
-    g_pidfd_error = 0;
+    g_on_waitid = nullptr;
+    g_pidfd_error = g_fcntl_error = 0;
+    g_seconds_ahead = 0;
     if (words_[0] != nullptr) {
       EXPECT_EQ(QLIBPluginExit(words_), 0);
     }
@@ -251,6 +289,38 @@ TEST_F(ZelocorePlugin, PluginsRunWithoutADescriptorToWaitOn) {
   Init();
   EXPECT_EQ(QLIBPluginAction(QLIBPLUGIN_PRE, words_), -1);
   EXPECT_EQ(Noted(), "a\n");
+}
+
+TEST_F(ZelocorePlugin, AHangingOneIsEndedWithoutADescriptorToWaitOnToo) {
+  const std::string fifo = scratch_ + "/fifo";
+  ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
+  Install("a", "exec 9> " + fifo + "; sleep 1000 & echo started >&9; wait");
+  g_pidfd_error = EMFILE;
+  int reading = -1;
+  g_on_waitid = [&] {
+    if (reading < 0) {
+      char word[16];
+      reading = open(fifo.c_str(), O_RDONLY | O_CLOEXEC);
+      EXPECT_GT(read(reading, word, sizeof word), 0);
+      constexpr time_t kTimeIsUp = 31;
+      g_seconds_ahead = kTimeIsUp;
+    }
+  };
+  Init();
+  EXPECT_EQ(QLIBPluginAction(QLIBPLUGIN_PRE, words_), -1);
+  char rest;
+  EXPECT_EQ(read(reading, &rest, 1), 0) << "the end comes once nobody holds the other end";
+  close(reading);
+}
+
+TEST_F(ZelocorePlugin, ADirectoryThatCannotBeListedRunsNothing) {
+  InstallNoter("a");
+  Init();
+  g_fcntl_error = EMFILE;
+  EXPECT_EQ(QLIBPluginAction(QLIBPLUGIN_PRE, words_), -1);
+  EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_OPEN);
+  g_fcntl_error = 0;
+  EXPECT_EQ(Noted(), "");
 }
 
 TEST_F(ZelocorePlugin, TheVerdictIsKnownToACallerThatIgnoresItsChildren) {

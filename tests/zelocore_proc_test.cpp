@@ -1,5 +1,6 @@
 // Processes.
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/stat.h>
@@ -8,14 +9,24 @@
 #include <zelocore.h>
 
 #include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
 #include <string>
 #include <thread>
+#include <utility>
 
 namespace {
 
 /* The fork that fails, counted from 1 over a process and its children; 0 for none. */
 int g_failing_fork = 0;
 int g_forks = 0;
+
+/* What status pages hold; the real ones when null, none when empty. */
+const char *g_status_page = nullptr;
+bool g_pipes_fail = false;
+int g_interruptions = 0;
 
 }  // namespace
 
@@ -27,6 +38,46 @@ extern "C" pid_t fork() noexcept {
     return -1;
   }
   return real();
+}
+
+extern "C" int open(const char *path, int flags, ...) {
+  static auto *const real =
+      reinterpret_cast<int (*)(const char *, int, ...)>(dlsym(RTLD_NEXT, "open"));
+  va_list arguments;
+  va_start(arguments, flags);
+  const mode_t mode = (flags & O_CREAT) != 0 ? va_arg(arguments, mode_t) : 0;
+  va_end(arguments);
+  if (g_status_page == nullptr || std::strstr(path, "/status") == nullptr) {
+    return real(path, flags, mode);
+  }
+  int ends[2];
+  if (g_status_page[0] == '\0' || pipe(ends) != 0) {
+    errno = ENOENT;
+    return -1;
+  }
+  const ssize_t written = write(ends[1], g_status_page, std::strlen(g_status_page));
+  close(ends[1]);
+  return written > 0 ? ends[0] : -1;
+}
+
+extern "C" int pipe2(int *ends, int flags) noexcept {
+  static auto *const real = reinterpret_cast<int (*)(int *, int)>(dlsym(RTLD_NEXT, "pipe2"));
+  if (g_pipes_fail) {
+    errno = EMFILE;
+    return -1;
+  }
+  return real(ends, flags);
+}
+
+extern "C" ssize_t read(int descriptor, void *buffer, size_t size) {
+  static auto *const real =
+      reinterpret_cast<ssize_t (*)(int, void *, size_t)>(dlsym(RTLD_NEXT, "read"));
+  if (g_interruptions > 0) {
+    --g_interruptions;
+    errno = EINTR;
+    return -1;
+  }
+  return real(descriptor, buffer, size);
 }
 #pragma GCC visibility pop
 
@@ -54,7 +105,12 @@ class ZelocoreProc : public testing::Test {
     QLIBCErrSetEx(0, "", 0);
     g_forks = g_failing_fork = 0;
   }
-  void TearDown() override { g_failing_fork = 0; }
+  void TearDown() override {
+    g_failing_fork = 0;
+    g_status_page = nullptr;
+    g_pipes_fail = false;
+    g_interruptions = 0;
+  }
 
   static int Shell(const char *script) { return QLIBCExec("/bin/sh", "-c", script, nullptr); }
   static bool HasChildren() {
@@ -91,6 +147,18 @@ TEST_F(ZelocoreProc, ArgumentsArriveAsTheyAre) {
   EXPECT_EQ(QLIBCExec("/bin/sh", "-c", "test \"$1\" = \"a b\" && test \"$2\" = \"\" && test $# = 2",
                       "name", "a b", "", nullptr),
             0);
+}
+
+template <size_t... kEach>
+int ExecWith(std::index_sequence<kEach...>) {
+  return QLIBCExec("/bin/true", (static_cast<void>(kEach), "x")..., static_cast<char *>(nullptr));
+}
+
+TEST_F(ZelocoreProc, AListThatIsTooLongToHaveAnEndIsRefused) {
+  constexpr size_t kMost = 256; /* with the program */
+  EXPECT_EQ(ExecWith(std::make_index_sequence<kMost - 1>()), 0);
+  EXPECT_EQ(ExecWith(std::make_index_sequence<kMost>()), -1);
+  EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_BAD_PARAMETER);
 }
 
 TEST_F(ZelocoreProc, AProgramThatCannotBeStartedFails) {
@@ -154,11 +222,12 @@ int ForkAndHear(pid_t *child, int *code = nullptr) {
   if (pipe(ends) != 0) {
     return -2;
   }
+  std::fflush(nullptr); /* or the child would write it once more */
   const int result = QLIBCProcForkChildNoWait();
   if (result == 0) {
     const pid_t self = getpid();
     const ssize_t written = write(ends[1], &self, sizeof self);
-    _exit(written == sizeof self ? 0 : 1);
+    std::exit(written == sizeof self ? 0 : 1);
   }
   if (code != nullptr) {
     *code = QLIBCErrGet();
@@ -204,6 +273,27 @@ TEST_F(ZelocoreProc, ASecondForkThatFailsIsReportedThoughChildrenAreIgnored) {
   g_failing_fork = 2;
   pid_t child = 0;
   EXPECT_EQ(ForkAndHear(&child), -1);
+}
+
+TEST_F(ZelocoreProc, WithoutAPipeNothingIsForked) {
+  g_pipes_fail = true;
+  pid_t child = 0;
+  int code = 0;
+  EXPECT_EQ(QLIBCProcForkChildNoWait(), -1);
+  EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_SYSTEM);
+  EXPECT_EQ(g_forks, 0);
+  g_pipes_fail = false;
+  EXPECT_EQ(ForkAndHear(&child, &code), 1);
+}
+
+TEST_F(ZelocoreProc, AnInterruptedForkGoesOn) {
+  g_interruptions = 2;
+  const int result = QLIBCProcForkChildNoWait();
+  if (result == 0) {
+    _exit(0);
+  }
+  EXPECT_EQ(result, 1);
+  EXPECT_EQ(g_interruptions, 0);
 }
 
 TEST_F(ZelocoreProc, TheChildHasNoneOfThePipe) {
@@ -255,6 +345,17 @@ TEST_F(ZelocoreProc, AZombieIsNotAlive) {
 
 TEST_F(ZelocoreProc, AThreadIsNoProcess) {
   std::thread([] { EXPECT_EQ(QLIBCProcAlive(gettid()), 0); }).join();
+}
+
+/* A process that can be signalled is taken for alive where nothing else is known. */
+TEST_F(ZelocoreProc, WithoutAStatusPageSignalsDecide) {
+  for (const char *page : {"", "Name:\tshell\n", "Name:\tshell\nState:\tZ (zombie)\n"}) {
+    g_status_page = page;
+    EXPECT_EQ(QLIBCProcAlive(getpid()), 1) << page;
+    EXPECT_EQ(QLIBCProcAlive(0x7fffffff), 0) << page;
+  }
+  g_status_page = "Name:\tshell\nState:\tZ (zombie)\nTgid:\t1\n";
+  EXPECT_EQ(QLIBCProcAlive(getpid()), 0);
 }
 
 TEST_F(ZelocoreProc, SomebodyElsesProcessIsAlive) {

@@ -35,6 +35,7 @@ struct Calls {
   int reads = 0;
   std::optional<timespec> now;
   std::optional<timespec> stamp; /* what every file is stamped with */
+  int interruptions = 0;         /* of reads and writes, one after the other */
   int fail_rename = 0;
   int fail_write = 0;
   int fail_read = 0;
@@ -52,6 +53,15 @@ void Stamp(struct stat *status) {
   if (g_calls.stamp) {
     status->st_ctim = status->st_mtim = *g_calls.stamp;
   }
+}
+
+bool IsInterrupted() {
+  if (g_calls.interruptions == 0) {
+    return false;
+  }
+  --g_calls.interruptions;
+  errno = EINTR;
+  return true;
 }
 
 bool Fails(int error) {
@@ -101,7 +111,7 @@ int fstat(int fd, struct stat *status) noexcept {
 
 ssize_t read(int fd, void *buffer, size_t size) {
   static auto *const real = Real<ssize_t(int, void *, size_t)>("read");
-  if (Fails(g_calls.fail_read)) {
+  if (IsInterrupted() || Fails(g_calls.fail_read)) {
     return -1;
   }
   ++g_calls.reads;
@@ -114,7 +124,7 @@ ssize_t read(int fd, void *buffer, size_t size) {
 
 ssize_t write(int fd, const void *buffer, size_t size) {
   static auto *const real = Real<ssize_t(int, const void *, size_t)>("write");
-  return Fails(g_calls.fail_write) ? -1 : real(fd, buffer, size);
+  return IsInterrupted() || Fails(g_calls.fail_write) ? -1 : real(fd, buffer, size);
 }
 
 int rename(const char *from, const char *to) noexcept {
@@ -314,9 +324,17 @@ TEST_F(ZelocoreSectionFile, TheLastOfEqualKeysAndTheFirstOfEqualSectionsCount) {
 }
 
 TEST_F(ZelocoreSectionFile, MalformedLinesAreIgnored) {
-  Write("outside=1\n[]\n[open\n[5]x\n[1]\n=\"no key\"\na=\"not closed\nb=\"x\" rest\n[c=\"d\"\n");
+  Write(
+      "outside=1\n[]\n[open\n[5]x\n[1]\n=\"no key\"\na=\"not closed\na=\"ends within \\\nb=\"x\" "
+      "rest\n"
+      "[c=\"d\"\n");
   EXPECT_EQ(Names(), (Texts{"1"}));
   EXPECT_EQ(Section("1"), (Keys{{"b", "x"}}));
+}
+
+TEST_F(ZelocoreSectionFile, AQuoteInATextEndsIt) {
+  Write("[1]\na=\"x\"y\"\nb=\"z\"\n");
+  EXPECT_EQ(Section("1"), (Keys{{"a", "x"}, {"b", "z"}}));
 }
 
 TEST_F(ZelocoreSectionFile, ALineOfQuotesIsIgnored) {
@@ -543,6 +561,20 @@ TEST_F(ZelocoreSectionFile, AFailedReadIsReported) {
   EXPECT_EQ(enumerated, -1);
   EXPECT_EQ(code, QLIBC_ERR_IO);
   EXPECT_TRUE(FailedWith(set, QLIBC_ERR_IO));
+}
+
+TEST_F(ZelocoreSectionFile, AnInterruptedReadGoesOn) {
+  Write("[1]\n");
+  g_calls.interruptions = 2;
+  EXPECT_EQ(Names(), Texts{"1"});
+  EXPECT_EQ(g_calls.interruptions, 0);
+}
+
+TEST_F(ZelocoreSectionFile, AnInterruptedWriteGoesOn) {
+  g_calls.interruptions = 2; /* there is nothing to be read */
+  EXPECT_EQ(Add("1", {{"a", "x"}}), 1);
+  EXPECT_EQ(g_calls.interruptions, 0);
+  EXPECT_EQ(Section("1"), (Keys{{"a", "x"}}));
 }
 
 TEST_F(ZelocoreSectionFile, AFailedWriteLeavesTheFileAndNoTemporary) {

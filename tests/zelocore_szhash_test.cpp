@@ -16,11 +16,12 @@
 namespace {
 
 long g_allocations = 0;
-bool g_memory_is_short = false;
+/* How many more succeed; none counts them down otherwise. */
+long g_allocations_left = LONG_MAX;
 
 void *Allocate(std::size_t size) {
   ++g_allocations;
-  void *memory = g_memory_is_short ? nullptr : std::malloc(size > 0 ? size : 1);
+  void *memory = g_allocations_left-- <= 0 ? nullptr : std::malloc(size > 0 ? size : 1);
   if (memory == nullptr) {
     throw std::bad_alloc();
   }
@@ -52,8 +53,8 @@ namespace {
 
 class ShortMemory {
  public:
-  ShortMemory() { g_memory_is_short = true; }
-  ~ShortMemory() { g_memory_is_short = false; }
+  explicit ShortMemory(long after = 0) { g_allocations_left = after; }
+  ~ShortMemory() { g_allocations_left = LONG_MAX; }
   ShortMemory(const ShortMemory &) = delete;
   ShortMemory &operator=(const ShortMemory &) = delete;
 };
@@ -249,6 +250,36 @@ TEST_F(ZelocoreSzHash, ShortMemoryIsReportedAndLosesNothing) {
   EXPECT_EQ(Get("b"), "(none)");
 }
 
+TEST_F(ZelocoreSzHash, WhicheverAllocationFailsAKeyIsSetOrNotThere) {
+  constexpr int kKeys = 100;
+  for (long after = 0;; ++after) {
+    PSZHASH hash = QLIBCSzHashAlloc(1);
+    ASSERT_NE(hash, nullptr);
+    int set = 0;
+    {
+      const ShortMemory scope(after);
+      while (set < kKeys &&
+             QLIBCSzHashSetValue(&hash, ("key " + std::to_string(set)).c_str(), "value") == 0) {
+        ++set;
+      }
+    }
+    QLIBCSzListFree(list_);
+    list_ = QLIBCSzListAlloc(kKeys);
+    EXPECT_EQ(QLIBCSzHashEnumKey(hash, &list_), set);
+    for (int i = 0; i < kKeys; ++i) {
+      const std::string key = "key " + std::to_string(i);
+      EXPECT_EQ(QLIBCSzHashGetValue(hash, key.c_str()) != nullptr, i < set) << key;
+      EXPECT_EQ(QLIBCSzHashSetValue(&hash, key.c_str(), key.c_str()), 0);
+      EXPECT_EQ(QLIBCSzHashGetValue(hash, key.c_str()), key);
+    }
+    QLIBCSzHashFree(hash);
+    if (set == kKeys) {
+      EXPECT_GT(after, 5);
+      break;
+    }
+  }
+}
+
 TEST_F(ZelocoreSzHash, OddCapacitiesAreTaken) {
   for (const int capacity : {INT_MIN, -1, 0, 1, 3, INT_MAX}) {
     PSZHASH hash = QLIBCSzHashAlloc(capacity);
@@ -344,6 +375,18 @@ TEST_F(ZelocoreSzList, ShortMemoryIsReportedAndLosesNothing) {
     EXPECT_EQ(QLIBCStrSep(huge.c_str(), ",", &list_), -1);
   }
   EXPECT_EQ(Listed(), (std::vector<std::string>{"one"}));
+}
+
+TEST_F(ZelocoreSzList, ATextThatCannotBeSplitToItsEndIsNotSplitAtAll) {
+  QLIBCSzListPush(&list_, "one");
+  const std::string text = "two," + std::string(1 << 20, 'x');
+  {
+    const ShortMemory scope(1); /* for a copy of the text */
+    EXPECT_EQ(QLIBCStrSep(text.c_str(), ",", &list_), -1);
+    EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_OUT_OF_MEMORY);
+  }
+  EXPECT_EQ(Listed(), (std::vector<std::string>{"one"}));
+  EXPECT_EQ(QLIBCStrSep(text.c_str(), ",", &list_), 2);
 }
 
 TEST_F(ZelocoreSzList, ATextIsSplitAtEverySeparator) {

@@ -6,6 +6,8 @@
 #include <zelosdk.h>
 
 #include <cerrno>
+#include <cstddef>
+#include <cstdlib>
 #include <cstring>
 #include <random>
 #include <string>
@@ -15,6 +17,7 @@ namespace {
 
 size_t g_least_room = 0;
 int g_user_error = 0;
+int g_interruptions = 0;
 
 using LookUp = int(uid_t, passwd *, char *, size_t, passwd **);
 
@@ -24,11 +27,35 @@ using LookUp = int(uid_t, passwd *, char *, size_t, passwd **);
 extern "C" int getpwuid_r(uid_t uid, passwd *entry, char *texts, size_t room, passwd **found) {
   static auto *const real = reinterpret_cast<LookUp *>(dlsym(RTLD_NEXT, "getpwuid_r"));
   *found = nullptr;
+  if (g_interruptions > 0) {
+    --g_interruptions;
+    return EINTR;
+  }
   if (g_user_error != 0) {
     return g_user_error;
   }
   return room < g_least_room ? ERANGE : real(uid, entry, texts, room, found);
 }
+
+#if !defined(__SANITIZE_ADDRESS__)
+namespace {
+constexpr long kPlenty = -1;
+long g_allocations_left = kPlenty;
+}  // namespace
+
+extern "C" void *__libc_malloc(size_t size);
+
+extern "C" void *malloc(size_t size) noexcept {
+  if (g_allocations_left == 0) {
+    errno = ENOMEM;
+    return nullptr;
+  }
+  if (g_allocations_left > 0) {
+    --g_allocations_left;
+  }
+  return __libc_malloc(size);
+}
+#endif
 #pragma GCC visibility pop
 
 namespace {
@@ -39,6 +66,7 @@ class ZelosdkUser : public testing::Test {
     QLIBCErrSetEx(0, "", 0);
     g_least_room = 0;
     g_user_error = 0;
+    g_interruptions = 0;
   }
   void TearDown() override { SetUp(); }
 };
@@ -63,6 +91,37 @@ TEST_F(ZelosdkUser, ALargeEntryIsReadWhole) {
   EXPECT_STREQ(user->szName, "root");
   ZELOUserFree(user);
 }
+
+TEST_F(ZelosdkUser, AnInterruptedLookUpGoesOn) {
+  g_interruptions = 3;
+  PZELOUSER user = nullptr;
+  ASSERT_EQ(ZELOUserGetByUID(0, &user), 0);
+  EXPECT_EQ(g_interruptions, 0);
+  EXPECT_STREQ(user->szName, "root");
+  ZELOUserFree(user);
+}
+
+#if !defined(__SANITIZE_ADDRESS__) /* which allocates itself */
+TEST_F(ZelosdkUser, ShortMemoryIsReported) {
+  ZELOUSER mine{};
+  PZELOUSER user = &mine;
+  long after = 0;
+  for (; after < 100; ++after) {
+    QLIBCErrSetEx(0, "", 0);
+    g_allocations_left = after;
+    const int result = ZELOUserGetByUID(0, &user);
+    g_allocations_left = kPlenty;
+    if (result == 0) {
+      break;
+    }
+    EXPECT_EQ(QLIBCErrGet(), QLIBC_ERR_OUT_OF_MEMORY) << after;
+    EXPECT_EQ(user, &mine);
+  }
+  EXPECT_GE(after, 2) << "the texts, and the record";
+  EXPECT_STREQ(user->szName, "root");
+  ZELOUserFree(user);
+}
+#endif
 
 TEST_F(ZelosdkUser, FailuresLeaveTheResultAlone) {
   struct Failure {

@@ -614,9 +614,6 @@ class NewCrontab {
   }
 
   int write(const char *bytes, size_t count) {
-    if (count == 0) {
-      return 0;
-    }
     if (fwrite(bytes, 1, count, stream_.get()) != count) {
       return fail(SCHED_HERE, kErrIo);
     }

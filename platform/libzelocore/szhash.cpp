@@ -6,7 +6,6 @@
 #include <algorithm>
 #include <bit>
 #include <cstring>
-#include <limits>
 #include <new>
 #include <string>
 
@@ -18,8 +17,6 @@ namespace {
  * past it like any other. */
 constexpr size_t kMostReserved = 65536;
 constexpr size_t kLeastArena = 2048;
-/* Offsets are 32 bits wide. */
-constexpr size_t kMostArena = std::numeric_limits<uint32_t>::max();
 
 uint64_t LoadWord(const char *at, size_t size) noexcept {
   uint64_t word = 0;
@@ -130,8 +127,8 @@ inline void QLIBC_SZHASH::Place(Entry &entry, std::string_view value) noexcept {
   char *at = arena_.get() + arena_used_;
   std::copy(value.begin(), value.end(), at);
   at[value.size()] = '\0';
-  entry.value = static_cast<uint32_t>(arena_used_);
-  entry.value_size = static_cast<uint32_t>(value.size());
+  entry.value = arena_used_;
+  entry.value_size = value.size();
   entry.value_room = entry.value_size;
   arena_used_ += value.size() + 1;
 }
@@ -143,10 +140,7 @@ std::unique_ptr<char[]> QLIBC_SZHASH::MakeRoom(size_t size) {
   for (const Entry &entry : entries()) {
     live += entry.value_size + 1;
   }
-  if (size > kMostArena - live) {
-    throw std::bad_alloc();
-  }
-  const size_t room = std::min(std::max(kLeastArena, 2 * (live + size)), kMostArena);
+  const size_t room = std::max(kLeastArena, 2 * (live + size));
   auto left = std::make_unique_for_overwrite<char[]>(room);
   arena_.swap(left);
   arena_room_ = room;
@@ -170,30 +164,23 @@ void QLIBC_SZHASH::Replace(Entry &entry, std::string_view value) {
   /* The new text may be a part of the old one. */
   std::memmove(arena_.get() + entry.value, value.data(), value.size());
   arena_[entry.value + value.size()] = '\0';
-  entry.value_size = static_cast<uint32_t>(value.size());
+  entry.value_size = value.size();
 }
 
-/* The key is stored after the value, which may be one of the keys. */
+/* The key is stored after the value, which may be one of the keys. A key whose entry
+ * finds no memory is nobody's, and does no harm where it lies. */
 void QLIBC_SZHASH::Add(std::string_view key, uint32_t hash, uint32_t slot, std::string_view value) {
-  if (key.size() >= kMostArena - keys_.size()) {
-    throw std::bad_alloc();
-  }
   const auto left = HasRoom(value.size() + 1) ? nullptr : MakeRoom(value.size() + 1);
   Entry entry{.hash = hash,
               .slot = slot,
-              .key = static_cast<uint32_t>(keys_.size()),
-              .key_size = static_cast<uint32_t>(key.size()),
+              .key = keys_.size(),
+              .key_size = key.size(),
               .value = 0,
               .value_size = 0,
               .value_room = 0};
   Place(entry, value);
   keys_.append(key).push_back('\0');
-  try {
-    entries_.push_back(entry);
-  } catch (...) {
-    keys_.resize(entry.key);
-    throw;
-  }
+  entries_.push_back(entry);
   slots_[slot] = static_cast<uint32_t>(++count_);
 }
 

@@ -27,11 +27,11 @@ struct QLIBC_SZHASH {
   struct Entry {
     uint32_t hash;
     uint32_t slot; /* where slots_ refers to this entry */
-    uint32_t key;
-    uint32_t key_size;
-    uint32_t value;
-    uint32_t value_size;
-    uint32_t value_room;
+    size_t key;
+    size_t key_size;
+    size_t value;
+    size_t value_size;
+    size_t value_room;
   };
 
   explicit QLIBC_SZHASH(size_t capacity);

@@ -4,8 +4,6 @@
 #include "szlist.h"
 
 #include <algorithm>
-#include <climits>
-#include <stdexcept>
 
 #include "support.h"
 
@@ -21,9 +19,6 @@ QLIBC_SZLIST::QLIBC_SZLIST(size_t capacity) {
 }
 
 void QLIBC_SZLIST::Push(std::string_view text) {
-  if (starts_.size() >= INT_MAX) {
-    throw std::length_error("text list");
-  }
   const size_t start = arena_.size();
   starts_.push_back(start);
   try {

@@ -1,13 +1,17 @@
 #include "failing_calls.h"
 
+#include <dirent.h>
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <grp.h>
+#include <poll.h>
 #include <pwd.h>
 #include <signal.h>
+#include <spawn.h>
 #include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -78,6 +82,14 @@ namespace {
   X(chmod, '~')                    \
   X(access, '~')                   \
   X(unlink, '~')                   \
+  X(chdir, '~')                    \
+  X(fstatat, '~')                  \
+  X(mkostemp, '~')                 \
+  X(futimens, '~')                 \
+  X(fdopendir, '~')                \
+  X(dup, '~')                      \
+  X(fcntl, '~')                    \
+  X(pipe2, '~')                    \
   X(seteuid, '=')                  \
   X(setegid, '=')                  \
   X(setreuid, '~')                 \
@@ -89,7 +101,13 @@ namespace {
   X(getpwuid_r, '~')               \
   X(setsid, '~')                   \
   X(close_range, '~')              \
+  X(sysconf, '~')                  \
   X(fork, '~')                     \
+  X(posix_spawn, '~')              \
+  X(pidfd_open, '~')               \
+  X(poll, '~')                     \
+  X(waitid, '~')                   \
+  X(waitpid, '~')                  \
   X(localtime, '~')                \
   X(localtime_r, '~')              \
   X(mktime, '~')                   \
@@ -197,6 +215,7 @@ struct Forced {
   bool reallySleep = false;
   unsigned timesShorter = 1;
   std::function<void(size_t)> sleepAction;
+  std::function<void(const std::string &)> execAction;
   std::vector<int> randValues;
   size_t randNext = 0;
 };
@@ -242,6 +261,7 @@ bool canFail(Call call) {
 
 int errorOf(Call call) {
   if (isAllocation(call)) return ENOMEM;
+  if (call == Call::k_waitid || call == Call::k_waitpid) return ECHILD;
   return call == Call::k_fork ? EAGAIN : state().step.error;
 }
 
@@ -477,6 +497,10 @@ void onSleep(std::function<void(size_t)> action) {
   forced().sleepAction = std::move(action);
 }
 
+void onExec(std::function<void(const std::string &)> action) {
+  forced().execAction = std::move(action);
+}
+
 void setRandValues(std::vector<int> values) {
   forced().randValues = std::move(values);
   forced().randNext = 0;
@@ -536,6 +560,7 @@ int QLIBCExec(const char *program, ...) {
     return text;
   };
   support::record(support::execs(), line);
+  if (support::forced().execAction) support::forced().execAction(line());
   FAIL_OR_CALL(QLIBCExec, line(), -1, program, arguments[0], arguments[1], arguments[2],
                arguments[3], arguments[4], arguments[5], arguments[6], arguments[7],
                static_cast<char *>(nullptr));
@@ -745,6 +770,47 @@ int unlink(const char *path) noexcept {
   FAIL_OR_CALL(unlink, path, -1, path);
 }
 
+int chdir(const char *path) noexcept {
+  FAIL_OR_CALL(chdir, path, -1, path);
+}
+
+int fstatat(int directory, const char *path, struct stat *status, int flags) noexcept {
+  FAIL_OR_CALL(fstatat, path, -1, directory, path, status, flags);
+}
+
+int mkostemp(char *pattern, int flags) {
+  FAIL_OR_CALL(mkostemp, pattern, -1, pattern, flags);
+}
+
+int futimens(int descriptor, const timespec *times) noexcept {
+  FAIL_OR_CALL(futimens, nullptr, -1, descriptor, times);
+}
+
+DIR *fdopendir(int descriptor) {
+  FAIL_OR_CALL(fdopendir, nullptr, static_cast<DIR *>(nullptr), descriptor);
+}
+
+int dup(int descriptor) noexcept {
+  FAIL_OR_CALL(dup, nullptr, -1, descriptor);
+}
+
+// What SQLite locks with it has plans of its own: sqlite3_exec.
+int fcntl(int descriptor, int command, ...) {
+  va_list list;
+  va_start(list, command);
+  void *argument = va_arg(list, void *);
+  va_end(list);
+  REAL(fcntl);
+  if (command != F_DUPFD_CLOEXEC && command != F_SETFD) {
+    return real_fcntl(descriptor, command, argument);
+  }
+  FAIL_OR_CALL(fcntl, nullptr, -1, descriptor, command, argument);
+}
+
+int pipe2(int *ends, int flags) noexcept {
+  FAIL_OR_CALL(pipe2, nullptr, -1, ends, flags);
+}
+
 // ---- streams
 
 FILE *fopen(const char *path, const char *mode) {
@@ -880,8 +946,42 @@ int close_range(unsigned first, unsigned last, int flags) noexcept {
   FAIL_OR_CALL(close_range, nullptr, -1, first, last, flags);
 }
 
+long sysconf(int name) noexcept {
+  FAIL_OR_CALL(sysconf, nullptr, -1L, name);
+}
+
 pid_t fork() noexcept {
   FAIL_OR_CALL(fork, nullptr, pid_t{-1});
+}
+
+int posix_spawn(pid_t *pid, const char *program, const posix_spawn_file_actions_t *actions,
+                const posix_spawnattr_t *attributes, char *const *arguments,
+                char *const *environment) {
+  if (const auto *plan = failing(Call::k_posix_spawn, program)) return plan->error;
+  REAL(posix_spawn);
+  return real_posix_spawn(pid, program, actions, attributes, arguments, environment);
+}
+
+int pidfd_open(pid_t pid, unsigned flags) noexcept {
+  FAIL_OR_CALL(pidfd_open, nullptr, -1, pid, flags);
+}
+
+int poll(pollfd *events, nfds_t count, int timeout) {
+  FAIL_OR_CALL(poll, nullptr, -1, events, count, timeout);
+}
+
+int waitid(idtype_t type, id_t id, siginfo_t *info, int options) {
+  REAL(waitid);
+  const int result = real_waitid(type, id, info, options);
+  const auto *plan = failing(Call::k_waitid);
+  return plan != nullptr ? resultOf(*plan, -1) : result;
+}
+
+pid_t waitpid(pid_t pid, int *status, int options) {
+  REAL(waitpid);
+  const pid_t result = real_waitpid(pid, status, options);
+  const auto *plan = failing(Call::k_waitpid);
+  return plan != nullptr ? resultOf(*plan, pid_t{-1}) : result;
 }
 
 int system(const char *command) {

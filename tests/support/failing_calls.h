@@ -18,19 +18,21 @@
 //   section name       QLIBCFile{Get,Set,Add,Remove}Section                equal
 //   path or text       QLIBCFileExist, QLIBCFileTouch, QLIBCFileEnumSection, QLIBCExec (program and
 //                      arguments), QLIBCStrSep, open, fopen, rename (both paths), mkstemp, mkdir,
-//                      chmod, access, unlink, stat, lstat, system, sqlite3_open, sqlite3_exec
-//                      (SQL), fdopen (mode), initgroups (name)                    contained
+//                      mkostemp, chmod, access, unlink, chdir, fstatat, stat, lstat, system,
+//                      posix_spawn, sqlite3_open, sqlite3_exec (SQL), fdopen (mode),
+//                      initgroups (name)                                   contained
 //
 // Calls without a key: QLIBCSzHashAlloc QLIBCSzListAlloc QLIBCSzListPush QLIBCSzHashEnumKey
 // QLIBCProcForkChildNoWait SzBase64EncodeFull ZELOEncodingBase64Decode QLIBPluginInit
 // QLIBPluginExit fsync fstat fchown fchmod ftruncate fflush fclose getline (getdelim too) read
 // write fwrite (and all other writing to a stream) flock setreuid setresuid setregid setresgid
 // setgroups localtime localtime_r mktime malloc calloc realloc sleep usleep nanosleep rand srand
-// setsid close_range fork getpwuid_r sqlite3_close.
+// setsid close_range fork getpwuid_r futimens fdopendir dup fcntl (for F_DUPFD_CLOEXEC and F_SETFD)
+// pipe2 sysconf pidfd_open poll waitid waitpid sqlite3_close.
 //
-// Streams and descriptors 0 to 2 are never touched. fclose, sqlite3_close and QLIBPluginExit that
-// are made to fail have done their work all the same. sqlite3_open that is made to fail leaves a
-// handle with a message, as the real one does.
+// Streams and descriptors 0 to 2 are never touched. fclose, waitid, waitpid (somebody else took the
+// status), sqlite3_close and QLIBPluginExit that are made to fail have done their work all the
+// same. sqlite3_open that is made to fail leaves a handle with a message, as the real one does.
 #pragma once
 
 #include <sys/types.h>
@@ -146,6 +148,9 @@ std::map<pid_t, unsigned> sleepsByProcess(const std::string &call);
 // Sleeps are real, or so many times shorter than real.
 void realSleep(bool really, unsigned timesShorter = 1);
 void onSleep(std::function<void(size_t)> action);
+
+// Called before each QLIBCExec, with "program argument argument".
+void onExec(std::function<void(const std::string &)> action);
 
 // rand() gives these values in turn, over and over; an empty list gives rand() back.
 void setRandValues(std::vector<int> values);
