@@ -21,7 +21,7 @@ FILE *pfLock;
 
 namespace {
 
-constexpr char kLockDirectory[] = "/tmp/lock/";
+constexpr char kLockDirectory[] = "/tmp/lock";
 constexpr char kLockFile[] = "/tmp/lock/lock_sched_run";
 constexpr mode_t kLockDirectoryMade = 0700;  // until it is complete
 constexpr mode_t kLockDirectoryMode = 0755;
@@ -75,25 +75,42 @@ int ZELOSchedCheckRunTime(const ZELO_SCHED_TASK &task, bool *pIsDue) {
 
 // ---- the run lock -----------------------------------------------------------------------------
 
-bool isKind(const char *szPath, mode_t kind) {
-  struct stat info = {};
-  return stat(szPath, &info) == 0 && (info.st_mode & S_IFMT) == kind;
+// Anyone may have put something under a name below "/tmp". Whoever owns the lock file, or can write
+// to it, could hold its lock for ever.
+bool isOurs(const struct stat &info) {
+  return info.st_uid == 0 || info.st_uid == geteuid();
+}
+
+bool isOurLockFile(const struct stat &info) {
+  return isOurs(info) && S_ISREG(info.st_mode) && info.st_nlink == 1 &&
+         (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
 }
 
 bool makeLockDirectory() {
-  return isKind(kLockDirectory, S_IFDIR) || (mkdir(kLockDirectory, kLockDirectoryMade) == 0 &&
-                                             chmod(kLockDirectory, kLockDirectoryMode) == 0);
+  struct stat info = {};
+  if (lstat(kLockDirectory, &info) == 0 && !isOurs(info)) {
+    return false;
+  }
+  if (stat(kLockDirectory, &info) == 0 && S_ISDIR(info.st_mode)) {
+    return true;
+  }
+  return mkdir(kLockDirectory, kLockDirectoryMade) == 0 &&
+         chmod(kLockDirectory, kLockDirectoryMode) == 0;
 }
 
-// Neither a link is followed nor a pipe waited for: anyone may have put something under a name
-// below "/tmp".
+// Neither a link is followed nor a pipe waited for.
 FILE *openLockFile(int flags, const char *szMode) {
   const int descriptor =
       open(kLockFile, flags | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, kLockFileMode);
   if (descriptor < 0) {
     return nullptr;
   }
-  FILE *stream = fdopen(descriptor, szMode);
+  struct stat info = {};
+  const bool isUsable = fstat(descriptor, &info) == 0 && isOurLockFile(info);
+  if (isUsable && (info.st_mode & ~static_cast<mode_t>(S_IFMT)) != kLockFileMode) {
+    fchmod(descriptor, kLockFileMode);  // who can read it can hold its lock
+  }
+  FILE *stream = isUsable ? fdopen(descriptor, szMode) : nullptr;
   if (stream == nullptr) {
     close(descriptor);
   }
@@ -101,8 +118,9 @@ FILE *openLockFile(int flags, const char *szMode) {
 }
 
 bool makeLockFile() {
-  if (isKind(kLockFile, S_IFREG)) {
-    return true;
+  struct stat info = {};
+  if (lstat(kLockFile, &info) == 0 && S_ISREG(info.st_mode)) {
+    return isOurLockFile(info);
   }
   FILE *stream = openLockFile(O_WRONLY | O_CREAT | O_TRUNC, "w");
   if (stream == nullptr) {

@@ -829,6 +829,7 @@ TEST_F(StoreTest, ASyncThatCannotListFailsTheChangeThoughItIsStored) {
   task->ID = static_cast<int32_t>(id);
   const Lines wanted = {backendLine("get task list failed. " + kInjected),
                         backendLine("sync crontab failed. " + kInjected)};
+  const std::string crontab = readFile(support::kCrontab);
 
   fail("QLIBCFileEnumSection", "", {.code = kInjectedCode});
   EXPECT_EQ(backend_.edit(task.get()), -1);
@@ -846,6 +847,7 @@ TEST_F(StoreTest, ASyncThatCannotListFailsTheChangeThoughItIsStored) {
   fail("QLIBCFileEnumSection", "", {.code = kInjectedCode});
   EXPECT_EQ(backend_.remove(id), -1);
   EXPECT_EQ(logged(), wanted);
+  EXPECT_EQ(readFile(support::kCrontab), crontab);
   EXPECT_EQ(listedIds(), Ids{2});
 }
 

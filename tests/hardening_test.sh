@@ -2,8 +2,8 @@
 # The protections that the built files carry. A build for the sanitizers, or one without
 # ZELO_HARDEN, has others.
 #
-# Functions are called by check:
-# shellcheck disable=SC2317
+# Functions are called by check, and awk expands what is in quotes:
+# shellcheck disable=SC2317,SC2016
 set -euo pipefail
 
 here=$(cd "$(dirname "$0")" && pwd -P)
@@ -38,28 +38,65 @@ calls() {
   readelf -sW --dyn-syms "$1" | grep -E "UND $2(@|$)" >/dev/null
 }
 
+is_among() {
+  local name=$1
+  shift
+  [[ " $* " == *" $name "* ]]
+}
+
+# Whether each unit under a directory was. A test that has a unit of the library of its own is no part
+# of what is installed.
+readonly COMMANDS='
+  /"directory":/ { is_test = $0 ~ /\/(tests|fuzz|bench)"/ }
+  /"command":/ && !is_test && $0 ~ directory { units++; if (index($0, " " option " ") == 0) without++ }
+  END { exit !(units > 0 && without == 0) }'
+is_compiled_with() {
+  awk -v option="$1" -v directory=" -c [^ ]*/$2/[^ ]*[.]c" "$COMMANDS" \
+    "$BUILD_DIR/compile_commands.json"
+}
+
 if [[ $(setting ZELO_HARDEN) != ON || -n $(setting ZELO_SANITIZE) ]]; then
   skip "the built files are protected" "this build leaves that to the sanitizers or to nobody"
   finish
 fi
 
 readonly LIBRARIES=("$BUILD_DIR"/lib/lib*.so)
-readonly TOOLS=("$BUILD_DIR"/bin/zeloschedt*)
+readonly TOOLS=("$BUILD_DIR"/bin/zelosched*)
+readonly SOURCES=(libzeloscheduler platform tools)
+# These cannot show it, as nothing in them needs it: no function with an array, no call that writes
+# into a buffer or by a format. What they were compiled with is looked at below.
+readonly WITHOUT_ARRAYS=(zeloschedtask)
+readonly WITHOUT_BUFFERS=(libzelosdk.so)
+readonly FORTIFIED='__[a-z]+_chk'
+
+is_optimised=true
+if [[ $(setting CMAKE_BUILD_TYPE) == Debug ]]; then is_optimised=false; fi
+
+check "all libraries and tools are there" test "${#LIBRARIES[@]} ${#TOOLS[@]}" = "3 2"
 for file in "${LIBRARIES[@]}" "${TOOLS[@]}"; do
   name=$(basename "$file")
   check "$name: what was relocated is read-only" relocations_are_read_only "$file"
   check "$name: every name is bound at the start" binds_at_start "$file"
   check "$name: the stack is not executable" stack_is_not_executable "$file"
   check "$name: no code is written to" has_no_text_relocations "$file"
-done
-for file in "${LIBRARIES[@]}"; do
-  check "$(basename "$file"): stacks are guarded" calls "$file" __stack_chk_fail
+  if ! is_among "$name" "${WITHOUT_ARRAYS[@]}"; then
+    check "$name: stacks are guarded" calls "$file" __stack_chk_fail
+  fi
+  if $is_optimised && ! is_among "$name" "${WITHOUT_BUFFERS[@]}"; then
+    check "$name: calls that write into a buffer know its size" calls "$file" "$FORTIFIED"
+  fi
 done
 for file in "${TOOLS[@]}"; do
   check "$(basename "$file") can be loaded anywhere" is_position_independent "$file"
 done
-if [[ $(setting CMAKE_BUILD_TYPE) != Debug ]]; then
-  check "calls that write into a buffer know its size" \
-    calls "$BUILD_DIR/lib/libzeloscheduler.so" '__.*_chk'
-fi
+for directory in "${SOURCES[@]}"; do
+  check "$directory: every unit has its stacks guarded" \
+    is_compiled_with -fstack-protector-strong "$directory"
+  check "$directory: every unit has its stacks probed" \
+    is_compiled_with -fstack-clash-protection "$directory"
+  if $is_optimised; then
+    check "$directory: every unit knows the sizes of buffers" \
+      is_compiled_with -D_FORTIFY_SOURCE=2 "$directory"
+  fi
+done
 finish

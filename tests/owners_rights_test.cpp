@@ -177,9 +177,12 @@ TEST_P(FailedStepTest, NothingIsRun) {
 INSTANTIATE_TEST_SUITE_P(EachStep, FailedStepTest,
                          testing::Values(Step{"seteuid", "0"}, Step{"setegid", "4343"},
                                          Step{"initgroups", kOwnerName}, Step{"seteuid", "4242"},
-                                         Step{"setresgid", ""}, Step{"setresuid", ""}),
+                                         Step{"setresgid", ""}, Step{"setresuid", ""},
+                                         Step{"clearenv", ""}, Step{"putenv", "HOME="}),
                          [](const testing::TestParamInfo<Step> &step) {
-                           return std::string(step.param.call) + step.param.key;
+                           std::string name = std::string(step.param.call) + step.param.key;
+                           std::erase(name, '=');
+                           return name;
                          });
 
 TEST_F(OwnersRightsTest, RealIdsThatCannotBeSetAreReported) {

@@ -3,7 +3,6 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/stat.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -18,20 +17,6 @@
 #include "power.h"
 #include "sandbox_fixture.h"
 #include "zelocore.h"
-
-namespace {
-
-int killError = 0;  // with which the next signals fail
-
-}  // namespace
-
-extern "C" __attribute__((visibility("default"))) int kill(pid_t pid, int signal) noexcept {
-  if (killError != 0) {
-    errno = killError;
-    return -1;
-  }
-  return static_cast<int>(syscall(SYS_kill, pid, signal));
-}
 
 namespace {
 
@@ -746,12 +731,12 @@ TEST_F(UpdateCrontabTest, TheDaemonOfThePidFileGetsAHangUpSignal) {
 
 TEST_F(UpdateCrontabTest, ADaemonThatCannotBeSignalledIsAFailure) {
   writeFile(support::kCronPidFile, std::to_string(getpid()) + "\n");
-  killError = EPERM;
+  failCall("kill", {.times = support::kAlways, .error = EPERM});
   EXPECT_TRUE(failedWith(update(), kSystem));
   EXPECT_EQ(errorRecord().file, "crontab.cpp");
-  killError = ESRCH;
+  support::resetFailingCalls();
+  failCall("kill", {.times = support::kAlways, .error = ESRCH});
   EXPECT_EQ(update(), 0) << "it ended meanwhile";
-  killError = 0;
 }
 
 TEST_F(UpdateCrontabTest, WithoutADaemonThereIsNothingToDo) {

@@ -11,6 +11,7 @@
 #include <cerrno>
 #include <csignal>
 #include <cstring>
+#include <filesystem>
 #include <functional>
 
 #include "captured_log.h"
@@ -592,7 +593,7 @@ TEST_F(TaskRunTest, TheLockDirectoryIsMadeForEverybodyWhateverTheMask) {
 
 TEST_F(TaskRunTest, TheLockDirectoryIsTheOwnersAloneUntilItIsComplete) {
   const mode_t mask = umask(0);
-  failCallFor("chmod", "/tmp/lock/", {.from = 1, .times = 1, .error = EPERM});
+  failCallFor("chmod", "/tmp/lock", {.from = 1, .times = 1, .error = EPERM});
   const long id = saveTask(makeTask("task", kRanCommand));
   setRandValues({0});
   runToEnd(id);
@@ -615,6 +616,7 @@ TEST_F(TaskRunTest, ALockFileThatIsThereIsNotMadeAnew) {
   writeFile(kLockFile, "kept");
   runToEnd(saveRanTask());
   EXPECT_EQ(readFile(kLockFile), "kept");
+  EXPECT_EQ(modeOf(kLockFile), 0600U) << "who can read it can hold its lock";
   EXPECT_TRUE(ran());
 }
 
@@ -682,6 +684,17 @@ TEST_F(TaskRunTest, WhateverStandsInTheWayOfTheLockEndsTheRunWithoutARow) {
          mkdir(kLockDirectory, 0755);
          EXPECT_EQ(mkfifo(kLockFile, 0644), 0);
        }},
+      {"a file with a second name",
+       [] {
+         mkdir(kLockDirectory, 0755);
+         writeFile(kLockFile, "", 0600);
+         EXPECT_EQ(link(kLockFile, "/tmp/lock/other"), 0);
+       }},
+      {"a file that others can write",
+       [] {
+         mkdir(kLockDirectory, 0755);
+         writeFile(kLockFile, "", 0666);
+       }},
   };
   for (const auto &[what, make] : obstacles) {
     SCOPED_TRACE(what);
@@ -694,6 +707,41 @@ TEST_F(TaskRunTest, WhateverStandsInTheWayOfTheLockEndsTheRunWithoutARow) {
     EXPECT_FALSE(fileExists("/tmp/run_test.victim"));
     expectNothingRan();
   }
+}
+
+// Whoever owns the file can hold its lock for ever, and whoever owns the directory can change
+// files.
+TEST_F(TaskRunTest, ALockOfSomebodyElseIsNotWaitedFor) {
+  REQUIRE_OTHER_USERS();
+  for (const char *path : {kLockFile, kLockDirectory}) {
+    SCOPED_TRACE(path);
+    cleanWorld();
+    const long id = saveRanTask();
+    ASSERT_EQ(mkdir(kLockDirectory, 0755), 0);
+    writeFile(kLockFile, "", 0600);
+    ASSERT_EQ(lchown(path, 65534, 65534), 0);
+    const int descriptor = open(kLockFile, O_RDONLY | O_CLOEXEC);
+    ASSERT_EQ(flock(descriptor, LOCK_EX), 0);
+    runToEnd(id);
+    close(descriptor);
+    EXPECT_EQ(logged().size(), size_t{kMostRetries});
+    EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>{});
+    EXPECT_FALSE(fileExists(kStatusDatabase));
+    expectNothingRan();
+  }
+}
+
+TEST_F(TaskRunTest, ALinkOfSomebodyElseToADirectoryIsNotFollowed) {
+  REQUIRE_OTHER_USERS();
+  const std::string target = "/tmp/run_test.directory";
+  std::filesystem::remove_all(target);
+  ASSERT_EQ(mkdir(target.c_str(), 0755), 0);
+  ASSERT_EQ(symlink(target.c_str(), kLockDirectory), 0);
+  ASSERT_EQ(lchown(kLockDirectory, 65534, 65534), 0);
+  runToEnd(saveRanTask());
+  EXPECT_TRUE(std::filesystem::is_empty(target));
+  expectNothingRan();
+  std::filesystem::remove_all(target);
 }
 
 TEST_F(TaskRunTest, ALockFileThatCannotBeMadeFailsTheAttemptAtOnce) {
@@ -781,6 +829,20 @@ TEST_F(TaskRunTest, ARunWaitsWhileAnotherProcessHoldsTheLock) {
 }
 
 // A look-up that fails without a code of its own shows the record that the release left.
+// Or two runs could find that the other is not there yet.
+TEST_F(TaskRunTest, TheLockIsHeldFromTheLookForConflictsUntilTheRowIsIn) {
+  for (const char *statement : {"from task_status WHERE task_id=", "INSERT INTO task_status"}) {
+    SCOPED_TRACE(statement);
+    cleanWorld();
+    seen().clear();
+    const long id = saveRanTask();
+    failCallFor("sqlite3_exec", statement, {.text = "database is locked"});
+    onSleep([](size_t) { see("locked", tryRunLock()); });
+    runToEnd(id);
+    EXPECT_EQ(seen().texts(), Lines{"locked " + std::to_string(EWOULDBLOCK)});
+  }
+}
+
 TEST_F(TaskRunTest, ALockThatCannotBeReleasedLeavesItsCodeAndTheRunGoesOn) {
   const std::pair<const char *, FailPlan> releases[] = {{"flock", {.from = 2, .error = EINVAL}},
                                                         {"fclose", {.error = EIO}}};

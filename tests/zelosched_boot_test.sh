@@ -69,7 +69,7 @@ is_done() {
 }
 
 forget_tmp() {
-  rm -rf "$STORE" "$PROGRAM" "$STATUS"* /tmp/lock
+  rm -rf "$STORE"* "$PROGRAM"* "$STATUS"* /tmp/lock*
 }
 
 clean() {
@@ -208,6 +208,58 @@ make_fifo() {
   mkfifo "$PERSISTENT"
 }
 
+# Three tasks in both copies, of which the persistent one is then damaged by "$@".
+damaged_inside() {
+  saved
+  add --daily 04:30 --name three -- true
+  z restore >/dev/null
+  cp "$LAST_GOOD" "$SCRATCH/good"
+  "$@"
+  boot
+  try z restore
+  cmp "$LAST_GOOD" "$SCRATCH/good"
+}
+
+is_refused_for_the_last_good() {
+  damaged_inside "$@" && says 1 "$PERSISTENT is not as it was written" &&
+    says 1 "The tasks are those of an earlier boot" && same "$(names)" "one three two "
+}
+
+is_used_without_a_last_good_copy() {
+  saved
+  lose_a_key
+  boot
+  try z restore
+  says 1 "It was used all the same" && [[ ! -e $LAST_GOOD ]] && same "$(names)" "two "
+}
+
+is_used_all_the_same() {
+  damaged_inside "$@" && says 1 "$PERSISTENT is not as it was written: its checksum does not fit. It was used all the same" &&
+    cmp "$STORE" "$PERSISTENT" && same "$(names)" "one three tow " || return 1
+  add --daily 05:30 -- true
+  boot
+  try z restore
+  is_done && cmp "$LAST_GOOD" "$PERSISTENT"
+}
+
+change_a_letter() {
+  sed -i 's/^name="two"/name="tow"/' "$PERSISTENT"
+}
+
+# One task's keys are gone, its section is there.
+lose_a_key() {
+  sed -i '0,/^run hour=/s//run_hour=/' "$PERSISTENT"
+}
+
+write_over_the_middle() {
+  head -c 512 /dev/zero | tr '\0' x | dd of="$PERSISTENT" bs=1 seek=600 conv=notrunc status=none
+}
+
+lose_the_header_and_the_end() {
+  printf X | dd of="$PERSISTENT" conv=notrunc status=none
+  truncate -s 700 "$PERSISTENT"
+}
+
 gives_up_without_a_good_copy() {
   damaged cut_off
   truncate -s -40 "$LAST_GOOD"
@@ -273,6 +325,11 @@ plant_fifo() {
   mkfifo "$STORE"
 }
 
+plant_second_name() {
+  cp "$PERSISTENT" "$STORE"
+  ln "$STORE" "$STORE.other"
+}
+
 plant_half() {
   head -c -40 "$PERSISTENT" >"$STORE"
 }
@@ -294,24 +351,33 @@ does_not_follow_a_link_for_the_program() {
   is_done && [[ ! -L $PROGRAM ]] && same "$(cat "$SCRATCH/victim")" untouched && puts_all_back_as_roots
 }
 
-tells_of_a_directory() {
+moves_a_directory_away() {
   saved
   boot
   mkdir "$1"
+  touch "$1/his"
   try z restore
-  says 1 "$2" && [[ -d $1 ]]
+  [[ $status == 0 && $err == *"$1 is a directory: it is taken away"*"$1 is now $1."* ]] || { echo "$status $err"; return 1; }
+  same "$(names) $(ls "$1".??????)" "one two  his" && puts_all_back_as_roots
 }
 
+# A directory on which something is mounted cannot be moved.
 does_the_rest_beside_a_directory() {
   saved
   boot
-  mkdir "$PROGRAM"
+  mkdir "$1"
+  mount -n -t tmpfs none "$1"
   try z restore
-  says 1 "cannot replace $PROGRAM: Is a directory" && same "$(names)" "one two "
+  umount -n "$1"
+  says 1 "cannot move $1 away: Device or resource busy" && same "$(find /tmp -name "${1##*/}.??????")" ""
+}
+
+puts_the_store_back_beside_a_directory() {
+  does_the_rest_beside_a_directory "$PROGRAM" && same "$(names)" "one two "
 }
 
 leaves_no_scratch_file() {
-  same "$(find /tmp /usr/zelo/etc -name '*.??????' -not -name '*.last-good' | grep -v "^$BUILD_DIR" || true)" ""
+  same "$(find /tmp /run /usr/zelo/etc -name '*.??????' -not -name '*.sqlite' | grep -v "^$BUILD_DIR" || true)" ""
 }
 
 does_not_wear_the_memory() {
@@ -474,6 +540,12 @@ check "and one that others can write" falls_back_on_the_last_good "is not root's
 check "and one that is missing" falls_back_on_the_last_good "$PERSISTENT is missing" remove
 check "and a directory" falls_back_on_the_last_good "is a directory" make_directory
 check "and a FIFO" falls_back_on_the_last_good "is no regular file" make_fifo
+check "one with another letter is used, but not kept as good until the tasks are saved" \
+  is_used_all_the_same change_a_letter
+check "one with a task that cannot be read is refused for the last good one" is_refused_for_the_last_good lose_a_key
+check "and one that was written over" is_refused_for_the_last_good write_over_the_middle
+check "and one that neither begins nor ends as stores do" is_refused_for_the_last_good lose_the_header_and_the_end
+check "without a last good one it is used" is_used_without_a_last_good_copy
 check "when neither copy is fit, that is said and nothing made" gives_up_without_a_good_copy
 check "and when there is no last good one" gives_up_without_a_last_good_copy
 check "tasks that stand in /tmp are kept from an older persistent copy" keeps_what_stands
@@ -484,12 +556,15 @@ check_as_root "another user's file in place of the store is replaced" \
 check "so is one that others can write" replaces_what_is_not_ours "is not root's alone" plant_shared
 check "and a link, which is not followed" replaces_what_is_not_ours "is no regular file" plant_link
 check "and a FIFO, which is not waited for" replaces_what_is_not_ours "is no regular file" plant_fifo
+check "and a file with a second name" replaces_what_is_not_ours "has a second name" plant_second_name
 check "and half a store" replaces_what_is_not_ours "cannot be read: reading or writing failed" plant_half
 check_as_root "what is not ours goes also when there is nothing to put back" removes_what_is_not_ours
 check "a link in place of the program is not followed" does_not_follow_a_link_for_the_program
-check "a directory in place of the store is told" \
-  tells_of_a_directory "$STORE" "$STORE is a directory: no task runs until it is moved away"
-check "a directory in place of the program is told, and the store put back" does_the_rest_beside_a_directory
+for name in "$STORE" "$PROGRAM"; do
+  check "a directory in place of $name is moved away" moves_a_directory_away "$name"
+done
+check "one that cannot be moved is told" does_the_rest_beside_a_directory "$STORE"
+check "and the store is put back beside it" puts_the_store_back_beside_a_directory
 check "no scratch file is left" leaves_no_scratch_file
 check "the last good copy is not written again without need" does_not_wear_the_memory
 check_as_root "restore is for root" is_for_root restore
@@ -509,6 +584,194 @@ check_as_root "on a full disk no half store is made" makes_no_half_store_on_a_fu
 check "restore takes no operand" is_refused_as "'now' is more than" restore now
 check "and explains its option" explains restore --force
 check_as_root "on a full disk the program stays as it was" leaves_the_old_program_on_a_full_disk
+
+# ---- the other names in /tmp ----------------------------------------------------------------
+
+names_in_tmp() {
+  find /tmp/lock "$STATUS" "$STATUS"-* -printf '%p %u:%g %m %y\n' 2>/dev/null | sort
+}
+
+readonly ALL_TAKEN="/tmp/lock root:root 755 d
+/tmp/lock/lock_sched_run root:root 600 f
+$STATUS root:root 600 f
+$STATUS-journal root:root 600 f"
+
+takes_all_names() {
+  "$@"
+  boot
+  (umask 077 && z restore >/dev/null)
+  same "$(names_in_tmp)" "$ALL_TAKEN"
+}
+
+# restore finds what "$@" has planted, says why, and takes the names.
+takes_back() {
+  local why=$1
+  shift
+  saved
+  boot
+  echo untouched >"$SCRATCH/victim"
+  "$@"
+  try z status
+  [[ $status == 1 && $out == *"WRONG  "*"$why: it keeps tasks from running until 'zelosched restore' takes it away"* ]] ||
+    { echo "$out"; return 1; }
+  try z restore
+  [[ $status == 0 && $err == *"$why: it is taken away"* ]] || { echo "$status $err"; return 1; }
+  same "$(names_in_tmp), $(cat "$SCRATCH/victim")" "$ALL_TAKEN, untouched" || return 1
+  try z run --wait 1
+  is_done
+}
+
+as_nobody() {
+  setpriv --reuid "$NOBODY" --regid "$NOBODY" --clear-groups "$@"
+}
+
+plant_database() {
+  as_nobody touch "$STATUS$1"
+}
+
+plant_database_link() {
+  ln -s "$SCRATCH/victim" "$STATUS"
+}
+
+plant_dangling_link() {
+  ln -s "$SCRATCH/nothing" "$STATUS"
+}
+
+plant_shared_database() {
+  install -m 0666 /dev/null "$STATUS"
+}
+
+plant_database_directory() {
+  mkdir "$STATUS"
+}
+
+plant_second_database() {
+  install -m 0600 /dev/null "$STATUS"
+  ln "$STATUS" "$STATUS.other"
+}
+
+plant_lock() {
+  as_nobody sh -c 'mkdir /tmp/lock; : >/tmp/lock/lock_sched_run; flock -o /tmp/lock/lock_sched_run sleep 100 >/dev/null 2>&1 &
+    until ! flock -n /tmp/lock/lock_sched_run true; do :; done'
+}
+
+plant_lock_link() {
+  ln -s "$SCRATCH" /tmp/lock
+}
+
+plant_lock_file() {
+  touch /tmp/lock
+}
+
+plant_shared_lock_directory() {
+  mkdir -m 0777 /tmp/lock
+}
+
+plant_lock_in_ours() {
+  mkdir /tmp/lock
+  install -o "$NOBODY" -m 0600 /dev/null /tmp/lock/lock_sched_run
+}
+
+closes_what_others_can_open() {
+  saved
+  z restore >/dev/null
+  z run --wait 1 >/dev/null
+  chmod 0644 "$STATUS" /tmp/lock/lock_sched_run
+  try z status
+  [[ $out == *"WRONG  $STATUS can be opened by others"* && $out == *"WRONG  /tmp/lock/lock_sched_run can be opened by others"* ]] ||
+    { echo "$out"; return 1; }
+  try z restore
+  is_done && same "$(names_in_tmp)" "$ALL_TAKEN" && same "$(z history | wc -l)" 2
+}
+
+takes_the_others_beside_one_that_cannot_be_taken() {
+  saved
+  boot
+  mkdir /tmp/lock
+  mount -n -t tmpfs -o mode=0777 none /tmp/lock
+  try z restore
+  umount -n /tmp/lock
+  rmdir /tmp/lock
+  says 1 "cannot move /tmp/lock away: Device or resource busy" && [[ -e $STATUS && ! -e /tmp/lock ]]
+}
+
+tells_of_a_database_that_cannot_be_made() {
+  saved
+  boot
+  echo "this is no database, but long enough to be looked at as one" >"$STATUS"
+  chmod 0600 "$STATUS"
+  try z restore
+  says 1 "cannot make $STATUS" && same "$(names 2>/dev/null)" "one two "
+}
+
+check "restore takes the names of the lock and the status database" takes_all_names saved
+check "also when no task was ever saved" takes_all_names clean
+for suffix in '' -journal -wal -shm; do
+  check_as_root "another user's $STATUS$suffix is told and taken away" \
+    takes_back "$STATUS$suffix is another user's" plant_database "$suffix"
+done
+check "so is a link" takes_back "$STATUS is no regular file" plant_database_link
+check "and one that leads nowhere" takes_back "$STATUS is no regular file" plant_dangling_link
+check "and a database that others can write" takes_back "$STATUS can be written by others" plant_shared_database
+check "and a directory" takes_back "$STATUS is no regular file" plant_database_directory
+check "and a file with a second name" takes_back "$STATUS has a second name" plant_second_database
+check_as_root "and another user's lock that is held" takes_back "/tmp/lock is another user's" plant_lock
+check "and a link to a directory" takes_back "/tmp/lock is no directory" plant_lock_link
+check "and a file in place of the directory" takes_back "/tmp/lock is no directory" plant_lock_file
+check "and a directory that others can write" takes_back "/tmp/lock can be written by others" plant_shared_lock_directory
+check_as_root "and another user's file in it" takes_back "/tmp/lock/lock_sched_run is another user's" plant_lock_in_ours
+check "what others can open is closed to them, and keeps what it holds" closes_what_others_can_open
+check "what cannot be taken does not keep the others from it" takes_the_others_beside_one_that_cannot_be_taken
+check "a status database that is none is told" tells_of_a_database_that_cannot_be_made
+
+# ---- what killed writers left ---------------------------------------------------------------
+
+readonly LEFT="/etc/crontab.aB3xY9 /usr/zelo/etc/power_sched.conf.0aZ9bc /usr/zelo/etc/scheduled_tasks.last-good.Qx7pLm"
+readonly STAYS="/etc/crontab.backup /etc/crontab.BACKUP /etc/crontab.202611 /etc/crontab.old001 /etc/crontab.aB3xY \
+/etc/crontab.aB3xY99 /etc/crontab-aB3xY9 /etc/crontab.aB3-Y9 /etc/acrontab.aB3xY9 /usr/zelo/etc/crontab.aB3xY9"
+
+removes_what_killed_writers_left() {
+  clean
+  # shellcheck disable=SC2086
+  touch -d '2 minutes ago' $LEFT $STAYS
+  touch /etc/crontab.cD4zY8
+  try z restore
+  local name bad=0
+  for name in $LEFT; do
+    [[ ! -e $name && $out == *"$name was left by a program that was ended: it is removed"* ]] || { echo "$name"; bad=1; }
+  done
+  for name in $STAYS /etc/crontab.cD4zY8; do [[ -e $name ]] || { echo "$name"; bad=1; }; done
+  # shellcheck disable=SC2086
+  rm -f $STAYS /etc/crontab.cD4zY8
+  return "$bad"
+}
+
+leaves_other_things_of_such_a_name() {
+  ln -s "$SCRATCH/nothing" /etc/crontab.aB3xY1
+  mkdir /etc/crontab.aB3xY2
+  touch /etc/crontab.aB3xY3
+  chown "$NOBODY" /etc/crontab.aB3xY3
+  touch -h -d '2 minutes ago' /etc/crontab.aB3xY?
+  z restore >/dev/null
+  local count
+  count=$(find /etc -name 'crontab.aB3xY?' | wc -l)
+  rm -rf /etc/crontab.aB3xY?
+  same "$count" 3
+}
+
+tells_what_cannot_be_taken_away() {
+  touch -d '2 minutes ago' /usr/zelo/etc/power_sched.conf.0aZ9bc
+  mount -n --bind /usr/zelo/etc /usr/zelo/etc
+  mount -n -o remount,bind,ro /usr/zelo/etc
+  try z restore
+  umount -n /usr/zelo/etc
+  rm /usr/zelo/etc/power_sched.conf.0aZ9bc
+  says 1 "cannot remove /usr/zelo/etc/power_sched.conf.0aZ9bc: Read-only file system"
+}
+
+check "what killed writers left is removed" removes_what_killed_writers_left
+check_as_root "but no link, no directory, and nothing of another user's" leaves_other_things_of_such_a_name
+check "what cannot be removed is told" tells_what_cannot_be_taken_away
 
 # ---- history that outlives a boot -----------------------------------------------------------
 
@@ -600,17 +863,30 @@ is_roots_alone() {
   same "$(owner_and_mode "$KEPT"), $(owner_and_mode /usr/zelo/var)" "root:root 600, root:root 755"
 }
 
-drops_what_is_too_old() {
+keeps_what_is_old() {
   clean
-  run 1 "2025-11-01 08:00" 3
+  run 1 "2020-11-01 08:00" 3
   run 1 "2026-11-01 08:00" 3
   keep
-  same "$(sql "$KEPT" 'SELECT count(*) FROM run'), $out" "1, 1 run kept"
+  same "$(sql "$KEPT" 'SELECT count(*) FROM run'), $out" "2, 2 runs kept"
 }
 
-drops_what_became_too_old() {
-  try at "2028-01-01 12:00" history --keep
-  is_done && same "$(sql "$KEPT" 'SELECT count(*) FROM run')" 0
+# As after a boot with a clock that has lost its battery.
+keeps_all_by_a_clock_that_is_wrong() {
+  boot
+  run 1 "2099-01-01 08:00" 3
+  try at "2099-01-01 12:00" history --keep
+  is_done && same "$(sql "$KEPT" 'SELECT count(*) FROM run')" 3
+}
+
+keeps_behind_a_link() {
+  clean
+  run 1 "2026-11-20 08:00" 3
+  rm -rf "$SCRATCH/volume"
+  mkdir "$SCRATCH/volume"
+  ln -s "$SCRATCH/volume" /usr/zelo/var
+  keep
+  is_done && boot && history_is "1, 2026-11-20 08:00:00, finished" && [[ -s $SCRATCH/volume/history.sqlite ]]
 }
 
 # Many are of one second, as when the clock stood.
@@ -755,9 +1031,10 @@ check "what ran when the machine went off is known to be gone" knows_what_ran_at
 check "also where /tmp outlived the boot and another process has its number" \
   knows_what_ran_before_a_boot_that_left_tmp
 check "the kept history is root's alone" is_roots_alone
-check "of more than a year ago none is kept" drops_what_is_too_old
-check "and after a year it is dropped" drops_what_became_too_old
-check "and of more than a hundred thousand the oldest" drops_what_is_too_much
+check "runs are kept however old they are" keeps_what_is_old
+check "also by a clock that is wrong" keeps_all_by_a_clock_that_is_wrong
+check "of more than a hundred thousand the oldest are dropped" drops_what_is_too_much
+check "the directory may be a link to a data volume" keeps_behind_a_link
 check "a file that is no database is refused" refuses_to_keep_in "file is not a database" no_database
 check "so is that of a later version" refuses_to_keep_in "a later zelosched made it" later_database
 check "and one that others can write" refuses_to_keep_in "it is not this user's own file alone" shared_database
@@ -908,6 +1185,28 @@ misses_nothing_without_an_earlier_boot() {
   same "$(missed)" ""
 }
 
+misses_nothing_in_the_future() {
+  clean
+  one_task
+  at "$OFF" history --keep
+  boot
+  at "2099-01-01 08:00" restore >/dev/null
+  same "$(at "2099-01-01 08:05" catch-up --dry-run | grep -c "due at 2099-01-01 02:30")" 1 || return 1
+  same "$(missed --within 7d)" "" && ! at "$LATER" status | grep 'when the machine was off' || return 1
+  at "$LATER" history --keep
+  same "$(sql "$KEPT" 'SELECT count(*) FROM missed')" 0
+}
+
+# Nor does it take away what was missed before.
+misses_all_behind_a_clock_that_is_wrong_for_once() {
+  went_off one_task
+  z disable 1 >/dev/null
+  boot
+  at "2099-01-01 08:00" restore >/dev/null
+  z enable 1 >/dev/null
+  same "$(missed)" "one 2026-11-20 02:30"
+}
+
 misses_nothing_by_a_clock_set_back() {
   clean
   one_task
@@ -947,6 +1246,25 @@ one_long_task() {
   add --daily 02:30 --name one -- "echo \$\$ >$SCRATCH/long; exec sleep 100"
 }
 
+keeps_missed_what_cannot_be_recorded() {
+  went_off one_task
+  rm "$STATUS"*
+  : >"$STATUS-wal"
+  chmod 0666 "$STATUS-wal"
+  try at "$LATER" catch-up
+  rm "$STATUS-wal"
+  says 1 "cannot record a run" && same "$(missed)" "one 2026-11-20 02:30"
+}
+
+keeps_missed_what_cannot_have_its_turn() {
+  went_off one_task
+  rm -rf /tmp/lock
+  : >/tmp/lock
+  try at "$LATER" catch-up
+  rm /tmp/lock
+  says 1 "/tmp/lock is no directory" && same "$(missed)" "one 2026-11-20 02:30"
+}
+
 holds_nobody_up() {
   rm -f "$SCRATCH/long"
   went_off one_long_task
@@ -973,7 +1291,7 @@ check "catch-up runs each once" runs_each_once
 check "and finds none afterwards" finds_none_afterwards
 check "also before the runs are recorded" finds_none_before_it_is_recorded
 check "two at once run each once" two_at_once_run_each_once
-check "a task that ran since is not missed" is_not_missed_any_more z run 1 --wait
+check "a task that ran since is not missed" is_not_missed_any_more at "$LATER" run 1 --wait
 check "nor one that is disabled" is_not_missed_any_more z disable 1
 check "nor one that is removed" is_not_missed_any_more z remove 1 --yes
 check "nor one of its id" is_not_missed_any_more removed_and_another_added
@@ -983,9 +1301,13 @@ check "a restore by hand finds nothing missed" restored_by_hand_misses_nothing
 check "a task that was added later has missed nothing" a_task_of_later_missed_nothing
 check "without an earlier boot nothing was missed" misses_nothing_without_an_earlier_boot
 check "nor by a clock that was set back" misses_nothing_by_a_clock_set_back
+check "nor in the future, by a clock that was wrong" misses_nothing_in_the_future
+check "which takes nothing away" misses_all_behind_a_clock_that_is_wrong_for_once
 check "after a week it is told no more" forgets_after_a_week
 check "what passed before the tasks were back is missed too" misses_what_passed_until_the_tasks_were_back
 check "a run that cannot be started is told, and remains missed" tells_what_cannot_be_started
+check "and so does one that cannot be recorded" keeps_missed_what_cannot_be_recorded
+check "or cannot have its turn" keeps_missed_what_cannot_have_its_turn
 check "a run that goes on keeps nobody from changing tasks" holds_nobody_up
 check_as_root "catch-up is for root" is_for_root catch-up
 for span in 8d 169h 0m -1h 12 h 1.5h ''; do

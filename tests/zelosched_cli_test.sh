@@ -282,6 +282,9 @@ refuses_import_as_a_whole() {
     's/"start year":0/"start year":4294969323/' 's/"owner":0/"owner":-1/' 's/"start day":0/"start day":32/' \
     's/"name":"kept"/"name":"a\\nb"/' 's/"cmd":"true"/"cmd":" "/' 's/"cmd":"true"/"cmd base64":"AA=="/' \
     's/"cmd":"true"/"cmd":"true","cmd base64":"dHJ1ZQ=="/' "s/\"cmd\":\"true\"/\"cmd\":\"$(printf %012288d 0)\"/" \
+    's/"type":"daily"/"type":"monthly"/;s/"start day":0/"start day":1/;s/"start month":0/"start month":99/' \
+    's/"type":"daily"/"type":"monthly"/;s/"start day":0/"start day":1/;s/"start year":0/"start year":10000/' \
+    's/"start year":0/"start year":4294967295/' \
     's/"type":"daily"/"type":"once"/;s/"start day":0,//' 's/"type":"daily"/"type":"weekly"/;s/,"week":"1111111"//'; do
     { echo "[$(sed '1d;$d' "$SCRATCH/tasks"),"; sed '1d;$d' "$SCRATCH/tasks" | sed "$edit"; echo "]"; } >"$SCRATCH/bad"
     leaves_all_as_it_was z import "$SCRATCH/bad" || { echo "saved: $edit"; bad=1; }
@@ -312,12 +315,44 @@ imports_power_times_whole_or_not_at_all() {
   return "$bad"
 }
 
+# times COUNT: an array with so many of the object that is read
+times() {
+  local object
+  object=$(cat)
+  echo "["
+  yes "$object," | head -n "$(($1 - 1))"
+  echo "$object]"
+}
+
+# More is said of them than is written at once.
 imports_to_the_end_when_the_reader_is_gone() {
   clean
-  add --daily 08:30 -- true >/dev/null
-  { echo "["; for i in {1..60}; do z export 1 | sed '1d;$d'; echo ","; done; z export 1 | sed '1d;$d'; echo "]"; } >"$SCRATCH/many"
+  add --daily 08:30 --name "$(printf %0200d 0)" -- true >/dev/null
+  z export 1 | sed '1d;$d' | times 61 >"$SCRATCH/many"
   { z import --new "$SCRATCH/many" 2>/dev/null || true; } | true
   same "$(task_lines)" 62
+}
+
+# The library would take another day of its own.
+an_import_without_its_day_is_refused() {
+  local type key bad=0
+  clean
+  add --daily 08:30 -- true >/dev/null
+  z export 1 | sed 's/"start year":0/"start year":2099/;s/"start month":0/"start month":1/;s/"start day":0/"start day":1/' >"$SCRATCH/day"
+  while read -r type key; do
+    sed "s/\"type\":\"daily\"/\"type\":\"$type\"/;s/\"$key\":[^,}]*,*//" "$SCRATCH/day" >"$SCRATCH/without"
+    leaves_all_as_it_was z import --new "$SCRATCH/without" || bad=1
+    [[ $err == *"object 1 of 1: \"$key\" is missing"* ]] || { echo "$type without $key: $err"; bad=1; }
+  done <<'KEYS'
+once start year
+once start month
+once start day
+weekly week
+monthly start day
+yearly start month
+yearly start day
+KEYS
+  return "$bad"
 }
 
 an_empty_import_is_told() {
@@ -384,6 +419,67 @@ writes_no_line_that_cron_cannot_read() {
     [[ $out == *"once no task has a field that cron cannot read"* ]]
 }
 
+# Another program has saved the hour, so that the crontab has it only after the next change.
+spoil_the_hour_of_the_first() {
+  sed -i '0,/^run hour=.*/s//run hour="25"/' "$STORE"
+}
+
+no_change_writes_a_line_that_cron_cannot_read() {
+  local command bad=0
+  all_well
+  add --daily 09:30 -- true >/dev/null
+  add --daily 10:30 --disabled -- true >/dev/null
+  z export 2 >"$SCRATCH/one"
+  spoil_the_hour_of_the_first
+  for command in 'add --daily 10:30 -- true' 'edit 2 --daily 11:30' 'disable 2' 'enable 3' 'remove --yes 3' \
+    "import $SCRATCH/one" "import --new $SCRATCH/one"; do
+    # shellcheck disable=SC2086
+    leaves_all_as_it_was z $command || { echo "changed by: $command"; bad=1; }
+    [[ $err == *"nothing was saved, as cron may then pass over all of /etc/crontab: task 1 (Task 1): the hour 25 is none of a day"*"or disable the task"* ]] ||
+      { echo "$command: $err"; bad=1; }
+  done
+  z power add off --daily 23:00 >/dev/null || bad=1
+  return "$bad"
+}
+
+# One after the other; each but the last is mended beside another one.
+a_task_that_cron_cannot_read_can_be_changed() {
+  all_well
+  add --daily 09:30 -- true >/dev/null
+  add --daily 10:30 -- true >/dev/null
+  sed -i 's/^run hour=.*/run hour="25"/' "$STORE"
+  z disable 1 >/dev/null && z remove --yes 2 >/dev/null && z edit 3 --daily 09:30 >/dev/null &&
+    gives 0 "the crontab is in step with the tasks" sync && same "$(task_lines)" 1
+}
+
+arms_the_clock_beside_a_task_that_cron_cannot_read() {
+  all_well
+  z power add on --daily 07:00 >/dev/null
+  spoil_the_hour_of_the_first
+  : >/sys/class/rtc/rtc0/wakealarm
+  fails_saying 1 "the crontab was not written" z sync && [[ -s /sys/class/rtc/rtc0/wakealarm ]]
+}
+
+writes_the_tasks_beside_a_damaged_power_list() {
+  all_well
+  z power add off --daily 23:00 >/dev/null
+  sed -i '/zeloschedtask/d' /etc/crontab
+  truncate -s 30 /usr/zelo/etc/power_sched.conf
+  try z sync
+  local result=$((status == 1 ? 0 : 1))
+  [[ $err == *"cannot list the tasks"* ]] && same "$(task_lines)" 1 || result=1
+  rm /usr/zelo/etc/power_sched.conf
+  return "$result"
+}
+
+arms_the_clock_beside_tasks_that_are_not_there() {
+  all_well
+  z power add on --daily 07:00 >/dev/null
+  : >/sys/class/rtc/rtc0/wakealarm
+  truncate -s 100 "$STORE"
+  fails_saying 1 "cannot list the tasks" z sync && [[ -s /sys/class/rtc/rtc0/wakealarm ]]
+}
+
 tells_of_a_clock_that_is_not_armed() {
   all_well
   local alarm=/sys/class/rtc/rtc0/wakealarm result=0
@@ -407,21 +503,20 @@ fails_saying_of_all() {
   [[ $status == 1 && $err == *"$part"* ]] || { echo "$status: $out$err"; return 1; }
 }
 
-nothing_but_what_was_shown_is_removed() {
-  clean
-  add --daily 08:30 --name first -- true >/dev/null
-  add --daily 09:30 --name shown -- true >/dev/null
-  python3 - "$ZELOSCHED" >"$SCRATCH/log" <<'PTY'
+# answer_after COMMAND... -- ARGUMENTS...: "yes" to zelosched ARGUMENTS, when COMMAND has run since the
+# question
+answer_after() {
+  python3 - "$ZELOSCHED" "$@" <<'PTY'
 import os, pty, subprocess, sys
-zelosched = sys.argv[1]
+zelosched, *words = sys.argv[1:]
+dashes = words.index("--")
 pid, terminal = pty.fork()
 if pid == 0:
-    os.execv(zelosched, [zelosched, "remove", "2"])
+    os.execv(zelosched, [zelosched, *words[dashes + 1:]])
 seen = b""
 while b"[y/N]" not in seen:
     seen += os.read(terminal, 1024)
-subprocess.run([zelosched, "remove", "--yes", "2"], check=True)
-subprocess.run([zelosched, "add", "--daily", "10:30", "--name", "precious", "--", "true"], check=True)
+subprocess.run(words[:dashes], check=True)
 os.write(terminal, b"y\n")
 try:
     while chunk := os.read(terminal, 1024):
@@ -430,8 +525,46 @@ except OSError:
     pass
 print(seen.decode(), os.waitstatus_to_exitcode(os.waitpid(pid, 0)[1]))
 PTY
+}
+
+replace_the_second() {
+  z remove --yes 2 && z add --daily 10:30 --name precious -- true
+}
+
+nothing_but_what_was_shown_is_removed() {
+  clean
+  add --daily 08:30 --name first -- true >/dev/null
+  add --daily 09:30 --name shown -- true >/dev/null
+  export -f replace_the_second z
+  export ZELOSCHED
+  answer_after bash -c replace_the_second -- remove 2 >"$SCRATCH/log"
   grep -q "stays: it has been changed meanwhile" "$SCRATCH/log" &&
     same "$(z list --json | json '[t["name"] for t in tasks]')" "['first', 'precious']"
+}
+
+# Which renames the ones after it.
+eight_power_times_are_removed_at_once() {
+  clean
+  local hour ids
+  for hour in {1..8}; do z power add on --daily "0$hour:00" >/dev/null; done
+  ids=$(z power list --json | json '" ".join(str(t["id"]) for t in tasks)')
+  local id bad=0
+  local -a removals=()
+  for id in $ids; do
+    z power remove --yes "$id" >/dev/null 2>>"$SCRATCH/log" &
+    removals+=($!)
+  done
+  for id in "${removals[@]}"; do wait "$id" || bad=1; done
+  same "$bad $(ids_of_list)" "0 []"
+}
+
+# The power time that is asked about moves up in the list meanwhile.
+a_power_time_that_was_shown_is_removed() {
+  clean
+  z power add on --daily 01:00 >/dev/null
+  z power add on --daily 02:00 >/dev/null
+  answer_after "$ZELOSCHED" power remove --yes 71270100 -- remove 71270200 >"$SCRATCH/log" &&
+    grep -q "removed" "$SCRATCH/log" && same "$(ids_of_list)" "[]"
 }
 
 next_of_several_tells_what_is_missing() {
@@ -444,10 +577,17 @@ next_of_several_tells_what_is_missing() {
 next_of_many_is_quick() {
   clean
   add --daily 08:30 -- true >/dev/null
-  { echo "["; for i in {1..400}; do z export 1 | sed "1d;\$d;s/\"run min\":30/\"run min\":$((i % 60))/"; echo ","; done; z export 1 | sed '1d;$d'; echo "]"; } >"$SCRATCH/many"
+  z export 1 | sed '1d;$d' | times 401 | awk '{ sub(/"run min":30/, "\"run min\":" NR % 60); print }' >"$SCRATCH/many"
   z import --new "$SCRATCH/many" >/dev/null
   same "$(timeout 20 "$ZELOSCHED" next --count 10000 --json | json 'len(tasks)')" 10000 &&
     same "$("$ZELOSCHED" next --count 5 --json | json '[t["run"][11:13] for t in tasks]')" "['08', '08', '08', '08', '08']"
+}
+
+next_beside_rare_tasks_is_quick() {
+  clean
+  for day in 1 2 3; do add --yearly "01-0$day" 08:30 -- true >/dev/null; done
+  add --daily 00:15 --every 1h -- true >/dev/null
+  same "$(timeout 20 "$ZELOSCHED" next --count 10000 --json | json 'len(tasks)')" 10000
 }
 
 a_minute_that_never_comes_is_told() {
@@ -520,6 +660,29 @@ shows_the_coming_runs() {
     fails_saying 1 "there is no task 9" z next 9
 }
 
+aligns_ids() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  z power add on --daily 07:30 >/dev/null
+  same "$(at '2026-11-21 07:00' next --count 2)" "2026-11-21 Saturday
+  07:30  71270730  PowerOn task 0
+  08:30         1  Task 1"
+}
+
+sorts_a_far_year_last() {
+  clean
+  add --weekly mon 08:30 --start 9999-12-31 -- true >/dev/null
+  add --daily 08:30 -- true >/dev/null
+  same "$(ids_of_list)" "[2, 1]" && [[ $(z list | tail -1) == *10000-01-03* ]]
+}
+
+shows_a_start_from_the_beginning_of_a_year() {
+  all_well
+  sed -i 's/^start year=.*/start year="2098"/' "$STORE" "$PERSISTENT"
+  [[ $(z show 1) == *"From: 2098-01-01 on"*"Next run: 2098-01-01 08:30"* ]] && z edit 1 --name b >/dev/null &&
+    gives 0 "task 1 (b) disabled" disable 1 && gives 0 "task 1 (b) enabled" enable 1
+}
+
 looking_makes_no_database() {
   three_tasks
   try z status
@@ -571,11 +734,22 @@ task 1 (Task 1) finishedcomplained" run --output 1
 tells_that_a_run_gave_up() {
   clean
   add --daily 08:30 -- true >/dev/null
-  touch /tmp/lock # where a directory should be
+  z run --wait 1 >/dev/null
+  python3 -c 'import sqlite3, sys
+with sqlite3.connect("/tmp/sched_status.sqlite") as database:
+    database.execute("UPDATE task_status SET status_code=2, pid=?", [int(sys.argv[1])])' $$
   FAKE_PATIENCE=1 LD_PRELOAD=$FAKE try z run --wait 1
-  rm /tmp/lock
   same "$status: ${err%% (the*}" "1: zelosched: task 1 (Task 1) did not run: it could not be\
  recorded, or other runs were in its way for too long"
+}
+
+tells_that_a_run_cannot_have_its_turn() {
+  clean
+  add --daily 08:30 -- true >/dev/null
+  touch /tmp/lock # where a directory should be
+  try z run --wait 1
+  rm /tmp/lock
+  same "$status: $err" "1: zelosched: cannot run task 1 (Task 1): /tmp/lock is no directory"
 }
 
 tells_that_a_run_died() {
@@ -649,6 +823,12 @@ power_lists_are_bounded() {
   { echo '[poweron]'; printf 'times="'; for i in {0..99}; do printf '0 127 %d %d;' $((i / 60)) $((i % 60)); done |
     sed 's/;$//'; echo '"'; } >/usr/zelo/etc/power_sched.conf
   fails_saying 1 "there are 100 power-on times already" z power add on --daily 23:00 &&
+    z enable 61270000 >/dev/null && z disable 71270000 >/dev/null &&
+    gives 0 "task 61270500 (Poweron 0) saved: daily at 05:00" edit 61270000 --daily 05:00 &&
+    z export 61270500 >"$SCRATCH/edited" && sed -i 's/"run hour":5/"run hour":6/' "$SCRATCH/edited" &&
+    z import "$SCRATCH/edited" >/dev/null && same "$(z power list | grep -c ' on ')" 100 &&
+    sed -i 's/"run hour":6/"run hour":7/' "$SCRATCH/edited" &&
+    fails_saying 1 "there are 100 power-on times already" z import --new "$SCRATCH/edited" &&
     gives 0 "91272300" power add off --daily 23:00 --quiet
 }
 
@@ -691,6 +871,7 @@ status_is_well() {
   all_well
   gives 0 "ok     cron is running (process $(cat /var/run/crond.pid))
 ok     /tmp/zeloschedtask is there, and root's
+ok     no other user is in the way of a run
 ok     the working and the persistent copy of the tasks agree
 ok     the crontab is in step with the tasks
 ok     no enabled task has a fault
@@ -801,10 +982,44 @@ tells_of_a_database_that_is_none() {
   fails_saying 1 "cannot read /tmp/sched_status.sqlite" z history
 }
 
-tasks_are_listed_beside_a_database_that_cannot_be_read() {
+tasks_are_shown_beside_a_database_that_cannot_be_read() {
   tells_of_a_database_that_is_not_roots || return 1
   try z list
-  [[ $status == 1 && $(tail -1 <<<"$out" | awk '{ print $1, $7 }') == "1 ?" && $err == *"cannot read /tmp/sched_status.sqlite"* ]]
+  [[ $status == 1 && $(tail -1 <<<"$out" | awk '{ print $1, $7 }') == "1 ?" && $err == *"cannot read /tmp/sched_status.sqlite"* ]] || return 1
+  add --daily 09:30 -- true >/dev/null
+  try z show 1 2
+  [[ $status == 1 && $(grep -c 'Last run: ?' <<<"$out") == 2 && $(grep -c 'Command: true' <<<"$out") == 2 &&
+    $err == *"cannot read /tmp/sched_status.sqlite"* ]] || { echo "$out$err"; return 1; }
+}
+
+kept_runs_are_shown_beside_a_database_that_cannot_be_read() {
+  all_well
+  z run --wait 1 >/dev/null && z history --keep >/dev/null
+  rm /tmp/sched_status.sqlite*
+  install -m 0666 /dev/null /tmp/sched_status.sqlite
+  try z history
+  rm -r /usr/zelo/var
+  [[ $status == 1 && $(tail -1 <<<"$out") == *"finished"* && $err == *"cannot read /tmp/sched_status.sqlite"* ]] ||
+    { echo "$out$err"; return 1; }
+}
+
+tells_of_a_dangling_link_in_place_of_the_database() {
+  all_well
+  ln -s "$SCRATCH/nothing" /tmp/sched_status.sqlite
+  local command
+  for command in list 'show 1' history status 'run 1' 'run --wait 1'; do
+    # shellcheck disable=SC2086
+    try z $command
+    [[ $status == 1 && $out$err == *" /tmp/sched_status.sqlite"*": "* && ! -e $SCRATCH/nothing ]] ||
+      { echo "$command: $status $out $err"; return 1; }
+  done
+  fails_saying 1 "cannot read /tmp/sched_status.sqlite: it is no regular file" z history
+}
+
+tells_of_a_run_that_cannot_be_recorded() {
+  all_well
+  install -m 0666 /dev/null /tmp/sched_status.sqlite
+  fails_saying 1 "cannot record a run in /tmp/sched_status.sqlite: a file or the database could not be opened" z run 1
 }
 
 every_result_is_told_in_words() {
@@ -880,7 +1095,14 @@ waiting_for_the_lock_ends() {
 import_tells_what_it_cannot_read() {
   all_well
   echo '{"a":' >"$SCRATCH/broken"
-  fails_saying 1 "it is no JSON: Line 2, Column 1" z import "$SCRATCH/broken" &&
+  local text
+  for text in null 5 '"x"' true; do
+    echo "$text" >"$SCRATCH/value"
+    fails_saying 1 "it is neither an object nor an array" z import "$SCRATCH/value" || return 1
+  done
+  { z export 1; printf '\0garbage'; } >"$SCRATCH/zero"
+  fails_saying 1 "it holds a zero byte" z import "$SCRATCH/zero" &&
+    fails_saying 1 "it is no JSON: Line 2, Column 1" z import "$SCRATCH/broken" &&
     fails_saying 1 "cannot open $SCRATCH/none: No such file" z import "$SCRATCH/none" &&
     fails_saying 1 "cannot read $SCRATCH: Is a directory" z import "$SCRATCH" &&
     { head -c 5000 /dev/zero | tr '\0' '['; } >"$SCRATCH/deep" &&
@@ -958,6 +1180,10 @@ completes() {
     ",|history,|1  (Nightly backup),2  (Mirror),|1,|2,|--sort,|list,add,remove,|owner,"
 }
 
+completes_file_names() {
+  [[ $(PATH=$BUILD_DIR/bin:$PATH bash -c 'source <(zelosched completion bash); complete -p zelosched') == *"-o default"* ]]
+}
+
 every_option_is_completed() {
   local name options bad=0
   for name in $(z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'); do
@@ -978,6 +1204,7 @@ check "every command has its help" every_command_has_help
 check "help fits a terminal" help_fits_the_terminal
 check "the version is told" gives 0 "zelosched 4.0.0" --version
 check "wrong arguments are usage errors" wrong_arguments_are_usage_errors
+check "a blank command is none" fails_saying "$USAGE" "there is no command after '--'" z add --daily 08:30 -- ' '
 check "a task is saved as it was told" saves_what_it_was_told
 check "several words of a command reach the shell as they are" quotes_words
 check "one word of a command is a shell command line" takes_one_word_as_it_is
@@ -989,11 +1216,15 @@ check "what would do harm is refused and changes nothing" refuses
 check "an import with one bad task changes nothing" refuses_import_as_a_whole
 check "nor does one with a power time that has no room" imports_power_times_whole_or_not_at_all
 check "an import goes on when its reader is gone" imports_to_the_end_when_the_reader_is_gone
+check "an import of a task without its day is refused" an_import_without_its_day_is_refused
 check "an import without tasks is told" an_empty_import_is_told
 check "a minute that never comes is told" a_minute_that_never_comes_is_told
 check "nothing but what was shown is removed" nothing_but_what_was_shown_is_removed
+check "and a power time that was shown, whatever its place" a_power_time_that_was_shown_is_removed
+check "power times that are removed at once are all removed" eight_power_times_are_removed_at_once
 check "of several tasks the missing ones are told" next_of_several_tells_what_is_missing
 check "the coming runs of many tasks are quick" next_of_many_is_quick
+check "those of an hourly task beside yearly ones too" next_beside_rare_tasks_is_quick
 check "both forms of an export are imported unchanged" imports_what_it_exports
 check "an import takes one object, or one a line" imports_one_object_or_lines
 check "the doubly encoded form is the library's" agrees_with_the_library_on_the_wire_form
@@ -1003,12 +1234,16 @@ check "only wanted tasks are listed" lists_chosen_tasks
 check "tasks are sorted by each key" sorts
 check "a task is shown" shows_a_task
 check "the coming runs are shown day by day" shows_the_coming_runs
+check "ids of all lengths are aligned" aligns_ids
+check "a year of five digits comes last" sorts_a_far_year_last
+check "a task may start with a year" shows_a_start_from_the_beginning_of_a_year
 check "looking makes no status database" looking_makes_no_database
 check "a run's result is told" runs_and_tells_the_result
 check "a wait is for its own run alone" waits_for_its_own_run_only
 check "without --wait the run goes on by itself" lets_the_run_go_on
 check "what a run prints is shown when wanted" shows_the_output_when_told_to
 check "a run that gave up is told" tells_that_a_run_gave_up
+check "and one that cannot have its turn" tells_that_a_run_cannot_have_its_turn
 check "a run that died is told" tells_that_a_run_died
 check "the history has every run" keeps_history
 check "a run that goes on has its duration" shows_how_long_a_run_goes_on
@@ -1025,13 +1260,21 @@ check "a task with a fault can be disabled but not enabled" a_fault_can_be_disab
 check "a task that cannot be read does not hide the others" a_bad_task_does_not_hide_the_others
 check "sync writes the crontab again" syncs
 check "but no line that cron cannot read" writes_no_line_that_cron_cannot_read
+check "nor does any change, which is refused" no_change_writes_a_line_that_cron_cannot_read
+check "but that of the task itself" a_task_that_cron_cannot_read_can_be_changed
+check "beside such a task the clock is armed" arms_the_clock_beside_a_task_that_cron_cannot_read
+check "and when the tasks cannot be read" arms_the_clock_beside_tasks_that_are_not_there
+check "a damaged power list keeps no task out of the crontab" writes_the_tasks_beside_a_damaged_power_list
 check "a clock that is not armed is told" tells_of_a_clock_that_is_not_armed
 check "a crontab that cannot be written is told" tells_of_a_crontab_that_cannot_be_written
 check "the error record is told in words" tells_the_error_in_words
 check "a store that is not root's alone is refused" tells_of_a_store_that_cannot_be_written
 check "a status database that is not root's alone is refused" tells_of_a_database_that_is_not_roots
 check "a status database that is none is told" tells_of_a_database_that_is_none
-check "and tasks are listed beside it" tasks_are_listed_beside_a_database_that_cannot_be_read
+check "and tasks are shown beside it" tasks_are_shown_beside_a_database_that_cannot_be_read
+check "and so are the runs that were kept" kept_runs_are_shown_beside_a_database_that_cannot_be_read
+check "a link to nowhere is no empty status database" tells_of_a_dangling_link_in_place_of_the_database
+check "a run that cannot be recorded is told" tells_of_a_run_that_cannot_be_recorded
 check "every result is told in words" every_result_is_told_in_words
 check "options stand behind ids always" options_stand_behind_ids_always
 if grep -qE '^ *0 +0 +[0-9]{2,}' /proc/self/uid_map; then
@@ -1048,5 +1291,6 @@ check "closed streams harm nothing" closed_streams_harm_nothing
 check "a reader that is gone ends the output quietly" ends_quietly_when_the_reader_is_gone
 check "a pipe gets the same in every locale" same_in_every_locale
 check "commands, options and tasks are completed" completes
+check "and file names, where nothing else fits" completes_file_names
 check "every option of every command is completed" every_option_is_completed
 finish

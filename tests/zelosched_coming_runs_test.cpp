@@ -117,6 +117,16 @@ TEST_F(ZeloschedComingRunsTest, NothingRunsBeforeTheStartDate) {
   EXPECT_EQ(libraryNext(task, "2026-11-21 00:00"), "2026-11-21 08:30");
 }
 
+TEST_F(ZeloschedComingRunsTest, AStartWithoutAMonthBeginsWithTheYear) {
+  const Task task = daily(8, 30);
+  task->StartYear = 2098;
+  task->StartMonth = 0;
+  task->StartDay = 0;
+  EXPECT_EQ(next(task, "2026-11-21 00:00", 1), (Texts{"2098-01-01 08:30"}));
+  task->StartMonth = 5;
+  EXPECT_EQ(next(task, "2026-11-21 00:00", 1), (Texts{"2098-05-01 08:30"}));
+}
+
 TEST_F(ZeloschedComingRunsTest, AStartInAYearThatNeverComesGivesNoRun) {
   const Task task = daily(8, 30);
   task->StartYear = 4000000000U;

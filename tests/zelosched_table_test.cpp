@@ -19,6 +19,13 @@ TEST(ZeloschedTextTest, ControlCharactersAndDirectionMarksAreEscaped) {
   EXPECT_EQ(printable(std::string("a\0b", 3)), "a\\x00b");
 }
 
+TEST(ZeloschedTextTest, WhatCannotBeSeenIsEscaped) {
+  EXPECT_EQ(printable("a\xe2\x80\x8b"), "a\\xe2\\x80\\x8b");           // of no width
+  EXPECT_EQ(printable("a\xc2\xad"), "a\\xc2\\xad");                    // a soft hyphen
+  EXPECT_EQ(printable("a\xe2\x81\xa0"), "a\\xe2\\x81\\xa0");           // a joiner
+  EXPECT_EQ(printable("a\xf3\xa0\x81\x81"), "a\\xf3\\xa0\\x81\\x81");  // a tag
+}
+
 TEST(ZeloschedTextTest, BytesThatAreNoUtf8AreEscaped) {
   EXPECT_EQ(printable("\xff"), "\\xff");
   EXPECT_EQ(printable("\xc0\x8a"), "\\xc0\\x8a");                    // a line feed in disguise

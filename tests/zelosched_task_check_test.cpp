@@ -66,6 +66,17 @@ TEST_F(ZeloschedTaskCheckTest, EachFaultIsSaidWithWhatToWriteInstead) {
        "month 2 never has a day 29 in 2027: write a day that it has", false},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_ONCE, 10000, 2, 2); },
        "the year 10000 never comes: write one up to 9999", false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 10000, 0, 0); },
+       "the year 10000 never comes: write one up to 9999", false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_WEEKLY, UINT32_MAX, 2, 2); },
+       "the year 4294967295 never comes: write one up to 9999", false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 10000, 2, 2); },
+       "the year 10000 never comes: write one up to 9999", false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_YEARLY, UINT32_MAX, 2, 2); },
+       "the year 4294967295 never comes: write one up to 9999", false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 2027, 99, 2); },
+       "the start date 2027-99-2 does not exist: write --start with a day that its month has",
+       false},
       {[](auto &task) {
          task.Type = ZELO_SCHED_TYPE_WEEKLY;
          setText(task.Week, "0100");
@@ -89,6 +100,12 @@ TEST_F(ZeloschedTaskCheckTest, EachFaultIsSaidWithWhatToWriteInstead) {
        false},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_WEEKLY, 0, 99, 99); },
        "the start date 0-99-99 does not exist: write --start with a day that its month has", false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 2027, 13, 0); },
+       "the start date 2027-13-0 does not exist: write --start with a day that its month has",
+       false},
+      {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 2027, 0, 32); },
+       "the start date 2027-0-32 does not exist: write --start with a day that its month has",
+       false},
       {[](auto &task) { setText(task.Action, "a\nb"); },
        "the action has a line feed: write it on one line", false},
       {[](auto &task) {
@@ -129,6 +146,12 @@ TEST_F(ZeloschedTaskCheckTest, WhatIsJustInRangeIsFit) {
       [](auto &task) { setDay(task, ZELO_SCHED_TYPE_ONCE, 2028, 2, 29); },
       [](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 0, 0, 0); },
       [](auto &task) { setDay(task, ZELO_SCHED_TYPE_WEEKLY, 2028, 2, 29); },
+      // Zeros stand for the beginning.
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 2027, 0, 0); },
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_WEEKLY, 2027, 12, 0); },
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_DAILY, 2027, 0, 31); },
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 9999, 12, 31); },
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_YEARLY, 9999, 12, 31); },
       [](auto &task) { setText(task.Week, "0000000"); },  // of a daily task
       [](auto &task) { task.State = ZELO_SCHED_STATE_DISABLED; },
       [](auto &task) { setText(task.Command, std::string(12287, 'x')); },

@@ -72,6 +72,17 @@ bool isForeign(const char *szPath) {
   return !isOurs || (S_ISREG(info.st_mode) && isShared);
 }
 
+off_t sizeOf(const char *szPath) {
+  struct stat info = {};
+  return stat(szPath, &info) == 0 ? info.st_size : 0;
+}
+
+// A store without bytes beside a persistent copy that has some was cut off by a copy that was
+// killed. Nobody must build on that, nor take it for a store without tasks.
+bool isCutToNothing(const char *szStore) {
+  return sizeOf(szStore) == 0 && sizeOf(kPersistentCopy) > 0;
+}
+
 // ---- reading the store --------------------------------------------------------------------------
 
 // 1 read, 0 there is no such section, -1 on failure.
@@ -143,6 +154,10 @@ class StoreWalk {
       return -1;
     }
     sections_ = QLIBCFileEnumSection(kWorkingCopy, names_.handle());
+    if (sections_ == 0 && isCutToNothing(kWorkingCopy)) {
+      SCHED_SET_ERROR(kErrIo);
+      return -1;
+    }
     return sections_ < 0 ? -1 : sections_;
   }
 
@@ -245,6 +260,11 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
     return -1;
   }
   const int read = readSection(section.c_str(), &hash);
+  if (read == kNotFound && isCutToNothing(kWorkingCopy)) {
+    SCHED_SET_ERROR(kErrIo);
+    SCHED_LOG_CALLEE("Get section [%s] from [%s] failed. ", section.c_str(), kWorkingCopy);
+    return -1;
+  }
   if (read != kFound) {
     return read;
   }
@@ -384,11 +404,6 @@ class ScratchFile {
   bool made_ = false;
 };
 
-off_t sizeOf(const char *szPath) {
-  struct stat info = {};
-  return stat(szPath, &info) == 0 ? info.st_size : 0;
-}
-
 int reportCopy(const char *szSource, const char *szTarget) {
   SCHED_LOG_CALLEE("Copy sched conf failed. [%s] -> [%s] ", szSource, szTarget);
   return -1;
@@ -415,9 +430,7 @@ int copyWorkingCopy(const ScratchFile &scratch) {
     }
     usleep(kPause);
   }
-  // A store without bytes beside a persistent copy that has some was cut off by a copy that was
-  // killed. Nobody must build on that.
-  if (sizeOf(scratch.path()) == 0 && sizeOf(kPersistentCopy) > 0) {
+  if (isCutToNothing(scratch.path())) {
     SCHED_SET_ERROR(kErrIo);
     return reportCopy(kWorkingCopy, scratch.path());
   }

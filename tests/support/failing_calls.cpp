@@ -11,6 +11,7 @@
 #include <sqlite3.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -58,6 +59,12 @@ namespace {
   X(QLIBPluginExit, '~')           \
   X(ZELOUserGetByUID, '=')         \
   X(SzBase64EncodeFull, '~')       \
+  X(ZELOAutoPowerConfGet, '~')     \
+  X(ZELOAutoPowerConfSet, '~')     \
+  X(ZELOAutoPoweronSet, '~')       \
+  X(QLIBCFileSetLine, '~')         \
+  X(ZELOUpdateCrontab, '~')        \
+  X(ZELOScheduleSet, '~')          \
   X(ZELOEncodingBase64Decode, '~') \
   X(rename, '~')                   \
   X(fsync, '~')                    \
@@ -87,6 +94,13 @@ namespace {
   X(mkostemp, '~')                 \
   X(futimens, '~')                 \
   X(fdopendir, '~')                \
+  X(readdir, '~')                  \
+  X(close, '~')                    \
+  X(open64, '~')                   \
+  X(pread64, '~')                  \
+  X(pwrite64, '~')                 \
+  X(fdatasync, '~')                \
+  X(fcntl64, '~')                  \
   X(dup, '~')                      \
   X(fcntl, '~')                    \
   X(pipe2, '~')                    \
@@ -102,6 +116,9 @@ namespace {
   X(setsid, '~')                   \
   X(close_range, '~')              \
   X(sysconf, '~')                  \
+  X(clearenv, '~')                 \
+  X(putenv, '~')                   \
+  X(kill, '~')                     \
   X(fork, '~')                     \
   X(posix_spawn, '~')              \
   X(pidfd_open, '~')               \
@@ -259,6 +276,19 @@ bool canFail(Call call) {
   return std::find(std::begin(kNever), std::end(kNever), call) == std::end(kNever);
 }
 
+// No room and no right to write is found by what writes.
+bool canFailWith(Call call, int error) {
+  constexpr Call kWriting[] = {
+      Call::k_open,     Call::k_open64,   Call::k_fopen,     Call::k_fdopen, Call::k_mkstemp,
+      Call::k_mkostemp, Call::k_mkdir,    Call::k_write,     Call::k_fwrite, Call::k_pwrite64,
+      Call::k_fflush,   Call::k_fclose,   Call::k_close,     Call::k_fsync,  Call::k_fdatasync,
+      Call::k_rename,   Call::k_unlink,   Call::k_ftruncate, Call::k_fchown, Call::k_fchmod,
+      Call::k_chmod,    Call::k_futimens, Call::k_QLIBCExec};
+  const bool isOfWriters = error == ENOSPC || error == EDQUOT || error == EROFS;
+  return canFail(call) && (!isOfWriters || std::find(std::begin(kWriting), std::end(kWriting),
+                                                     call) != std::end(kWriting));
+}
+
 int errorOf(Call call) {
   if (isAllocation(call)) return ENOMEM;
   if (call == Call::k_waitid || call == Call::k_waitpid) return ECHILD;
@@ -268,10 +298,10 @@ int errorOf(Call call) {
 // Whether the step that stands is at this call.
 bool fallsOn(Call call) {
   Step &step = state().step;
-  if (!step.stands || OwnWork::isGoingOn() || !canFail(call)) return false;
+  if (!step.stands || OwnWork::isGoingOn() || !canFailWith(call, step.error)) return false;
   const unsigned seen = ++step.seen;
   if (step.onwards ? seen < step.nth : seen != step.nth) return false;
-  if (step.kills) kill(0, SIGKILL);
+  if (step.kills) syscall(SYS_kill, 0, SIGKILL);  // kill itself may be the call
   size_t none = 0;
   step.failed.compare_exchange_strong(none, static_cast<size_t>(call) + 1);
   errno = errorOf(call);
@@ -448,6 +478,14 @@ KillingStep::KillingStep(unsigned nth) : FailingStep(nth, false, EIO) {
 FailingStep::~FailingStep() {
   state().step.stands = false;
   allocationPlanned = false;
+}
+
+bool failsInStep(const char *call) {
+  const Call number = [&] {
+    const OwnWork own;
+    return callNamed(call);
+  }();
+  return failing(number) != nullptr;
 }
 
 std::string FailingStep::failed() const {
@@ -723,6 +761,11 @@ int ftruncate(int descriptor, off_t length) noexcept {
   FAIL_OR_CALL(ftruncate, nullptr, -1, descriptor, length);
 }
 
+// What open may have been compiled to.
+int __open_2(const char *path, int flags) {
+  FAIL_OR_CALL(open, path, -1, path, flags);
+}
+
 int open(const char *path, int flags, ...) {
   mode_t mode = 0;
   if ((flags & O_CREAT) != 0 || (flags & O_TMPFILE) == O_TMPFILE) {
@@ -752,6 +795,36 @@ int mkstemp(char *pattern) {
 
 int flock(int descriptor, int operation) noexcept {
   FAIL_OR_CALL(flock, nullptr, -1, descriptor, operation);
+}
+
+// What SQLite works with.
+
+int open64(const char *path, int flags, ...) {
+  va_list list;
+  va_start(list, flags);
+  const mode_t mode = (flags & O_CREAT) != 0 ? va_arg(list, mode_t) : 0;
+  va_end(list);
+  FAIL_OR_CALL(open64, path, -1, path, flags, mode);
+}
+
+ssize_t pread64(int descriptor, void *buffer, size_t size, off64_t at) {
+  FAIL_OR_CALL(pread64, nullptr, ssize_t{-1}, descriptor, buffer, size, at);
+}
+
+ssize_t pwrite64(int descriptor, const void *buffer, size_t size, off64_t at) {
+  FAIL_OR_CALL(pwrite64, nullptr, ssize_t{-1}, descriptor, buffer, size, at);
+}
+
+int fdatasync(int descriptor) {
+  FAIL_OR_CALL(fdatasync, nullptr, -1, descriptor);
+}
+
+int fcntl64(int descriptor, int command, ...) {
+  va_list list;
+  va_start(list, command);
+  void *argument = va_arg(list, void *);
+  va_end(list);
+  FAIL_OR_CALL(fcntl64, nullptr, -1, descriptor, command, argument);
 }
 
 int mkdir(const char *path, mode_t mode) noexcept {
@@ -790,11 +863,23 @@ DIR *fdopendir(int descriptor) {
   FAIL_OR_CALL(fdopendir, nullptr, static_cast<DIR *>(nullptr), descriptor);
 }
 
+dirent *readdir(DIR *directory) {
+  FAIL_OR_CALL(readdir, nullptr, static_cast<dirent *>(nullptr), directory);
+}
+
+int close(int descriptor) {
+  REAL(close);
+  if (isStandard(descriptor)) return real_close(descriptor);
+  const int result = real_close(descriptor);
+  if (result != 0) return result;  // of what was not open, which is no failure to be had
+  const auto *plan = failing(Call::k_close);
+  return plan != nullptr ? resultOf(*plan, -1) : result;
+}
+
 int dup(int descriptor) noexcept {
   FAIL_OR_CALL(dup, nullptr, -1, descriptor);
 }
 
-// What SQLite locks with it has plans of its own: sqlite3_exec.
 int fcntl(int descriptor, int command, ...) {
   va_list list;
   va_start(list, command);
@@ -944,6 +1029,18 @@ pid_t setsid() noexcept {
 
 int close_range(unsigned first, unsigned last, int flags) noexcept {
   FAIL_OR_CALL(close_range, nullptr, -1, first, last, flags);
+}
+
+int clearenv() noexcept {
+  FAIL_OR_CALL(clearenv, nullptr, -1);
+}
+
+int putenv(char *entry) noexcept {
+  FAIL_OR_CALL(putenv, entry, -1, entry);
+}
+
+int kill(pid_t pid, int signal) noexcept {
+  FAIL_OR_CALL(kill, std::to_string(pid), -1, pid, signal);
 }
 
 long sysconf(int name) noexcept {

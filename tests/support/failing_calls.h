@@ -19,8 +19,8 @@
 //   path or text       QLIBCFileExist, QLIBCFileTouch, QLIBCFileEnumSection, QLIBCExec (program and
 //                      arguments), QLIBCStrSep, open, fopen, rename (both paths), mkstemp, mkdir,
 //                      mkostemp, chmod, access, unlink, chdir, fstatat, stat, lstat, system,
-//                      posix_spawn, sqlite3_open, sqlite3_exec (SQL), fdopen (mode),
-//                      initgroups (name)                                   contained
+//                      posix_spawn, open64, putenv, kill (pid), sqlite3_open, sqlite3_exec (SQL),
+//                      fdopen (mode), initgroups (name)                                   contained
 //
 // Calls without a key: QLIBCSzHashAlloc QLIBCSzListAlloc QLIBCSzListPush QLIBCSzHashEnumKey
 // QLIBCProcForkChildNoWait SzBase64EncodeFull ZELOEncodingBase64Decode QLIBPluginInit
@@ -28,11 +28,12 @@
 // write fwrite (and all other writing to a stream) flock setreuid setresuid setregid setresgid
 // setgroups localtime localtime_r mktime malloc calloc realloc sleep usleep nanosleep rand srand
 // setsid close_range fork getpwuid_r futimens fdopendir dup fcntl (for F_DUPFD_CLOEXEC and F_SETFD)
-// pipe2 sysconf pidfd_open poll waitid waitpid sqlite3_close.
+// pipe2 readdir close pread64 pwrite64 fdatasync fcntl64 sysconf clearenv pidfd_open poll waitid
+// waitpid sqlite3_close.
 //
-// Streams and descriptors 0 to 2 are never touched. fclose, waitid, waitpid (somebody else took the
-// status), sqlite3_close and QLIBPluginExit that are made to fail have done their work all the
-// same. sqlite3_open that is made to fail leaves a handle with a message, as the real one does.
+// Streams and descriptors 0 to 2 are never touched. close, fclose, waitid, waitpid (somebody else
+// took the status), sqlite3_close and QLIBPluginExit that are made to fail have done their work all
+// the same. sqlite3_open that is made to fail leaves a handle with a message, as the real one does.
 #pragma once
 
 #include <sys/types.h>
@@ -100,7 +101,8 @@ class FailingAllocation {
 //   step.failed();   "rename"; "" when there were fewer calls
 class FailingStep {
  public:
-  // What a call reports that has no error of its own, as short memory has.
+  // `error` is what a call reports that has no error of its own, as short memory has. ENOSPC,
+  // EDQUOT and EROFS come to calls that write only.
   FailingStep(unsigned nth, bool onwards, int error = EIO);
   ~FailingStep();
   FailingStep(const FailingStep &) = delete;
@@ -108,6 +110,9 @@ class FailingStep {
 
   std::string failed() const;
 };
+
+// For a call that is interposed elsewhere: whether the step that stands is at it.
+bool failsInStep(const char *call);
 
 // As FailingStep, but before the nth call the whole process group is killed.
 class KillingStep : public FailingStep {

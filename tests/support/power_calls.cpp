@@ -29,18 +29,29 @@ State &state() {
   return value;
 }
 
-// Records the call; whether it fails, and then with what.
-bool fails(const std::string &call, int *result) {
-  state().calls.push_back(call);
+// Records the call; whether a plan fails it, and then with what.
+bool isPlanned(std::string call, int *result) {
   for (Plan &plan : state().plans) {
     if (!call.starts_with(plan.beginning)) continue;
     const unsigned nth = ++plan.matched;
     if (nth < plan.plan.from || nth - plan.plan.from >= plan.plan.times) continue;
     if (plan.plan.code != 0) QLIBCErrSetEx(plan.plan.code, kInjectedFile, kInjectedLine);
     *result = static_cast<int>(plan.plan.result.value_or(-1));
+    state().calls.push_back(std::move(call));
     return true;
   }
+  state().calls.push_back(std::move(call));
   return false;
+}
+
+template <class Make>
+bool fails(const char *name, Make make, int *result) {
+  *result = -1;
+  {
+    const OwnWork own;
+    if (isPlanned(make(), result)) return true;
+  }
+  return failsInStep(name);
 }
 
 template <typename Function>
@@ -89,7 +100,10 @@ extern "C" {
 
 int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *entries) {
   int result = 0;
-  if (fails("ConfGet" + number(list) + number(capacity), &result)) return result;
+  if (fails(
+          "ZELOAutoPowerConfGet", [&] { return "ConfGet" + number(list) + number(capacity); },
+          &result))
+    return result;
   const auto given = support::state().lists.find(list);
   if (given != support::state().lists.end()) {
     const auto count = std::min(given->second.size(), static_cast<size_t>(capacity));
@@ -101,30 +115,42 @@ int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *entries) {
 
 int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *entries) {
   int result = 0;
-  if (fails("ConfSet" + number(list) + number(count), &result)) return result;
-  support::state().last.assign(entries, entries + count);
+  if (fails(
+          "ZELOAutoPowerConfSet", [&] { return "ConfSet" + number(list) + number(count); },
+          &result))
+    return result;
+  {
+    const support::OwnWork own;
+    support::state().last.assign(entries, entries + count);
+  }
   if (support::state().takeAny) return 0;
   return next<decltype(ZELOAutoPowerConfSet)>("ZELOAutoPowerConfSet")(list, count, entries);
 }
 
 int ZELOAutoPoweronSet(void) {
   int result = 0;
-  if (fails("PoweronSet", &result)) return result;
+  if (fails(
+          "ZELOAutoPoweronSet", [] { return "PoweronSet"; }, &result))
+    return result;
   return next<decltype(ZELOAutoPoweronSet)>("ZELOAutoPoweronSet")();
 }
 
 int QLIBCFileSetLine(const char *path, const char *key, const char *value, int flags) {
   int result = 0;
-  const std::string call = std::string("SetLine ") + path + " " + key +
-                           (value != nullptr ? std::string(" ") + value : "") +
-                           (flags != 0 ? number(flags) : "");
-  if (fails(call, &result)) return result;
+  const auto call = [&] {
+    return std::string("SetLine ") + path + " " + key +
+           (value != nullptr ? std::string(" ") + value : "") + (flags != 0 ? number(flags) : "");
+  };
+  if (fails("QLIBCFileSetLine", call, &result)) return result;
   return next<decltype(QLIBCFileSetLine)>("QLIBCFileSetLine")(path, key, value, flags);
 }
 
 int ZELOUpdateCrontab(const char *command, int stop, int reload) {
   int result = 0;
-  if (fails(std::string("UpdateCrontab ") + command + number(stop) + number(reload), &result)) {
+  if (fails(
+          "ZELOUpdateCrontab",
+          [&] { return std::string("UpdateCrontab ") + command + number(stop) + number(reload); },
+          &result)) {
     return result;
   }
   return next<decltype(ZELOUpdateCrontab)>("ZELOUpdateCrontab")(command, stop, reload);
@@ -132,11 +158,12 @@ int ZELOUpdateCrontab(const char *command, int stop, int reload) {
 
 int ZELOScheduleSet(const ZELO_SCHEDULE *schedule, int enabled) {
   int result = 0;
-  const std::string call = "ScheduleSet" + number(schedule->weekdays) + number(schedule->hour) +
-                           number(schedule->repeat) + number(schedule->lastHour) +
-                           number(schedule->minute) + number(schedule->reserved) + " " +
-                           schedule->szCommand + number(enabled);
-  if (fails(call, &result)) return result;
+  const auto call = [&] {
+    return "ScheduleSet" + number(schedule->weekdays) + number(schedule->hour) +
+           number(schedule->repeat) + number(schedule->lastHour) + number(schedule->minute) +
+           number(schedule->reserved) + " " + schedule->szCommand + number(enabled);
+  };
+  if (fails("ZELOScheduleSet", call, &result)) return result;
   return next<decltype(ZELOScheduleSet)>("ZELOScheduleSet")(schedule, enabled);
 }
 

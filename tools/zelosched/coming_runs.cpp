@@ -70,12 +70,13 @@ std::vector<int> hoursOf(const ZELO_SCHED_TASK &task) {
   return hours;
 }
 
-// Nothing before the start date needs a look.
+// Nothing before the start date needs a look. Of one without a month, that begins with the year.
 sys_days firstDay(const ZELO_SCHED_TASK &task, sys_days day) {
-  const bool isDate = task.StartMonth >= 1 && task.StartMonth <= 12 && task.StartYear >= 1;
+  const bool isDate = task.StartMonth <= 12 && task.StartYear >= 1;
   if (!isDate || task.StartYear > kLastYear) return day;
   const year_month_day month(std::chrono::year(static_cast<int>(task.StartYear)),
-                             std::chrono::month(task.StartMonth), std::chrono::day(1));
+                             std::chrono::month(std::max(task.StartMonth, 1U)),
+                             std::chrono::day(1));
   return std::max(day, sys_days(month));
 }
 
@@ -148,10 +149,11 @@ const char *weekdayName(const LocalMinute &minute) {
 }
 
 std::vector<LocalMinute> comingRuns(const ZELO_SCHED_TASK &task, const LocalMinute &after,
-                                    size_t count) {
+                                    size_t count, const std::optional<LocalMinute> &last) {
   std::vector<LocalMinute> runs;
   if (count == 0) return runs;
   forEachRun(task, after, [&](const LocalMinute &run) {
+    if (last && run > *last) return false;
     runs.push_back(run);
     return runs.size() < count;
   });

@@ -38,10 +38,10 @@ std::string timeText(const LocalMinute &minute);  // "18:30"
 std::string minuteText(const LocalMinute &minute);
 const char *weekdayName(const LocalMinute &minute);
 
-// The next runs after `after`, at most `count`; fewer when there are no more. Whether the task is
-// enabled is not asked.
+// The next runs after `after`, at most `count` and none behind `last`; fewer when there are no
+// more. Whether the task is enabled is not asked.
 std::vector<LocalMinute> comingRuns(const ZELO_SCHED_TASK &task, const LocalMinute &after,
-                                    size_t count);
+                                    size_t count, const std::optional<LocalMinute> &last = {});
 
 // Every run after `after`, up to and including `last`.
 std::vector<LocalMinute> runsBetween(const ZELO_SCHED_TASK &task, const LocalMinute &after,

@@ -103,13 +103,16 @@ int runHistory(int argc, char **argv) {
     id = ids.front();
   }
   const long limit = arguments.number("limit", 1, kMostRuns).value_or(kUsualLimit);
-  const std::vector<Run> runs = allRuns(id, limit);
+  std::vector<Run> runs;
+  const int status = collectRuns(id, limit, &runs);
+  // An empty table would say that there was no run.
+  if (status != kDone && runs.empty()) return status;
   if (arguments.has("json")) {
     printAsJson(runs);
   } else {
     print(runs);
   }
-  return kDone;
+  return status;
 }
 
 }  // namespace

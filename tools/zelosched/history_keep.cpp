@@ -5,7 +5,6 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <ctime>
 #include <tuple>
 
 #include "command.h"
@@ -17,7 +16,6 @@
 namespace {
 
 constexpr long kMostRuns = 100000;
-constexpr long kLongest = 366L * 24 * 60 * 60;  // seconds
 constexpr int kAlive = 1;
 
 #define RUN_KEY "timestamp, status_id, pid, task_id, app"
@@ -28,7 +26,7 @@ constexpr char kKeep[] =
     " VALUES(?, ?, ?, ?, ?, ?, ?, ?)"
     " ON CONFLICT DO UPDATE SET status_code = excluded.status_code, comment = excluded.comment"
     " WHERE status_code <> excluded.status_code OR comment <> excluded.comment";
-constexpr char kDropOld[] = "DELETE FROM run WHERE timestamp < ?";
+// By their number alone: a clock that is wrong for once must not take the history away.
 constexpr char kDropMany[] =
     "DELETE FROM run WHERE (" RUN_KEY
     ") <"
@@ -102,20 +100,26 @@ std::vector<Run> withoutDoubles(const std::vector<Run> &sorted) {
   return runs;
 }
 
+// Newest first.
+std::vector<Run> together(std::vector<Run> recent, const std::vector<Run> &kept, long limit) {
+  recent.insert(recent.end(), kept.begin(), kept.end());
+  std::stable_sort(recent.begin(), recent.end(), isNewer);
+  std::vector<Run> runs = withoutDoubles(recent);
+  if (runs.size() > static_cast<size_t>(limit)) runs.resize(static_cast<size_t>(limit));
+  return runs;
+}
+
 void keepRuns() {
   const std::vector<Run> runs = RunDatabase().newest(std::nullopt, kMostRuns);
   const KeptDatabase kept(KeptDatabase::kChange);
   const std::string boot = bootId();
-  const long oldest = time(nullptr) - kLongest;
   Transaction transaction(kept);
   Query keep(kept, kKeep);
   long count = 0;
   for (const Run &run : runs) {
-    if (run.start < oldest) continue;
     keep.with(run.start).with(run.statusId).with(run.pid).with(run.taskId).with(run.app);
     count += keep.with(run.statusCode).with(run.comment).with(boot).run();
   }
-  Query(kept, kDropOld).with(oldest).run();
   Query(kept, kDropMany).with(kMostRuns - 1).run();
   transaction.commit();
   // A timer calls this: nothing new is nothing to fill the log with.
@@ -129,13 +133,18 @@ int keepHistory() {
 }
 
 std::vector<Run> allRuns(std::optional<long> taskId, long limit) {
-  std::vector<Run> runs = RunDatabase().newest(taskId, limit);
-  const std::vector<Run> kept = keptRuns(taskId, limit);
-  runs.insert(runs.end(), kept.begin(), kept.end());
-  std::stable_sort(runs.begin(), runs.end(), isNewer);
-  runs = withoutDoubles(runs);
-  if (runs.size() > static_cast<size_t>(limit)) runs.resize(static_cast<size_t>(limit));
-  return runs;
+  return together(RunDatabase().newest(taskId, limit), keptRuns(taskId, limit), limit);
+}
+
+int collectRuns(std::optional<long> taskId, long limit, std::vector<Run> *runs) {
+  std::vector<Run> recent;
+  std::vector<Run> kept;
+  const int results[] = {
+      attempt([&] { recent = RunDatabase().newest(taskId, limit); }),
+      attempt([&] { kept = keptRuns(taskId, limit); }),
+  };
+  *runs = together(std::move(recent), kept, limit);
+  return *std::max_element(std::begin(results), std::end(results));
 }
 
 bool mayReadAllRuns() {

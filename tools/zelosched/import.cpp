@@ -1,4 +1,5 @@
 // zelosched import
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
@@ -80,7 +81,10 @@ std::vector<Task> readTasks(const std::vector<Json::Value> &objects, bool areNew
     try {
       Task task = taskOf(objects[i]);
       const bool isKnown = !areNew && isStored(*task);
-      if (isPower(*task) && !(isKnown && powerId(*task) == task->ID)) room.take(*task);
+      if (isPower(*task)) {
+        if (isKnown) room.leave(*task);
+        room.take(*task);
+      }
       tasks.push_back(std::move(task));
     } catch (const Failure &failure) {
       complain(orderOf(i, objects.size()) + ": " + failure.what());
@@ -91,6 +95,13 @@ std::vector<Task> readTasks(const std::vector<Json::Value> &objects, bool areNew
                   " of " + std::to_string(objects.size()) + " cannot be saved");
   }
   return tasks;
+}
+
+// Not some, until the first one that writes the crontab is refused.
+void requireSavable(const std::vector<Task> &tasks) {
+  const bool hasLine =
+      std::any_of(tasks.begin(), tasks.end(), [](const Task &task) { return !isPower(*task); });
+  if (hasLine) requireReadableTasks();
 }
 
 void save(ZELO_SCHED_TASK *task, bool isNew) {
@@ -111,6 +122,7 @@ int runImport(int argc, char **argv) {
   const std::vector<Json::Value> objects = parseObjects(readAll(arguments.operands().front()));
   const ChangeLock lock;
   const std::vector<Task> tasks = readTasks(objects, arguments.has("new"));
+  requireSavable(tasks);
   int status = kDone;
   if (tasks.empty()) std::puts("there is no task to import");
   for (size_t i = 0; i < tasks.size(); ++i) {

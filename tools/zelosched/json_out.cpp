@@ -349,10 +349,13 @@ void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task) {
 }
 
 std::vector<Json::Value> parseObjects(const std::string &text) {
+  // The reader would take what is before it for the whole.
+  if (text.find('\0') != std::string::npos) throw Failure("it holds a zero byte");
   std::string errors;
   const Json::Value whole = parse(text, &errors);
   if (whole.isArray()) return {whole.begin(), whole.end()};
   if (whole.isObject()) return {whole};
+  if (errors.empty()) throw Failure("it is neither an object nor an array");
   const std::string wholeError = firstError(errors);
   const size_t first = text.find_first_not_of(" \t\r\n");
   if (first == std::string::npos) throw Failure("it holds no task");

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <cstdlib>
 #include <cstring>
 
 #include "failure.h"
@@ -13,6 +14,7 @@
 namespace {
 
 constexpr char kPath[] = "/usr/zelo/var/history.sqlite";
+constexpr char kName[] = "/history.sqlite";
 constexpr char kDirectory[] = "/usr/zelo/var";
 constexpr mode_t kDirectoryMode = 0755;
 constexpr mode_t kMode = 0600;  // command results are nobody else's business
@@ -73,6 +75,15 @@ void requireOurFile() {
   }
 }
 
+// A data volume may stand behind a link of root's to the directory, where SQLite, told to follow no
+// link, would follow none of these either.
+std::string pathBehindLinks() {
+  const std::unique_ptr<char, decltype(&std::free)> directory(realpath(kDirectory, nullptr),
+                                                              std::free);
+  if (directory == nullptr) throw cannot("open", std::strerror(errno));
+  return std::string(directory.get()) + kName;
+}
+
 long versionOf(const KeptDatabase &database) {
   Query query(database, "PRAGMA user_version");
   return query.next() ? query.number(0) : 0;
@@ -106,8 +117,8 @@ KeptDatabase::KeptDatabase(Access access) {
   if (access == kChange) makeFile();
   requireOurFile();
   sqlite3 *opened = nullptr;
-  const int result =
-      sqlite3_open_v2(kPath, &opened, SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOFOLLOW, nullptr);
+  const int result = sqlite3_open_v2(pathBehindLinks().c_str(), &opened,
+                                     SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOFOLLOW, nullptr);
   db_.reset(opened);
   if (result != SQLITE_OK) throw cannot("open", sqlite3_errmsg(opened));
   sqlite3_busy_timeout(opened, kPatience);

@@ -28,7 +28,6 @@ void noteMissed(const KeptDatabase &kept, time_t lastUp, time_t now) {
     const std::optional<time_t> due = lastRunBetween(*task, after, now);
     if (due) note.with(task->ID).with(std::string(task->App)).with(*due).run();
   }
-  Query(kept, "DELETE FROM missed WHERE due < ?").with(now - kMissedRemembered).run();
 }
 
 // They could not be put back, or nobody tried so far. No time of theirs may count as passed over
@@ -43,8 +42,12 @@ bool hasRunAt(const TaskRecord &task, time_t due) {
 }
 
 bool ranSince(const TaskRecord &task, time_t due) {
-  const std::vector<Run> last = allRuns(task.ID, 1);
-  return !last.empty() && last.front().start >= due;
+  constexpr long kLatest = 100;
+  const time_t now = time(nullptr);
+  const std::vector<Run> runs = allRuns(task.ID, kLatest);
+  // One behind now was recorded by a clock that was wrong.
+  return std::any_of(runs.begin(), runs.end(),
+                     [&](const Run &run) { return run.start >= due && run.start <= now; });
 }
 
 }  // namespace
@@ -58,6 +61,9 @@ void markMachineUp() {
   Query last(kept, "SELECT boot, seen FROM up");
   const bool isKnown = last.next();
   if (isKnown && last.text(0) != boot) noteMissed(kept, last.number(1), now);
+  // Noted by a clock that was wrong. What is long past stays until the task is missed again: it may
+  // be now that the clock is wrong.
+  Query(kept, "DELETE FROM missed WHERE due > ?").with(now).run();
   Query(kept, "DELETE FROM up").run();
   Query(kept, "INSERT INTO up(boot, seen) VALUES(?, ?)").with(boot).with(now).run();
   transaction.commit();
@@ -67,8 +73,10 @@ std::vector<MissedTask> missedTasks(const TaskList &list, time_t since) {
   std::vector<MissedTask> missed;
   const KeptDatabase kept(KeptDatabase::kRead);
   if (!kept.isThere()) return missed;
-  Query query(kept, "SELECT task_id, app, due FROM missed WHERE due >= ? ORDER BY due, task_id");
-  query.with(since);
+  Query query(kept,
+              "SELECT task_id, app, due FROM missed WHERE due BETWEEN ? AND ?"
+              " ORDER BY due, task_id");
+  query.with(since).with(time(nullptr));
   while (query.next()) {
     const auto &tasks = list.tasks();
     const auto found = std::find_if(tasks.begin(), tasks.end(), [&](const TaskRecord *task) {

@@ -29,15 +29,15 @@ struct Entry {
 };
 
 // The first runs of several tasks. Of a task that comes later, only those before the last of them
-// are worked out.
+// are worked out, and never more than are wanted of all.
 class FirstRuns {
  public:
   FirstRuns(const LocalMinute &now, size_t count) : now_(now), count_(count) {}
 
   void add(const ZELO_SCHED_TASK &task) {
-    const std::vector<LocalMinute> runs =
-        last_ ? runsBetween(task, now_, *last_) : comingRuns(task, now_, count_);
-    for (const LocalMinute &run : runs) entries_.push_back({run, task.ID, task.Name});
+    for (const LocalMinute &run : comingRuns(task, now_, count_, last_)) {
+      entries_.push_back({run, task.ID, task.Name});
+    }
     if (entries_.size() > 2 * count_) prune();
   }
 

@@ -36,44 +36,6 @@ class Descriptor {
   int file_;
 };
 
-// In the same directory under a name that nobody can know, so that it can be renamed to its own.
-class Scratch {
- public:
-  explicit Scratch(const std::string &path)
-      : path_(path + ".XXXXXX"), file_(mkostemp(path_.data(), O_CLOEXEC)) {
-    if (file_.get() < 0) throw cannot("make a file beside", path);
-  }
-  ~Scratch() {
-    if (!isPlaced_) unlink(path_.c_str());
-  }
-  Scratch(const Scratch &) = delete;
-  Scratch &operator=(const Scratch &) = delete;
-
-  void fill(const std::string &contents, mode_t mode) {
-    size_t done = 0;
-    while (done < contents.size()) {
-      const ssize_t written = write(file_.get(), contents.data() + done, contents.size() - done);
-      if (written < 0 && errno == EINTR) continue;
-      if (written <= 0) throw cannot("write", path_);
-      done += static_cast<size_t>(written);
-    }
-    if (fchown(file_.get(), kRoot, kRootsGroup) != 0 || fchmod(file_.get(), mode) != 0 ||
-        fsync(file_.get()) != 0) {
-      throw cannot("write", path_);
-    }
-  }
-
-  void moveTo(const std::string &path) {
-    if (rename(path_.c_str(), path.c_str()) != 0) throw cannot("replace", path);
-    isPlaced_ = true;
-  }
-
- private:
-  std::string path_;
-  Descriptor file_;
-  bool isPlaced_ = false;
-};
-
 void syncDirectoryOf(const std::string &path) {
   const std::string directory = path.substr(0, path.rfind('/'));
   const Descriptor file(open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
@@ -87,6 +49,34 @@ void requireFile(int file, const std::string &path) {
 }
 
 }  // namespace
+
+ScratchFile::ScratchFile(const std::string &path)
+    : path_(path + ".XXXXXX"), file_(mkostemp(path_.data(), O_CLOEXEC)) {
+  if (file_ < 0) throw cannot("make a file beside", path);
+}
+
+ScratchFile::~ScratchFile() {
+  close(file_);
+  if (!isPlaced_) unlink(path_.c_str());
+}
+
+void ScratchFile::fill(const std::string &contents, mode_t mode) {
+  size_t done = 0;
+  while (done < contents.size()) {
+    const ssize_t written = write(file_, contents.data() + done, contents.size() - done);
+    if (written < 0 && errno == EINTR) continue;
+    if (written <= 0) throw cannot("write", path_);
+    done += static_cast<size_t>(written);
+  }
+  if (fchown(file_, kRoot, kRootsGroup) != 0 || fchmod(file_, mode) != 0 || fsync(file_) != 0) {
+    throw cannot("write", path_);
+  }
+}
+
+void ScratchFile::moveTo(const std::string &path) {
+  if (rename(path_.c_str(), path.c_str()) != 0) throw cannot("replace", path);
+  isPlaced_ = true;
+}
 
 std::string contentsOf(const std::string &path) {
   // Not blocking, for a FIFO would hang the open.
@@ -106,7 +96,7 @@ std::string contentsOf(const std::string &path) {
 }
 
 void placeFile(const std::string &path, const std::string &contents, mode_t mode) {
-  Scratch scratch(path);
+  ScratchFile scratch(path);
   scratch.fill(contents, mode);
   scratch.moveTo(path);
   syncDirectoryOf(path);

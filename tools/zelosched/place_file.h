@@ -6,6 +6,25 @@
 
 #include <string>
 
+// In the same directory as `path`, under a name that nobody can know; gone with the object, unless
+// it was moved. Each call throws Failure.
+class ScratchFile {
+ public:
+  explicit ScratchFile(const std::string &path);
+  ~ScratchFile();
+  ScratchFile(const ScratchFile &) = delete;
+  ScratchFile &operator=(const ScratchFile &) = delete;
+
+  const std::string &path() const { return path_; }
+  void fill(const std::string &contents, mode_t mode);
+  void moveTo(const std::string &path);
+
+ private:
+  std::string path_;
+  int file_;
+  bool isPlaced_ = false;
+};
+
 // Each throws Failure.
 
 // Of a regular file, or of one that a link leads to.

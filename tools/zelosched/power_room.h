@@ -22,6 +22,9 @@ class PowerRoom {
   // Throws Failure when the power time has no room, and counts it otherwise.
   void take(const ZELO_SCHED_TASK &task);
 
+  // A stored power time gives its place up, by its stored id.
+  void leave(const ZELO_SCHED_TASK &task) { ids_.erase(task.ID); }
+
  private:
   std::set<int32_t> ids_;
 };

@@ -30,25 +30,44 @@ bool isConfirmed(const ZELO_SCHED_TASK &task) {
   return isYes(answer);
 }
 
-// The id may have been given to another task since.
+// The id may have been given to another task since. The name of a power time is its place in the
+// list, which is another one as soon as one before it is removed.
 bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
   Json::Value members[] = {jsonOf(one), jsonOf(other)};
-  for (Json::Value &object : members) object.removeMember("next trigger time");
+  for (Json::Value &object : members) {
+    object.removeMember("next trigger time");
+    if (isPower(one)) object.removeMember("name");
+  }
   return members[0] == members[1];
 }
 
-// The lock is not held while an answer is waited for.
-void removeOne(long id, const RemoveRules &rules) {
-  const Task task = loadTask(id);
+Task loadRemovable(long id, const RemoveRules &rules) {
+  Task task = loadTask(id);
   if (rules.powerOnly && !isPower(*task)) throw Failure(titleOf(*task) + " is no power time");
   requirePermission(*task, task->CanDeleteFromUI, "removed", rules.insists);
-  if (!rules.isSure && !isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");
+  return task;
+}
+
+void removeAndTell(const ZELO_SCHED_TASK &task) {
+  removeTask(task);
+  std::printf("%s removed\n", titleOf(task).c_str());
+}
+
+// The lock is not held while an answer is waited for.
+void askAndRemove(long id, const RemoveRules &rules) {
+  const Task task = loadRemovable(id, rules);
+  if (!isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");
   const ChangeLock lock;
   if (!isSame(*task, *loadTask(id))) {
     throw Failure(titleOf(*task) + " stays: it has been changed meanwhile");
   }
-  removeTask(*task);
-  std::printf("%s removed\n", titleOf(*task).c_str());
+  removeAndTell(*task);
+}
+
+void removeOne(long id, const RemoveRules &rules) {
+  if (!rules.isSure) return askAndRemove(id, rules);
+  const ChangeLock lock;
+  removeAndTell(*loadRemovable(id, rules));
 }
 
 int runRemove(int argc, char **argv) {

@@ -1,10 +1,13 @@
 #include "runs.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 #include <zelocore.h>
 #include <zelosched.h>
 
+#include <cerrno>
 #include <cstdint>
+#include <cstring>
 
 #include "failure.h"
 #include "text.h"
@@ -55,16 +58,18 @@ Failure cannotRead(const char *why) {
 
 }  // namespace
 
-bool areThereRuns() {
-  return access(kDatabase, F_OK) == 0;
-}
-
 bool mayReadRuns() {
-  return !areThereRuns() || access(kDatabase, R_OK | W_OK) == 0;
+  return access(kDatabase, R_OK | W_OK) == 0 || errno != EACCES;
 }
 
 RunDatabase::RunDatabase() {
-  if (!areThereRuns()) return;
+  struct stat info {};
+  if (lstat(kDatabase, &info) != 0) {
+    if (errno == ENOENT) return;
+    throw cannotRead(std::strerror(errno));
+  }
+  // A link that leads nowhere is not "no run so far": none can be recorded.
+  if (!S_ISREG(info.st_mode)) throw cannotRead("it is no regular file");
   if (!mayReadRuns()) throw cannotRead("that takes root's rights");
   forgetError();
   db_.reset(ZELOSchedDBInit());

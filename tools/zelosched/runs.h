@@ -19,9 +19,8 @@ struct Run {
   std::string comment;
 };
 
-// The status database may be read: it is there, and this user has the rights.
+// This user has the rights to read the status database, or will have when it is there.
 bool mayReadRuns();
-bool areThereRuns();
 
 class RunDatabase {
  public:

@@ -1,12 +1,11 @@
 #include "save.h"
 
-#include <cstring>
+#include <algorithm>
 
 #include "crontab_check.h"
 #include "failure.h"
 #include "power_room.h"
 #include "task_check.h"
-#include "task_list.h"
 #include "text.h"
 
 namespace {
@@ -15,7 +14,13 @@ constexpr int kFlagYes = 1;
 
 // An entry that is edited into one like another would be one less.
 void requireUnlike(const ZELO_SCHED_TASK &task) {
-  if (powerId(task) != task.ID) PowerRoom().take(task);
+  PowerRoom room;
+  room.leave(task);
+  room.take(task);
+}
+
+bool isUnreadable(const ZELO_SCHED_TASK &task) {
+  return isEnabled(task) && !unreadableFieldsOf(task).empty();
 }
 
 bool isStored(long id) {
@@ -42,9 +47,32 @@ void requireHarmless(const ZELO_SCHED_TASK &task) {
   throw Failure(sentences);
 }
 
+std::string unreadableTask(const TaskList &list) {
+  for (const ZELO_SCHED_TASK *task : list.tasks()) {
+    if (!isUnreadable(*task)) continue;
+    return titleOf(*task) + ": " + unreadableFieldsOf(*task).front() + ", or disable the task";
+  }
+  return "";
+}
+
+void requireReadableTasks(std::optional<long> changedId) {
+  const TaskList list;
+  // Of several, each is mended beside the others.
+  const bool isMended = std::any_of(
+      list.tasks().begin(), list.tasks().end(),
+      [&](const ZELO_SCHED_TASK *task) { return changedId == task->ID && isUnreadable(*task); });
+  const std::string fault = unreadableTask(list);
+  if (fault.empty() || isMended) return;
+  throw Failure("nothing was saved, as cron may then pass over all of /etc/crontab: " + fault);
+}
+
 void createTask(ZELO_SCHED_TASK *task) {
   requireHarmless(*task);
-  if (isPower(*task)) PowerRoom().take(*task);
+  if (isPower(*task)) {
+    PowerRoom().take(*task);
+  } else {
+    requireReadableTasks();
+  }
   forgetError();
   if (ZELOSchedTaskCreate(task) < 0) {
     throwFailedChange(failedTo("save the task"),
@@ -54,7 +82,11 @@ void createTask(ZELO_SCHED_TASK *task) {
 }
 
 void editTask(ZELO_SCHED_TASK *task) {
-  if (isPower(*task)) requireUnlike(*task);
+  if (isPower(*task)) {
+    requireUnlike(*task);
+  } else {
+    requireReadableTasks(task->ID);
+  }
   forgetError();
   if (ZELOSchedTaskEdit(task) < 0) {
     throwFailedChange(failedTo("save " + titleOf(*task)),
@@ -65,6 +97,8 @@ void editTask(ZELO_SCHED_TASK *task) {
 }
 
 void removeTask(const ZELO_SCHED_TASK &task) {
+  // The lines of power times are others, which no task can harm.
+  if (!isPower(task)) requireReadableTasks(task.ID);
   forgetError();
   if (ZELOSchedTaskRemove(task.ID) < 0) {
     throwFailedChange(failedTo("remove " + titleOf(task)),
@@ -75,6 +109,8 @@ void removeTask(const ZELO_SCHED_TASK &task) {
 
 void requireCrontabInStep() {
   const TaskList list;
+  // As long as one is kept out of it, the crontab cannot be in step.
+  if (!unreadableTask(list).empty()) return;
   const std::vector<std::string> differences = crontabDifferences(list.tasks());
   if (differences.empty()) return;
   throw Failure("the tasks are saved, but cron does not know them all: " + differences.front() +

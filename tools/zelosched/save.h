@@ -5,6 +5,11 @@
 
 #include <zelosched.h>
 
+#include <optional>
+#include <string>
+
+#include "task_list.h"
+
 // Throws Failure, with every fault in a sentence, for a task that would do harm.
 void requireHarmless(const ZELO_SCHED_TASK &task);
 
@@ -14,7 +19,14 @@ void createTask(ZELO_SCHED_TASK *task);
 void editTask(ZELO_SCHED_TASK *task);
 void removeTask(const ZELO_SCHED_TASK &task);
 
-// The crontab is in step with the store. Throws Failure.
+// A sentence on an enabled task with a field that cron cannot read; nothing when there is none.
+// Each change writes the lines of all tasks, and for such a one cron may pass over all of them.
+std::string unreadableTask(const TaskList &list);
+
+// There is no such task, or the one that is to be changed is one. Throws Failure.
+void requireReadableTasks(std::optional<long> changedId = std::nullopt);
+
+// The crontab is in step with the store, where no task is kept out of it. Throws Failure.
 void requireCrontabInStep();
 
 // What the application allows by hand, unless the administrator insists. Throws Failure.

@@ -5,6 +5,7 @@
 
 #include "coming_runs.h"
 #include "command.h"
+#include "failure.h"
 #include "for_each_id.h"
 #include "json_out.h"
 #include "options.h"
@@ -32,17 +33,25 @@ std::optional<Run> lastRun(const ZELO_SCHED_TASK &task) {
   return runs.front();
 }
 
-std::string lastRunInWords(const ZELO_SCHED_TASK &task) {
+// The status database is in "/tmp", where anybody can be in its way: the task is shown without it.
+std::string lastRunInWords(const ZELO_SCHED_TASK &task, int *status) {
   if (!mayReadRuns()) return "only root may see";
-  const std::optional<Run> run = lastRun(task);
-  if (!run) return "none is recorded";
-  return minuteText(localMinute(run->start)) + ", " + resultInWords(run->statusCode, run->comment);
+  std::string words = "?";
+  const int result = attempt([&] {
+    const std::optional<Run> run = lastRun(task);
+    words = run ? minuteText(localMinute(run->start)) + ", " +
+                      resultInWords(run->statusCode, run->comment)
+                : "none is recorded";
+  });
+  *status = std::max(*status, result);
+  return words;
 }
 
+// A zero stands for the beginning: of the year, or of the month.
 std::string startDate(const ZELO_SCHED_TASK &task) {
   char text[64];
-  std::snprintf(text, sizeof text, "%04u-%02u-%02u", task.StartYear, task.StartMonth,
-                task.StartDay);
+  std::snprintf(text, sizeof text, "%04u-%02u-%02u", task.StartYear, std::max(task.StartMonth, 1U),
+                std::max(task.StartDay, 1U));
   return text;
 }
 
@@ -60,7 +69,7 @@ std::string overlapText(const ZELO_SCHED_TASK &task) {
   return self + " overlap another run of it, " + app + " overlap others of its application";
 }
 
-std::vector<Line> linesOf(const ZELO_SCHED_TASK &task) {
+std::vector<Line> linesOf(const ZELO_SCHED_TASK &task, int *status) {
   const LocalMinute now = localMinute(time(nullptr));
   const std::optional<LocalMinute> next = nextRun(task, now);
   std::vector<Line> lines = {
@@ -70,7 +79,7 @@ std::vector<Line> linesOf(const ZELO_SCHED_TASK &task) {
       {"Runs", scheduleInWords(task)},
       {"From", startsLater(task, now) ? startDate(task) + " on" : ""},
       {"Next run", next ? minuteText(*next) : "none"},
-      {"Last run", lastRunInWords(task)},
+      {"Last run", lastRunInWords(task, status)},
       {"Owner", userText(task)},
       {"Command", task.Command},
       {"Action", task.Action},
@@ -84,10 +93,13 @@ std::vector<Line> linesOf(const ZELO_SCHED_TASK &task) {
   return lines;
 }
 
-void print(const ZELO_SCHED_TASK &task) {
-  for (const Line &line : linesOf(task)) {
+// The exit status.
+int print(const ZELO_SCHED_TASK &task) {
+  int status = kDone;
+  for (const Line &line : linesOf(task, &status)) {
     std::printf("%12s: %s\n", line.title, printable(line.text).c_str());
   }
+  return status;
 }
 
 int runShow(int argc, char **argv) {
@@ -96,7 +108,8 @@ int runShow(int argc, char **argv) {
   const std::vector<long> ids = parseIds(arguments.operands());
   std::vector<Json::Value> objects;
   bool isFirst = true;
-  const int status = forEachId(ids, [&](long id) {
+  int shown = kDone;
+  const int found = forEachId(ids, [&](long id) {
     const Task task = loadTask(id);
     if (arguments.has("json")) {
       objects.push_back(jsonOf(*task));
@@ -104,7 +117,7 @@ int runShow(int argc, char **argv) {
     }
     if (!isFirst) std::puts("");
     isFirst = false;
-    print(*task);
+    shown = std::max(shown, print(*task));
   });
   // One task is one object, without an array around it.
   if (objects.size() == 1 && ids.size() == 1) {
@@ -112,7 +125,7 @@ int runShow(int argc, char **argv) {
   } else if (arguments.has("json") && ids.size() > 1) {
     printJson(objects);
   }
-  return status;
+  return std::max(found, shown);
 }
 
 }  // namespace

@@ -1,12 +1,14 @@
 #include "start_run.h"
 
 #include <fcntl.h>
+#include <sqlite3.h>
 #include <unistd.h>
 
 #include <cstdio>
 #include <iterator>
 
 #include "failure.h"
+#include "shared_names.h"
 #include "task_list.h"
 
 namespace {
@@ -36,9 +38,26 @@ class NoStreams {
   int kept_[STDERR_FILENO + 1];
 };
 
+// A run that cannot be recorded ends at once, which only the system log says.
+void requireRecords() {
+  forgetError();
+  sqlite3 *const database = ZELOSchedDBInit();
+  if (database == nullptr) throw failedTo("record a run in /tmp/sched_status.sqlite");
+  sqlite3_close(database);
+}
+
+// Nor does one that cannot have its turn say more.
+void requireTurn(const ZELO_SCHED_TASK &task) {
+  if (task.CanRunTaskSameTime != 0 && task.CanRunAppSameTime != 0) return;
+  const std::string fault = runLockFault();
+  if (!fault.empty()) throw Failure("cannot run " + titleOf(task) + ": " + fault);
+}
+
 }  // namespace
 
 void startRun(const ZELO_SCHED_TASK &task, Disabled disabled) {
+  requireRecords();
+  requireTurn(task);
   // The run's process begins as a copy of this one.
   std::fflush(stdout);
   forgetError();

@@ -19,6 +19,7 @@
 #include "missed.h"
 #include "options.h"
 #include "runs.h"
+#include "shared_names.h"
 #include "store_files.h"
 #include "task_check.h"
 #include "task_list.h"
@@ -81,6 +82,13 @@ Findings programIsThere() {
                   " is not root's alone: whoever can write it runs commands as root")};
   }
   return {well(std::string(kTaskProgram) + " is there, and root's")};
+}
+
+Findings namesAreOurs() {
+  Findings findings;
+  for (const std::string &fault : sharedNameFaults()) findings.push_back(wrong(fault));
+  if (findings.empty()) findings.push_back(well("no other user is in the way of a run"));
+  return findings;
 }
 
 bool exists(const char *path) {
@@ -205,23 +213,27 @@ int runStatus(int argc, char **argv) {
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   Findings all;
-  const auto add = [&](const Findings &findings) {
-    all.insert(all.end(), findings.begin(), findings.end());
+  // One that cannot be made does not hide the others.
+  const auto add = [&](auto check) {
+    try {
+      const Findings findings = check();
+      all.insert(all.end(), findings.begin(), findings.end());
+    } catch (const Failure &failure) {
+      const bool isSaid = std::any_of(all.begin(), all.end(), [&](const Finding &finding) {
+        return finding.text == failure.what();
+      });
+      if (!isSaid) all.push_back(wrong(failure.what()));
+    }
   };
-  add(cronRuns());
-  add(programIsThere());
-  add(copiesAgree());
-  try {
+  for (const auto check : {cronRuns, programIsThere, namesAreOurs, copiesAgree}) add(check);
+  add([&] {
     const TaskList list;
-    add(tasksAreReadable(list));
-    add(crontabIsInStep(list));
-    add(tasksAreHarmless(list));
-    add(clockIsArmed(list));
-    add(runsInProgress(list));
-    add(runsMissed(list));
-  } catch (const Failure &failure) {
-    add({wrong(failure.what())});
-  }
+    for (const auto check : {tasksAreReadable, crontabIsInStep, tasksAreHarmless, clockIsArmed,
+                             runsInProgress, runsMissed}) {
+      add([&] { return check(list); });
+    }
+    return Findings();
+  });
   return report(all);
 }
 
@@ -230,10 +242,10 @@ int runStatus(int argc, char **argv) {
 const Command kStatusCommand = {
     "status", "", "say whether all is well",
     "Prints a line for each check: whether cron is running, whether the program that it\n"
-    "starts is there and root's, whether both copies of the tasks agree, whether the\n"
-    "crontab is in step with them, whether an enabled task has a fault, whether the clock is\n"
-    "armed for the next power-on time, which tasks are running, and which were due while\n"
-    "the machine was off.\n"
+    "starts is there and root's, whether another user is in the way of runs in /tmp, whether\n"
+    "both copies of the tasks agree, whether the crontab is in step with them, whether an\n"
+    "enabled task has a fault, whether the clock is armed for the next power-on time, which\n"
+    "tasks are running, and which were due while the machine was off.\n"
     "\n"
     "Exit status: 0 when all is well, 1 when something is wrong.\n",
     runStatus};

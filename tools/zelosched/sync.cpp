@@ -1,9 +1,10 @@
 // zelosched sync
 #include "sync.h"
 
+#include <zelosdk.h>
+
 #include <cstdio>
 #include <string>
-#include <vector>
 
 #include "alarm_check.h"
 #include "change_lock.h"
@@ -11,20 +12,24 @@
 #include "failure.h"
 #include "options.h"
 #include "save.h"
-#include "task_check.h"
 #include "task_list.h"
 
 namespace {
 
-// A line that cron cannot read may make it pass over all others: the ones that are there stay.
-void requireReadable(const TaskList &list) {
-  for (const ZELO_SCHED_TASK *task : list.tasks()) {
-    if (!isEnabled(*task)) continue;
-    const std::vector<std::string> faults = unreadableFieldsOf(*task);
-    if (faults.empty()) continue;
-    throw Failure("the crontab was not written, as cron may then pass over all of it: " +
-                  titleOf(*task) + ": " + faults.front() + ", or disable the task");
+// A power list that cannot be read is told in the end, but keeps no task out of the crontab.
+void writeTasksOut() {
+  const std::string fault = unreadableTask(TaskList(TaskList::Unreadable::kIsLeftOut));
+  if (!fault.empty()) {
+    throw Failure("the crontab was not written, as cron may then pass over all of it: " + fault);
   }
+  forgetError();
+  if (ZELOSchedTaskSync() < 0) throw failedTo("write the tasks out");
+  requireCrontabInStep();
+}
+
+void armClock() {
+  forgetError();
+  if (ZELOAutoPoweronSet() < 0) throw failedTo("arm the clock for the next power-on time");
 }
 
 int runSync(int argc, char **argv) {
@@ -41,14 +46,18 @@ int runSync(int argc, char **argv) {
 }  // namespace
 
 void synchronise() {
-  requireReadable(TaskList());
-  forgetError();
-  if (ZELOSchedTaskSync() < 0) throw failedTo("write the tasks out");
-  requireCrontabInStep();
+  try {
+    writeTasksOut();
+  } catch (const Failure &) {
+    // The machine goes on at its time whatever is wrong with the tasks.
+    attempt(armClock);
+    throw;
+  }
 }
 
 const Command kSyncCommand = {
     "sync", "", "write the tasks into the crontab again",
     "Writes the lines of all enabled tasks into /etc/crontab again, and arms the clock\n"
-    "for the next power-on time. Other lines stay as they are.\n",
+    "for the next power-on time. Other lines stay as they are, and all do while an enabled\n"
+    "task has a field that cron cannot read.\n",
     runSync};

@@ -1,6 +1,6 @@
 // Writing the tasks out again.
 #pragma once
 
-// The crontab, and the alarm of the machine's clock, unless a task has a field that cron cannot
-// read. Throws Failure.
+// The crontab, unless a task has a field that cron cannot read; and in any case the alarm of the
+// machine's clock. Throws Failure.
 void synchronise();

@@ -96,24 +96,33 @@ std::string noWeekday(const ZELO_SCHED_TASK &task) {
 
 // ---- what makes the task itself useless -----------------------------------------------------
 
-std::string neverExists(const ZELO_SCHED_TASK &task) {
-  if (!hasMonth(task) || !isDay(task) || !isMonth(task)) return "";
-  const bool isYear = task.Type != ZELO_SCHED_TYPE_ONCE || task.StartYear <= kLastYear;
-  // 29 February comes in leap years, to a task that runs every year.
-  const bool comes =
-      task.Type == ZELO_SCHED_TYPE_ONCE ? dateExists(task) : dayExists(kLeapYear, task);
-  if (isYear && comes) return "";
-  if (!isYear) return "the year " + number(task.StartYear) + " never comes: write one up to 9999";
-  return "month " + number(task.StartMonth) + " never has a day " + number(task.StartDay) +
-         (task.Type == ZELO_SCHED_TYPE_ONCE ? " in " + number(task.StartYear) : "") +
-         ": write a day that it has";
+std::string lateYear(const ZELO_SCHED_TASK &task) {
+  if (task.StartYear <= kLastYear) return "";
+  return "the year " + number(task.StartYear) + " never comes: write one up to 9999";
 }
 
-// Of the other types the start date is the schedule, which is looked at above.
+std::string neverExists(const ZELO_SCHED_TASK &task) {
+  if (!hasMonth(task) || !isDay(task) || !isMonth(task) || task.StartYear > kLastYear) return "";
+  const bool isOnce = task.Type == ZELO_SCHED_TYPE_ONCE;
+  // 29 February comes in leap years, to a task that runs every year.
+  if (isOnce ? dateExists(task) : dayExists(kLeapYear, task)) return "";
+  return "month " + number(task.StartMonth) + " never has a day " + number(task.StartDay) +
+         (isOnce ? " in " + number(task.StartYear) : "") + ": write a day that it has";
+}
+
+// Of a start date, a zero stands for the beginning.
+bool canStart(const ZELO_SCHED_TASK &task) {
+  if (task.StartMonth != 0 && task.StartDay != 0) return dateExists(task);
+  return task.StartMonth <= kMonths && task.StartDay <= kMostDays;
+}
+
+// Of the other types the day is the schedule, or the date is, which is looked at above.
 std::string badStart(const ZELO_SCHED_TASK &task) {
   const bool isFree = task.Type == ZELO_SCHED_TYPE_DAILY || task.Type == ZELO_SCHED_TYPE_WEEKLY;
-  const bool isSet = task.StartYear != 0 || task.StartMonth != 0 || task.StartDay != 0;
-  if (!isFree || !isSet || (task.StartYear <= kLastYear && dateExists(task))) return "";
+  const bool isMonthly = task.Type == ZELO_SCHED_TYPE_MONTHLY;
+  const bool isBad = (isFree && task.StartYear <= kLastYear && !canStart(task)) ||
+                     (isMonthly && task.StartMonth > kMonths);
+  if (!isBad) return "";
   return "the start date " + number(task.StartYear) + "-" + number(task.StartMonth) + "-" +
          number(task.StartDay) + " does not exist: write --start with a day that its month has";
 }
@@ -192,9 +201,9 @@ std::string badDirection(const ZELO_SCHED_TASK &task) {
 
 using Check = std::string (*)(const ZELO_SCHED_TASK &task);
 constexpr Check kUnreadable[] = {badHour, badMinute, badLastHour, badDay, badMonth, noWeekday};
-constexpr Check kUseless[] = {neverExists, badStart, badWeek,      badType,
-                              badState,    earlyEnd, unknownOwner, apostrophe,
-                              longCommand, lineFeed, badDirection};
+constexpr Check kUseless[] = {lateYear,   neverExists, badStart, badWeek,
+                              badType,    badState,    earlyEnd, unknownOwner,
+                              apostrophe, longCommand, lineFeed, badDirection};
 
 template <size_t count>
 void collect(const Check (&checks)[count], const ZELO_SCHED_TASK &task,

@@ -23,8 +23,10 @@ Task loadTask(long id);
 
 class TaskList {
  public:
-  // Every task of every backend. Throws Failure.
-  TaskList();
+  enum class Unreadable { kIsFailure, kIsLeftOut };
+
+  // Every task of every backend, or of those that can be read. Throws Failure.
+  explicit TaskList(Unreadable backend = Unreadable::kIsFailure);
   ~TaskList();
   TaskList(const TaskList &) = delete;
   TaskList &operator=(const TaskList &) = delete;

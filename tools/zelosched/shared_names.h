@@ -1,0 +1,21 @@
+// The names in /tmp, beside those of the tasks and their program, that the library uses. Anybody
+// can be first under such a name in a directory that is everybody's, and then no run can be
+// recorded, or every run waits.
+#pragma once
+
+#include <string>
+#include <vector>
+
+// What keeps runs from being recorded or begun, in a sentence for each name that is not as the
+// library makes it. A name that is free is no fault: the library takes it when it needs it.
+std::vector<std::string> sharedNameFaults();
+
+// Why the library would let no run have its turn; nothing when it does.
+std::string runLockFault();
+
+// Takes every such name as the library would, and takes away what is not root's alone, which is
+// said. What failed is said too, and does not keep the rest from being done; the exit status.
+int takeSharedNames();
+
+// Takes away a directory in place of a file, and says so. Throws Failure.
+void freeOfDirectory(const std::string &path);

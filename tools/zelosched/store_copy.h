@@ -1,0 +1,27 @@
+// Whether a copy of the tasks is fit to be used.
+#pragma once
+
+#include <string>
+
+struct StoreCopy {
+  enum Condition {
+    kMissing,
+    kWhole,
+    kDoubtful,  // it can be read, but is not as it was written
+    kDamaged,
+    kForeign,
+    kDirectory
+  } condition = kMissing;
+  std::string why;        // of all but the first two: what is wrong with it
+  int tasks = 0;          // that can be read
+  bool isHeaded = false;  // it begins as every store does
+
+  bool isWhole() const { return condition == kWhole; }
+  bool isUsable() const { return condition == kWhole || condition == kDoubtful; }
+};
+
+StoreCopy judgeStore(const std::string &path);
+
+// As judgeStore, for the copy in /tmp: the library refuses it when it has a second name, too, which
+// anybody can give it where the kernel lets him.
+StoreCopy judgeWorkingStore(const std::string &path);
