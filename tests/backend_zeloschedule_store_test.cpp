@@ -986,6 +986,18 @@ TEST_F(StoreTest, ALinkPlantedWhileTheFirstStoreIsPublishedIsNotWrittenThrough) 
   EXPECT_NE(readFile(support::kPersistentStore).find("first"), std::string::npos);
 }
 
+// By another process's copy that is killed.
+TEST_F(StoreTest, AStoreThatIsEmptiedWhileItIsTakenIsNotBuiltOn) {
+  create("first");
+  const std::string persistent = readFile(support::kPersistentStore);
+  support::onExec([](const std::string &line) {
+    if (line.ends_with(scratchPath())) std::filesystem::resize_file(support::kStore, 0);
+  });
+  EXPECT_EQ(backend_.create(makeTask("second", "true").get()), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0B00, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(readFile(support::kPersistentStore), persistent);
+}
+
 TEST_F(StoreTest, AHardLinkPlantedUnderTheScratchNameIsNotWrittenThrough) {
   writeFile(kVictim, "untouched");
   create("first");

@@ -1,0 +1,2 @@
+// Nothing but the headers that are read once for all tests.
+int main() {}
