@@ -22,8 +22,8 @@ build() {
   find "$COVERED" -name '*.gcda' -delete
 }
 
-# A tenth of what takes long by its number finds the same lines, and many at once find no others. Some are run by users who may not
-# write what is counted.
+# A tenth of what takes long by its number finds the same lines, and many at once find no others.
+# Some are run by users who may not write what is counted.
 run_tests() {
   local log=$COVERED/tests.log
   local -a names

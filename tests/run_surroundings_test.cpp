@@ -30,6 +30,8 @@ using Lines = std::vector<std::string>;
 constexpr char kOutput[] = "/tmp/surroundings_test.out";
 constexpr char kHome[] = "/tmp/surroundings_test.home";
 constexpr char kCallersLock[] = "/tmp/surroundings_test.lock";
+constexpr char kNoContext[] =
+    "sched_task_run.cpp:N Failed to set user context. uid:[0] [0x2A00 sched_surroundings.cpp:N]";
 const std::string kTo = "exec > /tmp/surroundings_test.out 2>&1; ";
 
 // Opens nothing itself, unlike a listing of /proc/PID/fd.
@@ -78,6 +80,13 @@ class SurroundingsTest : public UsersTest {
 
   static std::string outputOf(uid_t owner, const std::string &command) {
     return outputOf(save(owner, command));
+  }
+
+  static void expectNothingRuns(long id, const Lines &wanted) {
+    clearLog();
+    EXPECT_EQ(outputOf(id), "");
+    EXPECT_EQ(recordedSystemCommands(), Lines{});
+    EXPECT_EQ(logged(), wanted);
   }
 
   static Lines sortedLines(const std::string &text) {
@@ -350,36 +359,25 @@ TEST_F(SurroundingsTest, AVariableThatCannotBeAllocatedRunsNothing) {
   setenv("LANG", zone.c_str(), 1);
   const FailingAllocation malloc("malloc", {.times = kAlways, .minSize = zone.size()});
   const FailingAllocation realloc("realloc", {.times = kAlways, .minSize = zone.size()});
-  clearLog();
-  EXPECT_EQ(outputOf(id), "");
-  EXPECT_EQ(recordedSystemCommands(), Lines{});
-  EXPECT_EQ(logged(), (Lines{"sched_surroundings.cpp:N Failed to set environment: [0] Cannot "
-                             "allocate memory",
-                             "sched_task_run.cpp:N Failed to set user context. uid:[0] [0x2A00 "
-                             "sched_surroundings.cpp:N]"}));
+  expectNothingRuns(id, (Lines{"sched_surroundings.cpp:N Failed to set environment: [0] Cannot "
+                               "allocate memory",
+                               kNoContext}));
 }
 
 TEST_F(SurroundingsTest, WithoutADirectoryToBeInNothingIsRun) {
   const long id = save(0, kListEnvironment);
   failCall("chdir", {.times = kAlways, .error = EIO});
-  clearLog();
-  EXPECT_EQ(outputOf(id), "");
-  EXPECT_EQ(recordedSystemCommands(), Lines{});
-  EXPECT_EQ(logged(), (Lines{"sched_surroundings.cpp:N Failed to change directory: [0] "
-                             "Input/output error",
-                             "sched_task_run.cpp:N Failed to set user context. uid:[0] [0x2A00 "
-                             "sched_surroundings.cpp:N]"}));
+  expectNothingRuns(id, (Lines{"sched_surroundings.cpp:N Failed to change directory: [0] "
+                               "Input/output error",
+                               kNoContext}));
 }
 
 TEST_F(SurroundingsTest, ACallersDescriptorsThatCannotBeClosedRunNothing) {
   const long id = save(0, kListEnvironment);
   failCall("close_range", {.times = kAlways, .error = ENOSYS});
   failCall("sysconf", {.times = kAlways, .error = EINVAL});
-  clearLog();
-  EXPECT_EQ(outputOf(id), "");
-  EXPECT_EQ(recordedSystemCommands(), Lines{});
-  EXPECT_EQ(logged(), (Lines{"sched_surroundings.cpp:N Failed to close descriptors. "
-                             "Invalid argument"}));
+  expectNothingRuns(id, (Lines{"sched_surroundings.cpp:N Failed to close descriptors. "
+                               "Invalid argument"}));
 }
 
 // ---- directory and mask

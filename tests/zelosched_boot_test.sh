@@ -295,13 +295,18 @@ not_even_by_force() {
   says 1 "save a task, which writes it anew" && same "$(names)" "one two "
 }
 
-replaces_what_is_not_ours() {
-  local why=$1
-  shift
+# "$@" plants something once /tmp is empty.
+boot_with() {
   saved
   boot
   echo untouched >"$SCRATCH/victim"
   "$@"
+}
+
+replaces_what_is_not_ours() {
+  local why=$1
+  shift
+  boot_with "$@"
   try z restore
   [[ $status == 0 && $err == *"$STORE $why"*": it is not used"* ]] || { echo "$status $err"; return 1; }
   same "$(names), $(owner_and_mode "$STORE"), $(cat "$SCRATCH/victim")" \
@@ -607,10 +612,7 @@ takes_all_names() {
 takes_back() {
   local why=$1
   shift
-  saved
-  boot
-  echo untouched >"$SCRATCH/victim"
-  "$@"
+  boot_with "$@"
   try z status
   [[ $status == 1 && $out == *"WRONG  "*"$why: it keeps tasks from running until 'zelosched restore' takes it away"* ]] ||
     { echo "$out"; return 1; }

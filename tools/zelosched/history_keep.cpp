@@ -1,6 +1,5 @@
 #include "history_keep.h"
 
-#include <zelocore.h>
 #include <zelosched.h>
 
 #include <algorithm>
@@ -16,7 +15,6 @@
 namespace {
 
 constexpr long kMostRuns = 100000;
-constexpr int kAlive = 1;
 
 #define RUN_KEY "timestamp, status_id, pid, task_id, app"
 
@@ -41,8 +39,7 @@ constexpr char kNewestOfTask[] =
 
 // Carried over as running, by this boot or an earlier one, whose processes are all gone.
 bool isGone(const Run &run, bool isThisBoot) {
-  if (run.statusCode != ZELO_SCHED_STATUS_RUNNING) return false;
-  return !isThisBoot || QLIBCProcAlive(static_cast<pid_t>(run.pid)) != kAlive;
+  return isThisBoot ? isGone(run) : run.statusCode == ZELO_SCHED_STATUS_RUNNING;
 }
 
 Run runOf(const Query &query, const std::string &thisBoot) {

@@ -14,7 +14,6 @@
 namespace {
 
 constexpr char kPath[] = "/usr/zelo/var/history.sqlite";
-constexpr char kName[] = "/history.sqlite";
 constexpr char kDirectory[] = "/usr/zelo/var";
 constexpr mode_t kDirectoryMode = 0755;
 constexpr mode_t kMode = 0600;  // command results are nobody else's business
@@ -81,7 +80,7 @@ std::string pathBehindLinks() {
   const std::unique_ptr<char, decltype(&std::free)> directory(realpath(kDirectory, nullptr),
                                                               std::free);
   if (directory == nullptr) throw cannot("open", std::strerror(errno));
-  return std::string(directory.get()) + kName;
+  return std::string(directory.get()) + std::strrchr(kPath, '/');
 }
 
 long versionOf(const KeptDatabase &database) {

@@ -32,12 +32,6 @@ std::string textOf(sqlite3_stmt *statement, int column) {
   return text == nullptr ? "" : std::string(reinterpret_cast<const char *>(text), size);
 }
 
-bool isGone(const Run &run) {
-  const bool isProcess = run.pid > 0 && run.pid <= INT32_MAX;
-  return run.statusCode == ZELO_SCHED_STATUS_RUNNING &&
-         (!isProcess || QLIBCProcAlive(static_cast<pid_t>(run.pid)) != kAlive);
-}
-
 Run runOf(sqlite3_stmt *statement) {
   Run run;
   int column = 0;
@@ -57,6 +51,12 @@ Failure cannotRead(const char *why) {
 }
 
 }  // namespace
+
+bool isGone(const Run &run) {
+  const bool isProcess = run.pid > 0 && run.pid <= INT32_MAX;
+  return run.statusCode == ZELO_SCHED_STATUS_RUNNING &&
+         (!isProcess || QLIBCProcAlive(static_cast<pid_t>(run.pid)) != kAlive);
+}
 
 bool mayReadRuns() {
   return access(kDatabase, R_OK | W_OK) == 0 || errno != EACCES;

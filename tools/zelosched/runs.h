@@ -19,6 +19,9 @@ struct Run {
   std::string comment;
 };
 
+// By its record it goes on, but its process does not.
+bool isGone(const Run &run);
+
 // This user has the rights to read the status database, or will have when it is there.
 bool mayReadRuns();
 
