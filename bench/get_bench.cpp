@@ -1,0 +1,37 @@
+// Reading one task of a store that the process has not read yet, beside reading the file and
+// nothing else; and once more, when it has been read.
+#include <zelosched.h>
+
+#include "support/row.h"
+#include "support/stored_tasks.h"
+
+namespace {
+
+constexpr int kTasks = 1000;
+
+void get(int id) {
+  static ZELO_SCHED_TASK task;
+  orDie(ZELOSchedTaskGetByID(id, &task) == 0, "ZELOSchedTaskGetByID");
+}
+
+void getLast() {
+  get(kTasks);
+}
+
+void fillOldStore() {
+  fillStore(kTasks);
+  growOld();
+}
+
+}  // namespace
+
+void makeRows() {
+  constexpr double kMost = 1.5;
+  constexpr char kReading[] = "read the file, 1000 tasks";
+  Row("ZELOSchedTaskGetByID in 1000 tasks", Work{getLast, fillOldStore})
+      .atMost(kMost, kReading, Work{readStore, fillOldStore, forgetStore});
+  Row("... the first read of the process", Work{getLast, fillOldStore, forgetStore})
+      .atMost(kMost, kReading);
+  Row("... of a file that was just changed", Work{getLast, [] { fillStore(kTasks); }, forgetStore})
+      .atMost(kMost, kReading);
+}

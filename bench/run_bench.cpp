@@ -1,0 +1,109 @@
+// A run from the call to the first instruction of its command, beside a shell that is forked and
+// does nothing.
+#include <fcntl.h>
+#include <pwd.h>
+#include <sqlite3.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <zelocore.h>
+#include <zelosched.h>
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "support/row.h"
+#include "support/stored_tasks.h"
+
+namespace {
+
+constexpr char kStarted[] = "/tmp/started";
+// Without another program, so that the shell's first instruction for it is the command's.
+constexpr char kCommand[] = ": > /tmp/started";
+constexpr int kId = 1;
+constexpr int kPatience = 1000;  // milliseconds, with a run that is closing the database
+
+sqlite3 *db;
+
+// The shell waits in its redirection for a reader, and the reader for it.
+void awaitCommand() {
+  const int started = open(kStarted, O_RDONLY | O_CLOEXEC);
+  orDie(started >= 0 && close(started) == 0, "the command");
+}
+
+void run() {
+  orDie(ZELOSchedTaskRun(kId, 0, 0) == 0, "ZELOSchedTaskRun");
+  awaitCommand();
+}
+
+bool isRunning() {
+  int statusCode = 0;
+  const int found = ZELOSchedDBGetStatusByTaskID(db, kId, nullptr, &statusCode, nullptr, 0);
+  orDie(found >= 0, "ZELOSchedDBGetStatusByTaskID");
+  return found > 0 && statusCode == ZELO_SCHED_STATUS_RUNNING;
+}
+
+// A run that has not been recorded as ended is a conflict for the next.
+void awaitEnd() {
+  constexpr useconds_t kPause = 200;
+  while (isRunning()) {
+    usleep(kPause);
+  }
+  orDie(sqlite3_exec(db, "DELETE FROM task_status", nullptr, nullptr, nullptr) == SQLITE_OK,
+        "emptying the table");
+}
+
+void storeTask() {
+  unlink(kStarted);
+  orDie(mkfifo(kStarted, 0600) == 0, "mkfifo");
+  fillStore(0);
+  const Task task = newTask(kId);
+  snprintf(task->Command, sizeof(task->Command), "%s", kCommand);
+  orDie(ZELOSchedTaskCreate(task.get()) >= 0, "ZELOSchedTaskCreate");
+  db = ZELOSchedDBInit();
+  orDie(db != nullptr && sqlite3_busy_timeout(db, kPatience) == SQLITE_OK, "ZELOSchedDBInit");
+}
+
+// As the library opens it, which is measured elsewhere.
+void recordStart() {
+  sqlite3 *own = ZELOSchedDBInit();
+  ZELO_SCHED_STATUS other = {};
+  ZELO_SCHED_TASK task = {};
+  task.ID = kId;
+  const bool recorded = own != nullptr && ZELOSchedDBIsTaskRunning(own, kId, &other) == 0 &&
+                        ZELOSchedDBAddRecord(own, &task, nullptr) == 0;
+  orDie(recorded && sqlite3_close(own) == SQLITE_OK, "recording a start");
+}
+
+// What a run cannot do without: a child that nobody waits for, the record of its start, the owner
+// and the shell.
+void runWithoutTheRest() {
+  const int side = QLIBCProcForkChildNoWait();
+  orDie(side >= 0, "QLIBCProcForkChildNoWait");
+  if (side == 0) {
+    recordStart();
+    orDie(getpwuid(geteuid()) != nullptr && system(kCommand) == 0, "system");
+    _exit(EXIT_SUCCESS);
+  }
+  awaitCommand();
+}
+
+void forkShell() {
+  const pid_t shell = fork();
+  if (shell == 0) {
+    execl("/bin/sh", "sh", "-c", "true", nullptr);
+    _exit(EXIT_FAILURE);
+  }
+  int status = 0;
+  orDie(shell > 0 && waitpid(shell, &status, 0) == shell && status == 0, "/bin/sh -c true");
+}
+
+}  // namespace
+
+void makeRows() {
+  storeTask();
+  Row("ZELOSchedTaskRun to the command", Work{run, nullptr, awaitEnd})
+      .atMost(2, "fork, /bin/sh -c true", Work{forkShell, nullptr, awaitEnd})
+      .atMost(1.3, "two forks, the record, the owner, the shell",
+              Work{runWithoutTheRest, nullptr, awaitEnd});
+}

@@ -1,0 +1,192 @@
+#include "row.h"
+
+#include <benchmark/benchmark.h>
+#include <zelocore.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <map>
+#include <utility>
+#include <vector>
+
+namespace {
+
+constexpr char kBytes[] = "bytes";
+
+struct Comparison {
+  std::string what;
+  std::string with;
+  double most;
+};
+
+std::vector<Comparison> &comparisons() {
+  static std::vector<Comparison> all;
+  return all;
+}
+
+double secondsOf(const std::function<void()> &work) {
+  const auto start = std::chrono::steady_clock::now();
+  work();
+  return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+}
+
+void measurePrepared(const Work &work, benchmark::State &state) {
+  for ([[maybe_unused]] auto iteration : state) {
+    work.before();
+    state.SetIterationTime(secondsOf(work.work));
+  }
+}
+
+void measureInARow(const Work &work, benchmark::State &state) {
+  for ([[maybe_unused]] auto iteration : state) {
+    work.work();
+  }
+}
+
+void registerWork(const std::string &what, const Work &work) {
+  auto *registered = benchmark::RegisterBenchmark(what.c_str(), [work](benchmark::State &state) {
+    if (work.setUp) {
+      work.setUp();
+    }
+    (work.before ? measurePrepared : measureInARow)(work, state);
+  });
+  if (work.before) {
+    registered->UseManualTime();
+  } else {
+    registered->UseRealTime();
+  }
+}
+
+void registerWork(const std::string &what, const Footprint &footprint) {
+  benchmark::RegisterBenchmark(what.c_str(), [footprint](benchmark::State &state) {
+    for ([[maybe_unused]] auto iteration : state) {
+      state.counters[kBytes] = static_cast<double>(footprint.bytes());
+    }
+  })->Iterations(1);
+}
+
+struct Amount {
+  double number;  // seconds or bytes
+  bool isBytes;
+};
+
+Amount medianOf(std::vector<double> numbers, bool isBytes) {
+  std::sort(numbers.begin(), numbers.end());
+  return {numbers[numbers.size() / 2], isBytes};
+}
+
+class Collector : public benchmark::BenchmarkReporter {
+ public:
+  bool ReportContext(const Context &context) override {
+    static_cast<void>(context);
+    return true;
+  }
+
+  void ReportRuns(const std::vector<Run> &runs) override {
+    std::vector<double> numbers;
+    bool isBytes = false;
+    std::string name;
+    for (const Run &run : runs) {
+      if (run.run_type != Run::RT_Iteration) {
+        continue;
+      }
+      name = run.run_name.function_name;
+      const auto bytes = run.counters.find(kBytes);
+      isBytes = bytes != run.counters.end();
+      numbers.push_back(isBytes ? double{bytes->second}
+                                : run.real_accumulated_time / static_cast<double>(run.iterations));
+    }
+    if (!numbers.empty()) {
+      measured_[name] = medianOf(std::move(numbers), isBytes);
+    }
+  }
+
+  // Null for what was not asked for.
+  const Amount *find(const std::string &what) const {
+    const auto found = measured_.find(what);
+    return found == measured_.end() ? nullptr : &found->second;
+  }
+
+ private:
+  std::map<std::string, Amount> measured_;
+};
+
+struct Unit {
+  const char *name;
+  double size;
+};
+constexpr Unit kTimes[] = {{"ns", 1e-9}, {"us", 1e-6}, {"ms", 1e-3}};
+constexpr Unit kSizes[] = {{"B", 1}, {"KiB", 1024}, {"MiB", 1024 * 1024}};
+
+std::string written(Amount amount) {
+  const auto &units = amount.isBytes ? kSizes : kTimes;
+  const Unit *unit = units;
+  while (unit + 1 != std::end(units) && amount.number >= unit[1].size) {
+    ++unit;
+  }
+  char text[32];
+  snprintf(text, sizeof(text), "%.4g %s", amount.number / unit->size, unit->name);
+  return text;
+}
+
+// The columns' widths are known to scripts/bench, which prints their headings.
+void print(const Comparison &row, const Amount &what, const Amount &with) {
+  const double ratio = what.number / with.number;
+  printf("%-46s %10s  %-44s %10s %7.2f %6.2f  %s\n", row.what.c_str(), written(what).c_str(),
+         row.with.c_str(), written(with).c_str(), ratio, row.most,
+         ratio <= row.most ? "yes" : "no");
+}
+
+}  // namespace
+
+Row::Row(const std::string &what, const Work &work) : what_(what) {
+  registerWork(what, work);
+}
+
+Row::Row(const std::string &what, const Footprint &footprint) : what_(what) {
+  registerWork(what, footprint);
+}
+
+Row &Row::atMost(double ratio, const std::string &what, const Work &work) {
+  registerWork(what, work);
+  return atMost(ratio, what);
+}
+
+Row &Row::atMost(double ratio, const std::string &what, const Footprint &footprint) {
+  registerWork(what, footprint);
+  return atMost(ratio, what);
+}
+
+Row &Row::atMost(double ratio, const std::string &what) {
+  comparisons().push_back({what_, what, ratio});
+  return *this;
+}
+
+void orDie(bool ok, const char *what) {
+  if (!ok) {
+    fprintf(stderr, "%s failed: 0x%04X %s:%d\n", what, static_cast<unsigned>(QLIBCErrGet()),
+            QLIBCErrorGetFile(), QLIBCErrorGetLine());
+    exit(EXIT_FAILURE);
+  }
+}
+
+int main(int argc, char **argv) {
+  benchmark::Initialize(&argc, argv);
+  if (benchmark::ReportUnrecognizedArguments(argc, argv)) {
+    return EXIT_FAILURE;
+  }
+  orDie(getenv("ZELO_SANDBOX") != nullptr, "being in the sandbox (scripts/sandbox)");
+  makeRows();
+  Collector collector;
+  benchmark::RunSpecifiedBenchmarks(&collector);
+  for (const Comparison &row : comparisons()) {
+    const Amount *what = collector.find(row.what);
+    const Amount *with = collector.find(row.with);
+    if (what != nullptr && with != nullptr) {
+      print(row, *what, *with);
+    }
+  }
+  return EXIT_SUCCESS;
+}

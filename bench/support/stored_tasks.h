@@ -1,0 +1,36 @@
+// Stores of many tasks, and reading a file as fast as it can be done.
+#ifndef BENCH_STORED_TASKS_H
+#define BENCH_STORED_TASKS_H
+
+#include <zelosched.h>
+
+#include <cstddef>
+#include <memory>
+
+constexpr char kStore[] = "/tmp/scheduled_tasks";
+
+struct TaskFree {
+  void operator()(ZELO_SCHED_TASK *task) const { ZELOSchedTaskFree(task); }
+};
+using Task = std::unique_ptr<ZELO_SCHED_TASK, TaskFree>;
+
+// A new task as a user might make one, which is different for each number.
+Task newTask(int number);
+
+// Makes the store one of `count` tasks, written last by the platform as one that grew is. Of none
+// there is no file.
+void fillStore(int count);
+
+// Waits until the store is older than what may still be a copy in progress.
+void growOld();
+
+// Makes the platform forget what it has read of the store, as in a process that has just started.
+void forgetStore();
+
+// All tasks of the store, listed and freed. The store must have one.
+void list();
+
+// Opens, reads and closes the store, into memory that nothing else is done to. Its size.
+size_t readStore();
+
+#endif

@@ -1,0 +1,51 @@
+#!/bin/bash
+# The benchmarks still run and print every row. No time is judged.
+#
+# Functions are called by check:
+# shellcheck disable=SC2317
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+
+readonly BENCH=$here/../scripts/bench
+readonly BRIEF=(--benchmark_repetitions=1 --benchmark_min_time=0.0001)
+readonly AMOUNT='[0-9.e+]+ (ns|us|ms|B|KiB|MiB)'
+readonly ROW="^.+ $AMOUNT  .+ $AMOUNT +[0-9.]+ +[0-9.]+  (yes|no)\$"
+
+# prints_rows PROGRAM COUNT
+prints_rows() {
+  local rows
+  rows=$("$here/../scripts/sandbox" "$BUILD_DIR/bench/${1}_bench" "${BRIEF[@]}") || return 1
+  same "$(grep -cE "$ROW" <<<"$rows")" "$2" && same "$(wc -l <<<"$rows")" "$2"
+}
+
+refuses_to_run_outside_the_sandbox() {
+  local complaint
+  ! complaint=$(env -u ZELO_SANDBOX "$BUILD_DIR/bench/json_bench" "${BRIEF[@]}" 2>&1) &&
+    [[ $complaint == *"being in the sandbox"* ]]
+}
+
+explains_itself() {
+  [[ $("$BENCH" --help) == *"scripts/bench --brief"* ]]
+}
+
+names_what_there_is() {
+  local complaint status=0
+  complaint=$("$BENCH" lists 2>&1) || status=$?
+  same "$status" 2 && [[ $complaint == *"no 'lists'"*"list get create"* ]]
+}
+
+check "listing is compared with GKeyFile and with the records alone" prints_rows list 9
+check "reading one task is compared with reading the file" prints_rows get 3
+check "creating is compared with the copies and the crontab" prints_rows create 3
+check "the next trigger time is compared with the clock's calls" prints_rows trigger 10
+check "JSON is compared with JsonCpp alone" prints_rows json 3
+check "recording a run is compared with the statements alone" prints_rows status 1
+check "a run is compared with a shell that is forked" prints_rows run 2
+check "a list's memory is compared with its records and file" prints_rows memory 4
+check "a benchmark refuses to run outside the sandbox" refuses_to_run_outside_the_sandbox
+check "scripts/bench --help says how it is called" explains_itself
+check "an unknown name is refused, and those there are are named" names_what_there_is
+finish
