@@ -8,17 +8,30 @@
 #include <json/json.h>
 
 #include <string>
+#include <string_view>
 
-inline std::string schedWriteJson(const Json::Value &value) {
-  return Json::FastWriter().write(value);
-}
+// One of each serves for all texts of a call: what they allocate to begin with is most of what a
+// short text costs them.
+class SchedJsonWriter {
+ public:
+  std::string write(const Json::Value &value) { return writer_.write(value); }
 
-// Comments are passed over. The reader can also keep them, but takes time that grows with the
-// square of their number to do so, and the texts come from outside.
-inline bool schedReadJson(const std::string &text, Json::Value *value) {
-  constexpr bool kKeepComments = false;
-  return Json::Reader().parse(text, *value, kKeepComments);
-}
+ private:
+  Json::FastWriter writer_;
+};
+
+class SchedJsonReader {
+ public:
+  // Comments are passed over. The reader can also keep them, but takes time that grows with the
+  // square of their number to do so, and the texts come from outside.
+  bool read(std::string_view text, Json::Value *value) {
+    constexpr bool kKeepComments = false;
+    return reader_.parse(text.data(), text.data() + text.size(), *value, kKeepComments);
+  }
+
+ private:
+  Json::Reader reader_;
+};
 #pragma GCC diagnostic pop
 
 #endif

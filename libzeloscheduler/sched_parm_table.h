@@ -19,6 +19,7 @@ struct SchedParm {
   int (*fnFromHashStr)(void *private_data, const char *str);            // numbers only
   int (*compare)(const void *field1, const void *field2);
 
+  bool isText() const { return capacity > 0; }
   void *fieldOf(ZELO_SCHED_TASK *task) const { return reinterpret_cast<char *>(task) + offset; }
   const void *fieldOf(const ZELO_SCHED_TASK *task) const {
     return reinterpret_cast<const char *>(task) + offset;

@@ -3,6 +3,7 @@
 
 #include <sys/mman.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
@@ -13,7 +14,7 @@ namespace {
 
 constexpr int kLongestPlainList = 16;
 constexpr size_t kHugePage = size_t{2} << 20;
-constexpr size_t kSlabSize = 4 * kHugePage;
+constexpr size_t kMostSlabSize = 4 * kHugePage;
 
 #if defined(__SANITIZE_ADDRESS__)
 constexpr bool kSlabsAllowed = false;  // each record is watched by itself then
@@ -51,6 +52,7 @@ constexpr Layout layoutOf(SchedRecordExtent extent) {
 // Stands at the front of its memory; the records follow.
 struct SchedSlab {
   SchedSlab *next;
+  size_t size;  // in bytes, with this
   size_t stride;
   size_t unused;   // records not handed out yet, from the first on
   size_t holders;  // records in use, and the source that still takes from it
@@ -58,7 +60,7 @@ struct SchedSlab {
   uintptr_t begin() const { return reinterpret_cast<uintptr_t>(this); }
   bool holds(const ZELO_SCHED_TASK *pTask) const {
     const auto address = reinterpret_cast<uintptr_t>(pTask);
-    return address >= begin() && address < begin() + kSlabSize;
+    return address >= begin() && address < begin() + size;
   }
   ZELO_SCHED_TASK *record(size_t index) const {
     return reinterpret_cast<ZELO_SCHED_TASK *>(begin() + sizeof(*this) + index * stride);
@@ -73,9 +75,9 @@ SchedSlab *slabs = nullptr;
 
 // Mapped rather than allocated: the pages come zeroed, and go back at once when the list is freed.
 // A huge page must begin at a multiple of its size, so what is mapped too much is cut off.
-void *mapSlab() {
-  constexpr size_t kMapped = kSlabSize + kHugePage;
-  void *memory = mmap(nullptr, kMapped, PROT_READ | PROT_WRITE,
+void *mapSlab(size_t size) {
+  const size_t mapped = size + kHugePage;
+  void *memory = mmap(nullptr, mapped, PROT_READ | PROT_WRITE,
                       MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
   if (memory == MAP_FAILED) {
     return nullptr;
@@ -83,27 +85,45 @@ void *mapSlab() {
   const auto begin = reinterpret_cast<uintptr_t>(memory);
   const uintptr_t aligned = (begin + kHugePage - 1) / kHugePage * kHugePage;
   const size_t before = aligned - begin;
-  const size_t after = kMapped - kSlabSize - before;
+  const size_t after = mapped - size - before;
   if (before > 0) {
     munmap(memory, before);
   }
   void *slab = reinterpret_cast<void *>(aligned);
   if (after > 0) {
-    munmap(static_cast<char *>(slab) + kSlabSize, after);
+    munmap(static_cast<char *>(slab) + size, after);
   }
   return slab;
 }
 
-SchedSlab *newSlab(Layout layout) {
-  void *memory = mapSlab();
+size_t recordsIn(size_t slabSize, Layout layout) {
+  const size_t least = sizeof(SchedSlab) + layout.end;
+  return slabSize < least ? 0 : (slabSize - least) / layout.stride + 1;
+}
+
+// Whole huge pages, and no more of them than the records fill: memory that nobody asked for would
+// be taken otherwise. 0 when there are too few records for one.
+size_t slabSizeFor(size_t expectedRecords, Layout layout) {
+  size_t size = kMostSlabSize;
+  while (size > 0 && recordsIn(size, layout) > expectedRecords) {
+    size -= kHugePage;
+  }
+  return size;
+}
+
+// Null when memory is short, or the records too few.
+SchedSlab *newSlab(Layout layout, size_t expectedRecords) {
+  const size_t size = layout.fillsHugePages ? slabSizeFor(expectedRecords, layout) : kMostSlabSize;
+  void *memory = size > 0 ? mapSlab(size) : nullptr;
   if (memory == nullptr) {
     return nullptr;
   }
   // A kernel without huge pages is only slower.
-  madvise(memory, kSlabSize, layout.fillsHugePages ? MADV_HUGEPAGE : MADV_NOHUGEPAGE);
+  madvise(memory, size, layout.fillsHugePages ? MADV_HUGEPAGE : MADV_NOHUGEPAGE);
   auto *slab = static_cast<SchedSlab *>(memory);
+  slab->size = size;
   slab->stride = layout.stride;
-  slab->unused = (kSlabSize - sizeof(*slab) - layout.end) / layout.stride + 1;
+  slab->unused = recordsIn(size, layout);
   slab->holders = 1;
   slab->next = slabs;
   slabs = slab;
@@ -133,7 +153,7 @@ void unhold(SchedSlab *slab) {
     return;
   }
   slabs = slabOf(slab->record(0))->next;
-  munmap(slab, kSlabSize);
+  munmap(slab, slab->size);
 }
 
 }  // namespace
@@ -159,7 +179,9 @@ void schedRecordEmpty(ZELO_SCHED_TASK *pTask) {
 }
 
 SchedRecordSource::SchedRecordSource(int expectedRecords, SchedRecordExtent extent)
-    : usesSlabs_(kSlabsAllowed && expectedRecords > kLongestPlainList), extent_(extent) {}
+    : usesSlabs_(kSlabsAllowed && expectedRecords > kLongestPlainList),
+      expectedRecords_(static_cast<size_t>(std::max(expectedRecords, 0))),
+      extent_(extent) {}
 
 SchedRecordSource::~SchedRecordSource() {
   if (slab_ != nullptr) {
@@ -175,8 +197,12 @@ TaskGuard SchedRecordSource::take() {
     unhold(slab_);
     slab_ = nullptr;
   }
-  if (slab_ == nullptr && (slab_ = newSlab(layoutOf(extent_))) == nullptr) {
-    return schedRecordAlloc();  // there may still be room for a single one
+  if (slab_ == nullptr) {
+    slab_ = newSlab(layoutOf(extent_), expectedRecords_);
+  }
+  expectedRecords_ -= std::min<size_t>(expectedRecords_, 1);
+  if (slab_ == nullptr) {
+    return schedRecordAlloc();  // where there may still be room for a single one
   }
   // From the end on: a list that is built from its end then lies in memory as it is linked.
   ++slab_->holders;

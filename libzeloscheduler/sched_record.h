@@ -44,6 +44,7 @@ class SchedRecordSource {
 
  private:
   bool usesSlabs_;
+  size_t expectedRecords_;  // that have not been taken yet
   SchedRecordExtent extent_;
   SchedSlab *slab_ = nullptr;
 };

@@ -81,11 +81,11 @@ int encodeCommand(PSZHASH *ppHash) {
   return 0;
 }
 
-// The store keeps one value a line.
+// The store keeps one value a line. Numbers and names have no line feeds to begin with.
 int replaceLineFeeds(PSZHASH *ppHash) {
   SCHED_CHECK_ARG(*ppHash != nullptr, "NULL != *ppHash", 0);
   for (const SchedParm *parm = parm_table; parm->szKey != nullptr; ++parm) {
-    const char *szValue = QLIBCSzHashGetValue(*ppHash, parm->szKey);
+    const char *szValue = parm->isText() ? QLIBCSzHashGetValue(*ppHash, parm->szKey) : nullptr;
     if (szValue == nullptr || strchr(szValue, '\n') == nullptr) {
       continue;
     }

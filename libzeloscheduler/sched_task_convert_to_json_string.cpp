@@ -3,6 +3,7 @@
 #include <zelocore.h>
 #include <zelosched.h>
 
+#include <algorithm>
 #include <exception>
 #include <string>
 #include <string_view>
@@ -70,15 +71,22 @@ std::string wellFormed(std::string_view text) {
   return result;
 }
 
+Json::Value valueOf(std::string_view text) {
+  const bool isAscii = std::none_of(text.begin(), text.end(), [](char byte) { return byte < 0; });
+  return isAscii ? Json::Value(text.data(), text.data() + text.size())
+                 : Json::Value(wellFormed(text));
+}
+
 std::string objectOf(PSZHASH hash, PSZLIST keys) {
   Json::Value root(Json::objectValue);
+  SchedJsonWriter writer;
   const int count = QLIBCSzListCount(keys);
   for (int i = 0; i < count; ++i) {
     const char *szKey = QLIBCSzListGet(keys, i);
     const char *szValue = QLIBCSzHashGetValue(hash, szKey);
-    root[szKey] = schedWriteJson(Json::Value(wellFormed(szValue != nullptr ? szValue : "")));
+    root[Json::StaticString(szKey)] = writer.write(valueOf(szValue != nullptr ? szValue : ""));
   }
-  return schedWriteJson(root);
+  return writer.write(root);
 }
 
 int convert(const ZELO_SCHED_TASK *pTask, char *szBuf, size_t cbBuf) {

@@ -84,28 +84,32 @@ bool hasHalfPair(std::string_view text) {
 }
 
 // The reader throws where a text is nested too deeply.
-bool parse(const std::string &text, Json::Value *value) {
+bool parse(SchedJsonReader *reader, std::string_view text, Json::Value *value) {
   try {
-    return text.size() <= kLongestText && schedReadJson(text, value) && !hasHalfPair(text) &&
-           isAllThereIs(
-               std::string_view(text).substr(static_cast<size_t>(value->getOffsetLimit())));
+    return text.size() <= kLongestText && reader->read(text, value) && !hasHalfPair(text) &&
+           isAllThereIs(text.substr(static_cast<size_t>(value->getOffsetLimit())));
   } catch (const Json::Exception &) {
     return false;
   }
 }
 
-// A text for C would end at a zero byte: refused, rather than saved cut.
-bool isPlainText(const std::string &text) {
-  return text.find('\0') == std::string::npos;
+// What a string value holds, without copying it.
+std::string_view textOf(const Json::Value &string) {
+  const char *begin = nullptr;
+  const char *end = nullptr;
+  string.getString(&begin, &end);
+  return {begin, static_cast<size_t>(end - begin)};
 }
 
-bool decodeMember(const Json::Value &member, std::string *text) {
-  Json::Value inner;
-  if (!member.isString() || !parse(member.asString(), &inner) || !inner.isString()) {
-    return false;
-  }
-  *text = inner.asString();
-  return isPlainText(*text);
+// A text for C would end at a zero byte: refused, rather than saved cut.
+bool isPlainText(std::string_view text) {
+  return text.find('\0') == std::string_view::npos;
+}
+
+// The value that is written in a member's string, which must be a string again.
+bool decodeMember(SchedJsonReader *reader, const Json::Value &member, Json::Value *inner) {
+  return member.isString() && parse(reader, textOf(member), inner) && inner->isString() &&
+         isPlainText(textOf(*inner));
 }
 
 long long numberIn(const char *szText) {
@@ -113,12 +117,18 @@ long long numberIn(const char *szText) {
   return strtoll(szText, nullptr, kDecimal);
 }
 
+// A number of a few digits, which nearly every one is.
+bool isShort(const char *szNumber) {
+  constexpr size_t kFitAlways = 9;
+  return szNumber[0] >= '0' && szNumber[0] <= '9' && strlen(szNumber) <= kFitAlways;
+}
+
 // A field has 32 bits, and a number that does not fit would become another one in it: uid 0 of
 // 4294967296. What is no number at all is left to the conversion.
 bool fitsNumber(const SchedParm &parm, const char *szNumber) {
   uint32_t field = 0;
   char szKept[32];
-  return parm.fnFromHashStr(&field, szNumber) < 0 ||
+  return isShort(szNumber) || parm.fnFromHashStr(&field, szNumber) < 0 ||
          parm.ToHashStr(&field, szKept, sizeof(szKept)) < 0 ||
          numberIn(szKept) == numberIn(szNumber);
 }
@@ -138,28 +148,31 @@ bool fitsCommand(std::string_view encoded) {
          memchr(command, '\0', length) == nullptr;
 }
 
-bool fitsField(const std::string &name, const std::string &text) {
-  if (name == kCommandKey) {
-    return fitsCommand(text);
+bool fitsFields(PSZHASH hash) {
+  const char *szCommand = QLIBCSzHashGetValue(hash, kCommandKey);
+  if (szCommand != nullptr && !fitsCommand(szCommand)) {
+    return false;
   }
   for (const SchedParm *parm = parm_table; parm->szKey != nullptr; ++parm) {
-    if (name == parm->szKey && parm->inHash && parm->fnFromHashStr != nullptr) {
-      return fitsNumber(*parm, text.c_str());
+    const bool isNumber = parm->inHash && parm->fnFromHashStr != nullptr;
+    const char *szNumber = isNumber ? QLIBCSzHashGetValue(hash, parm->szKey) : nullptr;
+    if (szNumber != nullptr && !fitsNumber(*parm, szNumber)) {
+      return false;
     }
   }
   return true;
 }
 
-int fillHash(const Json::Value &root, HashGuard *hash) {
-  for (const std::string &name : root.getMemberNames()) {
-    std::string text;
-    if (!isPlainText(name) || !decodeMember(root[name], &text) || !fitsField(name, text) ||
-        QLIBCSzHashSetValue(hash->handle(), name.c_str(), text.c_str()) < 0) {
-      SCHED_LOG("save appargs failed");
-      return -1;
+bool fillHash(const Json::Value &root, SchedJsonReader *reader, HashGuard *hash) {
+  for (auto member = root.begin(); member != root.end(); ++member) {
+    const std::string name = member.name();
+    Json::Value inner;
+    if (!isPlainText(name) || !decodeMember(reader, *member, &inner) ||
+        QLIBCSzHashSetValue(hash->handle(), name.c_str(), inner.asCString()) < 0) {
+      return false;
     }
   }
-  return 0;
+  return fitsFields(hash->get());
 }
 
 // The task that is stored under the id may be another one by now: one that another program has put
@@ -193,8 +206,9 @@ int saveFromJson(const char *szJson, bool create) {
     SCHED_LOG_CALLEE("alloc task failed.");
     return -1;
   }
+  SchedJsonReader reader;
   Json::Value root;
-  if (!parse(szJson, &root) || !root.isObject()) {
+  if (!parse(&reader, szJson, &root) || !root.isObject()) {
     SCHED_LOG("parse json failed, szJson=%s", szJson);
     return -1;
   }
@@ -203,7 +217,8 @@ int saveFromJson(const char *szJson, bool create) {
     SCHED_LOG("Out of memory");
     return -1;
   }
-  if (fillHash(root, &hash) < 0) {
+  if (!fillHash(root, &reader, &hash)) {
+    SCHED_LOG("save appargs failed");
     return -1;
   }
   if (root.empty()) {

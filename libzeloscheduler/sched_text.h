@@ -3,7 +3,6 @@
 #define SCHED_TEXT_H
 
 #include <algorithm>
-#include <charconv>
 #include <cstdarg>
 #include <cstddef>
 #include <cstdint>
@@ -47,15 +46,17 @@ class BoundedText {
     length_ += static_cast<size_t>(wanted);
   }
 
-  // As append with "%0*u", which a list of many tasks would spend much of its time in.
+  // As append with "%0*u", of a width up to kMostDigits. A list of many tasks would spend much of
+  // its time in that.
   BoundedText &appendNumber(uint32_t number, size_t width = 1) {
-    char digits[std::numeric_limits<uint32_t>::digits10 + 1];
-    const auto end = std::to_chars(digits, std::end(digits), number).ptr;
-    const auto count = static_cast<size_t>(end - digits);
-    for (size_t i = count; i < width; ++i) {
-      appendBytes("0", 1);
-    }
-    appendBytes(digits, count);
+    char digits[kMostDigits];
+    char *first = std::end(digits);
+    const char *const padded = std::end(digits) - std::min(width, kMostDigits);
+    do {
+      *--first = static_cast<char>('0' + number % 10);
+      number /= 10;
+    } while (number > 0 || first > padded);
+    appendBytes(first, static_cast<size_t>(std::end(digits) - first));
     return *this;
   }
   BoundedText &appendText(const char *szText) {
@@ -64,6 +65,8 @@ class BoundedText {
   }
 
  private:
+  static constexpr size_t kMostDigits = std::numeric_limits<uint32_t>::digits10 + 1;
+
   void appendBytes(const char *bytes, size_t count) {
     const size_t room = N - 1 - length_;
     wasCut_ = wasCut_ || count > room;

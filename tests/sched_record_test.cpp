@@ -22,6 +22,7 @@ using Lines = std::vector<std::string>;
 
 bool slabsFail = false;
 bool mappingsAreOdd = false;
+size_t mapped = 0;
 constexpr size_t kSmallestSlab = size_t{1} << 22;
 constexpr size_t kPage = 4096;
 
@@ -35,6 +36,7 @@ extern "C" __attribute__((visibility("default"))) void *mmap(void *address, size
     errno = ENOMEM;
     return MAP_FAILED;
   }
+  mapped += length >= kSmallestSlab ? length : 0;
   if (mappingsAreOdd && length >= kSmallestSlab) {
     auto *begin =
         static_cast<char *>(mmap64(address, length + kPage, protection, flags, descriptor, offset));
@@ -188,6 +190,25 @@ TEST_F(LongListTest, WithoutRoomForARecordEitherTheListFails) {
   EXPECT_EQ(head, nullptr);
   EXPECT_EQ(logged(), Lines{"backend_zeloschedule.cpp:N malloc ZELO_SCHED_TASK failed. key:[300]"});
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, "backend_zeloschedule.cpp"}));
+}
+
+// Each slab is mapped with a huge page too much, which is cut off again.
+TEST_F(LongListTest, SlabsAreNoLargerThanTheRecordsInThem) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer watches each record by itself";
+  constexpr size_t kHugePage = size_t{2} << 20;
+  for (const int count : {59, 60, 119, 120, 240, 241, 300, 500}) {
+    SCOPED_TRACE(count);
+    storeTasks(count);
+    mapped = 0;
+    const std::vector<ZELO_SCHED_TASK *> tasks = listed();
+    EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(count));
+    constexpr size_t kMostSlabs = 3;
+    EXPECT_EQ(mapped % kHugePage, 0U);
+    EXPECT_LE(mapped,
+              static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK) + kMostSlabs * kHugePage);
+    EXPECT_EQ(mapped > 0, count >= 60) << "a slab is a huge page at least";
+    freeAll(tasks);
+  }
 }
 
 // More ids than are first made room for.

@@ -21,6 +21,7 @@
 #include <functional>
 #include <map>
 #include <optional>
+#include <random>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -360,6 +361,54 @@ TEST_F(ZelocoreSectionFile, AZeroByteEndsTheNameOfASection) {
   Write("[1\0x]\na=b\n[\0]\nc=d\n"s);
   EXPECT_EQ(Names(), Texts{"1"});
   EXPECT_EQ(Section("1"), (Keys{{"a", "b"}, {"c", "d"}}));
+}
+
+/* The first section that is asked for is searched, the others are looked up. */
+TEST_F(ZelocoreSectionFile, SectionsAreFoundInWhateverOrderTheyAreAskedFor) {
+  Write("[1]\na=\"1\"\n[2]\na=\"2\"\n[2]\na=\"another\"\n[3]\na=\"3\"\n");
+  MakeOld();
+  for (const char *order : {"123", "321", "2213", "33", "4142", "44"}) {
+    Write(Contents());
+    for (const char *name = order; *name != '\0'; ++name) {
+      SCOPED_TRACE(std::string(order) + " at " + *name);
+      const std::string section(1, *name);
+      if (section == "4") {
+        EXPECT_EQ(Get(section), 0);
+      } else {
+        EXPECT_EQ(Section(section), (Keys{{"a", section}}));
+      }
+    }
+  }
+}
+
+/* A hash that has served for other sections, the same keys among them, reads what a new one does.
+ */
+TEST_F(ZelocoreSectionFile, WhatAHashHeldBeforeDoesNotShow) {
+  const std::vector<std::string> lines = {
+      "a=\"one\"",      "b=\"\"",     "a=\"another, and longer than the first\"",
+      "b=\"x\\ny\"",    " a=\"z\"",   "c = unquoted ",
+      "d=\"not closed", "e=\"x\"y\"", "# f=\"a remark\"",
+      "\"=\"x\"",       "=\"x\"",     "g=\"" + std::string(300, 'g') + "\"",
+      "a=b=\"x\"",      "",           "h=\"\r\""};
+  std::mt19937 random(4711);
+  std::string text;
+  constexpr int kSections = 500;
+  for (int i = 0; i < kSections; ++i) {
+    text += "[" + std::to_string(i) + "]\n";
+    for (unsigned line = random() % 8; line > 0; --line) {
+      text += lines[random() % lines.size()] + "\n";
+    }
+  }
+  text.pop_back();
+  Write(text);
+  PSZHASH used = HashOf({{"a=b", "set"}, {"# f", "set"}, {"\"", "set"}});
+  for (int i = 0; i < kSections; ++i) {
+    const std::string name = std::to_string(i);
+    QLIBCHashRemoveAll(used);
+    ASSERT_EQ(QLIBCFileGetSection(path_.c_str(), name.c_str(), &used), 1);
+    ASSERT_EQ(KeysOf(used), Section(name)) << text;
+  }
+  QLIBCSzHashFree(used);
 }
 
 TEST_F(ZelocoreSectionFile, ReadingAddsToWhatTheHashHolds) {

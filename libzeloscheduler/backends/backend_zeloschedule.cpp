@@ -138,9 +138,6 @@ class StoreHold {
 // behind one that cannot be read, and one that is gone since the names were listed is passed over.
 class StoreWalk {
  public:
-  StoreWalk()
-      : names_(QLIBCSzListAlloc(kContainerCapacity)), hash_(QLIBCSzHashAlloc(kContainerCapacity)) {}
-
   // The number of sections, 0 without a store; -1 when they cannot be listed or memory is short.
   int open() {
     if (QLIBCFileExist(kWorkingCopy) == 0) {
@@ -150,6 +147,8 @@ class StoreWalk {
       SCHED_SET_ERROR(kErrOpen);
       return -1;
     }
+    *names_.handle() = QLIBCSzListAlloc(kContainerCapacity);
+    *hash_.handle() = QLIBCSzHashAlloc(kContainerCapacity);
     if (!names_ || !hash_) {
       return -1;
     }
@@ -186,8 +185,8 @@ class StoreWalk {
  private:
   static constexpr int kDecimal = 10;
 
-  ListGuard names_;
-  HashGuard hash_;
+  ListGuard names_{nullptr};
+  HashGuard hash_{nullptr};
   SchedTriggerClock clock_;
   int sections_ = 0;
   int next_ = 0;

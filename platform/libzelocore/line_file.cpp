@@ -21,15 +21,18 @@ int ReadLineFile(const std::string &path, LineFile *file) {
   if (!S_ISREG(file->status.st_mode)) {
     return Fail(QLIBC_ERR_OPEN);
   }
+  Bytes contents;
   if (file->status.st_size > kMostFileBytes ||
-      !ReadAll(opened.get(), static_cast<size_t>(file->status.st_size), &file->text)) {
+      !ReadAll(opened.get(), static_cast<size_t>(file->status.st_size), &contents)) {
     return Fail(QLIBC_ERR_IO);
   }
+  file->text = contents.text();
   return 0;
 }
 
 int WriteLineFile(const std::string &path, const LineFile &file) {
-  return ReplaceFile(path, file.text, &file.status, Durability::kSynced);
+  const std::string_view contents = file.text;
+  return ReplaceFile(path, {&contents, 1}, &file.status, Durability::kSynced);
 }
 
 LineRange FindLine(const std::string &text, std::string_view key) noexcept {

@@ -7,7 +7,8 @@
 #include <sys/types.h>
 
 #include <cstddef>
-#include <string>
+
+#include "bytes.h"
 
 namespace zelo {
 
@@ -16,7 +17,7 @@ inline constexpr off_t kMostFileBytes = off_t{1} << 30;
 
 /* Reads up to the end of the file, which need not be where fstat saw it. False
  * when a read fails or the file is too large. Throws when memory is short. */
-bool ReadAll(int fd, size_t expected, std::string *contents);
+bool ReadAll(int fd, size_t expected, Bytes *contents);
 
 }  // namespace zelo
 

@@ -61,7 +61,7 @@ bool SameContents(const struct stat &a, const struct stat &b) noexcept {
 /* ---- reading ---- */
 
 struct Snapshot {
-  std::string contents;
+  Bytes contents;
   struct stat status; /* before the first byte was read */
   int64_t opened;     /* the clock that stamps files, before the file was opened */
   bool steady;        /* nobody wrote while it was read */
@@ -139,10 +139,11 @@ bool IsYoung(const struct stat &status) noexcept {
   return -kCopyInProgress < age && age < kCopyInProgress;
 }
 
-bool LooksTorn(const Snapshot &snapshot, SectionForm form) noexcept {
+bool LooksTorn(const Snapshot &snapshot, const SectionText &text) noexcept {
   if (!snapshot.steady) {
     return true;
   }
+  const SectionForm form = text.Form();
   return form == SectionForm::kEmpty || form == SectionForm::kCutOff ||
          form == SectionForm::kEdited;
 }
@@ -161,12 +162,11 @@ std::unique_ptr<const CachedFile> Load(const char *path) {
     /* Made in place, since its names are views into itself. */
     std::unique_ptr<const CachedFile> file(new CachedFile{
         path, snapshot.status, snapshot.opened, SectionText(std::move(snapshot.contents))});
-    if (pauses < kMostPauses && IsYoung(snapshot.status) &&
-        LooksTorn(snapshot, file->text.form())) {
+    if (pauses < kMostPauses && IsYoung(snapshot.status) && LooksTorn(snapshot, file->text)) {
       Pause();
       continue;
     }
-    if (file->text.form() == SectionForm::kCutOff) {
+    if (file->text.IsCutOff()) {
       Fail(QLIBC_ERR_IO);
       return nullptr;
     }
@@ -220,7 +220,7 @@ int ReadOriginal(const char *path, Original *original) {
   }
   original->status = snapshot.status;
   original->text = std::make_unique<const SectionText>(std::move(snapshot.contents));
-  if (!snapshot.steady || original->text->form() == SectionForm::kCutOff) {
+  if (!snapshot.steady || original->text->IsCutOff()) {
     return Fail(QLIBC_ERR_IO);
   }
   return 0;
@@ -258,15 +258,16 @@ int SetSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash
   if (section == nullptr) {
     return 0;
   }
-  return Changed(
-      ReplaceFile(path, original.text->WithSet(*section, hash), &original.status, durability));
+  return Changed(ReplaceFile(path, original.text->WithSet(*section, hash).Views(), &original.status,
+                             durability));
 }
 
 int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash,
                Durability durability) {
   struct stat status;
   if (lstat(path, &status) != 0 && errno == ENOENT) {
-    return Changed(ReplaceFile(path, SectionText({}).WithAdded(name, hash), nullptr, durability));
+    const SectionText empty{Bytes{}};
+    return Changed(ReplaceFile(path, empty.WithAdded(name, hash).Views(), nullptr, durability));
   }
   Original original;
   if (ReadOriginal(path, &original) < 0) {
@@ -275,8 +276,8 @@ int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash
   if (original.text->Find(name) != nullptr) {
     return Fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return Changed(
-      ReplaceFile(path, original.text->WithAdded(name, hash), &original.status, durability));
+  return Changed(ReplaceFile(path, original.text->WithAdded(name, hash).Views(), &original.status,
+                             durability));
 }
 
 int RemoveSection(const char *path, std::string_view name) {
@@ -288,8 +289,8 @@ int RemoveSection(const char *path, std::string_view name) {
   if (section == nullptr) {
     return 0;
   }
-  return Changed(
-      ReplaceFile(path, original.text->WithRemoved(*section), &original.status, Durability::kNone));
+  return Changed(ReplaceFile(path, original.text->WithRemoved(*section).Views(), &original.status,
+                             Durability::kNone));
 }
 
 }  // namespace

@@ -3,10 +3,14 @@
 #include <xxhash.h>
 
 #include <algorithm>
+#include <bit>
 #include <charconv>
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
+#include <memory>
+#include <new>
+#include <utility>
 
 namespace zelo {
 namespace {
@@ -116,11 +120,24 @@ uint64_t Checksum(std::string_view text) noexcept {
   return XXH3_64bits(text.data(), text.size());
 }
 
-void AppendTrailer(std::string &out, size_t sections) {
+uint64_t Checksum(const ChangedText &changed) {
+  const std::unique_ptr<XXH3_state_t, decltype(&XXH3_freeState)> state(XXH3_createState(),
+                                                                       XXH3_freeState);
+  if (state == nullptr) {
+    throw std::bad_alloc();
+  }
+  XXH3_64bits_reset(state.get());
+  for (const std::string_view piece : changed.Views()) {
+    XXH3_64bits_update(state.get(), piece.data(), piece.size());
+  }
+  return XXH3_64bits_digest(state.get());
+}
+
+std::string TrailerOf(const ChangedText &changed, size_t sections) {
   char line[kTrailerRoom];
   const int size = std::snprintf(line, sizeof line, kTrailerFormat, sections,
-                                 static_cast<unsigned long long>(Checksum(out)));
-  out.append(line, static_cast<size_t>(size));
+                                 static_cast<unsigned long long>(Checksum(changed)));
+  return {line, static_cast<size_t>(size)};
 }
 
 /* ---- escapes ---- */
@@ -217,6 +234,16 @@ bool ParseSectionLine(std::string_view line, std::string_view *name) noexcept {
   return !name->empty();
 }
 
+/* As this library writes it: nothing but the name and its brackets. */
+bool ParsePlainSectionLine(std::string_view line, std::string_view *name) noexcept {
+  constexpr size_t kLeast = 3;
+  if (line.size() < kLeast || line.back() != ']') {
+    return false;
+  }
+  *name = line.substr(1, line.size() - 2);
+  return std::all_of(name->begin(), name->end(), [](char c) { return c > ' ' && c != ']'; });
+}
+
 /* The general way to read a line, with all that a hand may have written. */
 void ReadLine(std::string_view line, QLIBC_SZHASH &hash, std::string &scratch) {
   const std::string_view trimmed = Trim(line);
@@ -238,9 +265,9 @@ void ReadLine(std::string_view line, QLIBC_SZHASH &hash, std::string &scratch) {
   hash.Set(key, UpToZero(value));
 }
 
-/* Reads a line as this library writes it: no blank, no escape, `key="value"`.
- * False, with nothing set, for any other. */
-bool ReadPlainLine(std::string_view line, QLIBC_SZHASH &hash) {
+/* Reads a line as this library writes it: no blank, no escape, `key="value"`. It lies
+ * in a text that the hash has taken. False, with nothing set, for any other. */
+bool ReadPlainLine(std::string_view text, std::string_view line, QLIBC_SZHASH &hash) {
   constexpr size_t kLeast = 4; /* k="" */
   if (line.size() < kLeast || line.back() != '"' || IsBlank(line.front()) || IsNoKeyLine(line)) {
     return false;
@@ -254,11 +281,12 @@ bool ReadPlainLine(std::string_view line, QLIBC_SZHASH &hash) {
   if (value.find('"') != std::string_view::npos) {
     return false;
   }
-  hash.Set(line.substr(0, equals), value);
+  hash.SetTaken(line.substr(0, equals), static_cast<size_t>(value.data() - text.data()),
+                value.size());
   return true;
 }
 
-void AppendSection(std::string &out, std::string_view name, const QLIBC_SZHASH &hash) {
+std::string SectionOf(std::string_view name, const QLIBC_SZHASH &hash) {
   std::vector<const QLIBC_SZHASH::Entry *> entries;
   entries.reserve(hash.entries().size());
   for (const QLIBC_SZHASH::Entry &entry : hash.entries()) {
@@ -268,12 +296,14 @@ void AppendSection(std::string &out, std::string_view name, const QLIBC_SZHASH &
   std::sort(entries.begin(), entries.end(),
             [&](const auto *a, const auto *b) { return hash.Key(*a) < hash.Key(*b); });
 
-  out.append("[").append(name).append("]\n");
+  std::string out("[");
+  out.append(name).append("]\n");
   for (const QLIBC_SZHASH::Entry *entry : entries) {
     out.append(hash.Key(*entry)).push_back('=');
     AppendQuoted(out, hash.Value(*entry));
     out.push_back('\n');
   }
+  return out;
 }
 
 }  // namespace
@@ -288,39 +318,82 @@ bool IsSectionKey(std::string_view key) noexcept {
          key.find('=') == std::string_view::npos && std::none_of(key.begin(), key.end(), IsControl);
 }
 
-SectionText::SectionText(std::string contents) : contents_(std::move(contents)) {
+void ChangedText::Keep(std::string_view text) {
+  pieces_.push_back({.kept = text, .made = {}});
+}
+
+void ChangedText::Add(std::string text) {
+  pieces_.push_back({.kept = {}, .made = std::move(text)});
+}
+
+void ChangedText::EndLine() {
+  if (pieces_.back().view().back() != '\n') {
+    Add("\n");
+  }
+}
+
+std::vector<std::string_view> ChangedText::Views() const {
+  std::vector<std::string_view> views;
+  views.reserve(pieces_.size());
+  for (const Piece &piece : pieces_) {
+    views.push_back(piece.view());
+  }
+  return views;
+}
+
+SectionText::SectionText(Bytes contents) : contents_(std::move(contents)) {
   form_ = Judge();
 }
 
 /* Brackets are rare beside bytes, so the search is for them, and whether one
  * begins its line is looked up backwards. */
 void SectionText::IndexSections() {
-  const std::string_view text(contents_);
+  const std::string_view text = contents_.text();
   for (size_t at = text.find('[', start_); at != std::string_view::npos;) {
     size_t begin = at;
     while (begin > start_ && IsBlank(text[begin - 1])) {
       --begin;
     }
     const size_t end = LineEnd(text, at);
+    const bool begins_line = begin == start_ || text[begin - 1] == '\n';
+    const std::string_view line = LineAt(text, at, end);
     std::string_view name;
-    if ((begin == start_ || text[begin - 1] == '\n') &&
-        ParseSectionLine(Trim(LineAt(text, at, end)), &name)) {
+    if (begins_line &&
+        (ParsePlainSectionLine(line, &name) || ParseSectionLine(Trim(line), &name))) {
       if (!sections_.empty()) {
         sections_.back().end = begin;
       }
-      sections_.push_back({name, begin, end, text.size(), false});
+      sections_.push_back({name, begin, end, text.size()});
     }
     at = text.find('[', end);
   }
-  first_of_name_.reserve(sections_.size());
+}
+
+void SectionText::IndexNames() const {
+  std::vector<bool> is_first(sections_.size());
+  slots_.resize(std::bit_ceil(2 * sections_.size() + 1));
   for (size_t i = 0; i < sections_.size(); ++i) {
-    sections_[i].is_first = first_of_name_.emplace(sections_[i].name, i).second;
+    uint32_t &slot = slots_[FindSlot(sections_[i].name)];
+    if (slot == 0) {
+      slot = static_cast<uint32_t>(i + 1);
+      is_first[i] = true;
+    }
   }
+  is_first_ = std::move(is_first);
+}
+
+size_t SectionText::FindSlot(std::string_view name) const noexcept {
+  const size_t mask = slots_.size() - 1;
+  size_t slot = XXH3_64bits(name.data(), name.size()) & mask;
+  while (slots_[slot] != 0 && sections_[slots_[slot] - 1].name != name) {
+    slot = (slot + 1) & mask;
+  }
+  return slot;
 }
 
 /* What a hand appended may follow the trailer, so any line can be it. */
 void SectionText::FindTrailer() {
-  const std::string_view text(contents_);
+  const std::string_view text = contents_.text();
   for (size_t at = LastTrailerMark(text, text.size()); at != std::string_view::npos && at >= start_;
        at = LastTrailerMark(text, at)) {
     Trailer trailer{};
@@ -334,7 +407,7 @@ void SectionText::FindTrailer() {
 }
 
 SectionForm SectionText::Judge() {
-  const std::string_view text(contents_);
+  const std::string_view text = contents_.text();
   if (text.empty()) {
     return SectionForm::kEmpty;
   }
@@ -350,40 +423,57 @@ SectionForm SectionText::Judge() {
   if (!headed) {
     return SectionForm::kPlain;
   }
-  if (trailer_begin_ == trailer_end_) {
-    return SectionForm::kCutOff;
-  }
-  Trailer trailer{};
-  const bool agrees = ParseTrailer(LineAt(text, trailer_begin_, trailer_end_), &trailer) &&
-                      trailer_end_ == text.size() && trailer.sections == sections_.size() &&
-                      trailer.checksum == Checksum(text.substr(0, trailer_begin_));
-  return agrees ? SectionForm::kSealed : SectionForm::kEdited;
+  return trailer_begin_ == trailer_end_ ? SectionForm::kCutOff : SectionForm::kSealed;
 }
 
-const Section *SectionText::Find(std::string_view name) const noexcept {
-  if (expected_ < sections_.size() && sections_[expected_].is_first &&
-      sections_[expected_].name == name) {
+bool SectionText::TrailerAgrees() const noexcept {
+  const std::string_view text = contents_.text();
+  Trailer trailer{};
+  return ParseTrailer(LineAt(text, trailer_begin_, trailer_end_), &trailer) &&
+         trailer_end_ == text.size() && trailer.sections == sections_.size() &&
+         trailer.checksum == Checksum(text.substr(0, trailer_begin_));
+}
+
+SectionForm SectionText::Form() const noexcept {
+  return form_ == SectionForm::kSealed && !TrailerAgrees() ? SectionForm::kEdited : form_;
+}
+
+const Section *SectionText::Search(std::string_view name) const {
+  const auto found = std::find_if(sections_.begin(), sections_.end(),
+                                  [name](const Section &section) { return section.name == name; });
+  return found == sections_.end() ? nullptr : &*found;
+}
+
+const Section *SectionText::Find(std::string_view name) const {
+  if (!was_searched_) {
+    was_searched_ = true;
+    return Search(name);
+  }
+  if (slots_.empty()) {
+    IndexNames();
+  }
+  if (expected_ < sections_.size() && is_first_[expected_] && sections_[expected_].name == name) {
     return &sections_[expected_++];
   }
-  const auto found = first_of_name_.find(name);
-  if (found == first_of_name_.end()) {
+  const uint32_t place = slots_[FindSlot(name)];
+  if (place == 0) {
     return nullptr;
   }
-  expected_ = found->second + 1;
-  return &sections_[found->second];
+  expected_ = place;
+  return &sections_[place - 1];
 }
 
 void SectionText::Read(const Section &section, QLIBC_SZHASH &hash) const {
-  const std::string_view body =
-      std::string_view(contents_).substr(section.body, section.end - section.body);
+  const std::string_view body = contents_.text().substr(section.body, section.end - section.body);
   /* One look over the section spares a look at every value. */
   const bool plain =
       body.find('\\') == std::string_view::npos && body.find('\0') == std::string_view::npos;
+  hash.Take(body);
   std::string scratch;
   for (size_t at = 0; at < body.size();) {
     const size_t feed = std::min(body.find('\n', at), body.size());
     const std::string_view line = body.substr(at, feed - at);
-    if (!plain || !ReadPlainLine(line, hash)) {
+    if (!plain || !ReadPlainLine(body, line, hash)) {
       ReadLine(line, hash, scratch);
     }
     at = feed + 1;
@@ -393,7 +483,7 @@ void SectionText::Read(const Section &section, QLIBC_SZHASH &hash) const {
 /* Comments and blank lines that stand right before the next section are about
  * that one, and stay when this one is replaced or removed. */
 size_t SectionText::EndOfReplaced(const Section &section) const noexcept {
-  const std::string_view text(contents_);
+  const std::string_view text = contents_.text();
   size_t end = section.body;
   for (size_t at = section.body; at < section.end;) {
     const size_t next = LineEnd(text, at);
@@ -406,50 +496,44 @@ size_t SectionText::EndOfReplaced(const Section &section) const noexcept {
 }
 
 /* The old trailer is the one line that is never kept. */
-void SectionText::AppendKept(std::string &out, size_t begin, size_t end) const {
-  const std::string_view text(contents_);
-  const auto append = [&](size_t from, size_t to) {
+void SectionText::Keep(ChangedText &changed, size_t begin, size_t end) const {
+  const std::string_view text = contents_.text();
+  const auto keep = [&](size_t from, size_t to) {
     if (from < to) {
-      out.append(text.substr(from, to - from));
+      changed.Keep(text.substr(from, to - from));
     }
   };
-  append(begin, std::min(end, std::max(begin, trailer_begin_)));
-  append(std::max(begin, std::min(end, trailer_end_)), end);
-  if (out.back() != '\n') {
-    out.push_back('\n');
-  }
+  keep(begin, std::min(end, std::max(begin, trailer_begin_)));
+  keep(std::max(begin, std::min(end, trailer_end_)), end);
+  changed.EndLine();
 }
 
-std::string SectionText::Begin() const {
-  std::string out;
-  out.reserve(kHeader.size() + contents_.size() + kTrailerRoom);
-  out.append(kHeader);
-  return out;
+ChangedText SectionText::WithSet(const Section &section, const QLIBC_SZHASH &hash) const {
+  ChangedText changed;
+  changed.Keep(kHeader);
+  Keep(changed, start_, section.begin);
+  changed.Add(SectionOf(section.name, hash));
+  Keep(changed, EndOfReplaced(section), contents_.size);
+  changed.Add(TrailerOf(changed, sections_.size()));
+  return changed;
 }
 
-std::string SectionText::WithSet(const Section &section, const QLIBC_SZHASH &hash) const {
-  std::string out = Begin();
-  AppendKept(out, start_, section.begin);
-  AppendSection(out, section.name, hash);
-  AppendKept(out, EndOfReplaced(section), contents_.size());
-  AppendTrailer(out, sections_.size());
-  return out;
+ChangedText SectionText::WithAdded(std::string_view name, const QLIBC_SZHASH &hash) const {
+  ChangedText changed;
+  changed.Keep(kHeader);
+  Keep(changed, start_, contents_.size);
+  changed.Add(SectionOf(name, hash));
+  changed.Add(TrailerOf(changed, sections_.size() + 1));
+  return changed;
 }
 
-std::string SectionText::WithAdded(std::string_view name, const QLIBC_SZHASH &hash) const {
-  std::string out = Begin();
-  AppendKept(out, start_, contents_.size());
-  AppendSection(out, name, hash);
-  AppendTrailer(out, sections_.size() + 1);
-  return out;
-}
-
-std::string SectionText::WithRemoved(const Section &section) const {
-  std::string out = Begin();
-  AppendKept(out, start_, section.begin);
-  AppendKept(out, EndOfReplaced(section), contents_.size());
-  AppendTrailer(out, sections_.size() - 1);
-  return out;
+ChangedText SectionText::WithRemoved(const Section &section) const {
+  ChangedText changed;
+  changed.Keep(kHeader);
+  Keep(changed, start_, section.begin);
+  Keep(changed, EndOfReplaced(section), contents_.size);
+  changed.Add(TrailerOf(changed, sections_.size() - 1));
+  return changed;
 }
 
 }  // namespace zelo

@@ -7,16 +7,19 @@
 #include <bit>
 #include <cstring>
 #include <new>
+#include <numeric>
 #include <string>
 
 #include "support.h"
 
 namespace {
 
-/* A caller's guess at the capacity reserves no more than this; a hash grows
- * past it like any other. */
-constexpr size_t kMostReserved = 65536;
+/* A caller's guess at the capacity reserves no more than this; a hash grows past
+ * it like any other. Guesses are mostly far above what comes, and many hashes live
+ * no longer than one call. */
+constexpr size_t kMostReserved = 64;
 constexpr size_t kLeastArena = 2048;
+constexpr size_t kExpectedKeySize = 16;
 
 uint64_t LoadWord(const char *at, size_t size) noexcept {
   uint64_t word = 0;
@@ -53,7 +56,9 @@ uint32_t HashText(std::string_view text) noexcept {
 QLIBC_SZHASH::QLIBC_SZHASH(size_t capacity) {
   const size_t reserved = std::clamp<size_t>(capacity, 1, kMostReserved);
   entries_.reserve(reserved);
+  keys_.reserve(kExpectedKeySize * reserved);
   slots_.resize(std::bit_ceil(2 * reserved));
+  std::iota(answers_.begin(), answers_.end(), 1U);
 }
 
 uint32_t QLIBC_SZHASH::FindSlot(std::string_view key, uint32_t hash) const noexcept {
@@ -76,9 +81,9 @@ uint32_t QLIBC_SZHASH::Search(std::string_view key) const noexcept {
   return place <= count_ ? place : 0;
 }
 
-const char *QLIBC_SZHASH::Find(std::string_view key) const noexcept {
+const char *QLIBC_SZHASH::Find(const char *key) const noexcept {
   uint32_t &answer = answers_[questions_++ % kRememberedQuestions];
-  if (answer == 0 || answer > count_ || Key(entries_[answer - 1]) != key) {
+  if (answer == 0 || answer > count_ || std::strcmp(Key(entries_[answer - 1]).data(), key) != 0) {
     answer = Search(key);
   }
   return answer == 0 ? nullptr : arena_.get() + entries_[answer - 1].value;
@@ -90,17 +95,8 @@ void QLIBC_SZHASH::Clear() noexcept {
   questions_ = 0;
 }
 
-/* The present keys are those before it, so one that is remembered there is not
- * among them. */
-inline bool QLIBC_SZHASH::IsRemembered(std::string_view key) const noexcept {
-  return count_ < entries_.size() && Key(entries_[count_]) == key;
-}
-
 /* What was added last is on nobody's way through the slots. */
 void QLIBC_SZHASH::ForgetRemembered() noexcept {
-  if (count_ == entries_.size()) {
-    return;
-  }
   for (size_t i = count_; i < entries_.size(); ++i) {
     slots_[entries_[i].slot] = 0;
   }
@@ -122,17 +118,6 @@ void QLIBC_SZHASH::GrowTable() {
   slots_.swap(wider);
 }
 
-/* There is room for it. */
-inline void QLIBC_SZHASH::Place(Entry &entry, std::string_view value) noexcept {
-  char *at = arena_.get() + arena_used_;
-  std::copy(value.begin(), value.end(), at);
-  at[value.size()] = '\0';
-  entry.value = arena_used_;
-  entry.value_size = value.size();
-  entry.value_room = entry.value_size;
-  arena_used_ += value.size() + 1;
-}
-
 /* Moves to a larger arena, leaving replaced values behind. The arena that was left
  * is handed to the caller, who may still be reading a text in it. */
 std::unique_ptr<char[]> QLIBC_SZHASH::MakeRoom(size_t size) {
@@ -149,11 +134,6 @@ std::unique_ptr<char[]> QLIBC_SZHASH::MakeRoom(size_t size) {
     Place(entries_[i], {left.get() + entries_[i].value, entries_[i].value_size});
   }
   return left;
-}
-
-void QLIBC_SZHASH::StoreValue(Entry &entry, std::string_view value) {
-  const auto left = HasRoom(value.size() + 1) ? nullptr : MakeRoom(value.size() + 1);
-  Place(entry, value);
 }
 
 void QLIBC_SZHASH::Replace(Entry &entry, std::string_view value) {
@@ -184,23 +164,22 @@ void QLIBC_SZHASH::Add(std::string_view key, uint32_t hash, uint32_t slot, std::
   slots_[slot] = static_cast<uint32_t>(++count_);
 }
 
-void QLIBC_SZHASH::Set(std::string_view key, std::string_view value) {
-  if (IsRemembered(key)) {
-    StoreValue(entries_[count_], value);
-    ++count_;
-    return;
-  }
+void QLIBC_SZHASH::SetElsewhere(std::string_view key, std::string_view value) {
   const uint32_t hash = HashText(key);
   uint32_t slot = FindSlot(key, hash);
   if (slots_[slot] != 0 && slots_[slot] <= count_) {
     Replace(entries_[slots_[slot] - 1], value);
     return;
   }
-  ForgetRemembered();
-  if (2 * (entries_.size() + 1) > slots_.size()) {
-    GrowTable();
+  if (count_ < entries_.size()) {
+    ForgetRemembered();
+    slot = FindSlot(key, hash);
   }
-  Add(key, hash, FindSlot(key, hash), value);
+  if (2 * (count_ + 1) > slots_.size()) {
+    GrowTable();
+    slot = FindSlot(key, hash);
+  }
+  Add(key, hash, slot, value);
 }
 
 PSZHASH QLIBCSzHashAlloc(int capacity) {

@@ -5,6 +5,7 @@
 #ifndef ZELOCORE_SZHASH_H
 #define ZELOCORE_SZHASH_H
 
+#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
@@ -38,8 +39,34 @@ struct QLIBC_SZHASH {
 
   /* The views may lie in this very hash. Throws std::bad_alloc, and leaves the
    * hash as it was then. */
-  void Set(std::string_view key, std::string_view value);
-  const char *Find(std::string_view key) const noexcept;
+  void Set(std::string_view key, std::string_view value) {
+    if (IsRemembered(key)) {
+      StoreValue(entries_[count_], value);
+      ++count_;
+    } else {
+      SetElsewhere(key, value);
+    }
+  }
+  /* Takes over a text that values of new entries lie in: those whose keys come where
+   * they came last time need not be copied one by one. What is set between this and
+   * the last SetTaken must fit into the text altogether. */
+  void Take(std::string_view text) {
+    const size_t room = 2 * (text.size() + 1);
+    const auto left = HasRoom(room) ? nullptr : MakeRoom(room);
+    taken_ = arena_used_;
+    std::copy(text.begin(), text.end(), arena_.get() + taken_);
+    arena_used_ += text.size() + 1;
+  }
+  /* Set, of the `size` bytes at `at` of the text. The byte behind them is lost. */
+  void SetTaken(std::string_view key, size_t at, size_t size) {
+    if (IsRemembered(key)) {
+      Lay(entries_[count_], taken_ + at, size);
+      ++count_;
+    } else {
+      SetElsewhere(key, {arena_.get() + taken_ + at, size});
+    }
+  }
+  const char *Find(const char *key) const noexcept;
   void Clear() noexcept;
 
   std::span<const Entry> entries() const noexcept { return {entries_.data(), count_}; }
@@ -53,7 +80,12 @@ struct QLIBC_SZHASH {
  private:
   static constexpr size_t kRememberedQuestions = 64;
 
-  bool IsRemembered(std::string_view key) const noexcept;
+  /* The present keys are those before it, so one that is remembered there is not
+   * among them. */
+  bool IsRemembered(std::string_view key) const noexcept {
+    return count_ < entries_.size() && Key(entries_[count_]) == key;
+  }
+  void SetElsewhere(std::string_view key, std::string_view value);
   uint32_t Search(std::string_view key) const noexcept;
   void ForgetRemembered() noexcept;
   uint32_t FindSlot(std::string_view key, uint32_t hash) const noexcept;
@@ -62,8 +94,22 @@ struct QLIBC_SZHASH {
   void GrowTable();
   bool HasRoom(size_t size) const noexcept { return size <= arena_room_ - arena_used_; }
   std::unique_ptr<char[]> MakeRoom(size_t size);
-  void StoreValue(Entry &entry, std::string_view value);
-  void Place(Entry &entry, std::string_view value) noexcept;
+  void StoreValue(Entry &entry, std::string_view value) {
+    const auto left = HasRoom(value.size() + 1) ? nullptr : MakeRoom(value.size() + 1);
+    Place(entry, value);
+  }
+  /* There is room for it. */
+  void Place(Entry &entry, std::string_view value) noexcept {
+    std::copy(value.begin(), value.end(), arena_.get() + arena_used_);
+    Lay(entry, arena_used_, value.size());
+    arena_used_ += value.size() + 1;
+  }
+  void Lay(Entry &entry, size_t at, size_t size) noexcept {
+    arena_[at + size] = '\0';
+    entry.value = at;
+    entry.value_size = size;
+    entry.value_room = size;
+  }
 
   std::vector<Entry> entries_;  /* the present ones, then those remembered */
   size_t count_ = 0;            /* of the present ones */
@@ -72,8 +118,10 @@ struct QLIBC_SZHASH {
   std::unique_ptr<char[]> arena_;
   size_t arena_room_ = 0;
   size_t arena_used_ = 0;
-  /* Of the n-th question since the hash was emptied, the place of the answer plus one. */
-  mutable std::array<uint32_t, kRememberedQuestions> answers_{};
+  size_t taken_ = 0; /* where the text that was taken last begins */
+  /* Of the n-th question since the hash was emptied, the place of the answer plus one;
+   * before it has been asked, that of the n-th key. */
+  mutable std::array<uint32_t, kRememberedQuestions> answers_;
   mutable size_t questions_ = 0;
 };
 

@@ -10,12 +10,15 @@
 namespace {
 
 /* A caller's guess at the capacity reserves no more than this. */
-constexpr size_t kMostReserved = 65536;
+constexpr size_t kMostReserved = 64;
+constexpr size_t kExpectedTextSize = 16;
 
 }  // namespace
 
 QLIBC_SZLIST::QLIBC_SZLIST(size_t capacity) {
-  starts_.reserve(std::min(capacity, kMostReserved));
+  const size_t reserved = std::min(capacity, kMostReserved);
+  starts_.reserve(reserved);
+  arena_.reserve(kExpectedTextSize * reserved);
 }
 
 void QLIBC_SZLIST::Push(std::string_view text) {

@@ -36,7 +36,7 @@ namespace {
 // Name, and whether a plan's key must be equal (=) to the call's or be contained in it (~).
 #define CALLS(X)                   \
   X(QLIBCExec, '~')                \
-  X(QLIBCSzHashAlloc, '~')         \
+  X(QLIBCSzHashAlloc, '=')         \
   X(QLIBCSzHashSetValue, '=')      \
   X(QLIBCSzHashGetValue, '=')      \
   X(QLIBCSzHashEnumKey, '~')       \
@@ -605,7 +605,7 @@ int QLIBCExec(const char *program, ...) {
 }
 
 PSZHASH QLIBCSzHashAlloc(int capacity) {
-  FAIL_OR_CALL(QLIBCSzHashAlloc, nullptr, PSZHASH{}, capacity);
+  FAIL_OR_CALL(QLIBCSzHashAlloc, std::to_string(capacity), PSZHASH{}, capacity);
 }
 
 int QLIBCSzHashSetValue(PSZHASH *hash, const char *key, const char *value) {

@@ -13,7 +13,7 @@
 // What the second argument of failCallFor is compared with
 //   hash key           QLIBCSzHashSetValue, QLIBCSzHashGetValue            equal
 //   number             QLIBCProcAlive (pid), ZELOUserGetByUID, seteuid, setegid (id),
-//                      QLIBPluginAction (stage)                            equal
+//                      QLIBPluginAction (stage), QLIBCSzHashAlloc (capacity)              equal
 //   plugin argument    QLIBPluginSetArg, QLIBPluginSetArgByInt             equal
 //   section name       QLIBCFile{Get,Set,Add,Remove}Section                equal
 //   path or text       QLIBCFileExist, QLIBCFileTouch, QLIBCFileEnumSection, QLIBCExec (program and
@@ -22,7 +22,7 @@
 //                      posix_spawn, open64, putenv, kill (pid), sqlite3_open, sqlite3_exec (SQL),
 //                      fdopen (mode), initgroups (name)                                   contained
 //
-// Calls without a key: QLIBCSzHashAlloc QLIBCSzListAlloc QLIBCSzListPush QLIBCSzHashEnumKey
+// Calls without a key: QLIBCSzListAlloc QLIBCSzListPush QLIBCSzHashEnumKey
 // QLIBCProcForkChildNoWait SzBase64EncodeFull ZELOEncodingBase64Decode QLIBPluginInit
 // QLIBPluginExit fsync fstat fchown fchmod ftruncate fflush fclose getline (getdelim too) read
 // write fwrite (and all other writing to a stream) flock setreuid setresuid setregid setresgid
