@@ -148,7 +148,7 @@ bool fitsCommand(std::string_view encoded) {
          memchr(command, '\0', length) == nullptr;
 }
 
-bool fitsFields(PSZHASH hash) {
+bool eachFits(PSZHASH hash) {
   const char *szCommand = QLIBCSzHashGetValue(hash, kCommandKey);
   if (szCommand != nullptr && !fitsCommand(szCommand)) {
     return false;
@@ -161,6 +161,15 @@ bool fitsFields(PSZHASH hash) {
     }
   }
   return true;
+}
+
+// What is malformed in itself is the conversion's to report, so that nothing of this question stays in
+// the error record.
+bool fitsFields(PSZHASH hash) {
+  const SchedErrorRecord before;
+  const bool fits = eachFits(hash);
+  before.restore();
+  return fits;
 }
 
 bool fillHash(const Json::Value &root, SchedJsonReader *reader, HashGuard *hash) {

@@ -508,9 +508,9 @@ bool isShortRun() {
   return factor != nullptr && std::atof(factor) < 1;
 }
 
-// Under a sanitizer each step takes five times as long, and every third is made in a short run.
+// Under a sanitizer each step takes five times as long, and every fifth is made in a short run.
 unsigned stride() {
-  return isShortRun() && !support::kAllocationsCanFail ? 3 : 1;
+  return isShortRun() && !support::kAllocationsCanFail ? 5 : 1;
 }
 
 TEST_P(FailingStepsTest, WhicheverCallFails) {

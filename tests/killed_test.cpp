@@ -623,7 +623,7 @@ class KilledPowerTest : public KilledTest {
   }
 
   void killAtEachCallOf(const char *name, const std::function<bool()> &act) {
-    const unsigned stride = soakFactor() < 1 ? 5 : 1;  // a short run takes some of them
+    const unsigned stride = soakFactor() < 1 ? 9 : 1;  // a short run takes some of them
     SCOPED_TRACE(name);
     const Files before;
     ASSERT_TRUE(act());

@@ -4,7 +4,9 @@
 #include <gtest/gtest.h>
 
 #include <cstddef>
+#include <cstdlib>
 #include <cstring>
+#include <string>
 #include <vector>
 
 #include "captured_log.h"
@@ -311,6 +313,33 @@ TEST_F(SchedParmTableTest, AnEmptyTextIsUnsignedZero) {
   EXPECT_EQ(rowOf("run hour").fnFromHashStr(&field, ""), 0);
   EXPECT_EQ(field, 0U);
   EXPECT_EQ(errorRecord().code, 0);
+}
+
+// Short texts are read another way than long ones.
+TEST_F(SchedParmTableTest, NumbersOfEveryLengthAreReadAsTheCLibraryReadsThem) {
+  const std::string digits = "98765432109876543210";
+  for (const char *front : {"", "0", "00000000", "-", "+", " ", "-0"}) {
+    for (size_t count = 1; count <= digits.size(); ++count) {
+      const std::string text = front + digits.substr(digits.size() - count);
+      SCOPED_TRACE(text);
+      int32_t field = 99;
+      EXPECT_EQ(rowOf("id").fnFromHashStr(&field, text.c_str()), 0);
+      EXPECT_EQ(field, static_cast<int32_t>(strtol(text.c_str(), nullptr, 10)));
+      uint32_t unsignedField = 99;
+      EXPECT_EQ(rowOf("owner").fnFromHashStr(&unsignedField, text.c_str()), 0);
+      EXPECT_EQ(unsignedField, static_cast<uint32_t>(strtoul(text.c_str(), nullptr, 10)));
+    }
+  }
+}
+
+TEST_F(SchedParmTableTest, ANumberThatDoesNotFitItsBufferIsCut) {
+  const int32_t field = -12345;
+  char text[] = "xxxx";
+  EXPECT_EQ(rowOf("id").ToHashStr(&field, text, 3), 0);
+  EXPECT_STREQ(text, "-1");
+  EXPECT_EQ(text[3], 'x');
+  EXPECT_EQ(rowOf("id").ToHashStr(&field, text, 0), 0);
+  EXPECT_STREQ(text, "-1");
 }
 
 // ---- null arguments of the conversions

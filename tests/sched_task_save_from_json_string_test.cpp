@@ -400,6 +400,19 @@ TEST_F(TaskFromJsonTest, ANumberThatDoesNotFitItsFieldIsRefusedRatherThanCut) {
   EXPECT_EQ(loadTask(1)->Owner, 4294967295U);
 }
 
+// The conversion stops at the missing id, before it comes to them.
+TEST_F(TaskFromJsonTest, WhetherFieldsFitIsAskedWithoutATraceInTheErrorRecord) {
+  for (const auto &[key, value] : Members{
+           {"run hour", "5x"}, {"run hour", "x5"}, {"run hour", "1234567890x"}, {"cmd", "!!"}}) {
+    SCOPED_TRACE(key + " " + value);
+    support::clearLog();
+    EXPECT_EQ(save(taskText({{key, value}}, "id")), -1);
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
+    EXPECT_EQ(logged().front(),
+              "sched_task_convert.cpp:N Get hash value failed. key:[id]. [0x0000 :N]");
+  }
+}
+
 TEST_F(TaskFromJsonTest, ACommandThatWouldBeCutIsRefused) {
   const std::string longest = std::string(16383, 'Q');  // 12,287 bytes
   for (const std::string &encoded : {std::string("ZWNobyBoaQAgLXJm"), std::string("AA=="),
