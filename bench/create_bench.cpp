@@ -1,6 +1,5 @@
 // Creating a task beside others, and beside the work that a create cannot do without: three runs of
 // /bin/cp on the store and one synced rewrite of the crontab.
-#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <zelocore.h>
@@ -31,7 +30,7 @@ std::string readAll(const char *szPath) {
   return text;
 }
 
-// The crontab read and written line for line, synced, given its owner and mode and renamed.
+// The crontab read line for line, written, synced, given its mode and renamed.
 void rewriteCrontab() {
   const std::string text = readAll(kCrontab);
   char path[] = "/etc/crontab.XXXXXX";

@@ -30,8 +30,8 @@ void makeRows() {
   constexpr char kReading[] = "read the file, 1000 tasks";
   Row("ZELOSchedTaskGetByID in 1000 tasks", Work{getLast, fillOldStore})
       .atMost(kMost, kReading, Work{readStore, fillOldStore, forgetStore});
-  Row("... the first read of the process", Work{getLast, fillOldStore, forgetStore})
+  Row("... when the file must be read", Work{getLast, fillOldStore, forgetStore})
       .atMost(kMost, kReading);
-  Row("... of a file that was just changed", Work{getLast, [] { fillStore(kTasks); }, forgetStore})
+  Row("... when it was changed just now", Work{getLast, [] { fillStore(kTasks); }, forgetStore})
       .atMost(kMost, kReading);
 }

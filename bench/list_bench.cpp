@@ -5,6 +5,7 @@
 #include <zelosched.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <string>
 
 #include "support/row.h"
@@ -12,21 +13,27 @@
 
 namespace {
 
+constexpr gsize kKeys = 29;  // of a task
+
 void readGroup(GKeyFile *file, const char *group) {
   gsize count = 0;
   gchar **keys = g_key_file_get_keys(file, group, &count, nullptr);
+  orDie(count == kKeys, "g_key_file_get_keys");
   for (gsize i = 0; i < count; ++i) {
-    g_free(g_key_file_get_value(file, group, keys[i], nullptr));
+    gchar *value = g_key_file_get_value(file, group, keys[i], nullptr);
+    orDie(value != nullptr, "g_key_file_get_value");
+    g_free(value);
   }
   g_strfreev(keys);
 }
 
-void readKeyFile() {
+void readKeyFile(gsize expected) {
   GKeyFile *file = g_key_file_new();
   orDie(g_key_file_load_from_file(file, kStore, G_KEY_FILE_NONE, nullptr) != FALSE,
         "g_key_file_load_from_file");
   gsize count = 0;
   gchar **groups = g_key_file_get_groups(file, &count);
+  orDie(count == expected, "g_key_file_get_groups");
   for (gsize i = 0; i < count; ++i) {
     readGroup(file, groups[i]);
   }
@@ -34,7 +41,7 @@ void readKeyFile() {
   g_key_file_free(file);
 }
 
-// A byte of every text, and the numbers: what a list has to write of a record.
+// A byte of every text: the numbers lie in the same pages.
 void touch(ZELO_SCHED_TASK *task) {
   constexpr size_t kTexts[] = {
       offsetof(ZELO_SCHED_TASK, Name),       offsetof(ZELO_SCHED_TASK, NextTriggerTime),
@@ -48,17 +55,19 @@ void touch(ZELO_SCHED_TASK *task) {
   }
 }
 
-// Zeroed by the kernel, in the pages that cost least where there are enough of them.
+// Zeroed by the kernel, in huge pages where there are enough of them.
 void readAndTouch(int count) {
+  constexpr size_t kHugePage = size_t{2} << 20;
   readStore();
-  const size_t size = static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK);
-  void *records = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
-  orDie(records != MAP_FAILED, "mmap");
-  madvise(records, size, MADV_HUGEPAGE);
+  const size_t size = static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK) + kHugePage;
+  void *memory = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+  orDie(memory != MAP_FAILED, "mmap");
+  madvise(memory, size, MADV_HUGEPAGE);
+  const auto begin = (reinterpret_cast<uintptr_t>(memory) + kHugePage - 1) / kHugePage * kHugePage;
   for (int i = 0; i < count; ++i) {
-    touch(static_cast<ZELO_SCHED_TASK *>(records) + i);
+    touch(reinterpret_cast<ZELO_SCHED_TASK *>(begin) + i);
   }
-  munmap(records, size);
+  munmap(memory, size);
 }
 
 std::string tasks(int count) {
@@ -67,9 +76,10 @@ std::string tasks(int count) {
 
 Row compareListing(int count) {
   const auto setUp = [count] { fillStore(count); };
-  return Row("ZELOSchedTaskListGet, " + tasks(count), Work{list, setUp, forgetStore})
+  return Row("ZELOSchedTaskListGet, " + tasks(count),
+             Work{[count] { list(count); }, setUp, forgetStore})
       .atMost(0.5, "GKeyFile: load, get every key, " + tasks(count),
-              Work{readKeyFile, setUp, forgetStore})
+              Work{[count] { readKeyFile(static_cast<gsize>(count)); }, setUp, forgetStore})
       .atMost(3, "read, zero and touch the records, " + tasks(count),
               Work{[count] { readAndTouch(count); }, setUp, forgetStore});
 }

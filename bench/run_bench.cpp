@@ -25,9 +25,13 @@ constexpr int kPatience = 1000;  // milliseconds, with a run that is closing the
 
 sqlite3 *db;
 
-// The shell waits in its redirection for a reader, and the reader for it.
+// The shell waits in its redirection for a reader, and the reader for it: not for ever, when no
+// command comes.
 void awaitCommand() {
+  constexpr unsigned kMostSeconds = 60;
+  alarm(kMostSeconds);
   const int started = open(kStarted, O_RDONLY | O_CLOEXEC);
+  alarm(0);
   orDie(started >= 0 && close(started) == 0, "the command");
 }
 

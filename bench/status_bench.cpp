@@ -39,6 +39,7 @@ void record() {
             ZELOSchedDBSetStatus(db, statusID, ZELO_SCHED_STATUS_RUNNING,
                                  ZELO_SCHED_STATUS_FINISHED, "") == 0,
         "recording a run");
+  orDie(sqlite3_changes(db) == 1, "ZELOSchedDBSetStatus");
 }
 
 int takeNumber(void *number, int, char **values, char **) {
@@ -65,6 +66,7 @@ void recordInSql() {
            "UPDATE task_status SET status_code=%d WHERE status_id=%d AND status_code=%d",
            ZELO_SCHED_STATUS_FINISHED, statusID, ZELO_SCHED_STATUS_RUNNING);
   orDieInSql(sqlite3_exec(db, statement, nullptr, nullptr, nullptr));
+  orDie(sqlite3_changes(db) == 1, "the statements");
 }
 
 }  // namespace

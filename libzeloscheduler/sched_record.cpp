@@ -12,7 +12,7 @@
 
 namespace {
 
-constexpr int kLongestPlainList = 16;
+constexpr size_t kLongestPlainList = 8;
 constexpr size_t kHugePage = size_t{2} << 20;
 constexpr size_t kMostSlabSize = 4 * kHugePage;
 
@@ -53,6 +53,7 @@ constexpr Layout layoutOf(SchedRecordExtent extent) {
 struct SchedSlab {
   SchedSlab *next;
   size_t size;  // in bytes, with this
+  bool isMapped;
   size_t stride;
   size_t unused;   // records not handed out yet, from the first on
   size_t holders;  // records in use, and the source that still takes from it
@@ -103,7 +104,10 @@ size_t recordsIn(size_t slabSize, Layout layout) {
 
 // Whole huge pages, and no more of them than the records fill: memory that nobody asked for would
 // be taken otherwise. 0 when there are too few records for one.
-size_t slabSizeFor(size_t expectedRecords, Layout layout) {
+size_t mappedSizeFor(size_t expectedRecords, Layout layout) {
+  if (!layout.fillsHugePages) {
+    return kMostSlabSize;
+  }
   size_t size = kMostSlabSize;
   while (size > 0 && recordsIn(size, layout) > expectedRecords) {
     size -= kHugePage;
@@ -111,23 +115,50 @@ size_t slabSizeFor(size_t expectedRecords, Layout layout) {
   return size;
 }
 
-// Null when memory is short, or the records too few.
-SchedSlab *newSlab(Layout layout, size_t expectedRecords) {
-  const size_t size = layout.fillsHugePages ? slabSizeFor(expectedRecords, layout) : kMostSlabSize;
+void *mapSlabFor(Layout layout, size_t size) {
   void *memory = size > 0 ? mapSlab(size) : nullptr;
-  if (memory == nullptr) {
-    return nullptr;
+  if (memory != nullptr) {  // a kernel without huge pages is only slower
+    madvise(memory, size, layout.fillsHugePages ? MADV_HUGEPAGE : MADV_NOHUGEPAGE);
   }
-  // A kernel without huge pages is only slower.
-  madvise(memory, size, layout.fillsHugePages ? MADV_HUGEPAGE : MADV_NOHUGEPAGE);
+  return memory;
+}
+
+SchedSlab *added(void *memory, size_t size, bool isMapped, Layout layout) {
   auto *slab = static_cast<SchedSlab *>(memory);
   slab->size = size;
+  slab->isMapped = isMapped;
   slab->stride = layout.stride;
   slab->unused = recordsIn(size, layout);
   slab->holders = 1;
   slab->next = slabs;
   slabs = slab;
   return slab;
+}
+
+// The allocator keeps a block that is freed at hand for the next list, but gives the pages of as
+// many single records back to the kernel.
+SchedSlab *newBlock(Layout layout, size_t records) {
+  const size_t size = sizeof(SchedSlab) + (records - 1) * layout.stride + layout.end;
+  void *memory = calloc(1, size);
+  return memory != nullptr ? added(memory, size, false, layout) : nullptr;
+}
+
+// Null when memory is short, or the records too few.
+SchedSlab *newSlab(Layout layout, size_t expectedRecords) {
+  const size_t size = mappedSizeFor(expectedRecords, layout);
+  if (size == 0 && expectedRecords > kLongestPlainList) {
+    return newBlock(layout, expectedRecords);
+  }
+  void *memory = mapSlabFor(layout, size);
+  return memory != nullptr ? added(memory, size, true, layout) : nullptr;
+}
+
+void freeSlab(SchedSlab *slab) {
+  if (slab->isMapped) {
+    munmap(slab, slab->size);
+  } else {
+    free(slab);
+  }
 }
 
 SchedSlab *moveToFront(SchedSlab **link) {
@@ -153,7 +184,7 @@ void unhold(SchedSlab *slab) {
     return;
   }
   slabs = slabOf(slab->record(0))->next;
-  munmap(slab, slab->size);
+  freeSlab(slab);
 }
 
 }  // namespace
@@ -179,8 +210,8 @@ void schedRecordEmpty(ZELO_SCHED_TASK *pTask) {
 }
 
 SchedRecordSource::SchedRecordSource(int expectedRecords, SchedRecordExtent extent)
-    : usesSlabs_(kSlabsAllowed && expectedRecords > kLongestPlainList),
-      expectedRecords_(static_cast<size_t>(std::max(expectedRecords, 0))),
+    : expectedRecords_(static_cast<size_t>(std::max(expectedRecords, 0))),
+      usesSlabs_(kSlabsAllowed && expectedRecords_ > kLongestPlainList),
       extent_(extent) {}
 
 SchedRecordSource::~SchedRecordSource() {

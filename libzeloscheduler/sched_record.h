@@ -28,9 +28,9 @@ enum class SchedRecordExtent { kWhole, kSchedule };
 struct SchedSlab;
 
 // The records of one list. A record is large and mostly empty, and of many records taken one by one
-// it is the page faults that a list costs most. A long list therefore takes them from slabs, which
-// may be backed by huge pages; a slab is freed with the last of its records, in whatever order they
-// are freed.
+// it is the page faults that a list costs most. All but the shortest lists therefore take them from
+// slabs, the long ones from slabs of huge pages; a slab is freed with the last of its records, in
+// whatever order they are freed.
 class SchedRecordSource {
  public:
   explicit SchedRecordSource(int expectedRecords,
@@ -43,8 +43,8 @@ class SchedRecordSource {
   TaskGuard take();
 
  private:
-  bool usesSlabs_;
   size_t expectedRecords_;  // that have not been taken yet
+  bool usesSlabs_;
   SchedRecordExtent extent_;
   SchedSlab *slab_ = nullptr;
 };

@@ -7,8 +7,9 @@
 #include <zelocore.h>
 
 #include <cerrno>
-#include <cstdio>
 #include <cstring>
+
+#include "sched_text.h"
 
 enum SchedError : int {
   kErrArrayAlloc = 0x0100,
@@ -58,7 +59,7 @@ struct SchedPlace {
 class SchedErrorRecord {
  public:
   SchedErrorRecord() : code_(QLIBCErrGet()), line_(QLIBCErrorGetLine()) {
-    snprintf(file_, sizeof(file_), "%s", QLIBCErrorGetFile());
+    copyText(file_, QLIBCErrorGetFile());
   }
   void restore() const { QLIBCErrSetEx(code_, file_, line_); }
 

@@ -340,6 +340,8 @@ TEST_F(SchedParmTableTest, ANumberThatDoesNotFitItsBufferIsCut) {
   EXPECT_EQ(text[3], 'x');
   EXPECT_EQ(rowOf("id").ToHashStr(&field, text, 0), 0);
   EXPECT_STREQ(text, "-1");
+  EXPECT_EQ(rowOf("id").ToHashStr(&field, text, 1), 0);
+  EXPECT_STREQ(text, "");
 }
 
 // ---- null arguments of the conversions

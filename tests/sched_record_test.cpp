@@ -1,6 +1,8 @@
 // Long lists: their records come from slabs, and go back one by one, in any order.
 #include <gtest/gtest.h>
 #include <sys/mman.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -23,6 +25,7 @@ using Lines = std::vector<std::string>;
 bool slabsFail = false;
 bool mappingsAreOdd = false;
 size_t mapped = 0;
+size_t unmapped = 0;
 constexpr size_t kSmallestSlab = size_t{1} << 22;
 constexpr size_t kPage = 4096;
 
@@ -44,6 +47,12 @@ extern "C" __attribute__((visibility("default"))) void *mmap(void *address, size
     return begin + kPage;
   }
   return mmap64(address, length, protection, flags, descriptor, offset);
+}
+
+extern "C" __attribute__((visibility("default"))) int munmap(void *address,
+                                                             size_t length) noexcept {
+  unmapped += length;
+  return static_cast<int>(syscall(SYS_munmap, address, length));
 }
 
 namespace {
@@ -115,6 +124,41 @@ TEST_F(LongListTest, RecordsMayBeFreedInAnyOrderWhileTheOthersStand) {
         ASSERT_EQ("task " + std::to_string(task->ID), task->Name);
       }
     }
+  }
+}
+
+// Single records, one block of them, and blocks behind huge pages.
+TEST_F(LongListTest, ListsOfEveryLengthHaveZeroedRecordsOfTheirOwn) {
+  for (const int count : {1, 8, 9, 16, 59, 60, 61, 68, 69, 120, 250}) {
+    SCOPED_TRACE(count);
+    storeTasks(count);
+    for (int round = 0; round < 2; ++round) {
+      std::vector<ZELO_SCHED_TASK *> tasks = listed();
+      ASSERT_EQ(idsOf(tasks).size(), static_cast<size_t>(count));
+      for (ZELO_SCHED_TASK *task : tasks) {
+        ASSERT_EQ("task " + std::to_string(task->ID), task->Name);
+        for (size_t i = 0; i < sizeof(task->Command); ++i) ASSERT_EQ(task->Command[i], '\0');
+        memset(task->Command, 'x', sizeof(task->Command));
+      }
+      std::shuffle(tasks.begin(), tasks.end(), std::mt19937(static_cast<unsigned>(count)));
+      freeAll(tasks);
+    }
+  }
+}
+
+TEST_F(LongListTest, ListsOfDifferentLengthsAreFreedInTurns) {
+  std::vector<ZELO_SCHED_TASK *> all;
+  for (const int count : {60, 9, 60, 300, 8, 120, 61}) {
+    storeTasks(count);
+    const std::vector<ZELO_SCHED_TASK *> tasks = listed();
+    ASSERT_EQ(tasks.size(), static_cast<size_t>(count));
+    all.insert(all.end(), tasks.begin(), tasks.end());
+  }
+  std::shuffle(all.begin(), all.end(), std::mt19937(11));
+  while (!all.empty()) {
+    ASSERT_EQ("task " + std::to_string(all.back()->ID), all.back()->Name);
+    ASSERT_EQ(ZELOSchedTaskFree(all.back()), 0);
+    all.pop_back();
   }
 }
 
@@ -199,7 +243,7 @@ TEST_F(LongListTest, SlabsAreNoLargerThanTheRecordsInThem) {
   for (const int count : {59, 60, 119, 120, 240, 241, 300, 500}) {
     SCOPED_TRACE(count);
     storeTasks(count);
-    mapped = 0;
+    mapped = unmapped = 0;
     const std::vector<ZELO_SCHED_TASK *> tasks = listed();
     EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(count));
     constexpr size_t kMostSlabs = 3;
@@ -208,6 +252,7 @@ TEST_F(LongListTest, SlabsAreNoLargerThanTheRecordsInThem) {
               static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK) + kMostSlabs * kHugePage);
     EXPECT_EQ(mapped > 0, count >= 60) << "a slab is a huge page at least";
     freeAll(tasks);
+    EXPECT_GE(unmapped, mapped) << "all of it is given back";
   }
 }
 

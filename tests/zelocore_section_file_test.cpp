@@ -36,6 +36,7 @@ struct Calls {
   int reads = 0;
   std::optional<timespec> now;
   std::optional<timespec> stamp; /* what every file is stamped with */
+  std::optional<off_t> size;     /* that every file seems to have */
   int interruptions = 0;         /* of reads and writes, one after the other */
   int fail_rename = 0;
   int fail_write = 0;
@@ -54,6 +55,7 @@ void Stamp(struct stat *status) {
   if (g_calls.stamp) {
     status->st_ctim = status->st_mtim = *g_calls.stamp;
   }
+  status->st_size = g_calls.size.value_or(status->st_size);
 }
 
 bool IsInterrupted() {
@@ -326,7 +328,8 @@ TEST_F(ZelocoreSectionFile, TheLastOfEqualKeysAndTheFirstOfEqualSectionsCount) {
 
 TEST_F(ZelocoreSectionFile, MalformedLinesAreIgnored) {
   Write(
-      "outside=1\n[]\n[open\n[5]x\n[1]\n=\"no key\"\na=\"not closed\na=\"ends within \\\nb=\"x\" "
+      "outside=1\n[]\n[open\n[5]x\n[a]b]\n[a]]\n[1]\n=\"no key\"\na=\"not closed\na=\"ends within "
+      "\\\nb=\"x\" "
       "rest\n"
       "[c=\"d\"\n");
   EXPECT_EQ(Names(), (Texts{"1"}));
@@ -367,7 +370,7 @@ TEST_F(ZelocoreSectionFile, AZeroByteEndsTheNameOfASection) {
 TEST_F(ZelocoreSectionFile, SectionsAreFoundInWhateverOrderTheyAreAskedFor) {
   Write("[1]\na=\"1\"\n[2]\na=\"2\"\n[2]\na=\"another\"\n[3]\na=\"3\"\n");
   MakeOld();
-  for (const char *order : {"123", "321", "2213", "33", "4142", "44"}) {
+  for (const char *order : {"123", "321", "2213", "1222", "12232", "33", "4142", "44"}) {
     Write(Contents());
     for (const char *name = order; *name != '\0'; ++name) {
       SCOPED_TRACE(std::string(order) + " at " + *name);
@@ -409,6 +412,29 @@ TEST_F(ZelocoreSectionFile, WhatAHashHeldBeforeDoesNotShow) {
     ASSERT_EQ(KeysOf(used), Section(name)) << text;
   }
   QLIBCSzHashFree(used);
+}
+
+TEST_F(ZelocoreSectionFile, OneHashServesForSectionsOfAllLengthsAndKeys) {
+  PSZHASH used = HashOf({});
+  constexpr size_t kAboveWhatIsTaken = 70000;
+  for (size_t size = 1; size < kAboveWhatIsTaken; size += size < 3000 ? 37 : 9973) {
+    const std::string number = std::to_string(size);
+    const std::string half(size / 2, 'x');
+    Write("[1]\n" + number + "a=\"" + half + "\"\n" + number + "b=\"" + half + "y\"\n" + number +
+          "a=\"" + half + "z\"\n");
+    QLIBCHashRemoveAll(used);
+    ASSERT_EQ(QLIBCFileGetSection(path_.c_str(), "1", &used), 1);
+    ASSERT_EQ(KeysOf(used), (Keys{{number + "a", half + "z"}, {number + "b", half + "y"}}));
+  }
+  QLIBCSzHashFree(used);
+}
+
+TEST_F(ZelocoreSectionFile, AFileThatGrewSinceItWasLookedAtIsReadToItsEnd) {
+  const std::string value(20000, 'v');
+  Write("[1]\na=\"" + value + "\"\n[2]\nb=\"end\"");
+  g_calls.size = 3;
+  EXPECT_EQ(Section("1"), (Keys{{"a", value}}));
+  EXPECT_EQ(Section("2"), (Keys{{"b", "end"}}));
 }
 
 TEST_F(ZelocoreSectionFile, ReadingAddsToWhatTheHashHolds) {
@@ -456,6 +482,17 @@ TEST_F(ZelocoreSectionFile, SettingKeepsEveryOtherLine) {
             "; first of all\n\n[1]\r\na = kept as it is\r\n# inside\n[2]\nnew=\"y\"\n"
             "# about 3\n[3]\nz\n");
   EXPECT_EQ(Names(), (Texts{"1", "2", "3"}));
+}
+
+TEST_F(ZelocoreSectionFile, AFileOfManyPartsIsPutTogetherWhole) {
+  Write(
+      "# zelo section file\n[0]\nq=1\n[1]\na=\"x\"\n# about the next\n"
+      "# end of file: 2 sections, checksum 0123456789abcdef\n[2]\nb=\"y\"");
+  ASSERT_EQ(Set("1", {{"a", "z"}}), 1);
+  EXPECT_EQ(Body(), "[0]\nq=1\n[1]\na=\"z\"\n# about the next\n[2]\nb=\"y\"\n");
+  EXPECT_NE(Contents().find("# end of file: 3 sections, checksum "), std::string::npos);
+  EXPECT_EQ(Names(), (Texts{"0", "1", "2"}));
+  EXPECT_EQ(g_calls.pauses, 0) << "its checksum is right";
 }
 
 TEST_F(ZelocoreSectionFile, OfEqualSectionsOnlyTheFirstIsChanged) {

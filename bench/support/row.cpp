@@ -1,6 +1,7 @@
 #include "row.h"
 
 #include <benchmark/benchmark.h>
+#include <unistd.h>
 #include <zelocore.h>
 
 #include <algorithm>
@@ -134,9 +135,23 @@ std::string written(Amount amount) {
 // The columns' widths are known to scripts/bench, which prints their headings.
 void print(const Comparison &row, const Amount &what, const Amount &with) {
   const double ratio = what.number / with.number;
-  printf("%-46s %10s  %-44s %10s %7.2f %6.2f  %s\n", row.what.c_str(), written(what).c_str(),
+  printf("%-46s %10s  %-44s %10s %7.2f %7.2f  %s\n", row.what.c_str(), written(what).c_str(),
          row.with.c_str(), written(with).c_str(), ratio, row.most,
          ratio <= row.most ? "yes" : "no");
+}
+
+// Their number. Of what was left out by a filter there is none.
+int printRows(const Collector &collector) {
+  int printed = 0;
+  for (const Comparison &row : comparisons()) {
+    const Amount *what = collector.find(row.what);
+    const Amount *with = collector.find(row.with);
+    if (what != nullptr && with != nullptr) {
+      print(row, *what, *with);
+      ++printed;
+    }
+  }
+  return printed;
 }
 
 }  // namespace
@@ -168,7 +183,7 @@ void orDie(bool ok, const char *what) {
   if (!ok) {
     fprintf(stderr, "%s failed: 0x%04X %s:%d\n", what, static_cast<unsigned>(QLIBCErrGet()),
             QLIBCErrorGetFile(), QLIBCErrorGetLine());
-    exit(EXIT_FAILURE);
+    _exit(EXIT_FAILURE);  // also in a child, where nothing of the parent's may happen
   }
 }
 
@@ -181,12 +196,6 @@ int main(int argc, char **argv) {
   makeRows();
   Collector collector;
   benchmark::RunSpecifiedBenchmarks(&collector);
-  for (const Comparison &row : comparisons()) {
-    const Amount *what = collector.find(row.what);
-    const Amount *with = collector.find(row.with);
-    if (what != nullptr && with != nullptr) {
-      print(row, *what, *with);
-    }
-  }
+  orDie(printRows(collector) > 0, "measuring both sides of a row");
   return EXIT_SUCCESS;
 }

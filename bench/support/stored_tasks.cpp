@@ -98,9 +98,9 @@ void forgetStore() {
   QLIBCSzListFree(names);
 }
 
-void list() {
+void list(int count) {
   ZELO_SCHED_TASK *tasks = nullptr;
-  orDie(ZELOSchedTaskListGet(&tasks, nullptr) > 0, "ZELOSchedTaskListGet");
+  orDie(ZELOSchedTaskListGet(&tasks, nullptr) == count, "ZELOSchedTaskListGet");
   ZELOSchedTaskListFree(&tasks);
 }
 

@@ -27,8 +27,8 @@ void growOld();
 // Makes the platform forget what it has read of the store, as in a process that has just started.
 void forgetStore();
 
-// All tasks of the store, listed and freed. The store must have one.
-void list();
+// All tasks of the store, listed and freed.
+void list(int count);
 
 // Opens, reads and closes the store, into memory that nothing else is done to. Its size.
 size_t readStore();

@@ -465,10 +465,14 @@ const Section *SectionText::Find(std::string_view name) const {
 
 void SectionText::Read(const Section &section, QLIBC_SZHASH &hash) const {
   const std::string_view body = contents_.text().substr(section.body, section.end - section.body);
-  /* One look over the section spares a look at every value. */
-  const bool plain =
-      body.find('\\') == std::string_view::npos && body.find('\0') == std::string_view::npos;
-  hash.Take(body);
+  /* One look over the section spares a look at every value. A hash needs up to four
+   * times the memory of what it takes, which a large section is not worth. */
+  constexpr size_t kMostTaken = 65536;
+  const bool plain = body.size() <= kMostTaken && body.find('\\') == std::string_view::npos &&
+                     body.find('\0') == std::string_view::npos;
+  if (plain) {
+    hash.Take(body);
+  }
   std::string scratch;
   for (size_t at = 0; at < body.size();) {
     const size_t feed = std::min(body.find('\n', at), body.size());

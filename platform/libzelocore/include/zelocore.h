@@ -52,9 +52,9 @@ typedef struct QLIBC_SZHASH *PSZHASH;
 /* A growable list of texts. */
 typedef struct QLIBC_SZLIST *PSZLIST;
 
-/* A new empty hash with room for `capacity` entries before it grows (at least
- * one; a number that is not positive counts as one). Free it with
- * QLIBCSzHashFree. NULL with 0x0200 when memory is short. */
+/* A new empty hash. `capacity` is the caller's guess at the number of entries: any
+ * number will do, and the hash grows as it must. Free it with QLIBCSzHashFree.
+ * NULL with 0x0200 when memory is short. */
 PSZHASH QLIBCSzHashAlloc(int capacity);
 /* Sets szKey to a copy of szValue, replacing what it had. The hash may grow,
  * hence the address of its handle. 0, or -1 (0x0D00, 0x0200). */
@@ -71,8 +71,8 @@ void QLIBCSzHashFree(PSZHASH pHash);
 
 /* ---- text lists ----------------------------------------------------------- */
 
-/* A new empty list with room for `capacity` texts before it grows. Free it
- * with QLIBCSzListFree. NULL with 0x0200 when memory is short. */
+/* A new empty list. `capacity` is the caller's guess at the number of texts, as for
+ * a hash. Free it with QLIBCSzListFree. NULL with 0x0200 when memory is short. */
 PSZLIST QLIBCSzListAlloc(int capacity);
 /* Appends a copy of szText. The number of texts now in the list, or -1. */
 int QLIBCSzListPush(PSZLIST *ppList, const char *szText);
