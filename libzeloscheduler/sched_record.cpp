@@ -97,14 +97,14 @@ void *mapSlab(size_t size) {
   return slab;
 }
 
-size_t recordsIn(size_t slabSize, Layout layout) {
+size_t recordsIn(size_t slabSize, const Layout &layout) {
   const size_t least = sizeof(SchedSlab) + layout.end;
   return slabSize < least ? 0 : (slabSize - least) / layout.stride + 1;
 }
 
 // Whole huge pages, and no more of them than the records fill: memory that nobody asked for would
 // be taken otherwise. 0 when there are too few records for one.
-size_t mappedSizeFor(size_t expectedRecords, Layout layout) {
+size_t mappedSizeFor(size_t expectedRecords, const Layout &layout) {
   if (!layout.fillsHugePages) {
     return kMostSlabSize;
   }
@@ -115,7 +115,7 @@ size_t mappedSizeFor(size_t expectedRecords, Layout layout) {
   return size;
 }
 
-void *mapSlabFor(Layout layout, size_t size) {
+void *mapSlabFor(const Layout &layout, size_t size) {
   void *memory = size > 0 ? mapSlab(size) : nullptr;
   if (memory != nullptr) {  // a kernel without huge pages is only slower
     madvise(memory, size, layout.fillsHugePages ? MADV_HUGEPAGE : MADV_NOHUGEPAGE);
@@ -123,7 +123,7 @@ void *mapSlabFor(Layout layout, size_t size) {
   return memory;
 }
 
-SchedSlab *added(void *memory, size_t size, bool isMapped, Layout layout) {
+SchedSlab *added(void *memory, size_t size, bool isMapped, const Layout &layout) {
   auto *slab = static_cast<SchedSlab *>(memory);
   slab->size = size;
   slab->isMapped = isMapped;
@@ -137,14 +137,14 @@ SchedSlab *added(void *memory, size_t size, bool isMapped, Layout layout) {
 
 // The allocator keeps a block that is freed at hand for the next list, but gives the pages of as
 // many single records back to the kernel.
-SchedSlab *newBlock(Layout layout, size_t records) {
+SchedSlab *newBlock(const Layout &layout, size_t records) {
   const size_t size = sizeof(SchedSlab) + (records - 1) * layout.stride + layout.end;
   void *memory = calloc(1, size);
   return memory != nullptr ? added(memory, size, false, layout) : nullptr;
 }
 
 // Null when memory is short, or the records too few.
-SchedSlab *newSlab(Layout layout, size_t expectedRecords) {
+SchedSlab *newSlab(const Layout &layout, size_t expectedRecords) {
   const size_t size = mappedSizeFor(expectedRecords, layout);
   if (size == 0 && expectedRecords > kLongestPlainList) {
     return newBlock(layout, expectedRecords);

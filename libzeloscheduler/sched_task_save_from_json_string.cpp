@@ -163,8 +163,8 @@ bool eachFits(PSZHASH hash) {
   return true;
 }
 
-// What is malformed in itself is the conversion's to report, so that nothing of this question stays in
-// the error record.
+// What is malformed in itself is the conversion's to report, so that nothing of this question stays
+// in the error record.
 bool fitsFields(PSZHASH hash) {
   const SchedErrorRecord before;
   const bool fits = eachFits(hash);
