@@ -71,8 +71,11 @@ std::string wellFormed(std::string_view text) {
   return result;
 }
 
+constexpr unsigned char kLastAscii = kUtf8Forms[0].lastLead;
+
 Json::Value valueOf(std::string_view text) {
-  const bool isAscii = std::none_of(text.begin(), text.end(), [](char byte) { return byte < 0; });
+  const bool isAscii = std::all_of(text.begin(), text.end(),
+                                   [](char byte) { return isWithin(byte, 0x00, kLastAscii); });
   return isAscii ? Json::Value(text.data(), text.data() + text.size())
                  : Json::Value(wellFormed(text));
 }
