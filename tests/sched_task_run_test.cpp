@@ -633,6 +633,19 @@ TEST_F(TaskRunTest, ALockDirectoryThatCannotBeMadeIsTriedAgainLater) {
   EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
 }
 
+// Of runs that start together after a boot, all but one do.
+TEST_F(TaskRunTest, ARunThatLosesTheRaceForTheLockDirectoryComesBackAndFindsIt) {
+  const long id = saveRanTask();
+  setRandValues({0});
+  failCallFor("mkdir", kLockDirectory, {.error = EEXIST});
+  onSleep([](size_t) { std::filesystem::create_directory(kLockDirectory); });
+  runToEnd(id);
+  EXPECT_EQ(logged(), Lines{runLine("Lock failed (retry=1), sleep 3 secs.")});
+  EXPECT_EQ(recordedSleeps(), std::vector<long>{3 * kMicroseconds});
+  EXPECT_TRUE(ran());
+  EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
+}
+
 TEST_F(TaskRunTest, WaitsGoFrom3To30SecondsInStepsOf3) {
   const long id = saveRanTask();
   setRandValues({0, 1, 2, 3, 4, 5, 6, 7, 8, 9, 10, 2147483647});
