@@ -329,11 +329,17 @@ was_off() {
   in_root sqlite3 /usr/zelo/var/history.sqlite "UPDATE up SET boot = 'another', seen = seen - 10000"
 }
 
+readonly CAUGHT_UP='
+  eventually() { for tenth in $(seq 200); do "$@" && return; sleep 0.1; done; }
+  eventually systemctl --quiet is-active zelosched-catch-up
+  eventually test -s /var/caught_up
+  systemctl is-active zelosched-catch-up
+  sort -u /var/caught_up'
+
 catches_up() {
   rm -f "$ROOT/var/caught_up"
   was_off && in_root_quietly systemctl enable zelosched-catch-up.service &&
-    same "$(boot 'sleep 1; systemctl is-active zelosched-catch-up; sort -u /var/caught_up')" \
-      "$(printf 'active\ncaught up')"
+    same "$(boot "$CAUGHT_UP")" "$(printf 'active\ncaught up')"
 }
 
 catches_nothing_up() {
