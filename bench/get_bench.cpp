@@ -1,5 +1,5 @@
-// Reading one task of a store that the process has not read yet, beside reading the file and
-// nothing else; and once more, when it has been read.
+// Reading one task, beside reading the file and nothing else: of a store that the process has read,
+// of one that it has not, and of one that was changed just now.
 #include <zelosched.h>
 
 #include "support/row.h"

@@ -13,18 +13,20 @@
 
 namespace {
 
-constexpr gsize kKeys = 29;  // of a task
+constexpr size_t kHugePage = size_t{2} << 20;
 
-void readGroup(GKeyFile *file, const char *group) {
+// The number of its keys.
+gsize readGroup(GKeyFile *file, const char *group) {
   gsize count = 0;
   gchar **keys = g_key_file_get_keys(file, group, &count, nullptr);
-  orDie(count == kKeys, "g_key_file_get_keys");
+  orDie(count > 0, "g_key_file_get_keys");
   for (gsize i = 0; i < count; ++i) {
     gchar *value = g_key_file_get_value(file, group, keys[i], nullptr);
     orDie(value != nullptr, "g_key_file_get_value");
     g_free(value);
   }
   g_strfreev(keys);
+  return count;
 }
 
 void readKeyFile(gsize expected) {
@@ -34,8 +36,9 @@ void readKeyFile(gsize expected) {
   gsize count = 0;
   gchar **groups = g_key_file_get_groups(file, &count);
   orDie(count == expected, "g_key_file_get_groups");
-  for (gsize i = 0; i < count; ++i) {
-    readGroup(file, groups[i]);
+  const gsize keys = readGroup(file, groups[0]);
+  for (gsize i = 1; i < count; ++i) {
+    orDie(readGroup(file, groups[i]) == keys, "as many keys of each task");
   }
   g_strfreev(groups);
   g_key_file_free(file);
@@ -55,15 +58,18 @@ void touch(ZELO_SCHED_TASK *task) {
   }
 }
 
-// Zeroed by the kernel, in huge pages where there are enough of them.
+size_t inHugePages(size_t size) {
+  return (size + kHugePage - 1) / kHugePage * kHugePage;
+}
+
+// Zeroed by the kernel, in huge pages wherever the mapping begins.
 void readAndTouch(int count) {
-  constexpr size_t kHugePage = size_t{2} << 20;
   readStore();
-  const size_t size = static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK) + kHugePage;
+  const size_t size = inHugePages(static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK)) + kHugePage;
   void *memory = mmap(nullptr, size, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
   orDie(memory != MAP_FAILED, "mmap");
   madvise(memory, size, MADV_HUGEPAGE);
-  const auto begin = (reinterpret_cast<uintptr_t>(memory) + kHugePage - 1) / kHugePage * kHugePage;
+  const size_t begin = inHugePages(reinterpret_cast<uintptr_t>(memory));
   for (int i = 0; i < count; ++i) {
     touch(reinterpret_cast<ZELO_SCHED_TASK *>(begin) + i);
   }

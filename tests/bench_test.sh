@@ -10,21 +10,39 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 . "$here/support/shell_test.sh"
 
 readonly BENCH=$here/../scripts/bench
-readonly BRIEF=(--benchmark_repetitions=1 --benchmark_min_time=0.0001)
 readonly AMOUNT='[0-9.e+]+ (ns|us|ms|B|KiB|MiB)'
 readonly ROW="^.+ $AMOUNT  .+ $AMOUNT +[0-9.]+ +[0-9.]+  (yes|no)\$"
 
-# prints_rows PROGRAM COUNT
+# prints_rows NAME COUNT: under a line of headings
 prints_rows() {
-  local rows
-  rows=$("$here/../scripts/sandbox" "$BUILD_DIR/bench/${1}_bench" "${BRIEF[@]}") || return 1
-  same "$(grep -cE "$ROW" <<<"$rows")" "$2" && same "$(wc -l <<<"$rows")" "$2"
+  local table
+  table=$("$BENCH" --built --brief "$1") || return 1
+  same "$(grep -cE "$ROW" <<<"$table")" "$2" && same "$(wc -l <<<"$table")" $(($2 + 1)) &&
+    [[ $table == "what "*"at most"* ]]
+}
+
+# run_bench PROGRAM ARGUMENTS: out, err and status are what came of it
+run_bench() {
+  status=0
+  out=$("$here/../scripts/sandbox" "$BUILD_DIR/bench/${1}_bench" "${@:2}" 2>"$BUILD_DIR/bench_test.err") || status=$?
+  err=$(<"$BUILD_DIR/bench_test.err")
+  rm "$BUILD_DIR/bench_test.err"
+}
+
+lists_benchmarks() {
+  run_bench list --benchmark_list_tests=true
+  same "$status" 0 && [[ $out == *"ZELOSchedTaskListGet, 10 tasks"* ]]
+}
+
+refuses_half_a_row() {
+  run_bench list '--benchmark_filter=GKeyFile.* 10 tasks'
+  same "$status $err" "1 no row has both its sides in the filter"
 }
 
 refuses_to_run_outside_the_sandbox() {
   local complaint
-  ! complaint=$(env -u ZELO_SANDBOX "$BUILD_DIR/bench/json_bench" "${BRIEF[@]}" 2>&1) &&
-    [[ $complaint == *"being in the sandbox"* ]]
+  ! complaint=$(env -u ZELO_SANDBOX "$BUILD_DIR/bench/json_bench" 2>&1) &&
+    same "$complaint" "being in the sandbox (scripts/sandbox) failed"
 }
 
 explains_itself() {
@@ -45,6 +63,8 @@ check "JSON is compared with JsonCpp alone" prints_rows json 3
 check "recording a run is compared with the statements alone" prints_rows status 1
 check "a run is compared with a shell that is forked" prints_rows run 2
 check "a list's memory is compared with its records and file" prints_rows memory 4
+check "the benchmarks of a program are listed" lists_benchmarks
+check "a filter that leaves no row whole is refused" refuses_half_a_row
 check "a benchmark refuses to run outside the sandbox" refuses_to_run_outside_the_sandbox
 check "scripts/bench --help says how it is called" explains_itself
 check "an unknown name is refused, and those there are are named" names_what_there_is
