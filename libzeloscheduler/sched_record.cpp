@@ -1,4 +1,4 @@
-// Task records: single ones, and slabs of them for long lists.
+// Task records: single ones, and slabs of them for lists.
 #include "sched_record.h"
 
 #include <sys/mman.h>
@@ -10,34 +10,36 @@
 
 #include "sched_parm_table.h"
 
+#ifndef __has_feature
+#define __has_feature(name) 0
+#endif
+
 namespace {
 
-constexpr size_t kLongestPlainList = 8;
 constexpr size_t kHugePage = size_t{2} << 20;
-constexpr size_t kMostSlabSize = 4 * kHugePage;
+// Also the most that one record which is kept can keep of a list.
+constexpr size_t kLargestMapping = 4 * kHugePage;
 
-#if defined(__SANITIZE_ADDRESS__)
+#if defined(__SANITIZE_ADDRESS__) || __has_feature(address_sanitizer)
 constexpr bool kSlabsAllowed = false;  // each record is watched by itself then
 #else
 constexpr bool kSlabsAllowed = true;
 #endif
 
-// How far the records of a slab are apart, where the last byte of one ends, and whether a list of
-// them fills huge pages.
+// How far the records of a slab are apart, and where the last byte of one ends.
 struct Layout {
   size_t stride;
   size_t end;
-  bool fillsHugePages;
 };
 
-constexpr Layout kWholeLayout = {sizeof(ZELO_SCHED_TASK), sizeof(ZELO_SCHED_TASK), true};
+constexpr Layout kWholeLayout = {sizeof(ZELO_SCHED_TASK), sizeof(ZELO_SCHED_TASK)};
 
 // A schedule is the fields before the name and those behind the next trigger time. The two texts
 // are not used, so that other records' fields may lie there, if only no two records share a byte.
 constexpr size_t kHeadEnd = offsetof(ZELO_SCHED_TASK, Name);
 constexpr size_t kTailBegin = offsetof(ZELO_SCHED_TASK, State);
 constexpr size_t kTailEnd = offsetof(ZELO_SCHED_TASK, LastWorkHour) + sizeof(uint32_t);
-constexpr Layout kScheduleLayout = {128, kTailEnd, false};
+constexpr Layout kScheduleLayout = {64, kTailEnd};
 static_assert(kTailBegin % kScheduleLayout.stride >= kHeadEnd);
 static_assert(kTailBegin % kScheduleLayout.stride + (kTailEnd - kTailBegin) <=
               kScheduleLayout.stride);
@@ -55,7 +57,8 @@ struct SchedSlab {
   size_t size;  // in bytes, with this
   bool isMapped;
   size_t stride;
-  size_t unused;   // records not handed out yet, from the first on
+  size_t room;     // in records
+  size_t taken;    // of them, from the first on
   size_t holders;  // records in use, and the source that still takes from it
 
   uintptr_t begin() const { return reinterpret_cast<uintptr_t>(this); }
@@ -71,12 +74,38 @@ static_assert(sizeof(SchedSlab) % alignof(ZELO_SCHED_TASK) == 0);
 
 namespace {
 
-// Every slab, the one used last in front: lists are mostly freed in order.
+// Every slab, the one asked for last in front: lists are mostly freed in order.
 SchedSlab *slabs = nullptr;
 
-// Mapped rather than allocated: the pages come zeroed, and go back at once when the list is freed.
+size_t recordsIn(size_t slabSize, const Layout &layout) {
+  const size_t least = sizeof(SchedSlab) + layout.end;
+  return slabSize < least ? 0 : (slabSize - least) / layout.stride + 1;
+}
+
+size_t sizeOf(size_t records, const Layout &layout) {
+  return sizeof(SchedSlab) + (records - 1) * layout.stride + layout.end;
+}
+
+// Whole huge pages, and no more of them than the records fill: memory that nobody asked for would
+// be taken otherwise. 0 when there are too few records for one.
+size_t mappedSizeFor(size_t records, const Layout &layout) {
+  size_t size = kLargestMapping;
+  while (size > 0 && recordsIn(size, layout) > records) {
+    size -= kHugePage;
+  }
+  return size;
+}
+
+// The kernel zeroes a huge page towards the byte that is touched first. Towards the last one it
+// goes upwards through memory, in about half the time that it needs downwards.
+void touchEnds(volatile char *pages, size_t size) {
+  for (size_t end = kHugePage; end <= size; end += kHugePage) {
+    pages[end - 1] = 0;
+  }
+}
+
 // A huge page must begin at a multiple of its size, so what is mapped too much is cut off.
-void *mapSlab(size_t size) {
+void *mapHugePages(size_t size) {
   const size_t mapped = size + kHugePage;
   void *memory = mmap(nullptr, mapped, PROT_READ | PROT_WRITE,
                       MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE, -1, 0);
@@ -90,67 +119,35 @@ void *mapSlab(size_t size) {
   if (before > 0) {
     munmap(memory, before);
   }
-  void *slab = reinterpret_cast<void *>(aligned);
+  void *pages = reinterpret_cast<void *>(aligned);
   if (after > 0) {
-    munmap(static_cast<char *>(slab) + size, after);
+    munmap(static_cast<char *>(pages) + size, after);
   }
-  return slab;
+  madvise(pages, size, MADV_HUGEPAGE);  // a kernel without them is only slower
+  touchEnds(static_cast<volatile char *>(pages), size);
+  return pages;
 }
 
-size_t recordsIn(size_t slabSize, const Layout &layout) {
-  const size_t least = sizeof(SchedSlab) + layout.end;
-  return slabSize < least ? 0 : (slabSize - least) / layout.stride + 1;
-}
-
-// Whole huge pages, and no more of them than the records fill: memory that nobody asked for would
-// be taken otherwise. 0 when there are too few records for one.
-size_t mappedSizeFor(size_t expectedRecords, const Layout &layout) {
-  if (!layout.fillsHugePages) {
-    return kMostSlabSize;
+// What is too small for huge pages comes from the allocator: it keeps a block that is freed at hand
+// for the next list, but gives the pages of as many single records back to the kernel.
+//
+// Null when memory is short.
+SchedSlab *newSlab(size_t records, const Layout &layout) {
+  const size_t mapped = mappedSizeFor(records, layout);
+  const size_t size = mapped > 0 ? mapped : sizeOf(records, layout);
+  auto *slab = static_cast<SchedSlab *>(mapped > 0 ? mapHugePages(size) : calloc(1, size));
+  if (slab == nullptr) {
+    return nullptr;
   }
-  size_t size = kMostSlabSize;
-  while (size > 0 && recordsIn(size, layout) > expectedRecords) {
-    size -= kHugePage;
-  }
-  return size;
-}
-
-void *mapSlabFor(const Layout &layout, size_t size) {
-  void *memory = size > 0 ? mapSlab(size) : nullptr;
-  if (memory != nullptr) {  // a kernel without huge pages is only slower
-    madvise(memory, size, layout.fillsHugePages ? MADV_HUGEPAGE : MADV_NOHUGEPAGE);
-  }
-  return memory;
-}
-
-SchedSlab *added(void *memory, size_t size, bool isMapped, const Layout &layout) {
-  auto *slab = static_cast<SchedSlab *>(memory);
   slab->size = size;
-  slab->isMapped = isMapped;
+  slab->isMapped = mapped > 0;
   slab->stride = layout.stride;
-  slab->unused = recordsIn(size, layout);
+  slab->room = recordsIn(size, layout);
+  slab->taken = 0;
   slab->holders = 1;
   slab->next = slabs;
   slabs = slab;
   return slab;
-}
-
-// The allocator keeps a block that is freed at hand for the next list, but gives the pages of as
-// many single records back to the kernel.
-SchedSlab *newBlock(const Layout &layout, size_t records) {
-  const size_t size = sizeof(SchedSlab) + (records - 1) * layout.stride + layout.end;
-  void *memory = calloc(1, size);
-  return memory != nullptr ? added(memory, size, false, layout) : nullptr;
-}
-
-// Null when memory is short, or the records too few.
-SchedSlab *newSlab(const Layout &layout, size_t expectedRecords) {
-  const size_t size = mappedSizeFor(expectedRecords, layout);
-  if (size == 0 && expectedRecords > kLongestPlainList) {
-    return newBlock(layout, expectedRecords);
-  }
-  void *memory = mapSlabFor(layout, size);
-  return memory != nullptr ? added(memory, size, true, layout) : nullptr;
 }
 
 void freeSlab(SchedSlab *slab) {
@@ -161,19 +158,20 @@ void freeSlab(SchedSlab *slab) {
   }
 }
 
-SchedSlab *moveToFront(SchedSlab **link) {
+// Out of the chain, from where the link to it is.
+SchedSlab *unlinked(SchedSlab **link) {
   SchedSlab *slab = *link;
   *link = slab->next;
-  slab->next = slabs;
-  slabs = slab;
   return slab;
 }
 
-// Which then stands in front.
 SchedSlab *slabOf(const ZELO_SCHED_TASK *pTask) {
   for (SchedSlab **link = &slabs; *link != nullptr; link = &(*link)->next) {
     if ((*link)->holds(pTask)) {
-      return moveToFront(link);
+      SchedSlab *slab = unlinked(link);
+      slab->next = slabs;
+      slabs = slab;
+      return slab;
     }
   }
   return nullptr;
@@ -183,8 +181,11 @@ void unhold(SchedSlab *slab) {
   if (--slab->holders > 0) {
     return;
   }
-  slabs = slabOf(slab->record(0))->next;
-  freeSlab(slab);
+  SchedSlab **link = &slabs;
+  while (*link != slab) {
+    link = &(*link)->next;
+  }
+  freeSlab(unlinked(link));
 }
 
 }  // namespace
@@ -209,10 +210,13 @@ void schedRecordEmpty(ZELO_SCHED_TASK *pTask) {
   }
 }
 
-SchedRecordSource::SchedRecordSource(int expectedRecords, SchedRecordExtent extent)
-    : expectedRecords_(static_cast<size_t>(std::max(expectedRecords, 0))),
-      usesSlabs_(kSlabsAllowed && expectedRecords_ > kLongestPlainList),
-      extent_(extent) {}
+void schedRecordCopySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from) {
+  memcpy(static_cast<void *>(pTo), &from, kHeadEnd);
+  memcpy(&pTo->State, &from.State, kTailEnd - kTailBegin);
+}
+
+SchedRecordSource::SchedRecordSource(SchedRecordCount count, int records, SchedRecordExtent extent)
+    : count_(count), extent_(extent), left_(static_cast<size_t>(std::max(records, 0))) {}
 
 SchedRecordSource::~SchedRecordSource() {
   if (slab_ != nullptr) {
@@ -220,22 +224,23 @@ SchedRecordSource::~SchedRecordSource() {
   }
 }
 
+size_t SchedRecordSource::nextSlab() const {
+  return count_ == SchedRecordCount::kExact ? left_ : std::min(left_, taken_);
+}
+
 TaskGuard SchedRecordSource::take() {
-  if (!usesSlabs_) {
-    return schedRecordAlloc();
-  }
-  if (slab_ != nullptr && slab_->unused == 0) {
+  if (slab_ != nullptr && slab_->taken == slab_->room) {
     unhold(slab_);
     slab_ = nullptr;
   }
-  if (slab_ == nullptr) {
-    slab_ = newSlab(layoutOf(extent_), expectedRecords_);
+  if (slab_ == nullptr && kSlabsAllowed && nextSlab() > 1) {
+    slab_ = newSlab(nextSlab(), layoutOf(extent_));
   }
-  expectedRecords_ -= std::min<size_t>(expectedRecords_, 1);
+  left_ -= std::min<size_t>(left_, 1);
+  ++taken_;
   if (slab_ == nullptr) {
     return schedRecordAlloc();  // where there may still be room for a single one
   }
-  // From the end on: a list that is built from its end then lies in memory as it is linked.
   ++slab_->holders;
-  return TaskGuard(slab_->record(--slab_->unused));
+  return TaskGuard(slab_->record(slab_->taken++));
 }

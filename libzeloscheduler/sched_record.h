@@ -21,20 +21,26 @@ TaskGuard schedRecordAlloc();
 // record that is filled over and over most of its bytes; none that a caller gets is made this way.
 void schedRecordEmpty(ZELO_SCHED_TASK *pTask);
 
-// How much of a record there is: all of it, or what says who is started when. The rest of a record,
-// its largest part, must then not be touched: the next records lie in it.
+// Copies what says who is started when, the link to the next record included.
+void schedRecordCopySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from);
+
+// How much of a record there is: all of it, or what schedRecordCopySchedule copies. The rest, its
+// largest part, must then not be touched: the next records lie in it.
 enum class SchedRecordExtent { kWhole, kSchedule };
+
+// What is known beforehand of the number of a list's records.
+enum class SchedRecordCount { kExact, kAtMost };
 
 struct SchedSlab;
 
 // The records of one list. A record is large and mostly empty, and of many records taken one by one
-// it is the page faults that a list costs most. All but the shortest lists therefore take them from
-// slabs, the long ones from slabs of huge pages; a slab is freed with the last of its records, in
-// whatever order they are freed.
+// it is the page faults that a list costs most. They are therefore taken from slabs, those of long
+// lists of huge pages; a slab is freed with the last of its records, in whatever order they are
+// freed. Within a slab they lie in the order in which they were taken. Where it is not known how
+// many there will be, a slab has no more room than was taken before it.
 class SchedRecordSource {
  public:
-  explicit SchedRecordSource(int expectedRecords,
-                             SchedRecordExtent extent = SchedRecordExtent::kWhole);
+  SchedRecordSource(SchedRecordCount count, int records, SchedRecordExtent extent);
   ~SchedRecordSource();
   SchedRecordSource(const SchedRecordSource &) = delete;
   SchedRecordSource &operator=(const SchedRecordSource &) = delete;
@@ -43,9 +49,12 @@ class SchedRecordSource {
   TaskGuard take();
 
  private:
-  size_t expectedRecords_;  // that have not been taken yet
-  bool usesSlabs_;
+  size_t nextSlab() const;  // in records
+
+  SchedRecordCount count_;
   SchedRecordExtent extent_;
+  size_t left_;  // that may still be taken
+  size_t taken_ = 0;
   SchedSlab *slab_ = nullptr;
 };
 

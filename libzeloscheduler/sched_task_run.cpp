@@ -329,8 +329,7 @@ int enterOwnersContext(uid_t owner) {
   return 0;
 }
 
-// ---- the child's work
-// -----------------------------------------------------------------------------
+// ---- the child's work ---------------------------------------------------------------------------
 
 struct RunResult {
   int statusCode = ZELO_SCHED_STATUS_NONE;

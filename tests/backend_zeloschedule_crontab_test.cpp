@@ -472,14 +472,17 @@ TEST_F(CrontabTest, AStoreThatCannotBeListedIsReportedAndLeavesTheCrontab) {
 
 TEST_F(CrontabTest, ARecordThatCannotBeAllocatedLeavesTheCrontab) {
   if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  constexpr size_t kPage = 4096;
   create();
   create();
   writeFile(kCrontab, kPlainCrontab);
   forget();
   for (const unsigned failing : {1U, 2U, 3U}) {
     SCOPED_TRACE(failing);
-    const support::FailingAllocation scope("calloc",
-                                           {.from = failing, .minSize = sizeof(ZELO_SCHED_TASK)});
+    // The second is what the lines of both need: without it each takes a record.
+    const support::FailingAllocation several("calloc", {.from = 2, .minSize = kPage});
+    const support::FailingAllocation one("calloc",
+                                         {.from = failing, .minSize = sizeof(ZELO_SCHED_TASK)});
     EXPECT_EQ(backend_.sync(), -1);
     EXPECT_EQ(logged(), (Lines{backendLine("malloc ZELO_SCHED_TASK failed. key:[" +
                                            std::string(failing == 3 ? "2" : "1") + "]"),

@@ -335,7 +335,9 @@ TEST_F(StoreTest, ARecordThatCannotBeAllocatedFailsTheWholeList) {
   for (const char *section : {"1", "2", "3"}) addSection(section, std::atoi(section));
   ZELO_SCHED_TASK *head = nullptr;
   {
-    const FailingAllocation scope("calloc", {.from = 2, .minSize = sizeof(ZELO_SCHED_TASK)});
+    const FailingAllocation several("calloc",
+                                    {.times = kAlways, .minSize = 2 * sizeof(ZELO_SCHED_TASK)});
+    const FailingAllocation one("calloc", {.from = 2, .minSize = sizeof(ZELO_SCHED_TASK)});
     EXPECT_EQ(backend_.list_get(&head, nullptr), -1);
   }
   EXPECT_EQ(head, nullptr);
@@ -852,17 +854,26 @@ TEST_F(StoreTest, ASyncThatCannotListFailsTheChangeThoughItIsStored) {
 }
 
 TEST_F(StoreTest, AScratchCopyThatComesOutEmptyIsMadeAgain) {
+  create("task");
+  writeFile(kStore, "");
+  const Task task = makeTask("task", "true");
+  resetFailingCalls();
+  EXPECT_EQ(backend_.edit(task.get()), -1);
+  constexpr size_t kTries = 20;
+  constexpr long kPause = 5000;
+  EXPECT_EQ(recordedExecs(), Lines(kTries, copyCommand(kStore, scratchPath())));
+  EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>(kTries, kPause));
+}
+
+TEST_F(StoreTest, AStoreWithoutBytesThatHasNoOtherCopyIsCopiedOnce) {
   writeFile(kStore, "");
   const Task task = makeTask("task", "true");
   resetFailingCalls();
   EXPECT_EQ(backend_.edit(task.get()), 0);
-  constexpr size_t kTries = 20;
-  constexpr long kPause = 5000;
-  Lines wanted(kTries, copyCommand(kStore, scratchPath()));
-  wanted.push_back(copyCommand(scratchPath(), kPersistentStore));
-  wanted.push_back(copyCommand(scratchPath(), kStore));
-  EXPECT_EQ(recordedExecs(), wanted);
-  EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>(kTries, kPause));
+  EXPECT_EQ(recordedExecs(),
+            (Lines{copyCommand(kStore, scratchPath()), copyCommand(scratchPath(), kPersistentStore),
+                   copyCommand(scratchPath(), kStore)}));
+  EXPECT_EQ(recordedSleeps(), std::vector<long>{});
 }
 
 TEST_F(StoreTest, AStoreThatIsFilledMeanwhileIsNotTakenForEmpty) {

@@ -1,5 +1,6 @@
-// Long lists: their records come from slabs, and go back one by one, in any order.
+// The records of lists: they come from slabs, and go back one by one, in any order.
 #include <gtest/gtest.h>
+#include <malloc.h>
 #include <sys/mman.h>
 #include <sys/syscall.h>
 #include <unistd.h>
@@ -22,12 +23,17 @@ using support::ErrorRecord;
 using support::logged;
 using Lines = std::vector<std::string>;
 
-bool slabsFail = false;
+bool mappingsFail = false;
 bool mappingsAreOdd = false;
 size_t mapped = 0;
 size_t unmapped = 0;
-constexpr size_t kSmallestSlab = size_t{1} << 22;
+size_t advised = 0;  // to be huge pages
+constexpr size_t kSmallestMapping = size_t{1} << 22;
 constexpr size_t kPage = 4096;
+
+int giveBack(void *address, size_t length) {
+  return static_cast<int>(syscall(SYS_munmap, address, length));
+}
 
 }  // namespace
 
@@ -35,15 +41,15 @@ extern "C" __attribute__((visibility("default"))) void *mmap(void *address, size
                                                              int protection, int flags,
                                                              int descriptor,
                                                              off_t offset) noexcept {
-  if (slabsFail && length >= kSmallestSlab) {
+  if (mappingsFail && length >= kSmallestMapping) {
     errno = ENOMEM;
     return MAP_FAILED;
   }
-  mapped += length >= kSmallestSlab ? length : 0;
-  if (mappingsAreOdd && length >= kSmallestSlab) {
+  mapped += length >= kSmallestMapping ? length : 0;
+  if (mappingsAreOdd && length >= kSmallestMapping) {
     auto *begin =
         static_cast<char *>(mmap64(address, length + kPage, protection, flags, descriptor, offset));
-    munmap(begin, kPage);
+    giveBack(begin, kPage);
     return begin + kPage;
   }
   return mmap64(address, length, protection, flags, descriptor, offset);
@@ -51,8 +57,15 @@ extern "C" __attribute__((visibility("default"))) void *mmap(void *address, size
 
 extern "C" __attribute__((visibility("default"))) int munmap(void *address,
                                                              size_t length) noexcept {
-  unmapped += length;
-  return static_cast<int>(syscall(SYS_munmap, address, length));
+  const int result = giveBack(address, length);
+  unmapped += result == 0 ? length : 0;
+  return result;
+}
+
+extern "C" __attribute__((visibility("default"))) int madvise(void *address, size_t length,
+                                                              int advice) noexcept {
+  advised += advice == MADV_HUGEPAGE ? length : 0;
+  return static_cast<int>(syscall(SYS_madvise, address, length, advice));
 }
 
 namespace {
@@ -60,14 +73,14 @@ namespace {
 // Two slabs and a part of a third.
 constexpr int kMany = 500;
 
-class LongListTest : public support::SandboxTest {
+class ListRecordsTest : public support::SandboxTest {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
-    slabsFail = mappingsAreOdd = false;
+    mappingsFail = mappingsAreOdd = false;
   }
   void TearDown() override {
-    slabsFail = mappingsAreOdd = false;
+    mappingsFail = mappingsAreOdd = false;
     SandboxTest::TearDown();
   }
 
@@ -76,7 +89,8 @@ class LongListTest : public support::SandboxTest {
     for (int id = 1; id <= count; ++id) {
       const std::string number = std::to_string(id);
       text += "[" + number + "]\nid=" + number + "\nname=task " + number +
-              "\nrun hour=8\nrun min=30\napp=a\napp name=b\naction=c\ncmd=\nstate=enabled\n"
+              "\nrun hour=" + std::to_string(id % 24) + "\nrun min=" + std::to_string(id % 60) +
+              "\napp=a\napp name=b\naction=c\ncmd=\nstate=enabled\n"
               "type=daily\n";
     }
     support::writeFile(support::kStore, text);
@@ -99,9 +113,23 @@ class LongListTest : public support::SandboxTest {
   static void freeAll(const std::vector<ZELO_SCHED_TASK *> &tasks) {
     for (ZELO_SCHED_TASK *task : tasks) EXPECT_EQ(ZELOSchedTaskFree(task), 0);
   }
+
+  // In how many pieces of memory they lie. Between records that were allocated one by one there is
+  // something of the allocator's.
+  static size_t piecesOf(std::vector<ZELO_SCHED_TASK *> tasks) {
+    std::sort(tasks.begin(), tasks.end());
+    size_t pieces = 1;
+    for (size_t i = 1; i < tasks.size(); ++i) pieces += tasks[i] != tasks[i - 1] + 1 ? 1 : 0;
+    return pieces;
+  }
+
+  static size_t heapInUse() {
+    const struct mallinfo2 info = mallinfo2();
+    return info.uordblks + info.hblkhd;
+  }
 };
 
-TEST_F(LongListTest, EveryTaskHasARecordOfItsOwn) {
+TEST_F(ListRecordsTest, EveryTaskHasARecordOfItsOwn) {
   storeTasks(kMany);
   const std::vector<ZELO_SCHED_TASK *> tasks = listed();
   EXPECT_EQ(tasks.size(), size_t{kMany});
@@ -112,7 +140,7 @@ TEST_F(LongListTest, EveryTaskHasARecordOfItsOwn) {
   freeAll(tasks);
 }
 
-TEST_F(LongListTest, RecordsMayBeFreedInAnyOrderWhileTheOthersStand) {
+TEST_F(ListRecordsTest, RecordsMayBeFreedInAnyOrderWhileTheOthersStand) {
   storeTasks(kMany);
   std::vector<ZELO_SCHED_TASK *> tasks = listed();
   std::shuffle(tasks.begin(), tasks.end(), std::mt19937(7));
@@ -127,9 +155,9 @@ TEST_F(LongListTest, RecordsMayBeFreedInAnyOrderWhileTheOthersStand) {
   }
 }
 
-// Single records, one block of them, and blocks behind huge pages.
-TEST_F(LongListTest, ListsOfEveryLengthHaveZeroedRecordsOfTheirOwn) {
-  for (const int count : {1, 8, 9, 16, 59, 60, 61, 68, 69, 120, 250}) {
+// Single records, slabs of the heap, and such behind huge pages.
+TEST_F(ListRecordsTest, ListsOfEveryLengthHaveZeroedRecordsOfTheirOwn) {
+  for (const int count : {1, 2, 8, 9, 59, 60, 61, 62, 120, 250}) {
     SCOPED_TRACE(count);
     storeTasks(count);
     for (int round = 0; round < 2; ++round) {
@@ -146,7 +174,7 @@ TEST_F(LongListTest, ListsOfEveryLengthHaveZeroedRecordsOfTheirOwn) {
   }
 }
 
-TEST_F(LongListTest, ListsOfDifferentLengthsAreFreedInTurns) {
+TEST_F(ListRecordsTest, ListsOfDifferentLengthsAreFreedInTurns) {
   std::vector<ZELO_SCHED_TASK *> all;
   for (const int count : {60, 9, 60, 300, 8, 120, 61}) {
     storeTasks(count);
@@ -162,7 +190,7 @@ TEST_F(LongListTest, ListsOfDifferentLengthsAreFreedInTurns) {
   }
 }
 
-TEST_F(LongListTest, TwoListsAndASingleRecordDoNotGetInEachOthersWay) {
+TEST_F(ListRecordsTest, TwoListsAndASingleRecordDoNotGetInEachOthersWay) {
   storeTasks(kMany);
   const std::vector<ZELO_SCHED_TASK *> first = listed();
   ZELO_SCHED_TASK *single = ZELOSchedTaskAlloc();
@@ -173,7 +201,7 @@ TEST_F(LongListTest, TwoListsAndASingleRecordDoNotGetInEachOthersWay) {
   freeAll(second);
 }
 
-TEST_F(LongListTest, ARecordThatIsFilteredOutIsUsedForTheNextTask) {
+TEST_F(ListRecordsTest, ARecordThatIsFilteredOutIsUsedForTheNextTask) {
   storeTasks(kMany);
   const std::vector<ZELO_SCHED_TASK *> tasks =
       listed([](const ZELO_SCHED_TASK *task) { return task->ID % 100 == 0 ? 1 : 0; });
@@ -181,7 +209,7 @@ TEST_F(LongListTest, ARecordThatIsFilteredOutIsUsedForTheNextTask) {
   freeAll(tasks);
 }
 
-TEST_F(LongListTest, AFilterMayKeepAListOfItsOwnWhileNothingIsKeptOfTheOuterOne) {
+TEST_F(ListRecordsTest, AFilterMayKeepAListOfItsOwnWhileNothingIsKeptOfTheOuterOne) {
   storeTasks(kMany);
   static std::vector<ZELO_SCHED_TASK *> inner;
   EXPECT_TRUE(listed([](const ZELO_SCHED_TASK *) {
@@ -193,7 +221,7 @@ TEST_F(LongListTest, AFilterMayKeepAListOfItsOwnWhileNothingIsKeptOfTheOuterOne)
   inner.clear();
 }
 
-TEST_F(LongListTest, RecordsLieWholeWhereverTheKernelPutsThem) {
+TEST_F(ListRecordsTest, RecordsLieWholeWhereverTheKernelPutsThem) {
   storeTasks(kMany);
   mappingsAreOdd = true;
   const std::vector<ZELO_SCHED_TASK *> tasks = listed();
@@ -201,32 +229,47 @@ TEST_F(LongListTest, RecordsLieWholeWhereverTheKernelPutsThem) {
   freeAll(tasks);
 }
 
-TEST_F(LongListTest, AListIsInTheOrderOfMemoryWhichASortByNumberKeeps) {
-  storeTasks(kMany);
-  ZELO_SCHED_TASK *head = nullptr;
-  ASSERT_EQ(ZELOSchedTaskListGet(&head, nullptr), kMany);
-  ZELOSchedTaskListSort(&head, "id", 1);
-  for (const ZELO_SCHED_TASK *task = head; task->next != nullptr; task = task->next) {
-    ASSERT_LT(task, task->next);
+// Which a sort by a number goes by.
+TEST_F(ListRecordsTest, RecordsLieInMemoryInTheOrderOfTheStore) {
+  for (const int count : {2, 8, 9, 59, 60, 240}) {
+    SCOPED_TRACE(count);
+    storeTasks(count);
+    ZELO_SCHED_TASK *head = nullptr;
+    ASSERT_EQ(ZELOSchedTaskListGet(&head, nullptr), count);
+    EXPECT_EQ(ZELOSchedTaskListSort(&head, "id", 1), 0);
+    int id = 0;
+    for (const ZELO_SCHED_TASK *task = head; task != nullptr; task = task->next) {
+      ASSERT_EQ(task->ID, ++id);
+    }
+    EXPECT_EQ(id, count);
+    ZELOSchedTaskListFree(&head);
   }
-  ZELOSchedTaskListFree(&head);
-  EXPECT_EQ(head, nullptr);
 }
 
-TEST_F(LongListTest, WithoutRoomForASlabRecordsAreTakenOneByOne) {
-  storeTasks(kMany);
-  slabsFail = true;
-  const std::vector<ZELO_SCHED_TASK *> tasks = listed();
-  EXPECT_EQ(idsOf(tasks).size(), size_t{kMany});
-  EXPECT_EQ(logged(), Lines{});
-  freeAll(tasks);
+TEST_F(ListRecordsTest, WithoutRoomForASlabRecordsAreTakenOneByOne) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  for (const int count : {2, 9, kMany}) {
+    SCOPED_TRACE(count);
+    storeTasks(count);
+    mappingsFail = true;
+    std::vector<ZELO_SCHED_TASK *> tasks;
+    {
+      const support::FailingAllocation scope(
+          "calloc", {.times = support::kAlways, .minSize = 2 * sizeof(ZELO_SCHED_TASK)});
+      tasks = listed();
+    }
+    EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(count));
+    EXPECT_EQ(piecesOf(tasks), static_cast<size_t>(count));
+    EXPECT_EQ(logged(), Lines{});
+    freeAll(tasks);
+  }
 }
 
-TEST_F(LongListTest, WithoutRoomForARecordEitherTheListFails) {
+TEST_F(ListRecordsTest, WithoutRoomForARecordEitherTheListFails) {
   if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
   storeTasks(kMany);
   ASSERT_EQ(ZELOSchedBackendInit(), 0);
-  slabsFail = true;
+  mappingsFail = true;
   ZELO_SCHED_TASK *head = nullptr;
   const support::FailingAllocation scope(
       "calloc", {.from = 300, .times = support::kAlways, .minSize = sizeof(ZELO_SCHED_TASK)});
@@ -236,28 +279,101 @@ TEST_F(LongListTest, WithoutRoomForARecordEitherTheListFails) {
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, "backend_zeloschedule.cpp"}));
 }
 
-// Each slab is mapped with a huge page too much, which is cut off again.
-TEST_F(LongListTest, SlabsAreNoLargerThanTheRecordsInThem) {
+TEST_F(ListRecordsTest, AListLiesInAsFewPiecesAsCanBe) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer watches each record by itself";
+  struct {
+    int count;
+    size_t pieces;
+  } const rows[] = {{1, 1},   {2, 1},   {9, 1},   {59, 1},  {60, 1},  {61, 2},  {62, 2},
+                    {119, 2}, {120, 1}, {180, 1}, {240, 1}, {241, 2}, {500, 3}, {1000, 5}};
+  for (const auto &row : rows) {
+    SCOPED_TRACE(row.count);
+    storeTasks(row.count);
+    const std::vector<ZELO_SCHED_TASK *> tasks = listed();
+    EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(row.count));
+    EXPECT_EQ(piecesOf(tasks), row.pieces);
+    freeAll(tasks);
+  }
+}
+
+// What is mapped is whole huge pages and one too many, which is cut off again.
+TEST_F(ListRecordsTest, NoMoreIsTakenThanTheRecordsFill) {
   if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer watches each record by itself";
   constexpr size_t kHugePage = size_t{2} << 20;
-  for (const int count : {59, 60, 119, 120, 240, 241, 300, 500}) {
+  for (const bool odd : {false, true}) {
+    mappingsAreOdd = odd;
+    for (const int count : {2, 59, 60, 119, 120, 240, 241, 300, 500}) {
+      SCOPED_TRACE(count);
+      storeTasks(count);
+      freeAll(listed());
+      const size_t records = static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK);
+      const size_t before = heapInUse();
+      mapped = unmapped = advised = 0;
+      const std::vector<ZELO_SCHED_TASK *> tasks = listed();
+      EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(count));
+      EXPECT_EQ(mapped - unmapped, advised) << "records lie in huge pages";
+      EXPECT_EQ(advised % kHugePage, 0U);
+      EXPECT_EQ(advised > 0, count >= 60) << "a huge page holds so many";
+      EXPECT_LE(advised + heapInUse() - before, records + records / 20);
+      freeAll(tasks);
+      EXPECT_EQ(unmapped, mapped) << "all of it is given back";
+      EXPECT_LT(heapInUse(), before + sizeof(ZELO_SCHED_TASK));
+    }
+  }
+}
+
+TEST_F(ListRecordsTest, AFilteredListTakesLittleMoreThanIsKept) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer watches each record by itself";
+  static int last;
+  for (const int count : {40, 59, 61, kMany}) {
+    storeTasks(count);
+    freeAll(listed());
+    for (const int kept : {1, 2, 3, 30}) {
+      SCOPED_TRACE(std::to_string(kept) + " of " + std::to_string(count));
+      last = kept;
+      const size_t before = heapInUse();
+      mapped = unmapped = 0;
+      const std::vector<ZELO_SCHED_TASK *> tasks =
+          listed([](const ZELO_SCHED_TASK *task) { return task->ID <= last ? 1 : 0; });
+      EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(kept));
+      EXPECT_EQ(mapped, 0U);
+      const size_t most = static_cast<size_t>(2 * kept) * sizeof(ZELO_SCHED_TASK);
+      EXPECT_LT(heapInUse(), before + most + kPage);
+      freeAll(tasks);
+      EXPECT_LT(heapInUse(), before + sizeof(ZELO_SCHED_TASK));
+    }
+  }
+}
+
+TEST_F(ListRecordsTest, AFilterThatKeepsAllIsServedInPiecesThatGrow) {
+  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer watches each record by itself";
+  storeTasks(kMany);
+  const std::vector<ZELO_SCHED_TASK *> tasks = listed([](const ZELO_SCHED_TASK *) { return 1; });
+  EXPECT_EQ(idsOf(tasks).size(), size_t{kMany});
+  EXPECT_LE(piecesOf(tasks), 12U);
+  freeAll(tasks);
+}
+
+// Of a list for the crontab only so much of each record exists as its line needs.
+TEST_F(ListRecordsTest, TheCrontabHasEachTaskWithItsOwnTimeInTheOrderOfTheStore) {
+  for (const int count : {1, 2, 8, 9, kMany}) {
     SCOPED_TRACE(count);
     storeTasks(count);
-    mapped = unmapped = 0;
-    const std::vector<ZELO_SCHED_TASK *> tasks = listed();
-    EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(count));
-    constexpr size_t kMostSlabs = 3;
-    EXPECT_EQ(mapped % kHugePage, 0U);
-    EXPECT_LE(mapped,
-              static_cast<size_t>(count) * sizeof(ZELO_SCHED_TASK) + kMostSlabs * kHugePage);
-    EXPECT_EQ(mapped > 0, count >= 60) << "a slab is a huge page at least";
-    freeAll(tasks);
-    EXPECT_GE(unmapped, mapped) << "all of it is given back";
+    support::writeFile(support::kCrontab, "");
+    mapped = 0;
+    EXPECT_EQ(ZELOSchedTaskSync(), 0);
+    EXPECT_EQ(mapped, 0U);
+    std::string wanted;
+    for (int id = 1; id <= count; ++id) {
+      wanted += std::to_string(id % 60) + "\t" + std::to_string(id % 24) +
+                "\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=" + std::to_string(id) + "\n";
+    }
+    EXPECT_TRUE(support::readFile(support::kCrontab) == wanted);
   }
 }
 
 // More ids than are first made room for.
-TEST_F(LongListTest, TheNextIdAfterThousandsIsFound) {
+TEST_F(ListRecordsTest, TheNextIdAfterThousandsIsFound) {
   storeTasks(2500);
   ZELO_SCHED_TASK *task = ZELOSchedTaskAlloc();
   ASSERT_NE(task, nullptr);

@@ -112,8 +112,10 @@ TEST_F(TaskToJsonTest, EachByteThatIsNotUtf8IsReplacedAndItsNeighboursStay) {
     const char *name;
     const char *json;
   } cases[] = {
-      {"caf\xE9 tea", R"(caf\\ufffd tea)"},                                // Latin-1
-      {"\x80\xBFx", R"(\\ufffd\\ufffdx)"},                                 // further bytes alone
+      {"caf\xE9 tea", R"(caf\\ufffd tea)"},  // Latin-1
+      {"\x80\xBFx", R"(\\ufffd\\ufffdx)"},   // further bytes alone
+      {"\x80", R"(\\ufffd)"},
+      {"a\x80z", R"(a\\ufffdz)"},
       {"\xC3(", R"(\\ufffd()"},                                            // cut off
       {"\xE2\x82", R"(\\ufffd\\ufffd)"},                                   // cut off at the end
       {"\xC0\xAF\xE0\x80\xAF", R"(\\ufffd\\ufffd\\ufffd\\ufffd\\ufffd)"},  // overlong

@@ -5,6 +5,7 @@
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <malloc.h>
 #include <sched.h>
 #include <signal.h>
 #include <sys/resource.h>
@@ -273,6 +274,10 @@ class ZelocoreSectionFile : public testing::Test {
     QLIBCErrSetEx(0, "", 0);
     return as_expected;
   }
+  static size_t HeapInUse() {
+    const struct mallinfo2 info = mallinfo2();
+    return info.uordblks + info.hblkhd;
+  }
   /* In a user namespace root is alone. */
   bool GiveAway() const { return chown(path_.c_str(), 12, 34) == 0; }
   void MakeOld() {
@@ -358,6 +363,26 @@ TEST_F(ZelocoreSectionFile, UnknownEscapesStandAsTheyAre) {
 TEST_F(ZelocoreSectionFile, AZeroByteEndsItsText) {
   Write("[1]\na=\"x\0y\"\nb\0c=\"z\"\n"s);
   EXPECT_EQ(Section("1"), (Keys{{"a", "x"}, {"b", "z"}}));
+}
+
+TEST_F(ZelocoreSectionFile, WhatIsBehindAZeroByteIsNotWrittenBack) {
+  Write("[1]\na=\"x\0y\"\nb\0c=\"z\"\n"s);
+  PSZHASH hash = QLIBCSzHashAlloc(1);
+  EXPECT_EQ(QLIBCFileGetSection(path_.c_str(), "1", &hash), 1);
+  EXPECT_EQ(QLIBCFileSetSection(path_.c_str(), "1", 0, hash, 0), 1);
+  QLIBCSzHashFree(hash);
+  EXPECT_EQ(Body(), "[1]\na=\"x\"\nb=\"z\"\n");
+}
+
+TEST_F(ZelocoreSectionFile, ALargeSectionTakesNoMoreThanTwiceItsMemory) {
+  constexpr size_t kSize = 1 << 20;
+  Write("[1]\na=\"" + std::string(kSize, 'x') + "\"\n");
+  EXPECT_EQ(Names(), Texts{"1"});
+  PSZHASH hash = QLIBCSzHashAlloc(1);
+  const size_t before = HeapInUse();
+  EXPECT_EQ(QLIBCFileGetSection(path_.c_str(), "1", &hash), 1);
+  EXPECT_LT(HeapInUse() - before, 2 * kSize + kSize / 2);
+  QLIBCSzHashFree(hash);
 }
 
 TEST_F(ZelocoreSectionFile, AZeroByteEndsTheNameOfASection) {

@@ -218,7 +218,8 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
   if (sections < 0) {
     return -1;
   }
-  SchedRecordSource records(sections);
+  const auto known = filter == nullptr ? SchedRecordCount::kExact : SchedRecordCount::kAtMost;
+  SchedRecordSource records(known, sections, SchedRecordExtent::kWhole);
   TaskChain tasks;
   int count = 0;
   TaskGuard task;
@@ -271,8 +272,7 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
   return convert(pTask, hash.get()) < 0 || setNextTrigger(pTask, &clock) < 0 ? -1 : kFound;
 }
 
-// ---- ids
-// ------------------------------------------------------------------------------------------
+// ---- ids ----------------------------------------------------------------------------------------
 
 // The ids of the stored tasks, in plain memory: no exception may arise here. It goes on counting
 // when memory is short, for the report.
@@ -365,8 +365,7 @@ int next_id(long *pID) {
   return 0;
 }
 
-// ---- writing the store
-// ------------------------------------------------------------------------------
+// ---- writing the store --------------------------------------------------------------------------
 
 // Makes the file under a name that nobody else has taken. In a sticky directory it stays ours.
 bool makeOwnFile(const char *szPath) {
@@ -413,9 +412,9 @@ int copyFile(const char *szSource, const char *szTarget) {
   return result == 0 ? 0 : reportCopy(szSource, szTarget);
 }
 
-// A forced copy empties its target before it fills it. A scratch file that is empty, or shorter or
-// longer than the working copy, has therefore most likely been taken from under another process's
-// copy: to build on it would lose other tasks.
+// A forced copy empties its target before it fills it. A scratch file that is empty though the
+// persistent copy is not, or shorter or longer than the working copy, has therefore most likely
+// been taken from under another process's copy: to build on it would lose other tasks.
 int copyWorkingCopy(const ScratchFile &scratch) {
   constexpr int kTries = 20;
   constexpr useconds_t kPause = 5000;
@@ -423,8 +422,7 @@ int copyWorkingCopy(const ScratchFile &scratch) {
     if (copyFile(kWorkingCopy, scratch.path()) < 0) {
       return -1;
     }
-    const off_t size = sizeOf(scratch.path());
-    if (size > 0 && size == sizeOf(kWorkingCopy)) {
+    if (sizeOf(scratch.path()) == sizeOf(kWorkingCopy) && !isCutToNothing(scratch.path())) {
       return 0;
     }
     usleep(kPause);
@@ -518,8 +516,7 @@ int write_store(long id, const ZELO_SCHED_TASK *pTask) {
   return removed > 0 ? publish(scratch, stored) : removed;
 }
 
-// ---- the crontab
-// ------------------------------------------------------------------------------------
+// ---- the crontab --------------------------------------------------------------------------------
 
 using CronLine = BoundedText<8192>;
 using HourList = BoundedText<128>;
@@ -726,31 +723,18 @@ void signalCron() {
   }
 }
 
-// What a crontab line says of a task.
-void copySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from) {
-  pTo->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
-  pTo->ID = from.ID;
-  pTo->State = from.State;
-  pTo->Type = from.Type;
-  memcpy(pTo->Week, from.Week, sizeof(pTo->Week));
-  pTo->StartMonth = from.StartMonth;
-  pTo->StartDay = from.StartDay;
-  pTo->RunHour = from.RunHour;
-  pTo->RunMin = from.RunMin;
-  pTo->RepeatHour = from.RepeatHour;
-  pTo->LastWorkHour = from.LastWorkHour;
-}
-
-// Every task as list_get lists it, but of each record no more than its crontab line needs: the
-// texts are most of a record, and zeroing them would be most of the work. The number of tasks, or
-// -1.
+// Every task that list_get lists, but of each record no more than its crontab line needs: the texts
+// are most of a record, and zeroing them would be most of the work. They are linked in the order of
+// the store, in which they also lie in memory: a sort by a number, which is by memory, leaves it.
+// The number of tasks, or -1.
 int listSchedules(TaskChain *tasks) {
   StoreWalk walk;
   const int sections = walk.open();
   if (sections < 0) {
     return -1;
   }
-  SchedRecordSource records(sections, SchedRecordExtent::kSchedule);
+  SchedRecordSource records(SchedRecordCount::kExact, sections, SchedRecordExtent::kSchedule);
+  ZELO_SCHED_TASK **end = tasks->handle();
   int count = 0;
   TaskGuard task;
   while (walk.next()) {
@@ -767,8 +751,10 @@ int listSchedules(TaskChain *tasks) {
     if (kept == nullptr) {
       return -1;
     }
-    copySchedule(kept.get(), *task);
-    tasks->pushFront(std::move(kept));
+    schedRecordCopySchedule(kept.get(), *task);
+    kept->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
+    *end = kept.release();
+    end = &(*end)->next;
     ++count;
   }
   return count;
@@ -803,8 +789,7 @@ int syncAfterChange() {
   return 0;
 }
 
-// ---- the operations of the backend
-// --------------------------------------------------------------------
+// ---- the operations of the backend --------------------------------------------------------------
 
 int sync() {
   const StoreLock lock;

@@ -25,7 +25,7 @@
  *  5. Null. A pointer that must be given is tested; a null one is a failure
  *     with 0x0D00. Where null is allowed, the function says so.
  *  6. Outputs are untouched when a call fails, but for the record that a read
- *     was filling: discard it.
+ *     was filling: discard it. ZELOSchedTaskCreate says what it may leave.
  *  7. Threads. One thread of a process at a time. Processes may use the
  *     library side by side.
  *  8. Clock. All times are local time; the resolution is the minute.
@@ -142,7 +142,9 @@ ZELO_SCHED_API int ZELOSchedTaskLoad(long id, ZELO_SCHED_TASK *pTask);
 /* Stores a new task with the backend that pTask->Backend names, which writes
  * the id it gave into the record (and a name, when that was empty). The
  * backend's result (0 or more), or -1: 0x0D00, 0x2000 when no backend has that
- * id, or what the backend left. */
+ * id, or what the backend left. After a failure the record has its new id when
+ * the task was stored and what follows from it was not done; that of a power time
+ * has it, and its new name, after any failure. */
 ZELO_SCHED_API int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask);
 
 /* Overwrites the stored task of the record's id; plugins hear of it before and
@@ -161,8 +163,9 @@ ZELO_SCHED_API int ZELOSchedTaskRemove(long id);
 /* Lists the tasks of every backend, each with its next trigger time; `filter`
  * may be null (all). When there are any, *pTaskList becomes the list, which
  * the caller frees with ZELOSchedTaskListFree; else it is left alone. A
- * backend that fails is logged and adds nothing. Their number (0 = none), or
- * -1: 0x0D00, or what the registration of the backends left. */
+ * backend that fails is logged and adds nothing. A record that is kept while
+ * the others are freed may keep their memory, of up to 240 records. Their number
+ * (0 = none), or -1: 0x0D00, or what the registration of the backends left. */
 ZELO_SCHED_API int ZELOSchedTaskListGet(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter);
 
 /* The record after pTask, or null after the last one and for null. */

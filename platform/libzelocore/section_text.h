@@ -43,7 +43,7 @@ class ChangedText {
  public:
   void Keep(std::string_view text);
   void Add(std::string text);
-  /* A line feed, unless the last line has its own. */
+  /* A line feed, unless the last line has its own. There must be one. */
   void EndLine();
   std::vector<std::string_view> Views() const;
 

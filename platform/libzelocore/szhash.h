@@ -7,6 +7,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cassert>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
@@ -59,6 +60,7 @@ struct QLIBC_SZHASH {
   }
   /* Set, of the `size` bytes at `at` of the text. The byte behind them is lost. */
   void SetTaken(std::string_view key, size_t at, size_t size) {
+    assert(taken_ + at + size < arena_used_);
     if (IsRemembered(key)) {
       Lay(entries_[count_], taken_ + at, size);
       ++count_;

@@ -137,9 +137,9 @@ void QLIBCFileHoldEnd(void);
  * other sections keep every byte, and so do comments and blank lines right before
  * the next one. 1 when replaced, 0 when there is no such section (nothing is
  * written), -1 on failure (0x0D00, 0x0900, 0x0B00, 0x2800, 0x0200; the file is
- * as it was). The flags are 0 or QLIBC_FILE_SYNC, `reserved` must be 0. A key must not be empty,
- * begin with `[`, `#` or `;`, begin or end with a blank, or hold `=` or a
- * control byte (0x0D00). */
+ * as it was). The flags are 0 or QLIBC_FILE_SYNC, `reserved` must be 0. A key
+ * must not be empty, begin with `[`, `#` or `;`, begin or end with a blank, or
+ * hold `=` or a control byte (0x0D00). */
 int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PSZHASH pHash,
                         int reserved);
 /* Appends a new section, to a new file when there is none. 1, or -1 as above
