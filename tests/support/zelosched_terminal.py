@@ -7,13 +7,16 @@ import fcntl
 import os
 import pty
 import re
+import signal
 import struct
 import subprocess
 import sys
 import termios
+import time
 
 PROGRAM = os.path.join(os.environ["BUILD_DIR"], "bin", "zelosched")
 ESCAPE = "\x1b"
+GO = "/tmp/zelosched_terminal.go"
 failed = False
 
 
@@ -32,8 +35,9 @@ def plain(*arguments):
                           stdin=subprocess.DEVNULL).stdout
 
 
-def on_terminal(arguments, columns=80, answer="", **variables):
-    """What the program shows on a terminal, and its exit status."""
+def on_terminal(arguments, columns=80, answer="", interrupted_at=None, **variables):
+    """What the program shows on a terminal, and its exit status. As by a key of the terminal, it and
+    what it has started are interrupted when there is more to read and that file is there."""
     environment = {"PATH": os.environ["PATH"], "TERM": "xterm", "LC_ALL": "C.UTF-8", **variables}
     master, slave = pty.openpty()
     fcntl.ioctl(slave, termios.TIOCSWINSZ, struct.pack("HHHH", 24, columns, 0, 0))
@@ -50,9 +54,21 @@ def on_terminal(arguments, columns=80, answer="", **variables):
             if not part:
                 break
             shown += part
+            if interrupted_at and os.path.exists(interrupted_at):
+                interrupted_at = None
+                os.killpg(process.pid, signal.SIGINT)
         status = process.wait()
     os.close(master)
     return shown.decode("utf-8", "backslashreplace").replace("\r\n", "\n"), status
+
+
+def appears(path):
+    """Whether it is there within a minute."""
+    for _ in range(600):
+        if os.path.exists(path):
+            return True
+        time.sleep(0.1)
+    return False
 
 
 def without_escapes(text):
@@ -141,5 +157,14 @@ check("the progress fits a narrow terminal",
       all(len(line) < 20 for line in lines if line.startswith("task 2")), text)
 seen = subprocess.run([PROGRAM, "run", "--wait", "2"], capture_output=True, text=True, check=False)
 check("without a terminal there is no progress", seen.stdout == "", seen.stdout)
+
+plain("edit", "2", "--", f"echo >{GO}.begun; read go <{GO}; echo >{GO}.done")
+os.mkfifo(GO)
+text, status = on_terminal(["run", "--wait", "2"], interrupted_at=GO + ".begun")
+check("an interrupt clears the line", text.endswith("\r" + ESCAPE + "[K"), text)
+check("the interrupt ends the program", status == -signal.SIGINT, status)
+with open(GO, "w", encoding="ascii") as go:
+    go.write("\n")
+check("the run that had begun goes on", appears(GO + ".done"))
 
 sys.exit(1 if failed else 0)

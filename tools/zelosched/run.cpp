@@ -1,5 +1,6 @@
 // zelosched run
 #include <dirent.h>
+#include <signal.h>
 #include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -86,6 +87,23 @@ pid_t newChild(const std::map<pid_t, ProcessStat> &before) {
 
 // ---- waiting --------------------------------------------------------------------------------
 
+// Whoever has waited long enough shall not find the shell's prompt behind a line of ours.
+void clearLineAndEnd(int signal) {
+  static_cast<void>(write(STDOUT_FILENO, kClearLine, sizeof(kClearLine) - 1) < 0);
+  raise(signal);  // which ends the process by now
+}
+
+void catchInterrupts() {
+  struct sigaction action = {};
+  action.sa_handler = clearLineAndEnd;
+  action.sa_flags = static_cast<int>(SA_RESETHAND);
+  for (const int signal : {SIGINT, SIGTERM}) {
+    struct sigaction former = {};
+    sigaction(signal, nullptr, &former);
+    if (former.sa_handler != SIG_IGN) sigaction(signal, &action, nullptr);
+  }
+}
+
 // One line that is written over, on a terminal only, and not where the command itself writes.
 class Progress {
  public:
@@ -99,6 +117,7 @@ class Progress {
     const auto seconds =
         std::chrono::duration_cast<std::chrono::seconds>(Clock::now() - start_).count();
     if (!columns || seconds == shown_) return;
+    if (shown_ < 0) catchInterrupts();
     shown_ = seconds;
     const std::string line = title_ + " " + what + ", " + std::to_string(seconds) + " s";
     std::printf("%s%s", kClearLine, fitted(line, *columns - 1).c_str());
@@ -186,7 +205,8 @@ const Command kRunCommand = {
     "waits for others that must not overlap with it, as always.\n"
     "\n"
     "Without --wait the run goes on by itself, and 'zelosched history' tells how it\n"
-    "ended. With --wait several tasks run one after the other.\n"
+    "ended. With --wait several tasks run one after the other; an interrupt ends the\n"
+    "waiting and leaves out the tasks behind, and a run that has begun goes on.\n"
     "\n"
     "  -w, --wait                     wait for the end and tell the result; the exit status\n"
     "                                 is 0 only when the command exited with 0\n"
