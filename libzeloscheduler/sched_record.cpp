@@ -10,8 +10,12 @@
 
 #include "sched_parm_table.h"
 
-#ifndef __has_feature
-#define __has_feature(name) 0
+#if defined(__SANITIZE_ADDRESS__)
+#define IS_ADDRESS_SANITIZED true
+#elif defined(__has_feature)
+#define IS_ADDRESS_SANITIZED __has_feature(address_sanitizer)
+#else
+#define IS_ADDRESS_SANITIZED false
 #endif
 
 namespace {
@@ -20,11 +24,7 @@ constexpr size_t kHugePage = size_t{2} << 20;
 // Also the most that one record which is kept can keep of a list.
 constexpr size_t kLargestMapping = 4 * kHugePage;
 
-#if defined(__SANITIZE_ADDRESS__) || __has_feature(address_sanitizer)
-constexpr bool kSlabsAllowed = false;  // each record is watched by itself then
-#else
-constexpr bool kSlabsAllowed = true;
-#endif
+constexpr bool kSlabsAllowed = !IS_ADDRESS_SANITIZED;  // which watches each record by itself
 
 // How far the records of a slab are apart, and where the last byte of one ends.
 struct Layout {
@@ -34,8 +34,9 @@ struct Layout {
 
 constexpr Layout kWholeLayout = {sizeof(ZELO_SCHED_TASK), sizeof(ZELO_SCHED_TASK)};
 
-// A schedule is the fields before the name and those behind the next trigger time. The two texts
-// are not used, so that other records' fields may lie there, if only no two records share a byte.
+// A schedule is some of the fields before the name, and those behind the next trigger time. The two
+// texts are not used, so that other records' fields may lie there, if only no two records share a
+// byte.
 constexpr size_t kHeadEnd = offsetof(ZELO_SCHED_TASK, Name);
 constexpr size_t kTailBegin = offsetof(ZELO_SCHED_TASK, State);
 constexpr size_t kTailEnd = offsetof(ZELO_SCHED_TASK, LastWorkHour) + sizeof(uint32_t);
@@ -44,10 +45,6 @@ static_assert(kTailBegin % kScheduleLayout.stride >= kHeadEnd);
 static_assert(kTailBegin % kScheduleLayout.stride + (kTailEnd - kTailBegin) <=
               kScheduleLayout.stride);
 static_assert(kScheduleLayout.stride % alignof(ZELO_SCHED_TASK) == 0);
-
-constexpr Layout layoutOf(SchedRecordExtent extent) {
-  return extent == SchedRecordExtent::kWhole ? kWholeLayout : kScheduleLayout;
-}
 
 }  // namespace
 
@@ -74,10 +71,11 @@ static_assert(sizeof(SchedSlab) % alignof(ZELO_SCHED_TASK) == 0);
 
 namespace {
 
-// Every slab, the one asked for last in front: lists are mostly freed in order.
+// Every slab, the one made or asked for last in front: lists are mostly freed in order. Nobody
+// holds so many lists that going through them would be long.
 SchedSlab *slabs = nullptr;
 
-size_t recordsIn(size_t slabSize, const Layout &layout) {
+constexpr size_t recordsIn(size_t slabSize, const Layout &layout) {
   const size_t least = sizeof(SchedSlab) + layout.end;
   return slabSize < least ? 0 : (slabSize - least) / layout.stride + 1;
 }
@@ -88,9 +86,9 @@ size_t sizeOf(size_t records, const Layout &layout) {
 
 // Whole huge pages, and no more of them than the records fill: memory that nobody asked for would
 // be taken otherwise. 0 when there are too few records for one.
-size_t mappedSizeFor(size_t records, const Layout &layout) {
+size_t mappedSizeFor(size_t records) {
   size_t size = kLargestMapping;
-  while (size > 0 && recordsIn(size, layout) > records) {
+  while (size > 0 && recordsIn(size, kWholeLayout) > records) {
     size -= kHugePage;
   }
   return size;
@@ -128,12 +126,12 @@ void *mapHugePages(size_t size) {
   return pages;
 }
 
-// What is too small for huge pages comes from the allocator: it keeps a block that is freed at hand
-// for the next list, but gives the pages of as many single records back to the kernel.
-//
-// Null when memory is short.
-SchedSlab *newSlab(size_t records, const Layout &layout) {
-  const size_t mapped = mappedSizeFor(records, layout);
+// Null when memory is short. What is too small for huge pages comes from the allocator: it keeps a
+// block that is freed at hand for the next list, but gives the pages of as many single records back
+// to the kernel. Schedules come from there in any case, and so lie in one piece.
+SchedSlab *newSlab(size_t records, SchedRecordExtent extent) {
+  const Layout &layout = extent == SchedRecordExtent::kWhole ? kWholeLayout : kScheduleLayout;
+  const size_t mapped = extent == SchedRecordExtent::kWhole ? mappedSizeFor(records) : 0;
   const size_t size = mapped > 0 ? mapped : sizeOf(records, layout);
   auto *slab = static_cast<SchedSlab *>(mapped > 0 ? mapHugePages(size) : calloc(1, size));
   if (slab == nullptr) {
@@ -211,8 +209,9 @@ void schedRecordEmpty(ZELO_SCHED_TASK *pTask) {
 }
 
 void schedRecordCopySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from) {
-  memcpy(static_cast<void *>(pTo), &from, kHeadEnd);
-  memcpy(&pTo->State, &from.State, kTailEnd - kTailBegin);
+  pTo->ID = from.ID;
+  memcpy(reinterpret_cast<char *>(pTo) + kTailBegin,
+         reinterpret_cast<const char *>(&from) + kTailBegin, kTailEnd - kTailBegin);
 }
 
 SchedRecordSource::SchedRecordSource(SchedRecordCount count, int records, SchedRecordExtent extent)
@@ -224,8 +223,11 @@ SchedRecordSource::~SchedRecordSource() {
   }
 }
 
-size_t SchedRecordSource::nextSlab() const {
-  return count_ == SchedRecordCount::kExact ? left_ : std::min(left_, taken_);
+size_t SchedRecordSource::roomOfNextSlab() const {
+  constexpr size_t kBelowHugePage = recordsIn(kHugePage, kWholeLayout) - 1;
+  return count_ == SchedRecordCount::kExpected
+             ? left_
+             : std::min(left_, std::max(kBelowHugePage, 2 * taken_));
 }
 
 TaskGuard SchedRecordSource::take() {
@@ -233,8 +235,8 @@ TaskGuard SchedRecordSource::take() {
     unhold(slab_);
     slab_ = nullptr;
   }
-  if (slab_ == nullptr && kSlabsAllowed && nextSlab() > 1) {
-    slab_ = newSlab(nextSlab(), layoutOf(extent_));
+  if (slab_ == nullptr && kSlabsAllowed && roomOfNextSlab() > 1) {
+    slab_ = newSlab(roomOfNextSlab(), extent_);
   }
   left_ -= std::min<size_t>(left_, 1);
   ++taken_;

@@ -21,23 +21,24 @@ TaskGuard schedRecordAlloc();
 // record that is filled over and over most of its bytes; none that a caller gets is made this way.
 void schedRecordEmpty(ZELO_SCHED_TASK *pTask);
 
-// Copies what says who is started when, the link to the next record included.
+// Copies the id, the state and what says when the task runs.
 void schedRecordCopySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from);
 
 // How much of a record there is: all of it, or what schedRecordCopySchedule copies. The rest, its
 // largest part, must then not be touched: the next records lie in it.
 enum class SchedRecordExtent { kWhole, kSchedule };
 
-// What is known beforehand of the number of a list's records.
-enum class SchedRecordCount { kExact, kAtMost };
+// What is known beforehand of the number of a list's records: that there will hardly be fewer, or
+// only that there will not be more.
+enum class SchedRecordCount { kExpected, kAtMost };
 
 struct SchedSlab;
 
 // The records of one list. A record is large and mostly empty, and of many records taken one by one
 // it is the page faults that a list costs most. They are therefore taken from slabs, those of long
 // lists of huge pages; a slab is freed with the last of its records, in whatever order they are
-// freed. Within a slab they lie in the order in which they were taken. Where it is not known how
-// many there will be, a slab has no more room than was taken before it.
+// freed. Within a slab they lie in the order in which they were taken, schedules in one slab. Where
+// it is not known how many there will be, slabs begin small and grow with what is taken.
 class SchedRecordSource {
  public:
   SchedRecordSource(SchedRecordCount count, int records, SchedRecordExtent extent);
@@ -49,7 +50,7 @@ class SchedRecordSource {
   TaskGuard take();
 
  private:
-  size_t nextSlab() const;  // in records
+  size_t roomOfNextSlab() const;  // in records
 
   SchedRecordCount count_;
   SchedRecordExtent extent_;

@@ -854,26 +854,59 @@ TEST_F(StoreTest, ASyncThatCannotListFailsTheChangeThoughItIsStored) {
 }
 
 TEST_F(StoreTest, AScratchCopyThatComesOutEmptyIsMadeAgain) {
-  create("task");
-  writeFile(kStore, "");
-  const Task task = makeTask("task", "true");
-  resetFailingCalls();
-  EXPECT_EQ(backend_.edit(task.get()), -1);
-  constexpr size_t kTries = 20;
-  constexpr long kPause = 5000;
-  EXPECT_EQ(recordedExecs(), Lines(kTries, copyCommand(kStore, scratchPath())));
-  EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>(kTries, kPause));
-}
-
-TEST_F(StoreTest, AStoreWithoutBytesThatHasNoOtherCopyIsCopiedOnce) {
   writeFile(kStore, "");
   const Task task = makeTask("task", "true");
   resetFailingCalls();
   EXPECT_EQ(backend_.edit(task.get()), 0);
-  EXPECT_EQ(recordedExecs(),
-            (Lines{copyCommand(kStore, scratchPath()), copyCommand(scratchPath(), kPersistentStore),
-                   copyCommand(scratchPath(), kStore)}));
-  EXPECT_EQ(recordedSleeps(), std::vector<long>{});
+  constexpr size_t kTries = 20;
+  constexpr long kPause = 5000;
+  Lines wanted(kTries, copyCommand(kStore, scratchPath()));
+  wanted.push_back(copyCommand(scratchPath(), kPersistentStore));
+  wanted.push_back(copyCommand(scratchPath(), kStore));
+  EXPECT_EQ(recordedExecs(), wanted);
+  EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>(kTries, kPause));
+}
+
+TEST_F(StoreTest, AScratchCopyOfAnotherSizeIsMadeAgain) {
+  create("task");
+  const std::string whole = readFile(kStore);
+  for (const std::string &copied : {whole.substr(0, whole.size() / 2), whole + whole}) {
+    const Task task = makeTask("edited", "true");
+    task->ID = 1;
+    resetFailingCalls();
+    failCallFor("QLIBCExec", scratchPath(), {.result = 0});
+    support::onExec([copied, isFirst = true](const std::string &) mutable {
+      if (isFirst) writeFile(scratchPath(), copied);
+      isFirst = false;
+    });
+    EXPECT_EQ(backend_.edit(task.get()), 0);
+    support::onExec(nullptr);
+    EXPECT_EQ(
+        recordedExecs(),
+        (Lines{copyCommand(kStore, scratchPath()), copyCommand(kStore, scratchPath()),
+               copyCommand(scratchPath(), kPersistentStore), copyCommand(scratchPath(), kStore)}));
+    EXPECT_EQ(listedIds(), Ids{1});
+  }
+}
+
+// Not even where no other copy could tell that it is not: somebody else may be filling it.
+TEST_F(StoreTest, AnOnlyCopyThatIsFilledMeanwhileIsNotTakenForEmpty) {
+  create("task");
+  const std::string whole = readFile(kStore);
+  for (const bool isEmpty : {false, true}) {
+    if (isEmpty) {
+      writeFile(kPersistentStore, "");
+    } else {
+      std::filesystem::remove(kPersistentStore);
+    }
+    writeFile(kStore, "");
+    resetFailingCalls();
+    onSleep([&](size_t) { writeFile(kStore, whole); });
+    const Task other = makeTask("other", "true");
+    other->ID = 2;
+    EXPECT_EQ(backend_.edit(other.get()), 0);
+    EXPECT_EQ(listedIds(), (Ids{2, 1}));
+  }
 }
 
 TEST_F(StoreTest, AStoreThatIsFilledMeanwhileIsNotTakenForEmpty) {

@@ -218,7 +218,7 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
   if (sections < 0) {
     return -1;
   }
-  const auto known = filter == nullptr ? SchedRecordCount::kExact : SchedRecordCount::kAtMost;
+  const auto known = filter == nullptr ? SchedRecordCount::kExpected : SchedRecordCount::kAtMost;
   SchedRecordSource records(known, sections, SchedRecordExtent::kWhole);
   TaskChain tasks;
   int count = 0;
@@ -412,9 +412,9 @@ int copyFile(const char *szSource, const char *szTarget) {
   return result == 0 ? 0 : reportCopy(szSource, szTarget);
 }
 
-// A forced copy empties its target before it fills it. A scratch file that is empty though the
-// persistent copy is not, or shorter or longer than the working copy, has therefore most likely
-// been taken from under another process's copy: to build on it would lose other tasks.
+// A forced copy empties its target before it fills it. A scratch file that is empty, or shorter or
+// longer than the working copy, has therefore most likely been taken from under another process's
+// copy: to build on it would lose other tasks.
 int copyWorkingCopy(const ScratchFile &scratch) {
   constexpr int kTries = 20;
   constexpr useconds_t kPause = 5000;
@@ -422,7 +422,8 @@ int copyWorkingCopy(const ScratchFile &scratch) {
     if (copyFile(kWorkingCopy, scratch.path()) < 0) {
       return -1;
     }
-    if (sizeOf(scratch.path()) == sizeOf(kWorkingCopy) && !isCutToNothing(scratch.path())) {
+    const off_t size = sizeOf(scratch.path());
+    if (size > 0 && size == sizeOf(kWorkingCopy)) {
       return 0;
     }
     usleep(kPause);
@@ -733,7 +734,7 @@ int listSchedules(TaskChain *tasks) {
   if (sections < 0) {
     return -1;
   }
-  SchedRecordSource records(SchedRecordCount::kExact, sections, SchedRecordExtent::kSchedule);
+  SchedRecordSource records(SchedRecordCount::kExpected, sections, SchedRecordExtent::kSchedule);
   ZELO_SCHED_TASK **end = tasks->handle();
   int count = 0;
   TaskGuard task;
@@ -752,7 +753,6 @@ int listSchedules(TaskChain *tasks) {
       return -1;
     }
     schedRecordCopySchedule(kept.get(), *task);
-    kept->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
     *end = kept.release();
     end = &(*end)->next;
     ++count;

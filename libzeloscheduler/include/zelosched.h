@@ -163,9 +163,9 @@ ZELO_SCHED_API int ZELOSchedTaskRemove(long id);
 /* Lists the tasks of every backend, each with its next trigger time; `filter`
  * may be null (all). When there are any, *pTaskList becomes the list, which
  * the caller frees with ZELOSchedTaskListFree; else it is left alone. A
- * backend that fails is logged and adds nothing. A record that is kept while
- * the others are freed may keep their memory, of up to 240 records. Their number
- * (0 = none), or -1: 0x0D00, or what the registration of the backends left. */
+ * backend that fails is logged and adds nothing. A record that is kept may
+ * keep the memory of up to 240 with it. Their number (0 = none), or -1: 0x0D00,
+ * or what the registration of the backends left. */
 ZELO_SCHED_API int ZELOSchedTaskListGet(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter);
 
 /* The record after pTask, or null after the last one and for null. */
