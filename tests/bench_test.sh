@@ -36,13 +36,13 @@ lists_benchmarks() {
 
 refuses_half_a_row() {
   run_bench list '--benchmark_filter=GKeyFile.* 10 tasks'
-  same "$status $err" "1 no row has both its sides in the filter"
+  same "$status" 1 && [[ $err == *"no row has both its sides in the filter" ]]
 }
 
 refuses_to_run_outside_the_sandbox() {
   local complaint
   ! complaint=$(env -u ZELO_SANDBOX "$BUILD_DIR/bench/json_bench" 2>&1) &&
-    same "$complaint" "being in the sandbox (scripts/sandbox) failed"
+    [[ $complaint == *"being in the sandbox (scripts/sandbox) failed" ]]
 }
 
 explains_itself() {

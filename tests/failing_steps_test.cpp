@@ -25,6 +25,7 @@
 #include "power.h"
 #include "power_calls.h"
 #include "sandbox_fixture.h"
+#include "soak.h"
 #include "status_db.h"
 #include "tasks.h"
 #include "zelocore.h"
@@ -33,6 +34,7 @@
 namespace {
 
 using support::FailingStep;
+using support::isShortRun;
 using support::makeTask;
 using support::OwnWork;
 using support::setText;
@@ -503,14 +505,9 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
   std::set<int> descriptors_;
 };
 
-bool isShortRun() {
-  const char *factor = getenv("ZELO_SOAK_FACTOR");
-  return factor != nullptr && std::atof(factor) < 1;
-}
-
-// Under a sanitizer each step takes five times as long, and every fifth is made in a short run.
 unsigned stride() {
-  return isShortRun() && !support::kAllocationsCanFail ? 5 : 1;
+  constexpr unsigned kInShortRun = 5;
+  return isShortRun() ? kInShortRun : 1;
 }
 
 TEST_P(FailingStepsTest, WhicheverCallFails) {

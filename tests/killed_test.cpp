@@ -34,6 +34,7 @@
 #include "power.h"
 #include "sandbox_fixture.h"
 #include "shared_memory.h"
+#include "soak.h"
 #include "status_db.h"
 #include "tasks.h"
 #include "zelocore.h"
@@ -46,11 +47,6 @@ constexpr unsigned kSeed = 20261121;
 constexpr int kMostTasks = 12;
 constexpr size_t kLongestLifeMicroseconds = 14000;  // at first
 constexpr char kChangeLock[] = "/run/zeloscheduler.lock";
-
-double soakFactor() {
-  const char *factor = getenv("ZELO_SOAK_FACTOR");
-  return factor != nullptr ? std::atof(factor) : 1;
-}
 
 // ---- the tasks, as acknowledged
 
@@ -398,7 +394,7 @@ class Worker {
 TEST_F(KilledTest, AtAnyMomentNothingAcknowledgedIsLost) {
   RandomChanges random(kSeed);
   build(kMostTasks / 2);
-  const int kills = static_cast<int>(kRandomKills * soakFactor());
+  const int kills = timesSoaked(kRandomKills);
   int acknowledged = 0;
   int underWay = 0;
   size_t longestLife = kLongestLifeMicroseconds;
@@ -627,7 +623,7 @@ class KilledPowerTest : public KilledTest {
   }
 
   void killAtEachCallOf(const char *name, const std::function<bool()> &act) {
-    const unsigned stride = soakFactor() < 1 ? 9 : 1;  // a short run takes some of them
+    const unsigned stride = isShortRun() ? 9 : 1;  // a short run takes some of them
     SCOPED_TRACE(name);
     const Files before;
     ASSERT_TRUE(act());

@@ -26,6 +26,7 @@
 #include "captured_log.h"
 #include "failing_calls.h"
 #include "sandbox_fixture.h"
+#include "soak.h"
 #include "status_db.h"
 #include "tasks.h"
 #include "text_hash.h"
@@ -44,17 +45,6 @@ constexpr char kGoFifo[] = "/tmp/load_test.go";
 constexpr char kOrder[] = "/tmp/load_test.order";
 constexpr mode_t kOwnersOnly = 0600;
 constexpr mode_t kLockDirectoryMode = 0755;
-
-// Below 1, where every step takes long as it is.
-bool isShortRun() {
-  const char *factor = getenv("ZELO_SOAK_FACTOR");
-  return factor != nullptr && std::atof(factor) < 1;
-}
-
-int soakFactor() {
-  const char *factor = getenv("ZELO_SOAK_FACTOR");
-  return factor != nullptr ? std::max(1, std::atoi(factor)) : 1;
-}
 
 class Stopwatch {
  public:
@@ -241,7 +231,7 @@ class RunsTest : public SandboxTest {
 // ---- runs that may overlap
 
 TEST_F(RunsTest, DistinctTasksAllRunAtOnceAndEachTellsHowItEnded) {
-  for (int round = 0; round < soakFactor() && !HasFailure(); ++round) {
+  for (int round = 0; round < timesSoaked(1) && !HasFailure(); ++round) {
     newRound();
     makeLockDirectory();
     constexpr int kCodes = 3;
@@ -277,7 +267,7 @@ TEST_F(RunsTest, DistinctTasksAllRunAtOnceAndEachTellsHowItEnded) {
 }
 
 TEST_F(RunsTest, ATaskThatMayOverlapItselfRunsAsOftenAsItIsStarted) {
-  for (int round = 0; round < soakFactor() && !HasFailure(); ++round) {
+  for (int round = 0; round < timesSoaked(1) && !HasFailure(); ++round) {
     newRound();
     std::vector<Task> tasks;
     tasks.push_back(makeRunTask(1, "app", kWaitToBeLetGo + "exit 0", {1, 1}));
@@ -335,7 +325,7 @@ std::string withoutWait(const std::string &line) {
 }
 
 TEST_P(ConflictingRunsTest, WhileOneGoesOnAllOthersGiveUpAfterTwentyRetriesWithoutARow) {
-  for (int round = 0; round < soakFactor() && !HasFailure(); ++round) {
+  for (int round = 0; round < timesSoaked(1) && !HasFailure(); ++round) {
     newRound();
     makeLockDirectory();
     realSleep(false);  // none of them meets a lock on the database
@@ -379,7 +369,7 @@ TEST_P(ConflictingRunsTest, WhileOneGoesOnAllOthersGiveUpAfterTwentyRetriesWitho
 }
 
 TEST_P(ConflictingRunsTest, TheyRunOneAfterTheOtherAndNoneIsLostButThoseThatGiveUp) {
-  for (int round = 0; round < soakFactor() && !HasFailure(); ++round) {
+  for (int round = 0; round < timesSoaked(1) && !HasFailure(); ++round) {
     newRound();
     storeThem(std::string("echo begin >> ") + kOrder + "; echo end >> " + kOrder);
     const Stopwatch watch;
@@ -461,7 +451,7 @@ pid_t startWriter(int writer) {
 }
 
 TEST_F(RunsTest, NoRowOfSeveralProcessesIsLostOrMixedUp) {
-  for (int round = 0; round < soakFactor() && !HasFailure(); ++round) {
+  for (int round = 0; round < timesSoaked(1) && !HasFailure(); ++round) {
     newRound();
     const Stopwatch watch;
     std::vector<pid_t> writers;
@@ -515,7 +505,7 @@ TEST_F(RunsTest, ListingOverAndOverTakesNoMoreMemory) {
   const size_t allocated = mallinfo2().uordblks;
   const long resident = residentKilobytes();
   const Stopwatch watch;
-  list(kLists * soakFactor());
+  list(timesSoaked(kLists));
   const double seconds = watch.seconds();
   const long residentAfter = residentKilobytes();
   EXPECT_EQ(mallinfo2().uordblks, allocated);
@@ -523,7 +513,7 @@ TEST_F(RunsTest, ListingOverAndOverTakesNoMoreMemory) {
   printf(
       "%zu tasks listed %d times in %.2f s: VmRSS %ld kB before, %ld kB after; %zu and %zu bytes "
       "allocated\n",
-      kTasks, kLists * soakFactor(), seconds, resident, residentAfter, allocated,
+      kTasks, timesSoaked(kLists), seconds, resident, residentAfter, allocated,
       mallinfo2().uordblks);
 }
 

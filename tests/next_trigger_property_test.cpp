@@ -20,6 +20,7 @@
 #include "captured_log.h"
 #include "fake_clock.h"
 #include "sandbox_fixture.h"
+#include "soak.h"
 #include "tasks.h"
 
 namespace support {
@@ -33,8 +34,8 @@ using std::chrono::year;
 using std::chrono::year_month;
 using std::chrono::year_month_day;
 
-constexpr int kCasesPerZone = 10000;
-constexpr int kLeastOfEachKind = 50;
+const int kCasesPerZone = timesSoaked(10000);
+const int kLeastOfEachKind = kCasesPerZone / 200;
 constexpr int kSeed = 20130507;
 constexpr int kMinutesPerHour = 60;
 constexpr int kMinutesPerDay = 24 * kMinutesPerHour;
