@@ -34,9 +34,9 @@ struct Layout {
 
 constexpr Layout kWholeLayout = {sizeof(ZELO_SCHED_TASK), sizeof(ZELO_SCHED_TASK)};
 
-// A schedule is some of the fields before the name, and those behind the next trigger time. The two
-// texts are not used, so that other records' fields may lie there, if only no two records share a
-// byte.
+// A schedule is the link and the id, before the name, and the fields behind the next trigger time.
+// The two texts are not used, so that other records' fields may lie there, if only no two records
+// share a byte.
 constexpr size_t kHeadEnd = offsetof(ZELO_SCHED_TASK, Name);
 constexpr size_t kTailBegin = offsetof(ZELO_SCHED_TASK, State);
 constexpr size_t kTailEnd = offsetof(ZELO_SCHED_TASK, LastWorkHour) + sizeof(uint32_t);

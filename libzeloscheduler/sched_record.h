@@ -38,7 +38,8 @@ struct SchedSlab;
 // it is the page faults that a list costs most. They are therefore taken from slabs, those of long
 // lists of huge pages; a slab is freed with the last of its records, in whatever order they are
 // freed. Within a slab they lie in the order in which they were taken, schedules in one slab. Where
-// it is not known how many there will be, slabs begin small and grow with what is taken.
+// it is not known how many there will be, slabs begin below a huge page and grow with what is
+// taken.
 class SchedRecordSource {
  public:
   SchedRecordSource(SchedRecordCount count, int records, SchedRecordExtent extent);
