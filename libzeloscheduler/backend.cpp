@@ -3,6 +3,7 @@
 
 #include "sched_backend.h"
 #include "sched_report.h"
+#include "sched_shared_names.h"
 
 ZELO_SCHED_BACKEND SchedBackends[16];
 uint32_t cBackend;
@@ -69,5 +70,6 @@ int ZELOSchedBackendInit(void) {
     }
   }
   initialised = true;
+  schedTakeNames();
   return 0;
 }

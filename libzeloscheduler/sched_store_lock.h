@@ -2,36 +2,30 @@
 #ifndef SCHED_STORE_LOCK_H
 #define SCHED_STORE_LOCK_H
 
-#include <fcntl.h>
-#include <sys/file.h>
-#include <unistd.h>
+#include <sys/types.h>
 
 // Keeps two processes from changing these files at once: each would write what it read over the
-// other's change. It is held on a file that nobody else can open: a lock that anyone could take
-// would keep everyone waiting. Whoever cannot get it in time goes on without: a change may then be
-// lost, but none is refused. It is not taken twice: an operation that holds it calls what needs it
-// and does not take it.
+// other's change. The lock is on a file that nobody else can open: one that anyone could take would
+// keep everyone waiting. It is not taken twice: an operation that holds it calls what needs it and
+// does not take it.
+//
+// Whoever has not had his turn after 30 seconds, or cannot open or lock the file, must change
+// nothing: isHeld() is false, the code is 0x0400, and one log line says why, with the process that
+// holds it.
 class StoreLock {
  public:
-  StoreLock() : file_(open(kFile, O_RDWR | O_CREAT | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, kMode)) {
-    for (int i = 0; file_ >= 0 && flock(file_, LOCK_EX | LOCK_NB) != 0 && i < kTries; ++i) {
-      usleep(kPause);
-    }
-  }
-  ~StoreLock() {
-    if (file_ >= 0) {
-      close(file_);
-    }
-  }
+  StoreLock();
+  ~StoreLock();
   StoreLock(const StoreLock &) = delete;
   StoreLock &operator=(const StoreLock &) = delete;
 
+  bool isHeld() const { return file_ >= 0; }
+
  private:
-  static constexpr char kFile[] = "/run/zeloscheduler.lock";
-  static constexpr mode_t kMode = 0600;
-  static constexpr int kTries = 1000;  // five seconds in all
-  static constexpr useconds_t kPause = 5000;
   int file_;
 };
+
+// The process that holds it, 0 when that is not known or there is none. It waits for nothing.
+pid_t schedStoreLockHolder();
 
 #endif

@@ -14,6 +14,7 @@
 #include "sched_db_guard.h"
 #include "sched_report.h"
 #include "sched_run_hours.h"
+#include "sched_shared_names.h"
 #include "sched_surroundings.h"
 #include "sched_user.h"
 
@@ -75,24 +76,11 @@ int ZELOSchedCheckRunTime(const ZELO_SCHED_TASK &task, bool *pIsDue) {
 
 // ---- the run lock -----------------------------------------------------------------------------
 
-// Anyone may have put something under a name below "/tmp". Whoever owns the lock file, or can write
-// to it, could hold its lock for ever.
-bool isOurs(const struct stat &info) {
-  return info.st_uid == 0 || info.st_uid == geteuid();
-}
-
-bool isOurLockFile(const struct stat &info) {
-  return isOurs(info) && S_ISREG(info.st_mode) && info.st_nlink == 1 &&
-         (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
-}
-
+// Whoever owns the lock file, or can write to it or to its directory, could hold its lock for ever.
 bool makeLockDirectory() {
-  struct stat info = {};
-  if (lstat(kLockDirectory, &info) == 0 && !isOurs(info)) {
-    return false;
-  }
-  if (stat(kLockDirectory, &info) == 0 && S_ISDIR(info.st_mode)) {
-    return true;
+  const SchedNameState state = schedLookAt(kSchedLockDirectory, nullptr);
+  if (state != SchedNameState::kFree) {
+    return state == SchedNameState::kOurs || schedTakeName(kSchedLockDirectory);
   }
   return mkdir(kLockDirectory, kLockDirectoryMade) == 0 &&
          chmod(kLockDirectory, kLockDirectoryMode) == 0;
@@ -106,7 +94,8 @@ FILE *openLockFile(int flags, const char *szMode) {
     return nullptr;
   }
   struct stat info = {};
-  const bool isUsable = fstat(descriptor, &info) == 0 && isOurLockFile(info);
+  const bool isUsable =
+      fstat(descriptor, &info) == 0 && schedWhyForeign(kSchedLockFile, info) == nullptr;
   if (isUsable && (info.st_mode & ~static_cast<mode_t>(S_IFMT)) != kLockFileMode) {
     fchmod(descriptor, kLockFileMode);  // who can read it can hold its lock
   }
@@ -118,9 +107,9 @@ FILE *openLockFile(int flags, const char *szMode) {
 }
 
 bool makeLockFile() {
-  struct stat info = {};
-  if (lstat(kLockFile, &info) == 0 && S_ISREG(info.st_mode)) {
-    return isOurLockFile(info);
+  const SchedNameState state = schedLookAt(kSchedLockFile, nullptr);
+  if (state != SchedNameState::kFree) {
+    return state == SchedNameState::kOurs || schedTakeName(kSchedLockFile);
   }
   FILE *stream = openLockFile(O_WRONLY | O_CREAT | O_TRUNC, "w");
   if (stream == nullptr) {

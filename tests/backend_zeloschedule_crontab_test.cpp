@@ -622,9 +622,72 @@ TEST_F(CrontabTest, AWholeSyncMakesEachCallOnce) {
   create();
   forget();
   EXPECT_EQ(backend_.sync(), 0);
-  for (const char *call : {"mkstemp", "fflush", "fsync", "fchown", "fchmod", "rename"}) {
+  for (const char *call : {"mkstemp", "fflush", "fchown", "fchmod", "rename"}) {
     EXPECT_EQ(callCount(call), 1U) << call;
   }
+  EXPECT_EQ(callCount("fsync"), 2U);  // the file and, after the rename, its directory
+}
+
+TEST_F(CrontabTest, ADirectoryThatCannotBeSyncedAfterTheRenameIsReported) {
+  create();
+  forget();
+  failCall("fsync", {.from = 2, .error = EIO});
+  EXPECT_EQ(backend_.sync(), 1);
+  EXPECT_EQ(logged(),
+            Lines{backendLine("sync task list failed. [0x0B00 backend_zeloschedule.cpp:N]")});
+}
+
+// ---- the program that the lines start
+
+TEST_F(CrontabTest, ALineIsWrittenOnlyWhileTheNameOfItsProgramIsRoots) {
+  std::filesystem::remove(support::kTaskProgram);
+  create();
+  struct stat info = {};
+  ASSERT_EQ(lstat(support::kTaskProgram, &info), 0);
+  EXPECT_EQ(info.st_uid, 0U);
+  EXPECT_EQ(info.st_mode, static_cast<mode_t>(S_IFREG | 0755));
+  EXPECT_EQ(crontabLines().size(), 1U);
+}
+
+TEST_F(CrontabTest, WhatSomebodyElsePutUnderTheNameOfTheProgramIsMovedAway) {
+  REQUIRE_OTHER_USERS();
+  constexpr char kHostile[] = "#!/bin/sh\ntouch /tmp/hostile.ran\n";
+  std::filesystem::remove(support::kTaskProgram);
+  writeFile(support::kTaskProgram, kHostile, 0755);
+  ASSERT_EQ(chown(support::kTaskProgram, 65534, 65534), 0);
+  create();
+  EXPECT_EQ(readFile(support::movedAway(support::kTaskProgram)), kHostile);
+  EXPECT_NE(readFile(support::kTaskProgram).find("not installed"), std::string::npos);
+  EXPECT_EQ(crontabLines().size(), 1U);
+}
+
+TEST_F(CrontabTest, TheProgramThatIsThereStays) {
+  writeFile(support::kTaskProgram, "the real one", 0755);
+  create();
+  EXPECT_EQ(readFile(support::kTaskProgram), "the real one");
+}
+
+TEST_F(CrontabTest, WithoutTheNameOfTheProgramNoLineIsWritten) {
+  create();
+  writeFile(kCrontab, kPlainCrontab);
+  std::filesystem::remove(support::kTaskProgram);
+  for (const char *call : {"mkdtemp", "renameat2"}) {
+    SCOPED_TRACE(call);
+    forget();
+    failCall(call, {.times = support::kAlways, .error = EACCES});
+    EXPECT_EQ(backend_.sync(), 1);
+    EXPECT_EQ(logged(),
+              Lines{backendLine("sync task list failed. [0x0900 backend_zeloschedule.cpp:N]")});
+    EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
+  }
+}
+
+TEST_F(CrontabTest, TheStandInOfTheProgramOnlySaysThatItIsNotInstalled) {
+  std::filesystem::remove(support::kTaskProgram);
+  create();
+  EXPECT_EQ(system(("/bin/sh -n " + std::string(support::kTaskProgram)).c_str()), 0);
+  EXPECT_EQ(readFile(support::kTaskProgram),
+            readFile(ZELO_SOURCE_DIR "/packaging/zeloschedtask.stand-in"));
 }
 
 TEST_F(CrontabTest, ALineOfATaskThatCannotBeWrittenAbandonsTheRewrite) {

@@ -178,16 +178,38 @@ TEST_F(StoreTest, NullArgumentsAreReported) {
 // ---- no store
 
 TEST_F(StoreTest, WithoutAStoreThereIsNothingToListFindOrRemove) {
+  EXPECT_EQ(backend_.remove(1), 0);
+  EXPECT_EQ(recordedExecs(), Lines{});
+  EXPECT_FALSE(fileExists(kStore));
   EXPECT_EQ(listedIds(), Ids{});
+  std::filesystem::remove(kStore);
   const Task task = makeTask("task", "true");
   EXPECT_EQ(backend_.get_by_id(1, task.get()), 0);
   EXPECT_EQ(task->State, ZELO_SCHED_STATE_NOT_EXISTED);
   EXPECT_EQ(task->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
-  EXPECT_EQ(backend_.remove(1), 0);
   EXPECT_EQ(logged(), Lines{});
   EXPECT_EQ(recordedExecs(), Lines{});
-  EXPECT_FALSE(fileExists(kStore));
   EXPECT_FALSE(fileExists(kPersistentStore));
+}
+
+// While the name is free, another user can move a file there that is root's.
+TEST_F(StoreTest, AFreeNameIsTakenByWhoeverReadsIt) {
+  writeFile(kPersistentStore, "tasks of before the boot\n");
+  const Task task = makeTask("task", "true");
+  const std::function<void()> readers[] = {
+      [&] { EXPECT_EQ(listedIds(), Ids{}); },
+      [&] { EXPECT_EQ(backend_.get_by_id(1, task.get()), 0); },
+  };
+  for (const auto &read : readers) {
+    std::filesystem::remove(kStore);
+    read();
+    EXPECT_EQ(readFile(kStore), "# No task was saved yet.\n");
+    struct stat info = {};
+    EXPECT_EQ(lstat(kStore, &info), 0);
+    EXPECT_EQ(info.st_mode, static_cast<mode_t>(S_IFREG | 0644));
+    read();
+  }
+  EXPECT_EQ(logged(), Lines{});
 }
 
 TEST_F(StoreTest, WithoutAStoreCreateMakesOneWithOneSection) {
@@ -423,8 +445,33 @@ TEST_F(StoreTest, AStoreThatSomebodyElsePlantedIsNotRead) {
   EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
   EXPECT_EQ(logged(), Lines{backendLine("Get section [1] from [/tmp/scheduled_tasks] failed. "
                                         "[0x0900 backend_zeloschedule.cpp:N]")});
-  EXPECT_EQ(backend_.edit(task.get()), -1);
   EXPECT_EQ(readFile(kStore), store);
+}
+
+// The persistent copy is written as a whole, so nothing is changed before its tasks are put back.
+TEST_F(StoreTest, AChangeMovesAStoreOfSomebodyElseAwayAndWaitsForARestore) {
+  REQUIRE_OTHER_USERS();
+  create("own");
+  const std::string store = readFile(kStore);
+  ASSERT_EQ(chown(kStore, 65534, 65534), 0);
+  EXPECT_EQ(backend_.create(makeTask("new", "true").get()), -1);
+  EXPECT_EQ(errorRecord().code, 0x0900);
+  EXPECT_EQ(backend_.edit(makeTask("new", "true").get()), -1);
+  EXPECT_EQ(errorRecord().code, 0x0B00);
+  EXPECT_EQ(readFile(support::movedAway(kStore)), store);
+  EXPECT_EQ(readFile(kStore), "");
+  EXPECT_EQ(readFile(kPersistentStore), store);
+}
+
+TEST_F(StoreTest, AFirstTaskTakesThePlaceOfAStoreOfSomebodyElse) {
+  REQUIRE_OTHER_USERS();
+  writeFile(kStore, "[1]\nid=\"1\"\n");
+  ASSERT_EQ(chown(kStore, 65534, 65534), 0);
+  const Task task = makeTask("first", "true");
+  task->ID = 1;
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  EXPECT_EQ(listedIds(), Ids{1});
+  EXPECT_NE(support::movedAway(kStore), "");
 }
 
 TEST_F(StoreTest, AStoreThatOthersCanWriteIsNotRead) {
@@ -436,20 +483,40 @@ TEST_F(StoreTest, AStoreThatOthersCanWriteIsNotRead) {
 }
 
 // A forced copy onto a directory would copy into it, through whatever link lies there.
-TEST_F(StoreTest, ADirectoryUnderTheScratchNameMakesTheChangeFail) {
+TEST_F(StoreTest, ADirectoryUnderTheScratchNameIsMovedAway) {
   create("own");
   writeFile(kVictim, "untouched");
   std::filesystem::create_directory(scratchPath());
   std::filesystem::create_symlink(kVictim, scratchPath() + "/scheduled_tasks");
-  support::resetFailingCalls();
-  const std::string store = readFile(kStore);
-  const Task task = makeTask("new", "");
-  EXPECT_EQ(backend_.create(task.get()), -1);
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
-  EXPECT_EQ(recordedExecs(), Lines{});
+  EXPECT_EQ(create("new"), 2);
   EXPECT_EQ(readFile(kVictim), "untouched");
-  EXPECT_EQ(readFile(kStore), store);
-  std::filesystem::remove_all(scratchPath());
+  const std::string away = support::movedAway(scratchPath());
+  EXPECT_TRUE(std::filesystem::is_symlink(away + "/scheduled_tasks"));
+  EXPECT_EQ(logged(), Lines{"sched_shared_names.cpp:N " + scratchPath() +
+                            " is no regular file: it is now " + away});
+}
+
+TEST_F(StoreTest, AnEmptyDirectoryUnderTheScratchNameIsRemoved) {
+  std::filesystem::create_directory(scratchPath());
+  create("new");
+  EXPECT_EQ(support::movedAway(scratchPath()), "");
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(StoreTest, AScratchNameThatCannotBeHadMakesTheChangeFail) {
+  create("own");
+  const std::string store = readFile(kStore);
+  for (const char *call : {"mkdtemp", "renameat2"}) {
+    SCOPED_TRACE(call);
+    std::filesystem::create_directory(scratchPath());
+    support::resetFailingCalls();
+    support::failCall(call, {.error = EIO});
+    EXPECT_EQ(backend_.create(makeTask("new", "").get()), -1);
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
+    EXPECT_EQ(recordedExecs(), Lines{});
+    EXPECT_EQ(readFile(kStore), store);
+    std::filesystem::remove_all(scratchPath());
+  }
 }
 
 // What is left when a copy was killed right after it had emptied its target.
@@ -463,7 +530,7 @@ TEST_F(StoreTest, NothingIsBuiltOnAStoreWithoutBytesBesideAPersistentCopyThatHas
   EXPECT_EQ(readFile(kPersistentStore), whole);
 }
 
-TEST_F(StoreTest, AChangeWaitsForTheOneOfAnotherProcessButNotForEver) {
+TEST_F(StoreTest, AChangeWaitsForItsTurnAndChangesNothingWithoutIt) {
   create("first");
   const int file = open("/run/zeloscheduler.lock", O_RDWR);
   ASSERT_EQ(flock(file, LOCK_EX), 0);
@@ -475,11 +542,70 @@ TEST_F(StoreTest, AChangeWaitsForTheOneOfAnotherProcessButNotForEver) {
   EXPECT_EQ(support::recordedSleeps().size(), 3U);
   support::onSleep({});
   ASSERT_EQ(flock(file, LOCK_EX), 0);
-  support::clearSleeps();
-  create("third");
-  EXPECT_EQ(support::recordedSleeps().size(), 1000U);
+  ASSERT_EQ(pwrite(file, "4711\n", 5, 0), 5);
+  const std::string store = readFile(kStore);
+  const std::string crontab = readFile(kCrontab);
+  const Task task = makeTask("third", "true");
+  task->ID = 1;
+  const std::function<int()> changes[] = {
+      [&] { return backend_.create(task.get()); },
+      [&] { return backend_.edit(task.get()); },
+      [&] { return backend_.remove(1); },
+      [&] { return backend_.sync(); },
+  };
+  for (const auto &change : changes) {
+    support::clearSleeps();
+    clearLog();
+    support::resetFailingCalls();
+    EXPECT_EQ(change(), -1);
+    EXPECT_EQ(support::recordedSleeps(), std::vector<long>(6000, 5000));
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0x0400, "sched_store_lock.cpp"}));
+    EXPECT_EQ(logged(), Lines{"sched_store_lock.cpp:N Lock [/run/zeloscheduler.lock] failed. "
+                              "Process 4711 holds it."});
+    EXPECT_EQ(recordedExecs(), Lines{});
+  }
   close(file);
-  EXPECT_EQ(listedIds().size(), 3U);
+  EXPECT_EQ(readFile(kStore), store);
+  EXPECT_EQ(readFile(kPersistentStore), store);
+  EXPECT_EQ(readFile(kCrontab), crontab);
+  EXPECT_EQ(create("third"), 3);
+}
+
+TEST_F(StoreTest, AChangeWithoutItsLockFileChangesNothing) {
+  create("first");
+  for (const char *call : {"open", "flock"}) {
+    SCOPED_TRACE(call);
+    support::failCall(call, {.error = EACCES});
+    clearLog();
+    EXPECT_EQ(backend_.create(makeTask("second", "true").get()), -1);
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0x0400, "sched_store_lock.cpp"}));
+    EXPECT_EQ(logged(), Lines{"sched_store_lock.cpp:N Lock [/run/zeloscheduler.lock] failed. "
+                              "Permission denied"});
+    EXPECT_EQ(listedIds(), Ids{1});
+  }
+}
+
+// Another process would lock the file that is there by then.
+TEST_F(StoreTest, ALockFileThatWasReplacedMeanwhileIsLockedAnew) {
+  constexpr char kLock[] = "/run/zeloscheduler.lock";
+  create("first");
+  const int file = open(kLock, O_RDWR);
+  ASSERT_EQ(flock(file, LOCK_EX), 0);
+  int other = -1;
+  support::onSleep([&](size_t sleeps) {
+    if (sleeps == 1) {
+      std::filesystem::remove(kLock);
+      other = open(kLock, O_RDWR | O_CREAT, 0600);
+      EXPECT_EQ(flock(other, LOCK_EX), 0);
+      close(file);
+    } else if (sleeps == 3) {
+      close(other);
+    }
+  });
+  support::clearSleeps();
+  create("second");
+  EXPECT_GE(support::recordedSleeps().size(), 3U);
+  support::onSleep({});
 }
 
 // ---- ids
@@ -922,21 +1048,24 @@ TEST_F(StoreTest, AStoreThatIsFilledMeanwhileIsNotTakenForEmpty) {
 
 // ---- a store in the way
 
-TEST_F(StoreTest, AStoreThatIsADirectoryFailsEveryOperation) {
-  std::filesystem::create_directory(kStore);
+TEST_F(StoreTest, AStoreThatIsADirectoryIsNotReadAndMakesWayForAChange) {
+  writeFile(std::string(kStore) + "/file", "");
   ZELO_SCHED_TASK *head = nullptr;
   EXPECT_EQ(backend_.list_get(&head, nullptr), -1);
   EXPECT_EQ(errorRecord().code, 0x0900);
   const Task task = makeTask("task", "true");
   EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
   EXPECT_EQ(logged(), Lines{backendLine("Get section [1] from [/tmp/scheduled_tasks] failed. "
-                                        "[0x0900 section_file.cpp:N]")});
+                                        "[0x0900 backend_zeloschedule.cpp:N]")});
   EXPECT_EQ(backend_.create(task.get()), -1);
-  EXPECT_EQ(backend_.edit(task.get()), -1);
-  EXPECT_EQ(backend_.remove(1), -1);
   EXPECT_EQ(backend_.get_default(task.get()), -1);
-  EXPECT_TRUE(std::filesystem::is_directory(kStore));
+  EXPECT_EQ(backend_.sync(), -1);
+  support::failCall("renameat2", {.error = EIO});
+  EXPECT_EQ(backend_.edit(task.get()), -1);
+  EXPECT_EQ(errorRecord().code, 0x0900);
   EXPECT_FALSE(fileExists(kPersistentStore));
+  EXPECT_EQ(backend_.edit(task.get()), 0);
+  EXPECT_TRUE(fileExists(support::movedAway(kStore) + "/file"));
 }
 
 TEST_F(StoreTest, AStoreThatTheCallerMayNotReadFailsTheOperations) {
@@ -1020,14 +1149,70 @@ TEST_F(StoreTest, ALinkPlantedWhileTheFirstStoreIsPublishedIsNotWrittenThrough) 
       ASSERT_EQ(lchown(support::kStore, 65534, 65534), 0);
     }
   });
-  EXPECT_EQ(backend_.create(makeTask("first", "true").get()), -1);
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
-  EXPECT_EQ(logged(),
-            (Lines{backendLine("Copy sched conf failed. [" + scratchPath() +
-                               "] -> [/tmp/scheduled_tasks] [0x0900 backend_zeloschedule.cpp:N]"),
-                   backendLine("set task failed. [1] [0x0900 backend_zeloschedule.cpp:N]")}));
+  EXPECT_EQ(create("first"), 1);
+  EXPECT_EQ(listedIds(), Ids{1});
+  EXPECT_TRUE(std::filesystem::is_symlink(support::movedAway(support::kStore)));
   EXPECT_EQ(readFile(kVictim), "untouched");
   EXPECT_NE(readFile(support::kPersistentStore).find("first"), std::string::npos);
+}
+
+// ---- what is acknowledged is on the disk
+
+TEST_F(StoreTest, TheNewTextStandsSyncedBesideThePersistentCopyBeforeThatIsTouched) {
+  create("first");
+  std::string lastGood;
+  std::string before;
+  support::onExec([&](const std::string &line) {
+    if (!line.ends_with(kPersistentStore)) return;
+    lastGood = readFile(support::kLastGoodStore);
+    before = readFile(kPersistentStore);
+  });
+  create("second");
+  support::onExec({});
+  EXPECT_EQ(lastGood, readFile(kPersistentStore));
+  EXPECT_NE(lastGood, before);
+  struct stat info = {};
+  EXPECT_EQ(lstat(support::kLastGoodStore, &info), 0);
+  EXPECT_EQ(info.st_mode, static_cast<mode_t>(S_IFREG | 0644));
+}
+
+TEST_F(StoreTest, AStepThatFailsOnTheWayToTheDiskFailsTheChange) {
+  create("first");
+  const std::string store = readFile(kStore);
+  const std::string failed =
+      "Copy sched conf failed. [" + scratchPath() + "] -> [" + kPersistentStore + "] ";
+  // The last good copy, its directory, the persistent copy, its directory.
+  for (unsigned from = 1; from <= 4; ++from) {
+    SCOPED_TRACE(from);
+    clearLog();
+    support::failCall("fsync", {.from = from, .error = EIO});
+    EXPECT_EQ(backend_.create(makeTask("second", "true").get()), -1);
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0x0B00, "backend_zeloschedule.cpp"}));
+    EXPECT_EQ(logged(), (Lines{backendLine(failed + "[0x0B00 backend_zeloschedule.cpp:N]"),
+                               backendLine("set task failed. [2] "
+                                           "[0x0B00 backend_zeloschedule.cpp:N]")}));
+    EXPECT_EQ(readFile(kStore), store);
+  }
+  support::resetFailingCalls();
+  const std::pair<const char *, int> steps[] = {
+      {"mkstemp", 0x0900}, {"fdopen", 0x0900}, {"fflush", 0x0B00},
+      {"fchown", 0x0B00},  {"fclose", 0x0B00}, {"rename", 0x2800},
+  };
+  for (const auto &[call, code] : steps) {
+    SCOPED_TRACE(call);
+    const std::string persistent = readFile(kPersistentStore);
+    support::failCallFor(call,
+                         call == std::string("rename") || call == std::string("mkstemp")
+                             ? support::kLastGoodStore
+                             : "",
+                         {.error = EIO});
+    EXPECT_EQ(backend_.create(makeTask("second", "true").get()), -1);
+    EXPECT_EQ(errorRecord(), (ErrorRecord{code, "backend_zeloschedule.cpp"}));
+    EXPECT_EQ(readFile(kPersistentStore), persistent);
+    EXPECT_EQ(readFile(kStore), store);
+    support::resetFailingCalls();
+  }
+  EXPECT_EQ(create("second"), 2);
 }
 
 // By another process's copy that is killed.

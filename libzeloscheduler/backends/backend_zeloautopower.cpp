@@ -469,12 +469,15 @@ int listOf(const ZELO_SCHED_TASK &task) {
 
 int sync() {
   const StoreLock lock;
-  return applySchedule();
+  return lock.isHeld() ? applySchedule() : -1;
 }
 
 int create(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   const StoreLock lock;
+  if (!lock.isHeld()) {
+    return -1;
+  }
   PowerTime time = {};
   if (makeEntry(&time.entry, pTask) < 0) {
     SCHED_LOG_CALLEE("convert task from power schedule failed. ");
@@ -502,7 +505,7 @@ int create(ZELO_SCHED_TASK *pTask) {
 int edit(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   const StoreLock lock;
-  if (setAndReport(pTask->ID, pTask) < 0) {
+  if (!lock.isHeld() || setAndReport(pTask->ID, pTask) < 0) {
     return -1;
   }
   if (applySchedule() < 0) {
@@ -514,6 +517,9 @@ int edit(ZELO_SCHED_TASK *pTask) {
 
 int remove(long id) {
   const StoreLock lock;
+  if (!lock.isHeld()) {
+    return -1;
+  }
   const int removed = setAndReport(id, nullptr);
   if (removed <= 0) {
     return removed;

@@ -18,6 +18,7 @@
 #include "sched_record.h"
 #include "sched_report.h"
 #include "sched_run_hours.h"
+#include "sched_shared_names.h"
 #include "sched_store_lock.h"
 #include "sched_surroundings.h"
 #include "sched_text.h"
@@ -32,14 +33,18 @@ namespace {
 
 constexpr char kName[] = "zeloschedule";
 
-// Every read uses the working copy; the persistent one is there for the next boot.
+// Every read uses the working copy; the persistent one is there for the next boot, and the last
+// good one for when the power goes while that is written.
 constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
 constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
+constexpr char kPersistentDirectory[] = "/usr/zelo/etc";
+constexpr char kLastGoodCopy[] = "/usr/zelo/etc/scheduled_tasks.last-good";
 constexpr char kScratchPrefix[] = "/tmp/scheduled_tasks.tmp";
 constexpr char kCopyProgram[] = "/bin/cp";
 constexpr mode_t kStoreMode = 0644;
 
 constexpr char kCrontab[] = "/etc/crontab";
+constexpr char kCrontabDirectory[] = "/etc";
 constexpr char kCronPidFile[] = "/var/run/crond.pid";
 constexpr char kSignalCron[] = "/bin/kill -HUP `/bin/cat /var/run/crond.pid` > /dev/null 2>&1";
 constexpr char kTaskProgram[] = "/tmp/zeloschedtask";  // also what marks a crontab line as ours
@@ -59,19 +64,6 @@ class SectionName {
   char text_[32];
 };
 
-// "/tmp" is everybody's: a file there is ours only when nobody else made it and nobody else can
-// write to it. A link is judged by who made the link; a file with a second name may be any file of
-// root's, which would be shown to all and written over.
-bool isForeign(const char *szPath) {
-  struct stat info = {};
-  if (lstat(szPath, &info) != 0) {
-    return false;
-  }
-  const bool isOurs = info.st_uid == 0 || info.st_uid == geteuid();
-  const bool isShared = (info.st_mode & (S_IWGRP | S_IWOTH)) != 0 || info.st_nlink > 1;
-  return !isOurs || (S_ISREG(info.st_mode) && isShared);
-}
-
 off_t sizeOf(const char *szPath) {
   struct stat info = {};
   return stat(szPath, &info) == 0 ? info.st_size : 0;
@@ -81,6 +73,14 @@ off_t sizeOf(const char *szPath) {
 // killed. Nobody must build on that, nor take it for a store without tasks.
 bool isCutToNothing(const char *szStore) {
   return sizeOf(szStore) == 0 && sizeOf(kPersistentCopy) > 0;
+}
+
+// A process that only reads takes the name all the same: while it is free, another user can move a
+// file of root's there.
+void takeFreeStore() {
+  if (geteuid() == 0) {
+    schedTakeName(kSchedStore);
+  }
 }
 
 // ---- reading the store --------------------------------------------------------------------------
@@ -140,10 +140,11 @@ class StoreWalk {
  public:
   // The number of sections, 0 without a store; -1 when they cannot be listed or memory is short.
   int open() {
-    if (QLIBCFileExist(kWorkingCopy) == 0) {
+    state_ = schedLookAt(kSchedStore, nullptr);
+    if (state_ == SchedNameState::kFree) {
       return 0;
     }
-    if (isForeign(kWorkingCopy)) {
+    if (state_ == SchedNameState::kForeign) {
       SCHED_SET_ERROR(kErrOpen);
       return -1;
     }
@@ -173,6 +174,7 @@ class StoreWalk {
     return false;
   }
 
+  bool isStored() const { return state_ == SchedNameState::kOurs; }
   bool isRead() const { return read_ == kFound; }
   const char *section() const { return szSection_; }
   long sectionId() const { return strtol(szSection_, nullptr, kDecimal); }
@@ -188,6 +190,7 @@ class StoreWalk {
   ListGuard names_{nullptr};
   HashGuard hash_{nullptr};
   SchedTriggerClock clock_;
+  SchedNameState state_ = SchedNameState::kFree;
   int sections_ = 0;
   int next_ = 0;
   int read_ = kNotFound;
@@ -217,6 +220,10 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
   const int sections = walk.open();
   if (sections < 0) {
     return -1;
+  }
+  if (!walk.isStored()) {
+    takeFreeStore();
+    return 0;
   }
   const auto known = filter == nullptr ? SchedRecordCount::kExpected : SchedRecordCount::kAtMost;
   SchedRecordSource records(known, sections, SchedRecordExtent::kWhole);
@@ -250,11 +257,13 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
   }
   pTask->State = ZELO_SCHED_STATE_NOT_EXISTED;
   pTask->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
-  if (QLIBCFileExist(kWorkingCopy) == 0) {
+  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
+  if (state == SchedNameState::kFree) {
+    takeFreeStore();
     return kNotFound;
   }
   const SectionName section(id);
-  if (isForeign(kWorkingCopy)) {
+  if (state == SchedNameState::kForeign) {
     SCHED_SET_ERROR(kErrOpen);
     SCHED_LOG_CALLEE("Get section [%s] from [%s] failed. ", section.c_str(), kWorkingCopy);
     return -1;
@@ -365,26 +374,110 @@ int next_id(long *pID) {
   return 0;
 }
 
-// ---- writing the store --------------------------------------------------------------------------
+// ---- files that are replaced as a whole ---------------------------------------------------------
 
-// Makes the file under a name that nobody else has taken. In a sticky directory it stays ours.
-bool makeOwnFile(const char *szPath) {
-  const int descriptor =
-      open(szPath, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kStoreMode);
-  return descriptor >= 0 && close(descriptor) == 0;
+bool syncFile(const char *szPath, int flags) {
+  const int descriptor = open(szPath, O_RDONLY | O_CLOEXEC | flags);
+  if (descriptor < 0) {
+    return false;
+  }
+  const bool isSynced = fsync(descriptor) == 0;
+  close(descriptor);
+  return isSynced;
 }
 
+struct FileCloser {
+  void operator()(FILE *stream) const { fclose(stream); }
+};
+using Stream = std::unique_ptr<FILE, FileCloser>;
+
+int fail(SchedPlace place, int code) {
+  QLIBCErrSetEx(code, place.file, place.line);
+  return -1;
+}
+
+// A file made beside another one, gone again unless it took the other one's place.
+class NewFile {
+ public:
+  NewFile(const char *szPath, const char *szDirectory)
+      : szPath_(szPath), szDirectory_(szDirectory) {
+    snprintf(path_, sizeof(path_), "%s.XXXXXX", szPath);
+  }
+  ~NewFile() {
+    stream_.reset();
+    if (made_) {
+      unlink(path_);
+    }
+  }
+  NewFile(const NewFile &) = delete;
+  NewFile &operator=(const NewFile &) = delete;
+
+  int open() {
+    const int descriptor = mkstemp(path_);
+    if (descriptor < 0) {
+      return fail(SCHED_HERE, kErrOpen);
+    }
+    made_ = true;
+    stream_.reset(fdopen(descriptor, "w"));
+    if (stream_ == nullptr) {
+      close(descriptor);
+      return fail(SCHED_HERE, kErrOpen);
+    }
+    return 0;
+  }
+
+  int write(const char *bytes, size_t count) {
+    if (fwrite(bytes, 1, count, stream_.get()) != count) {
+      return fail(SCHED_HERE, kErrIo);
+    }
+    endsLine_ = bytes[count - 1] == '\n';
+    return 0;
+  }
+
+  // A line must not be joined to a last line that has no line feed.
+  int endLine() { return endsLine_ ? 0 : write("\n", 1); }
+
+  // Whole on the disk and the old file's in owner and mode before anyone can see it.
+  int finish(const struct stat &old) {
+    constexpr mode_t kModeBits = 0xFFF;
+    FILE *stream = stream_.get();
+    const int descriptor = fileno(stream);
+    if (fflush(stream) != 0 || fsync(descriptor) != 0 ||
+        fchown(descriptor, old.st_uid, old.st_gid) != 0 ||
+        fchmod(descriptor, old.st_mode & kModeBits) != 0 || fclose(stream_.release()) != 0) {
+      return fail(SCHED_HERE, kErrIo);
+    }
+    return 0;
+  }
+
+  // On the disk when the call returns, whether it was there before or not.
+  int replaceOld() {
+    if (rename(path_, szPath_) != 0) {
+      return fail(SCHED_HERE, kErrRename);
+    }
+    made_ = false;
+    return syncFile(szDirectory_, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
+  }
+
+ private:
+  const char *szPath_;
+  const char *szDirectory_;
+  char path_[64];
+  bool made_ = false;
+  bool endsLine_ = true;
+  Stream stream_;
+};
+
+// ---- writing the store --------------------------------------------------------------------------
+
 // The private copy on which one write is made. Whatever stands under its name was left or planted
-// by someone else: it is neither written through nor taken over, and what cannot be removed, a
-// directory say, makes the write fail.
+// by someone else: it is neither written through nor taken over. A directory cannot be removed as a
+// file can, but root can have its place.
 class ScratchFile {
  public:
   ScratchFile() {
     snprintf(path_, sizeof(path_), "%s.%d", kScratchPrefix, static_cast<int>(getpid()));
-    for (int i = 0; i < kTries && !made_; ++i) {
-      unlink(path_);
-      made_ = makeOwnFile(path_);
-    }
+    made_ = schedMakeAnew({path_, kStoreMode, false, ""});
     if (!made_) {
       SCHED_SET_ERROR(kErrOpen);
     }
@@ -397,7 +490,6 @@ class ScratchFile {
   const char *path() const { return path_; }
 
  private:
-  static constexpr int kTries = 10;  // against someone who plants faster than we remove
   char path_[64];
   bool made_ = false;
 };
@@ -480,18 +572,73 @@ int removeSection(const ScratchFile &scratch, const SectionName &section) {
   return removed > 0 ? 1 : 0;
 }
 
-// The persistent copy goes first: a failure in between leaves the working copy, which every read
-// uses, as it was.
-int publish(const ScratchFile &scratch, bool stored) {
+int fillNewFile(FILE *source, NewFile *file) {
+  char block[1 << 14];
+  size_t count = 0;
+  while ((count = fread(block, 1, sizeof(block), source)) > 0) {
+    if (file->write(block, count) < 0) {
+      return -1;
+    }
+  }
+  return ferror(source) == 0 ? 0 : fail(SCHED_HERE, kErrIo);
+}
+
+// What is to become the persistent copy, whole and on the disk before that is touched.
+int keepLastGood(const ScratchFile &scratch) {
+  const Stream source(fopen(scratch.path(), "re"));
+  if (source == nullptr) {
+    return fail(SCHED_HERE, kErrOpen);
+  }
+  struct stat like = {};
+  like.st_uid = geteuid();
+  like.st_gid = getegid();
+  like.st_mode = kStoreMode;
+  NewFile file(kLastGoodCopy, kPersistentDirectory);
+  if (file.open() < 0 || fillNewFile(source.get(), &file) < 0 || file.finish(like) < 0) {
+    return -1;
+  }
+  return file.replaceOld();
+}
+
+// A forced copy empties its target before it fills it. When the power goes in between, the tasks
+// that had been safe until then are in the last good copy, which is on the disk by now.
+int copyToPersistent(const ScratchFile &scratch) {
+  if (keepLastGood(scratch) < 0) {
+    return reportCopy(scratch.path(), kPersistentCopy);
+  }
   if (copyFile(scratch.path(), kPersistentCopy) < 0) {
     return -1;
   }
-  // Where there is no working copy yet, its name may be taken meanwhile, by a pipe or a link.
-  if (!stored && !makeOwnFile(kWorkingCopy) && isForeign(kWorkingCopy)) {
+  if (!syncFile(kPersistentCopy, 0) || !syncFile(kPersistentDirectory, O_DIRECTORY)) {
+    SCHED_SET_ERROR(kErrIo);
+    return reportCopy(scratch.path(), kPersistentCopy);
+  }
+  return 0;
+}
+
+// The persistent copy goes first: a failure in between leaves the working copy, which every read
+// uses, as it was.
+int publish(const ScratchFile &scratch) {
+  if (copyToPersistent(scratch) < 0) {
+    return -1;
+  }
+  if (!schedTakeName(kSchedStore)) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(scratch.path(), kWorkingCopy);
   }
   return copyFile(scratch.path(), kWorkingCopy) < 0 ? -1 : 1;
+}
+
+// Whether there is a store to build on. For root, what another user has put in its place is moved
+// away. The tasks that are kept for the next boot must then be put back before any is changed,
+// since the persistent copy is written as a whole: the store is made as one that is cut off.
+SchedNameState openStore() {
+  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
+  if (state != SchedNameState::kForeign || geteuid() != 0) {
+    return state;
+  }
+  const bool isKept = sizeOf(kPersistentCopy) > 0;
+  return schedTakeName(isKept ? kSchedStoreToRestore : kSchedStore) ? SchedNameState::kOurs : state;
 }
 
 // The one way in which the store changes: one section written, or deleted when pTask is null. 1
@@ -499,22 +646,23 @@ int publish(const ScratchFile &scratch, bool stored) {
 int write_store(long id, const ZELO_SCHED_TASK *pTask) {
   const ScratchFile scratch;
   const SectionName section(id);
-  const bool stored = QLIBCFileExist(kWorkingCopy) != 0;
-  if (isForeign(kWorkingCopy)) {
+  const SchedNameState state = openStore();
+  if (state == SchedNameState::kForeign) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(kWorkingCopy, scratch.path());
   }
+  const bool stored = state == SchedNameState::kOurs;
   if (fillScratch(scratch, stored) < 0) {
     return -1;
   }
   if (pTask != nullptr) {
-    return writeSection(scratch, section, pTask) < 0 ? -1 : publish(scratch, stored);
+    return writeSection(scratch, section, pTask) < 0 ? -1 : publish(scratch);
   }
   if (!stored) {
     return 0;
   }
   const int removed = removeSection(scratch, section);
-  return removed > 0 ? publish(scratch, stored) : removed;
+  return removed > 0 ? publish(scratch) : removed;
 }
 
 // ---- the crontab --------------------------------------------------------------------------------
@@ -586,83 +734,7 @@ int toCronLine(const ZELO_SCHED_TASK *pTask, CronLine *line) {
   return 0;
 }
 
-struct FileCloser {
-  void operator()(FILE *stream) const { fclose(stream); }
-};
-using Stream = std::unique_ptr<FILE, FileCloser>;
-
-int fail(SchedPlace place, int code) {
-  QLIBCErrSetEx(code, place.file, place.line);
-  return -1;
-}
-
-// The new crontab beside the old one, gone again unless it took the old one's place.
-class NewCrontab {
- public:
-  NewCrontab() { snprintf(path_, sizeof(path_), "%s.XXXXXX", kCrontab); }
-  ~NewCrontab() {
-    stream_.reset();
-    if (made_) {
-      unlink(path_);
-    }
-  }
-  NewCrontab(const NewCrontab &) = delete;
-  NewCrontab &operator=(const NewCrontab &) = delete;
-
-  int open() {
-    const int descriptor = mkstemp(path_);
-    if (descriptor < 0) {
-      return fail(SCHED_HERE, kErrOpen);
-    }
-    made_ = true;
-    stream_.reset(fdopen(descriptor, "w"));
-    if (stream_ == nullptr) {
-      close(descriptor);
-      return fail(SCHED_HERE, kErrOpen);
-    }
-    return 0;
-  }
-
-  int write(const char *bytes, size_t count) {
-    if (fwrite(bytes, 1, count, stream_.get()) != count) {
-      return fail(SCHED_HERE, kErrIo);
-    }
-    endsLine_ = bytes[count - 1] == '\n';
-    return 0;
-  }
-
-  // A line must not be joined to a last line that has no line feed.
-  int endLine() { return endsLine_ ? 0 : write("\n", 1); }
-
-  // Whole on the disk and the old file's in owner and mode before anyone can see it.
-  int finish(const struct stat &old) {
-    constexpr mode_t kModeBits = 0xFFF;
-    FILE *stream = stream_.get();
-    const int descriptor = fileno(stream);
-    if (fflush(stream) != 0 || fsync(descriptor) != 0 ||
-        fchown(descriptor, old.st_uid, old.st_gid) != 0 ||
-        fchmod(descriptor, old.st_mode & kModeBits) != 0 || fclose(stream_.release()) != 0) {
-      return fail(SCHED_HERE, kErrIo);
-    }
-    return 0;
-  }
-
-  int replaceOld() {
-    if (rename(path_, kCrontab) != 0) {
-      return fail(SCHED_HERE, kErrRename);
-    }
-    made_ = false;
-    return 0;
-  }
-
- private:
-  char path_[sizeof(kCrontab) + sizeof(".XXXXXX") - 1];
-  bool made_ = false;
-  bool endsLine_ = true;
-  Stream stream_;
-};
-
-int keepOtherLines(FILE *old, NewCrontab *crontab) {
+int keepOtherLines(FILE *old, NewFile *crontab) {
   char *buffer = nullptr;
   size_t capacity = 0;
   ssize_t length = 0;
@@ -680,7 +752,7 @@ int keepOtherLines(FILE *old, NewCrontab *crontab) {
   return result;
 }
 
-int addTaskLines(const ZELO_SCHED_TASK *pTask, NewCrontab *crontab) {
+int addTaskLines(const ZELO_SCHED_TASK *pTask, NewFile *crontab) {
   for (; pTask != nullptr; pTask = pTask->next) {
     if (pTask->State != ZELO_SCHED_STATE_ENABLED) {
       continue;
@@ -703,6 +775,10 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   if (old == nullptr) {
     return -1;  // no crontab, nothing to write it like: none is made
   }
+  // Cron starts as root whatever stands under that name.
+  if (!schedTakeName(kSchedTaskProgram)) {
+    return fail(SCHED_HERE, kErrOpen);
+  }
   struct stat info = {};
   if (fstat(fileno(old.get()), &info) != 0) {
     return fail(SCHED_HERE, kErrStat);
@@ -710,7 +786,7 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   if (S_ISDIR(info.st_mode)) {
     return fail(SCHED_HERE, kErrOpen);
   }
-  NewCrontab crontab;
+  NewFile crontab(kCrontab, kCrontabDirectory);
   if (crontab.open() < 0 || keepOtherLines(old.get(), &crontab) < 0 ||
       addTaskLines(tasks, &crontab) < 0 || crontab.finish(info) < 0) {
     return -1;
@@ -793,7 +869,7 @@ int syncAfterChange() {
 
 int sync() {
   const StoreLock lock;
-  return writeCrontab();
+  return lock.isHeld() ? writeCrontab() : -1;
 }
 
 int storeTask(const ZELO_SCHED_TASK *pTask) {
@@ -808,7 +884,7 @@ int create(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   const StoreLock lock;
   long id = 0;
-  if (next_id(&id) < 0) {
+  if (!lock.isHeld() || next_id(&id) < 0) {
     return -1;
   }
   const bool isNamed = pTask->Name[0] != '\0';
@@ -829,11 +905,14 @@ int create(ZELO_SCHED_TASK *pTask) {
 int edit(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   const StoreLock lock;
-  return storeTask(pTask) < 0 ? -1 : syncAfterChange();
+  return !lock.isHeld() || storeTask(pTask) < 0 ? -1 : syncAfterChange();
 }
 
 int remove(long id) {
   const StoreLock lock;
+  if (!lock.isHeld()) {
+    return -1;
+  }
   const int removed = write_store(id, nullptr);
   if (removed < 0) {
     SCHED_LOG_CALLEE("set task failed. [%ld] ", id);

@@ -86,6 +86,9 @@ namespace {
   X(flock, '~')                    \
   X(open, '~')                     \
   X(mkdir, '~')                    \
+  X(mkdtemp, '~')                  \
+  X(rmdir, '~')                    \
+  X(renameat2, '~')                \
   X(chmod, '~')                    \
   X(access, '~')                   \
   X(unlink, '~')                   \
@@ -279,11 +282,11 @@ bool canFail(Call call) {
 // No room and no right to write is found by what writes.
 bool canFailWith(Call call, int error) {
   constexpr Call kWriting[] = {
-      Call::k_open,     Call::k_open64,   Call::k_fopen,     Call::k_fdopen, Call::k_mkstemp,
-      Call::k_mkostemp, Call::k_mkdir,    Call::k_write,     Call::k_fwrite, Call::k_pwrite64,
-      Call::k_fflush,   Call::k_fclose,   Call::k_close,     Call::k_fsync,  Call::k_fdatasync,
-      Call::k_rename,   Call::k_unlink,   Call::k_ftruncate, Call::k_fchown, Call::k_fchmod,
-      Call::k_chmod,    Call::k_futimens, Call::k_QLIBCExec};
+      Call::k_open,     Call::k_open64,    Call::k_fopen,   Call::k_fdopen,    Call::k_mkstemp,
+      Call::k_mkostemp, Call::k_mkdir,     Call::k_mkdtemp, Call::k_renameat2, Call::k_write,
+      Call::k_fwrite,   Call::k_pwrite64,  Call::k_fflush,  Call::k_fclose,    Call::k_close,
+      Call::k_fsync,    Call::k_fdatasync, Call::k_rename,  Call::k_unlink,    Call::k_ftruncate,
+      Call::k_fchown,   Call::k_fchmod,    Call::k_chmod,   Call::k_futimens,  Call::k_QLIBCExec};
   const bool isOfWriters = error == ENOSPC || error == EDQUOT || error == EROFS;
   return canFail(call) && (!isOfWriters || std::find(std::begin(kWriting), std::end(kWriting),
                                                      call) != std::end(kWriting));
@@ -731,6 +734,12 @@ int rename(const char *from, const char *to) noexcept {
   FAIL_OR_CALL(rename, std::string(from) + " " + to, -1, from, to);
 }
 
+int renameat2(int from_directory, const char *from, int to_directory, const char *to,
+              unsigned flags) noexcept {
+  FAIL_OR_CALL(renameat2, std::string(from) + " " + to, -1, from_directory, from, to_directory, to,
+               flags);
+}
+
 int fsync(int descriptor) {
   FAIL_OR_CALL(fsync, nullptr, -1, descriptor);
 }
@@ -825,6 +834,14 @@ int fcntl64(int descriptor, int command, ...) {
   void *argument = va_arg(list, void *);
   va_end(list);
   FAIL_OR_CALL(fcntl64, nullptr, -1, descriptor, command, argument);
+}
+
+char *mkdtemp(char *pattern) noexcept {
+  FAIL_OR_CALL(mkdtemp, pattern, nullptr, pattern);
+}
+
+int rmdir(const char *path) noexcept {
+  FAIL_OR_CALL(rmdir, path, -1, path);
 }
 
 int mkdir(const char *path, mode_t mode) noexcept {

@@ -20,11 +20,12 @@
 namespace support {
 namespace {
 
-void removeStoreAndScratchFiles() {
-  const std::string prefix = std::filesystem::path(kStore).filename();
+void removeSharedFiles() {
   for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {
-    if (entry.path().filename().string().starts_with(prefix)) {
-      std::filesystem::remove_all(entry.path());
+    const std::string name = entry.path().filename();
+    for (const char *prefix :
+         {"scheduled_tasks", "sched_status.sqlite", "zeloschedtask", "zeloscheduler."}) {
+      if (name.starts_with(prefix)) std::filesystem::remove_all(entry.path());
     }
   }
 }
@@ -87,11 +88,20 @@ bool otherUsersExist() {
   return false;
 }
 
+std::string movedAway(const std::string &path) {
+  const std::filesystem::path name = std::filesystem::path(path).filename();
+  for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {
+    const bool isOurs = entry.path().filename().string().starts_with("zeloscheduler.");
+    if (isOurs && fileExists(entry.path() / name)) return entry.path() / name;
+  }
+  return "";
+}
+
 void cleanWorld() {
   resetFailingCalls();
   waitForChildRuns();
-  removeStoreAndScratchFiles();
-  for (const char *path : {kPersistentStore, kPowerSchedule, kStatusDatabase, kLockDirectory,
+  removeSharedFiles();
+  for (const char *path : {kPersistentStore, kLastGoodStore, kPowerSchedule, kLockDirectory,
                            kCronPidFile, kPluginDirectory}) {
     std::filesystem::remove_all(path);
   }

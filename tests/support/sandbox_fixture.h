@@ -26,7 +26,9 @@ namespace support {
 inline constexpr char kCrontab[] = "/etc/crontab";
 inline constexpr char kStore[] = "/tmp/scheduled_tasks";
 inline constexpr char kPersistentStore[] = "/usr/zelo/etc/scheduled_tasks";
+inline constexpr char kLastGoodStore[] = "/usr/zelo/etc/scheduled_tasks.last-good";
 inline constexpr char kPowerSchedule[] = "/usr/zelo/etc/power_sched.conf";
+inline constexpr char kTaskProgram[] = "/tmp/zeloschedtask";
 inline constexpr char kStatusDatabase[] = "/tmp/sched_status.sqlite";
 inline constexpr char kLockDirectory[] = "/tmp/lock";
 inline constexpr char kCronPidFile[] = "/var/run/crond.pid";
@@ -56,6 +58,8 @@ std::vector<std::string> linesOf(const std::string &text);
 std::vector<std::string> crontabLines();
 ErrorRecord errorRecord();
 bool otherUsersExist();
+// Where a thing that stood under a name of ours was moved; "" when there is none.
+std::string movedAway(const std::string &path);
 void cleanWorld();
 
 class SandboxTest : public testing::Test {

@@ -1,0 +1,228 @@
+#include "sched_shared_names.h"
+
+#include <fcntl.h>
+#include <stdio.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+
+#include "sched_report.h"
+#include "sched_stand_in.h"
+
+namespace {
+
+constexpr mode_t kReadableByAll = 0644;
+constexpr mode_t kOwnersOnly = 0600;  // whoever can open it can keep every run waiting
+constexpr mode_t kOpenDirectory = 0755;
+constexpr char kStorePath[] = "/tmp/scheduled_tasks";
+// A store of no bytes beside a persistent copy that has some is one that was cut off, and is
+// refused.
+constexpr char kNoTasks[] = "# No task was saved yet.\n";
+
+constexpr int kTries = 1000;  // against somebody who is in the way again and again
+
+bool makeDirectory(const char *szPath, mode_t mode) {
+  return mkdir(szPath, S_IRWXU) == 0 && chmod(szPath, mode) == 0;
+}
+
+bool writeAll(int descriptor, const char *szText) {
+  const size_t length = strlen(szText);
+  return length == 0 || write(descriptor, szText, length) == static_cast<ssize_t>(length);
+}
+
+bool makeFile(const char *szPath, mode_t mode, const char *szContents) {
+  constexpr int kFlags = O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC;
+  const int descriptor = open(szPath, kFlags, mode & S_IRWXU);
+  if (descriptor < 0) {
+    return false;
+  }
+  const bool isWritten = writeAll(descriptor, szContents) && fchmod(descriptor, mode) == 0;
+  return close(descriptor) == 0 && isWritten;
+}
+
+bool make(const SchedSharedName &name, const char *szPath) {
+  return name.isDirectory ? makeDirectory(szPath, name.mode)
+                          : makeFile(szPath, name.mode, name.contents);
+}
+
+void removeEither(const char *szPath) {
+  if (unlink(szPath) != 0) {
+    rmdir(szPath);
+  }
+}
+
+// What becomes of a file that is ours by now, where another was found before.
+enum class Ours { kStays, kGoes };
+
+// A new file or directory of the name's kind, in a directory that nobody else can enter, and with
+// it gone unless something was moved there.
+class Replacement {
+ public:
+  Replacement(const SchedSharedName &name, Ours ours) : name_(name), ours_(ours) {
+    isMade_ = mkdtemp(directory_) != nullptr;
+    snprintf(path_, sizeof(path_), "%s%s", directory_, strrchr(name.path, '/'));
+    isMade_ = isMade_ && make(name, path_);
+  }
+  ~Replacement() {
+    if (!isKept_) {
+      removeEither(path_);
+    }
+    rmdir(directory_);
+  }
+  Replacement(const Replacement &) = delete;
+  Replacement &operator=(const Replacement &) = delete;
+
+  bool isMade() const { return isMade_; }
+
+  enum class Placed { kYes, kAgain, kNever };
+
+  Placed place() {
+    if (move(RENAME_EXCHANGE)) {
+      settleExchanged();
+      return Placed::kYes;
+    }
+    if (errno == ENOENT && move(RENAME_NOREPLACE)) {
+      return Placed::kYes;
+    }
+    if (errno == EEXIST) {
+      return Placed::kAgain;
+    }
+    return errno == EINVAL || errno == ENOSYS ? placeWithoutExchange() : Placed::kNever;
+  }
+
+ private:
+  bool move(unsigned flags) { return renameat2(AT_FDCWD, path_, AT_FDCWD, name_.path, flags) == 0; }
+
+  // Another process of ours may have taken the name since it was looked at: its file may be in use.
+  void settleExchanged() {
+    struct stat info = {};
+    const char *szWhy = lstat(path_, &info) == 0 ? schedWhyForeign(name_, info) : "is gone";
+    if (szWhy == nullptr) {
+      if (ours_ == Ours::kStays) {
+        move(RENAME_EXCHANGE);
+      }
+    } else if (rmdir(path_) != 0) {
+      isKept_ = true;
+      SCHED_LOG("%s %s: it is now %s", name_.path, szWhy, path_);
+    }
+  }
+
+  // On a file system that cannot exchange. A file takes the place of any other in one step; what
+  // is in the way of that is moved away first, and somebody may be faster than we then.
+  Placed placeWithoutExchange() {
+    if (rename(path_, name_.path) == 0) {
+      return Placed::kYes;
+    }
+    char away[sizeof(path_) + sizeof(kAway)];
+    snprintf(away, sizeof(away), "%s%s", path_, kAway);
+    if (rename(name_.path, away) == 0 && rmdir(away) != 0) {
+      SCHED_LOG("%s is not ours: it is now %s", name_.path, away);
+    }
+    return Placed::kAgain;
+  }
+
+  static constexpr char kAway[] = ".away";
+  const SchedSharedName &name_;
+  Ours ours_;
+  char directory_[sizeof("/tmp/zeloscheduler.XXXXXX")] = "/tmp/zeloscheduler.XXXXXX";
+  char path_[sizeof(directory_) + 64];
+  bool isMade_ = false;
+  bool isKept_ = false;
+};
+
+bool replace(const SchedSharedName &name, Ours ours) {
+  using Placed = Replacement::Placed;
+  Replacement replacement(name, ours);
+  Placed placed = replacement.isMade() ? Placed::kAgain : Placed::kNever;
+  for (int i = 0; i < kTries && placed == Placed::kAgain; ++i) {
+    placed = replacement.place();
+  }
+  return placed == Placed::kYes;
+}
+
+// Whoever starts the program must find all of it, so it is not made in place.
+bool takeFree(const SchedSharedName &name) {
+  return name.contents[0] == '\0' ? make(name, name.path) : replace(name, Ours::kStays);
+}
+
+}  // namespace
+
+const SchedSharedName kSchedStore = {kStorePath, kReadableByAll, false, kNoTasks};
+const SchedSharedName kSchedStoreToRestore = {kStorePath, kReadableByAll, false, ""};
+const SchedSharedName kSchedTaskProgram = {"/tmp/zeloschedtask", kOpenDirectory, false,
+                                           kSchedStandIn};
+const SchedSharedName kSchedLockDirectory = {"/tmp/lock", kOpenDirectory, true, ""};
+const SchedSharedName kSchedLockFile = {"/tmp/lock/lock_sched_run", kOwnersOnly, false, ""};
+const SchedSharedName kSchedDatabase = {"/tmp/sched_status.sqlite", kOwnersOnly, false, ""};
+const SchedSharedName kSchedJournal = {"/tmp/sched_status.sqlite-journal", kOwnersOnly, false, ""};
+
+const char *schedWhyForeign(const SchedSharedName &name, const struct stat &info) {
+  if (info.st_uid != 0 && info.st_uid != geteuid()) {
+    return "is another user's";
+  }
+  if (name.isDirectory ? !S_ISDIR(info.st_mode) : !S_ISREG(info.st_mode)) {
+    return name.isDirectory ? "is no directory" : "is no regular file";
+  }
+  if (!name.isDirectory && info.st_nlink != 1) {
+    return "has a second name";
+  }
+  return (info.st_mode & (S_IWGRP | S_IWOTH)) != 0 ? "can be written by others" : nullptr;
+}
+
+SchedNameState schedLookAt(const SchedSharedName &name, const char **pszWhy) {
+  struct stat info = {};
+  const char *szWhy = nullptr;
+  if (lstat(name.path, &info) != 0) {
+    if (errno == ENOENT) {
+      return SchedNameState::kFree;
+    }
+    szWhy = "cannot be examined";
+  } else {
+    szWhy = schedWhyForeign(name, info);
+  }
+  if (pszWhy != nullptr) {
+    *pszWhy = szWhy;
+  }
+  return szWhy == nullptr ? SchedNameState::kOurs : SchedNameState::kForeign;
+}
+
+bool schedTakeName(const SchedSharedName &name) {
+  for (int i = 0; i < kTries; ++i) {
+    const SchedNameState state = schedLookAt(name, nullptr);
+    if (state == SchedNameState::kOurs) {
+      return true;
+    }
+    if (state == SchedNameState::kForeign) {
+      return geteuid() == 0 && replace(name, Ours::kStays);
+    }
+    if (!takeFree(name) && errno != EEXIST) {
+      return false;
+    }
+  }
+  return false;
+}
+
+bool schedMakeAnew(const SchedSharedName &name) {
+  constexpr int kPlainTries = 10;
+  for (int i = 0; i < kPlainTries && (unlink(name.path) == 0 || errno == ENOENT); ++i) {
+    if (make(name, name.path)) {
+      return true;
+    }
+    if (errno != EEXIST) {
+      return false;
+    }
+  }
+  return geteuid() == 0 && replace(name, Ours::kGoes);
+}
+
+void schedTakeNames() {
+  if (geteuid() != 0) {
+    return;
+  }
+  for (const SchedSharedName *name : {&kSchedTaskProgram, &kSchedLockDirectory, &kSchedLockFile,
+                                      &kSchedDatabase, &kSchedJournal}) {
+    schedTakeName(*name);
+  }
+}
