@@ -190,8 +190,9 @@ std::set<std::string> allNames() {
 }
 
 bool isKept(const std::string &path) {
-  return path == kStore || path == kPersistentStore || path == kPowerSchedule ||
-         path == kStatusDatabase || path == std::string(kStatusDatabase) + "-journal";
+  return path == kStore || path == kPersistentStore || path == support::kLastGoodStore ||
+         path == support::kTaskProgram || path == kPowerSchedule || path == kStatusDatabase ||
+         path == std::string(kStatusDatabase) + "-journal";
 }
 
 class KilledTest : public SandboxTest {
@@ -207,12 +208,14 @@ class KilledTest : public SandboxTest {
   // what was being changed.
   int takeLeftoversAway() const {
     static const std::regex left(R"(/tmp/scheduled_tasks\.tmp\.\d+(\.\w{6})?|/etc/crontab\.\w{6}|)"
+                                 R"(/tmp/zeloscheduler\.\w{6}|)"
+                                 R"(/usr/zelo/etc/scheduled_tasks\.last-good\.\w{6}|)"
                                  R"(/usr/zelo/etc/power_sched\.conf\.\w{6})");
     int count = 0;
     for (const std::string &path : allNames()) {
       if (names_.count(path) == 1 || isKept(path)) continue;
       EXPECT_TRUE(std::regex_match(path, left)) << path << " is left";
-      std::filesystem::remove(path);
+      std::filesystem::remove_all(path);
       ++count;
     }
     return count;
@@ -267,6 +270,11 @@ class KilledTest : public SandboxTest {
     ASSERT_TRUE(working || persistent) << "no copy is whole";
     const auto isGood = [&](const Tasks &copy) { return copy == tasks_ || copy == changed; };
     EXPECT_TRUE(isGood(working ? *working : *persistent)) << "not the old tasks, not the new ones";
+    // Where the power goes now, one of these two is what is left.
+    const std::optional<Tasks> kept = persistent ? persistent : tasksIn(support::kLastGoodStore);
+    EXPECT_TRUE(kept) << "nothing is kept for the next boot";
+    EXPECT_TRUE(!kept || persistent || isGood(*kept) || kept == kept_);
+    kept_ = kept;
     // The one for the next boot may still be that of a change that was never acknowledged.
     EXPECT_TRUE(!persistent || isGood(*persistent) || persistent == persistent_);
     persistent_ = persistent;
@@ -313,6 +321,7 @@ class KilledTest : public SandboxTest {
   std::set<std::string> crontab_;
   int number_ = 0;
   int cutOff_ = 0;
+  std::optional<Tasks> kept_;
   int leftovers_ = 0;
 };
 
