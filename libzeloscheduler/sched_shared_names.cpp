@@ -27,18 +27,27 @@ bool makeDirectory(const char *szPath, mode_t mode) {
   return mkdir(szPath, S_IRWXU) == 0 && chmod(szPath, mode) == 0;
 }
 
-bool writeAll(int descriptor, const char *szText) {
-  const size_t length = strlen(szText);
-  return length == 0 || write(descriptor, szText, length) == static_cast<ssize_t>(length);
+bool writeAll(int descriptor, std::string_view contents) {
+  while (!contents.empty()) {
+    const ssize_t written = write(descriptor, contents.data(), contents.size());
+    if (written < 0 && errno == EINTR) {
+      continue;
+    }
+    if (written <= 0) {
+      return false;
+    }
+    contents.remove_prefix(static_cast<size_t>(written));
+  }
+  return true;
 }
 
-bool makeFile(const char *szPath, mode_t mode, const char *szContents) {
+bool makeFile(const char *szPath, mode_t mode, std::string_view contents) {
   constexpr int kFlags = O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC;
   const int descriptor = open(szPath, kFlags, mode & S_IRWXU);
   if (descriptor < 0) {
     return false;
   }
-  const bool isWritten = writeAll(descriptor, szContents) && fchmod(descriptor, mode) == 0;
+  const bool isWritten = writeAll(descriptor, contents) && fchmod(descriptor, mode) == 0;
   return close(descriptor) == 0 && isWritten;
 }
 
@@ -66,15 +75,19 @@ class Replacement {
     isMade_ = isMade_ && make(name, path_);
   }
   ~Replacement() {
+    const int reason = errno;  // of what has failed, for the caller
     if (!isKept_) {
       removeEither(path_);
     }
     rmdir(directory_);
+    errno = reason;
   }
   Replacement(const Replacement &) = delete;
   Replacement &operator=(const Replacement &) = delete;
 
   bool isMade() const { return isMade_; }
+  // What stood there, when that is kept.
+  const char *movedTo() const { return isKept_ ? path_ : ""; }
 
   enum class Placed { kYes, kAgain, kNever };
 
@@ -132,19 +145,22 @@ class Replacement {
   bool isKept_ = false;
 };
 
-bool replace(const SchedSharedName &name, Ours ours) {
+bool replace(const SchedSharedName &name, Ours ours, SchedMovedTo *pMovedTo = nullptr) {
   using Placed = Replacement::Placed;
   Replacement replacement(name, ours);
   Placed placed = replacement.isMade() ? Placed::kAgain : Placed::kNever;
   for (int i = 0; i < kTries && placed == Placed::kAgain; ++i) {
     placed = replacement.place();
   }
+  if (pMovedTo != nullptr) {
+    copyText(*pMovedTo, replacement.movedTo());
+  }
   return placed == Placed::kYes;
 }
 
 // Whoever starts the program must find all of it, so it is not made in place.
 bool takeFree(const SchedSharedName &name) {
-  return name.contents[0] == '\0' ? make(name, name.path) : replace(name, Ours::kStays);
+  return name.contents.empty() ? make(name, name.path) : replace(name, Ours::kStays);
 }
 
 }  // namespace
@@ -204,6 +220,10 @@ bool schedTakeName(const SchedSharedName &name) {
   return false;
 }
 
+bool schedReplaceName(const SchedSharedName &name, SchedMovedTo *pMovedTo) {
+  return geteuid() == 0 && replace(name, Ours::kGoes, pMovedTo);
+}
+
 bool schedMakeAnew(const SchedSharedName &name) {
   constexpr int kPlainTries = 10;
   for (int i = 0; i < kPlainTries && (unlink(name.path) == 0 || errno == ENOENT); ++i) {
@@ -214,7 +234,7 @@ bool schedMakeAnew(const SchedSharedName &name) {
       return false;
     }
   }
-  return geteuid() == 0 && replace(name, Ours::kGoes);
+  return schedReplaceName(name, nullptr);
 }
 
 void schedTakeNames() {

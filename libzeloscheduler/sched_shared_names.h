@@ -10,11 +10,13 @@
 #include <sys/stat.h>
 #include <sys/types.h>
 
+#include <string_view>
+
 struct SchedSharedName {
   const char *path;
   mode_t mode;
   bool isDirectory;
-  const char *contents;  // of a file that is made under the name
+  std::string_view contents;  // of a file that is made under the name
 };
 
 extern const SchedSharedName kSchedStore;
@@ -40,6 +42,12 @@ SchedNameState schedLookAt(const SchedSharedName &name, const char **pszWhy);
 // exchanged for what is made, in one step, and then found in a directory that only root can enter,
 // which the log names; an empty directory is removed. It logs nothing else, and sets no error code.
 bool schedTakeName(const SchedSharedName &name);
+
+// Makes it anew, in one step, whatever stands there: for root alone. True when the name has it;
+// where the log names what was moved away, it is in *pMovedTo, which may be null, and is ""
+// otherwise.
+using SchedMovedTo = char[128];
+bool schedReplaceName(const SchedSharedName &name, SchedMovedTo *pMovedTo);
 
 // The same for a name that nothing is expected under: what stands there, ours too, is removed, or
 // moved away when it is a directory. True when a new file of this process has the name.

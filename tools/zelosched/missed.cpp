@@ -1,5 +1,6 @@
 #include "missed.h"
 
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -33,8 +34,9 @@ void noteMissed(const KeptDatabase &kept, time_t lastUp, time_t now) {
 // They could not be put back, or nobody tried so far. No time of theirs may count as passed over
 // until they are.
 bool areTasksLost() {
-  return access(kWorkingCopy, F_OK) != 0 &&
-         (access(kPersistentCopy, F_OK) == 0 || access(kLastGoodCopy, F_OK) == 0);
+  struct stat info {};
+  const bool isThere = lstat(kWorkingCopy, &info) == 0 && info.st_size > 0;
+  return !isThere && (access(kPersistentCopy, F_OK) == 0 || access(kLastGoodCopy, F_OK) == 0);
 }
 
 bool hasRunAt(const TaskRecord &task, time_t due) {

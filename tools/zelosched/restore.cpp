@@ -1,4 +1,5 @@
 // zelosched restore
+#include <sched_shared_names.h>
 #include <sched_store_lock.h>
 #include <unistd.h>
 
@@ -45,39 +46,55 @@ void keepLastGood() {
   placeFile(kLastGoodCopy, contents, kStoreMode);
 }
 
+// In one step, whatever stands there: nobody can be faster.
+void replaceName(const SchedSharedName &name) {
+  SchedMovedTo movedTo;
+  if (!schedReplaceName(name, &movedTo)) {
+    throw Failure(std::string("cannot take ") + name.path + ": " + std::strerror(errno));
+  }
+  if (movedTo[0] != '\0') complain(std::string("what was ") + name.path + " is now " + movedTo);
+}
+
 void placeWorkingCopy(const char *source) {
-  placeFile(kWorkingCopy, contentsOf(source), kStoreMode);
+  const std::string contents = contentsOf(source);
+  replaceName({kWorkingCopy, kStoreMode, false, contents});
   std::printf("%s was put back from %s\n", kWorkingCopy, source);
 }
 
-// What somebody else has put there would keep the library from saving any task.
-void removeForeign(const StoreCopy &working) {
-  if (working.condition != StoreCopy::kForeign || unlink(kWorkingCopy) == 0) return;
-  const int reason = errno;
-  throw Failure(std::string("cannot remove ") + kWorkingCopy + ": " + std::strerror(reason) +
-                ": no task can be saved until it is gone");
+// The name is never left free: another user could move a file there that is root's.
+void takeWorkingName() {
+  if (!schedTakeName(kSchedStoreToRestore)) {
+    throw Failure(std::string("cannot take ") + kWorkingCopy + ": " + std::strerror(errno) +
+                  ": no task can be saved until it is root's");
+  }
 }
 
-void putLastGoodBack(const StoreCopy &working, const StoreCopy &persistent) {
+void putLastGoodBack(const StoreCopy &persistent) {
   const StoreCopy lastGood = judgeStore(kLastGoodCopy);
-  if (persistent.condition == StoreCopy::kMissing && lastGood.condition == StoreCopy::kMissing) {
-    removeForeign(working);
+  const bool isMissing = persistent.condition == StoreCopy::kMissing;
+  if (isMissing && lastGood.condition == StoreCopy::kMissing) {
+    takeWorkingName();
     std::puts("no task was ever saved: there is nothing to put back");
     return;
   }
-  const std::string what = persistent.condition == StoreCopy::kMissing
-                               ? std::string(kPersistentCopy) + " is missing"
-                               : refused(kPersistentCopy, persistent).what();
+  const std::string what = isMissing ? std::string(kPersistentCopy) + " is missing"
+                                     : refused(kPersistentCopy, persistent).what();
   if (!lastGood.isUsable()) {
-    removeForeign(working);
+    takeWorkingName();
     const std::string why =
         lastGood.condition == StoreCopy::kMissing ? "there is no " : "neither can be used: ";
     throw Failure(what + ", and " + why + kLastGoodCopy +
                   (lastGood.why.empty() ? "" : " " + lastGood.why) + ": no task will run");
   }
   placeWorkingCopy(kLastGoodCopy);
-  throw Failure(what + ". The tasks are those of an earlier boot, from " + kLastGoodCopy +
-                ": look through them, and save one to write both copies anew");
+  if (persistent.condition != StoreCopy::kDamaged || !lastGood.isWhole()) {
+    throw Failure(what + ". The tasks are those of " + kLastGoodCopy +
+                  ": look through them, and save one to write both copies anew");
+  }
+  // It was written before the persistent copy was touched, so it lacks nothing that was
+  // acknowledged.
+  placeFile(kPersistentCopy, contentsOf(kLastGoodCopy), kStoreMode);
+  complain(what + ". The tasks are those of " + kLastGoodCopy + ", and all copies agree again");
 }
 
 // Tasks may be gone from it.
@@ -107,31 +124,35 @@ void keepWorkingCopy(const StoreCopy &working, const StoreCopy &persistent) {
                 ": save a task, which writes it anew, or all are lost at the next boot");
 }
 
-void replaceWorkingCopy(const StoreCopy &working, const StoreCopy &persistent) {
+void replaceWorkingCopy(const StoreCopy &persistent) {
   if (persistent.isWhole()) {
     placeWorkingCopy(kPersistentCopy);
     keepLastGood();
   } else if (persistent.isUsable() && isNoLessThanLastGood(persistent)) {
     putDoubtfulBack(persistent);
   } else {
-    putLastGoodBack(working, persistent);
+    putLastGoodBack(persistent);
   }
+}
+
+// Names are taken at boot, and by whoever is first to read the tasks, before they are put back.
+bool onlyHoldsTheName(const StoreCopy &working) {
+  return working.condition == StoreCopy::kEmpty || (working.tasks == 0 && !working.isHeaded);
 }
 
 void putStoreBack(bool isForced) {
   const StoreLock turn;
-  freeOfDirectory(kWorkingCopy);
+  if (!turn.isHeld()) throw failedTo("put the tasks back");
   const StoreCopy working = judgeWorkingStore(kWorkingCopy);
-  if (working.condition == StoreCopy::kForeign || working.condition == StoreCopy::kDamaged) {
-    complain(refused(kWorkingCopy, working).what());
-  }
+  if (!working.isUsable() && !working.why.empty()) complain(refused(kWorkingCopy, working).what());
   const StoreCopy persistent = judgeStore(kPersistentCopy);
   // Even by force, tasks that are fit are given up for none but those saved last.
-  if (working.isUsable() && !(isForced && persistent.isWhole())) {
+  if (working.isUsable() && !onlyHoldsTheName(working) && !(isForced && persistent.isWhole())) {
     keepWorkingCopy(working, persistent);
   } else {
-    replaceWorkingCopy(working, persistent);
+    replaceWorkingCopy(persistent);
   }
+  clearScratchNames();
 }
 
 // ---- the program that cron starts ---------------------------------------------------------------
@@ -156,8 +177,7 @@ void putProgramBack() {
   const std::string installed = installedProgram();
   const std::string program = contentsOf(installed);
   if (program.empty()) throw Failure(installed + " is cut off: it has no bytes");
-  freeOfDirectory(kTaskProgram);
-  placeFile(kTaskProgram, program, kProgramMode);
+  replaceName({kTaskProgram, kProgramMode, false, program});
   std::printf("%s was put back from %s\n", kTaskProgram, installed.c_str());
 }
 

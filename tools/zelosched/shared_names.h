@@ -10,12 +10,12 @@
 // library makes it. A name that is free is no fault: the library takes it when it needs it.
 std::vector<std::string> sharedNameFaults();
 
-// Why the library would let no run have its turn; nothing when it does.
-std::string runLockFault();
-
-// Takes every such name as the library would, and takes away what is not root's alone, which is
+// Takes every such name as the library would; what is not root's alone is moved away, which is
 // said. What failed is said too, and does not keep the rest from being done; the exit status.
 int takeSharedNames();
 
-// Takes away a directory in place of a file, and says so. Throws Failure.
-void freeOfDirectory(const std::string &path);
+// What stands under names of scratch copies of the store that are another user's.
+size_t foreignScratchNames();
+
+// Takes away every scratch copy. Nobody may be changing the store meanwhile. Throws Failure.
+void clearScratchNames();

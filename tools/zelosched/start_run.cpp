@@ -8,7 +8,6 @@
 #include <iterator>
 
 #include "failure.h"
-#include "shared_names.h"
 #include "task_list.h"
 
 namespace {
@@ -46,18 +45,10 @@ void requireRecords() {
   sqlite3_close(database);
 }
 
-// Nor does one that cannot have its turn say more.
-void requireTurn(const ZELO_SCHED_TASK &task) {
-  if (task.CanRunTaskSameTime != 0 && task.CanRunAppSameTime != 0) return;
-  const std::string fault = runLockFault();
-  if (!fault.empty()) throw Failure("cannot run " + titleOf(task) + ": " + fault);
-}
-
 }  // namespace
 
 void startRun(const ZELO_SCHED_TASK &task, Disabled disabled) {
   requireRecords();
-  requireTurn(task);
   // The run's process begins as a copy of this one.
   std::fflush(stdout);
   forgetError();

@@ -1,4 +1,6 @@
 // zelosched status
+#include <sched_shared_names.h>
+#include <sched_store_lock.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <zelocore.h>
@@ -77,9 +79,15 @@ Findings programIsThere() {
   }
   const bool isProgram = S_ISREG(info.st_mode) && (info.st_mode & S_IXUSR) != 0;
   if (!isProgram) return {wrong(std::string(kTaskProgram) + " is no program")};
-  if (info.st_uid != 0 || (info.st_mode & (S_IWGRP | S_IWOTH)) != 0) {
+  if (info.st_uid != 0 || schedWhyForeign(kSchedTaskProgram, info) != nullptr) {
     return {wrong(std::string(kTaskProgram) +
                   " is not root's alone: whoever can write it runs commands as root")};
+  }
+  if (contents(kTaskProgram) == kSchedTaskProgram.contents) {
+    return {
+        wrong(std::string(kTaskProgram) +
+              " only stands in for the program that starts tasks: 'zelosched restore' puts that "
+              "there")};
   }
   return {well(std::string(kTaskProgram) + " is there, and root's")};
 }
@@ -87,8 +95,30 @@ Findings programIsThere() {
 Findings namesAreOurs() {
   Findings findings;
   for (const std::string &fault : sharedNameFaults()) findings.push_back(wrong(fault));
+  const size_t scratch = foreignScratchNames();
+  if (scratch > 0) {
+    findings.push_back(wrong(counted(scratch, "name") +
+                             " of scratch copies of the tasks in /tmp belong to other users: "
+                             "'zelosched restore' takes them away"));
+  }
   if (findings.empty()) findings.push_back(well("no other user is in the way of a run"));
   return findings;
+}
+
+// One that has it for a moment is no fault.
+Findings changesHaveTheirTurn() {
+  if (geteuid() != 0) return {well("whether changes of tasks have their turn, only root may see")};
+  constexpr int kTries = 100;
+  constexpr useconds_t kPause = 20000;
+  pid_t holder = schedStoreLockHolder();
+  for (int i = 0; i < kTries && holder != 0; ++i) {
+    usleep(kPause);
+    if (schedStoreLockHolder() != holder) holder = 0;
+  }
+  if (holder == 0) return {well("changes of tasks have their turn")};
+  return {wrong("process " + std::to_string(holder) + " (" +
+                firstLine("/proc/" + std::to_string(holder) + "/comm") +
+                ") keeps every change of tasks waiting")};
 }
 
 bool exists(const char *path) {
@@ -104,7 +134,9 @@ bool isWhole(const char *path, int *sections) {
 }
 
 Findings copiesAgree() {
-  if (!exists(kWorkingCopy) && !exists(kPersistentCopy)) return {well("no task was ever saved")};
+  int working = 0;
+  const bool isNothing = !exists(kWorkingCopy) || (isWhole(kWorkingCopy, &working) && working == 0);
+  if (isNothing && !exists(kPersistentCopy)) return {well("no task was ever saved")};
   for (const char *path : {kWorkingCopy, kPersistentCopy}) {
     int sections = 0;
     if (!exists(path)) return {wrong(std::string(path) + " is missing")};
@@ -225,7 +257,10 @@ int runStatus(int argc, char **argv) {
       if (!isSaid) all.push_back(wrong(failure.what()));
     }
   };
-  for (const auto check : {cronRuns, programIsThere, namesAreOurs, copiesAgree}) add(check);
+  for (const auto check :
+       {cronRuns, programIsThere, namesAreOurs, changesHaveTheirTurn, copiesAgree}) {
+    add(check);
+  }
   add([&] {
     const TaskList list;
     for (const auto check : {tasksAreReadable, crontabIsInStep, tasksAreHarmless, clockIsArmed,
@@ -243,7 +278,8 @@ const Command kStatusCommand = {
     "status", "", "say whether all is well",
     "Prints a line for each check: whether cron is running, whether the program that it\n"
     "starts is there and root's, whether another user is in the way of runs in /tmp, whether\n"
-    "both copies of the tasks agree, whether the crontab is in step with them, whether an\n"
+    "a process keeps changes waiting, whether both copies of the tasks agree, whether the crontab "
+    "is in step with them, whether an\n"
     "enabled task has a fault, whether the clock is armed for the next power-on time, which\n"
     "tasks are running, and which were due while the machine was off.\n"
     "\n"

@@ -143,8 +143,9 @@ StoreCopy judgeStore(const std::string &path) {
 
 StoreCopy judgeWorkingStore(const std::string &path) {
   struct stat info {};
-  if (lstat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode) && info.st_nlink > 1) {
-    return {StoreCopy::kForeign, "has a second name"};
-  }
-  return judgeStore(path);
+  const bool isFile = lstat(path.c_str(), &info) == 0 && S_ISREG(info.st_mode);
+  if (isFile && info.st_nlink > 1) return {StoreCopy::kForeign, "has a second name"};
+  StoreCopy copy = judgeStore(path);
+  const bool isEmpty = copy.condition == StoreCopy::kDamaged && isFile && info.st_size == 0;
+  return isEmpty ? StoreCopy{StoreCopy::kEmpty, ""} : copy;
 }

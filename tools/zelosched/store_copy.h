@@ -6,6 +6,7 @@
 struct StoreCopy {
   enum Condition {
     kMissing,
+    kEmpty,  // no bytes: the name is taken, or a copy was cut off
     kWhole,
     kDoubtful,  // it can be read, but is not as it was written
     kDamaged,
@@ -23,5 +24,5 @@ struct StoreCopy {
 StoreCopy judgeStore(const std::string &path);
 
 // As judgeStore, for the copy in /tmp: the library refuses it when it has a second name, too, which
-// anybody can give it where the kernel lets him.
+// anybody can give it where the kernel lets him. There a file of no bytes is no damaged copy.
 StoreCopy judgeWorkingStore(const std::string &path);
