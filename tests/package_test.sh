@@ -137,6 +137,10 @@ libzelocore -rw-r--r-- root:root usr/share/lintian/overrides/libzelocore
 libzelosdk drwxr-xr-x root:root usr/zelo
 libzelosdk drwxr-xr-x root:root usr/zelo/etc
 libzeloscheduler4 -rw-r--r-- root:root usr/LIB/libzeloscheduler.so.4
+libzeloscheduler4 -rw-r--r-- root:root usr/lib/tmpfiles.d/libzeloscheduler4.conf
+libzeloscheduler4 -rwxr-xr-x root:root usr/LIB/zeloscheduler/take-names
+libzeloscheduler4 -rwxr-xr-x root:root usr/share/zeloscheduler/take_lines_out
+libzeloscheduler4 -rwxr-xr-x root:root usr/share/zeloscheduler/zeloschedtask.stand-in
 libzeloscheduler4 -rw-r--r-- root:root usr/share/lintian/overrides/libzeloscheduler4
 libzeloscheduler4 drwxr-xr-x root:root usr/zelo
 libzeloscheduler4 drwxr-xr-x root:root usr/zelo/etc
@@ -160,11 +164,12 @@ zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-history.se
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-history.timer
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-restore.service
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-shutdown.service
-zeloscheduler-tools -rw-r--r-- root:root usr/lib/tmpfiles.d/zeloscheduler.conf
+zeloscheduler-tools -rw-r--r-- root:root usr/lib/tmpfiles.d/libzeloscheduler-program.conf
 zeloscheduler-tools -rw-r--r-- root:root usr/share/bash-completion/completions/zelosched
 zeloscheduler-tools -rw-r--r-- root:root usr/share/lintian/overrides/zeloscheduler-tools
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zelosched.8.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zeloschedtask.8.gz
+zeloscheduler-tools -rwxr-xr-x root:root etc/init.d/zelosched-restore
 zeloscheduler-tools -rwxr-xr-x root:root usr/sbin/zelosched
 zeloscheduler-tools -rwxr-xr-x root:root usr/sbin/zeloschedtask
 zeloscheduler-tools -rwxr-xr-x root:root usr/zelo/bin/zelo_poweroff_feasible_check
@@ -329,6 +334,48 @@ was_off() {
   in_root sqlite3 /usr/zelo/var/history.sqlite "UPDATE up SET boot = 'another', seen = seen - 10000"
 }
 
+readonly NAMES=(/tmp/scheduled_tasks /tmp/zeloschedtask /tmp/lock /tmp/lock/lock_sched_run
+  /tmp/sched_status.sqlite /tmp/sched_status.sqlite-journal)
+readonly NAMES_ARE_ROOTS="stat -c '%U %a' ${NAMES[*]} | tr '\n' ' '"
+readonly ALL_ROOTS="root 644 root 755 root 755 root 600 root 600 root 600 "
+
+names_are_roots() {
+  same "$(in_root sh -c "$NAMES_ARE_ROOTS")" "$ALL_ROOTS"
+}
+
+# boot_without DIRECTORY COMMANDS: boots with a mount there that fails
+boot_without() {
+  local unit
+  unit=$(tr / - <<<"${1#/}").mount
+  printf '[Unit]\nDefaultDependencies=no\n[Mount]\nWhat=/dev/nothing\nWhere=%s\nType=ext4\n' "$1" \
+    >"$ROOT/etc/systemd/system/$unit"
+  mkdir -p "$ROOT/etc/systemd/system/local-fs.target.wants"
+  ln -s "../$unit" "$ROOT/etc/systemd/system/local-fs.target.wants/$unit"
+  boot "$2"
+  rm -r "$ROOT/etc/systemd/system/$unit" "$ROOT/etc/systemd/system/local-fs.target.wants"
+}
+
+readonly WHICH_PROGRAM='
+  cmp -s /tmp/zeloschedtask /usr/sbin/zeloschedtask && echo program
+  cmp -s /tmp/zeloschedtask /usr/share/zeloscheduler/zeloschedtask.stand-in && echo stand-in'
+
+# A program that only has the library.
+save_by_library() {
+  local -a flags
+  read -ra flags < <(PKG_CONFIG_LIBDIR=$ROOT/$LIB/pkgconfig pkg-config --cflags --libs zeloscheduler)
+  gcc "$checkout/examples/save_and_list.c" "${flags[@]}" -o "$ROOT/save_and_list" &&
+    in_root_quietly /save_and_list "By the library" true && rm "$ROOT/save_and_list"
+}
+
+# As another user who was first would have it.
+plant_names() {
+  in_root setpriv --reuid 65534 --regid 65534 --clear-groups sh -c '
+    printf "#!/bin/sh\n" >/tmp/zeloschedtask; chmod 755 /tmp/zeloschedtask
+    mkdir /tmp/lock /tmp/scheduled_tasks; : >/tmp/sched_status.sqlite'
+  # One that is root's, and that he has moved there from a directory of his own.
+  echo planted >"$ROOT/tmp/sched_status.sqlite-journal"
+}
+
 readonly CAUGHT_UP='
   eventually() { for tenth in $(seq 200); do "$@" && return; sleep 0.1; done; }
   eventually systemctl --quiet is-active zelosched-catch-up
@@ -375,7 +422,16 @@ goes_on_without_crontab() {
 
 is_undone() {
   maintainer_script prerm remove >/dev/null && same "$(lines_in_crontab)" 0 &&
-    maintainer_script postinst abort-remove >/dev/null && same "$(lines_in_crontab)" 5
+    maintainer_script postinst abort-remove >/dev/null && has_all_lines
+}
+
+boots_with_the_library_alone() {
+  in_root_quietly zelosched restore && in_root_quietly dpkg --remove zeloscheduler-tools &&
+    save_by_library || return 1
+  local booted
+  booted=$(boot "$NAMES_ARE_ROOTS; $WHICH_PROGRAM; grep -qF /tmp/zeloschedtask /etc/crontab && echo lines")
+  install_by_dpkg && same "$booted" "${ALL_ROOTS}stand-in
+lines"
 }
 
 disarms_clock() {
@@ -383,6 +439,19 @@ disarms_clock() {
   mkdir -p "$clock"
   echo 1234567890 >"$clock/wakealarm"
   in_root_quietly dpkg --remove zeloscheduler-tools && same "$(cat "$clock/wakealarm")" 0 && rm -r "$ROOT/sys/class"
+}
+
+# One of them is disabled, and one power-off time has a line too.
+tasks_kept() {
+  grep -c '^\[' "$ROOT/usr/zelo/etc/scheduled_tasks"
+}
+
+has_all_lines() {
+  same "$(lines_in_crontab)" "$(tasks_kept)"
+}
+
+has_all_tasks() {
+  same "$(task_count)" "$(($(tasks_kept) + 1))"
 }
 
 task_count() {
@@ -405,7 +474,10 @@ files_in_root >"$WORK/before"
 cp "$ROOT/etc/crontab" "$WORK/crontab"
 check "no name of theirs is left" same "$(grep -E "$OUR_TRACES" "$WORK/before")" ""
 
+plant_names
 check "dpkg installs them" install_by_dpkg
+check "names in /tmp that were there before are root's and made anew" names_are_roots
+rm -r "$ROOT"/tmp/zeloscheduler.*
 check "files, owners and modes are right" same "$(installed_files)" "$(expected_files)"
 check "the program that cron starts stands in /tmp at once" task_program_is_installed
 check "in an image that is being made, nothing is put into /tmp" leaves_tmp_of_image
@@ -433,6 +505,15 @@ if has_own_cgroup; then
   check "missed runs are not made up for" catches_nothing_up
   check "they are where that is switched on" catches_up
   in_root_quietly systemctl disable zelosched-catch-up.service
+  check "without the file system of the history the tasks are restored all the same" \
+    same "$(boot_without /usr/zelo/var "$NAMES_ARE_ROOTS; cmp /tmp/scheduled_tasks /usr/zelo/etc/scheduled_tasks && echo restored; $WHICH_PROGRAM")" \
+    "${ALL_ROOTS}restored
+program"
+  check "without that of the tasks none is, and the names in /tmp are root's" \
+    same "$(boot_without /usr/zelo/etc "$NAMES_ARE_ROOTS; systemctl is-active zelosched-restore; $WHICH_PROGRAM")" \
+    "${ALL_ROOTS}inactive
+program"
+  check "systemd restores where the library alone names the program" boots_with_the_library_alone
   clear_boot
   check "the machine's kernel settings are as they were" same "$(settings_of_machine)" "$settings"
 else
@@ -444,31 +525,40 @@ in_root_quietly zelosched restore
 echo old >"$ROOT/tmp/zeloschedtask"
 check "an upgrade goes through" install_by_dpkg
 check "it puts the new program into /tmp" task_program_is_installed
-check "it keeps the tasks" same "$(task_count)" 6
-check "it keeps the lines in the crontab" same "$(lines_in_crontab)" 5
+check "it keeps the tasks" has_all_tasks
+check "it keeps the lines in the crontab" has_all_lines
 
 check "a crontab that cannot be replaced is told, and stays" goes_on_without_crontab
 check "a removal that is broken off is undone" is_undone
 check "the tools alone are removed, and the clock is disarmed" disarms_clock
 check "the lines are out of the crontab" cmp "$ROOT/etc/crontab" "$WORK/crontab"
 check "the tasks stay with the library" cmp "$ROOT/tmp/scheduled_tasks" "$ROOT/usr/zelo/etc/scheduled_tasks"
+check "the program of the crontab lines has a stand-in" \
+  cmp "$ROOT/tmp/zeloschedtask" "$ROOT/usr/share/zeloscheduler/zeloschedtask.stand-in"
+check "what saves a task by the library alone finds it root's" save_by_library
+check "and the names in /tmp too" names_are_roots
 check "the tools are installed again" install_by_dpkg
-check "the lines are back" same "$(lines_in_crontab)" 5
+check "the lines are back" has_all_lines
 
 check "all are removed" remove_packages
 check "the crontab is as it was" cmp "$ROOT/etc/crontab" "$WORK/crontab"
 check "its owner and mode are as they were" same "$(stat -c '%a %u:%g' "$ROOT/etc/crontab")" "644 0:0"
-# As of any package, systemd's helper keeps which units were enabled until the purge.
-check "nothing is left but the data, and what the purge takes of units" \
+# As of any package, systemd's helper keeps which units were enabled until the purge, and dpkg what
+# is configuration.
+check "the names in /tmp stay root's while a task is kept" names_are_roots
+check "nothing is left but the data, these names, and what the purge takes of units" \
   same "$(differences_from "$WORK/before")" "$(printf '> %s ' \
+    etc/init.d/zelosched-restore etc/rcS.d/S01zelosched-restore \
     etc/systemd/system/basic.target.wants \
     etc/systemd/system/{basic.target.wants/zelosched-restore.service,multi-user.target.wants/zelosched-shutdown.service,timers.target.wants/zelosched-history.timer} \
-    usr/zelo usr/zelo/etc \
+    run/zeloscheduler.lock \
+    tmp/lock tmp/lock/lock_sched_run tmp/sched_status.sqlite{,-journal} tmp/scheduled_tasks \
+    tmp/zeloschedtask usr/zelo usr/zelo/etc \
     usr/zelo/etc/{power_sched.conf,scheduled_tasks,scheduled_tasks.last-good} \
     usr/zelo/var usr/zelo/var/history.sqlite)"
 check "all are installed again" install_by_dpkg
-check "the tasks are there again" same "$(task_count)" 6
-check "and their lines" same "$(lines_in_crontab)" 5
+check "the tasks are there again" has_all_tasks
+check "and their lines" has_all_lines
 check "all are purged" purge_packages
 check "nothing is left at all" same "$(differences_from "$WORK/before")" ""
 check "the crontab is as it was before" cmp "$ROOT/etc/crontab" "$WORK/crontab"

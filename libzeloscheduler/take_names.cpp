@@ -1,0 +1,78 @@
+// take-names: makes the names in /tmp that the library uses root's, for package scripts and boot
+// steps.
+//
+//   take-names            takes those that are free or another user's
+//   take-names --anew     for a first installation: nothing that stands there can be ours, but a
+//   store
+//                         that is as the persistent copy says
+//   take-names --stand-in puts the stand-in in the place of the program that crontab lines start
+//
+// Exits with 1 when one could not be had.
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstring>
+#include <fstream>
+#include <iterator>
+#include <string>
+
+#include "sched_shared_names.h"
+
+namespace {
+
+constexpr const SchedSharedName *kNames[] = {&kSchedTaskProgram, &kSchedLockDirectory,
+                                             &kSchedLockFile, &kSchedDatabase, &kSchedJournal};
+constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
+
+std::string contentsOf(const char *path) {
+  std::ifstream file(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
+
+bool replace(const SchedSharedName &name) {
+  SchedMovedTo movedTo;
+  const bool isReplaced = schedReplaceName(name, &movedTo);
+  if (movedTo[0] != '\0')
+    fprintf(stderr, "take-names: what was %s is now %s\n", name.path, movedTo);
+  return isReplaced;
+}
+
+// The one that is kept for the next boot is written first, so a store of ours is never ahead of it.
+bool replaceStore() {
+  const std::string kept = contentsOf(kPersistentCopy);
+  const bool isKept = !kept.empty();
+  if (isKept && schedLookAt(kSchedStore, nullptr) == SchedNameState::kOurs &&
+      contentsOf(kSchedStore.path) == kept) {
+    return true;
+  }
+  return replace(isKept ? kSchedStoreToRestore : kSchedStore);
+}
+
+bool said(const SchedSharedName &name, bool isTaken) {
+  if (!isTaken) fprintf(stderr, "take-names: cannot take %s: %s\n", name.path, strerror(errno));
+  return isTaken;
+}
+
+int take(bool isAnew) {
+  bool isDone = said(kSchedStore, isAnew ? replaceStore() : schedTakeName(kSchedStoreToRestore));
+  for (const SchedSharedName *name : kNames) {
+    isDone = said(*name, isAnew ? replace(*name) : schedTakeName(*name)) && isDone;
+  }
+  return isDone ? 0 : 1;
+}
+
+}  // namespace
+
+int main(int argc, char **argv) {
+  const std::string option = argc == 2 ? argv[1] : "";
+  if (argc > 2 || (argc == 2 && option != "--anew" && option != "--stand-in")) {
+    fprintf(stderr, "usage: take-names [--anew | --stand-in]\n");
+    return 2;
+  }
+  if (geteuid() != 0) {
+    fprintf(stderr, "take-names: that takes root's rights\n");
+    return 1;
+  }
+  if (option == "--stand-in") return said(kSchedTaskProgram, replace(kSchedTaskProgram)) ? 0 : 1;
+  return take(option == "--anew");
+}
