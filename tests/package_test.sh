@@ -236,7 +236,7 @@ readonly NOT_IN_CONTAINERS=(systemd-sysctl systemd-modules-load systemd-binfmt s
 # Fails where the machine gives no cgroups to a container.
 has_own_cgroup() {
   mkdir -p "$CGROUPS"
-  mount -n -t cgroup2 cgroup2 "$CGROUPS" 2>/dev/null &&
+  { mountpoint -q "$CGROUPS" || mount -n -t cgroup2 cgroup2 "$CGROUPS" 2>/dev/null; } &&
     OWN_CGROUP=$(mktemp -d "$CGROUPS/package_test.XXXXXX" 2>/dev/null) &&
     unshare --cgroup --net true
 }
