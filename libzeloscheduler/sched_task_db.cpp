@@ -5,6 +5,7 @@
 // authorizer, limits and hooks are neither needed nor touched here.
 #include <fcntl.h>
 #include <sqlite3.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <zelocore.h>
@@ -12,11 +13,13 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
 
 #include "sched_db_text.h"
+#include "sched_db_vfs.h"
 #include "sched_report.h"
 #include "sched_text.h"
 
@@ -91,25 +94,30 @@ int execute(sqlite3 *db, const Statement &statement, const char *szText, AfterTe
   return execute(db, statement, takeRow, context);
 }
 
-// "/tmp" is everybody's, and SQLite trusts what it finds beside a database: a journal planted there
-// would be rolled back, and files that it names deleted. So each of these files is ours, or not
-// there.
-bool isOurs(const char *szPath) {
-  struct stat info = {};
-  if (lstat(szPath, &info) != 0) {
-    return errno == ENOENT;
-  }
-  return S_ISREG(info.st_mode) && info.st_nlink == 1 &&
-         (info.st_uid == 0 || info.st_uid == geteuid()) &&
-         (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
-}
-
 constexpr char kJournal[] = "/tmp/sched_status.sqlite-journal";
-constexpr const char *kDatabaseFiles[] = {kDatabase, kJournal, "/tmp/sched_status.sqlite-wal",
-                                          "/tmp/sched_status.sqlite-shm"};
+constexpr const char *kDatabaseFiles[] = {kDatabase, kJournal};
 constexpr mode_t kOwnersOnly = 0600;  // a reader's lock would keep every run from being recorded
 
-// Makes the file, when it is missing, before anyone else can. In a sticky directory it stays ours.
+// Why the file is not ours alone; null when it is. In a sticky directory such a file stays where it
+// is, so that what was looked at is what is opened.
+const char *whyNotOurs(const char *szPath) {
+  struct stat info = {};
+  if (lstat(szPath, &info) != 0) {
+    return errno == ENOENT ? "is missing" : "cannot be looked at";
+  }
+  if (info.st_uid != 0 && info.st_uid != geteuid()) {
+    return "is another user's";
+  }
+  if (!S_ISREG(info.st_mode)) {
+    return "is no regular file";
+  }
+  if (info.st_nlink != 1) {
+    return "has a second name";
+  }
+  return (info.st_mode & (S_IWGRP | S_IWOTH)) != 0 ? "can be written by others" : nullptr;
+}
+
+// Makes the file, when it is missing, before anyone else can.
 void occupy(const char *szPath) {
   const int descriptor =
       open(szPath, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kOwnersOnly);
@@ -118,13 +126,89 @@ void occupy(const char *szPath) {
   }
 }
 
+bool holdName(const char *szPath, bool mayMake) {
+  if (mayMake && access(szPath, F_OK) != 0) {
+    occupy(szPath);
+  }
+  return whyNotOurs(szPath) == nullptr;
+}
+
 void createDatabase() {
   const mode_t mask = umask(static_cast<mode_t>(~kOwnersOnly) & 0777);
   QLIBCFileTouch(kDatabase);
   umask(mask);
 }
 
-// A journal that is kept between transactions keeps its name taken.
+bool takeNames() {
+  if (access(kDatabase, F_OK) != 0) {
+    createDatabase();
+  }
+  for (const char *szPath : kDatabaseFiles) {
+    occupy(szPath);
+    const char *const szReason = whyNotOurs(szPath);
+    if (szReason != nullptr) {
+      BoundedText<128> text;
+      text.append("%s %s", szPath, szReason);
+      SCHED_SET_ERROR(kErrOpen);
+      SCHED_LOG("Can't open database: %s\n", text.c_str());
+      return false;
+    }
+  }
+  return true;
+}
+
+// An empty database takes the place of the one that is there, which stays under a name of its own
+// together with its log, so that its rows can still be read. The name is never free.
+bool moveAside() {
+  char aside[] = "/tmp/sched_status.sqlite.wal.XXXXXX";
+  const int descriptor = mkostemp(aside, O_CLOEXEC);
+  if (descriptor < 0) {
+    return false;
+  }
+  close(descriptor);
+  if (renameat2(AT_FDCWD, aside, AT_FDCWD, kDatabase, RENAME_EXCHANGE) != 0) {
+    unlink(aside);
+    return false;
+  }
+  constexpr char kLog[] = "/tmp/sched_status.sqlite-wal";
+  if (whyNotOurs(kLog) == nullptr) {
+    BoundedText<sizeof(aside) + sizeof("-wal")> log;
+    log.append("%s-wal", aside);
+    rename(kLog, log.c_str());
+  }
+  SCHED_LOG("%s was in WAL mode and is now %s\n", kDatabase, aside);
+  return true;
+}
+
+int openDatabase(sqlite3 **ppHandle) {
+  return openOwnFilesOnly(kDatabase, holdName, ppHandle);
+}
+
+bool isInWalMode(sqlite3 *db) {
+  return sqlite3_extended_errcode(db) == kInWalMode;
+}
+
+// In WAL mode SQLite would need files whose names others can hold. Processes that find it so take
+// turns, lest one moves aside what another has just made.
+int openInPlaceOfWal(sqlite3 **ppHandle) {
+  const int turn = open(kJournal, O_RDWR | O_NOFOLLOW | O_CLOEXEC);
+  if (turn < 0) {
+    return SQLITE_CANTOPEN;
+  }
+  int result = SQLITE_CANTOPEN;
+  if (flock(turn, LOCK_EX) == 0) {
+    sqlite3_close(*ppHandle);
+    result = openDatabase(ppHandle);
+    if (result != SQLITE_OK && isInWalMode(*ppHandle) && moveAside()) {
+      sqlite3_close(*ppHandle);
+      result = openDatabase(ppHandle);
+    }
+  }
+  close(turn);
+  return result;
+}
+
+// Cheaper than to empty it after each transaction.
 void keepJournal(sqlite3 *db) {
   sqlite3_stmt *statement = nullptr;
   if (sqlite3_prepare_v2(db, "PRAGMA journal_mode=PERSIST", -1, &statement, nullptr) == SQLITE_OK) {
@@ -216,19 +300,15 @@ int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStat
 
 sqlite3 *ZELOSchedDBInit(void) {
   ZELOSchedRandInit();
-  if (access(kDatabase, F_OK) != 0) {
-    createDatabase();
-  }
-  occupy(kJournal);
-  for (const char *szPath : kDatabaseFiles) {
-    if (!isOurs(szPath)) {
-      SCHED_SET_ERROR(kErrOpen);
-      SCHED_LOG("Can't open database: %s\n", "a file of it is not its owner's alone");
-      return nullptr;
-    }
+  if (!takeNames()) {
+    return nullptr;
   }
   sqlite3 *db = nullptr;
-  if (sqlite3_open(kDatabase, &db) != SQLITE_OK) {
+  int result = openDatabase(&db);
+  if (result != SQLITE_OK && isInWalMode(db)) {
+    result = openInPlaceOfWal(&db);
+  }
+  if (result != SQLITE_OK) {
     SCHED_SET_ERROR(kErrOpen);
     SCHED_LOG("Can't open database: %s\n", sqlite3_errmsg(db));
     sqlite3_close(db);
@@ -237,7 +317,6 @@ sqlite3 *ZELOSchedDBInit(void) {
   if (execute(db, kCreateTable, nullptr, nullptr) < 0) {
     return nullptr;  // The handle stays open, as callers have always found it.
   }
-  occupy(kJournal);  // creating the table has removed it
   keepJournal(db);
   return db;
 }

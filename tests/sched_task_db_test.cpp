@@ -1106,17 +1106,52 @@ TEST_P(InjectionTest, FailsInACommentAndIsLogged) {
 
 // SQLite trusts what lies beside a database: a planted journal would be rolled back.
 TEST_F(StatusDatabaseTest, FilesOfTheDatabaseThatAreNotOursGiveNoHandle) {
-  for (const char *suffix : {"", "-journal", "-wal", "-shm"}) {
-    SCOPED_TRACE(suffix);
+  struct Plant {
+    const char *szReason;
+    void (*put)(const std::string &path);
+  };
+  const Plant plants[] = {
+      {"is no regular file",
+       [](const std::string &path) { std::filesystem::create_symlink("/tmp/elsewhere", path); }},
+      {"is no regular file",
+       [](const std::string &path) { std::filesystem::create_directory(path); }},
+      {"has a second name",
+       [](const std::string &path) {
+         support::writeFile("/tmp/second_name", "");
+         std::filesystem::create_hard_link("/tmp/second_name", path);
+       }},
+      {"can be written by others",
+       [](const std::string &path) { support::writeFile(path, "", 0620); }},
+  };
+  for (const char *suffix : {"", "-journal"}) {
+    for (const Plant &plant : plants) {
+      SCOPED_TRACE(std::string(suffix) + " " + plant.szReason);
+      support::cleanWorld();
+      const std::string path = support::kStatusDatabase + std::string(suffix);
+      std::filesystem::remove(path);
+      plant.put(path);
+      EXPECT_EQ(ZELOSchedDBInit(), nullptr);
+      EXPECT_EQ(logged(), Lines{"sched_task_db.cpp:N Can't open database: " + path + " " +
+                                plant.szReason + "\n"});
+      EXPECT_EQ(support::errorRecord(), (support::ErrorRecord{0x0900, "sched_task_db.cpp"}));
+      EXPECT_FALSE(support::fileExists("/tmp/elsewhere"));
+      std::filesystem::remove(path);
+      std::filesystem::remove("/tmp/second_name");
+    }
+  }
+}
+
+TEST_F(StatusDatabaseTest, AFileOfAnotherUserIsNamedInTheLog) {
+  REQUIRE_OTHER_USERS();
+  constexpr uid_t kNobody = 65534;
+  for (const char *suffix : {"", "-journal"}) {
     support::cleanWorld();
     const std::string path = support::kStatusDatabase + std::string(suffix);
-    std::filesystem::remove(path);
-    std::filesystem::create_symlink("/tmp/elsewhere", path);
+    support::writeFile(path, "");
+    ASSERT_EQ(chown(path.c_str(), kNobody, kNobody), 0);
     EXPECT_EQ(ZELOSchedDBInit(), nullptr);
-    EXPECT_EQ(logged(), Lines{"sched_task_db.cpp:N Can't open database: a file of it is not its "
-                              "owner's alone\n"});
-    EXPECT_EQ(support::errorRecord(), (support::ErrorRecord{0x0900, "sched_task_db.cpp"}));
-    EXPECT_FALSE(support::fileExists("/tmp/elsewhere"));
+    EXPECT_EQ(logged(),
+              Lines{"sched_task_db.cpp:N Can't open database: " + path + " is another user's\n"});
     std::filesystem::remove(path);
   }
 }

@@ -1251,10 +1251,10 @@ one_long_task() {
 keeps_missed_what_cannot_be_recorded() {
   went_off one_task
   rm "$STATUS"*
-  : >"$STATUS-wal"
-  chmod 0666 "$STATUS-wal"
+  : >"$STATUS-journal"
+  chmod 0666 "$STATUS-journal"
   try at "$LATER" catch-up
-  rm "$STATUS-wal"
+  rm "$STATUS-journal"
   says 1 "cannot record a run" && same "$(missed)" "one 2026-11-20 02:30"
 }
 

@@ -443,7 +443,11 @@ ZELO_SCHED_API int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled)
 extern ZELO_SCHED_API FILE *pfLock;
 
 /* Opens the status database, creating it when it is missing. The caller closes
- * it with sqlite3_close. The calls below run their statements on it and leave
+ * it with sqlite3_close, before the library is unloaded. The database and its
+ * rollback journal are used only while they are root's or the caller's, and
+ * nothing else that lies beside them: the connection knows no WAL mode and no
+ * transaction over attached databases. A database in WAL mode is moved aside,
+ * which the log tells, and made anew. The calls below run their statements on it and leave
  * its authorizer, limits, hooks and transaction as they are. Null on failure:
  * 0x0900 when it cannot be opened, no code, and the connection left open, when
  * the table cannot be created. */
