@@ -1,11 +1,11 @@
 // The status database: one row for every run of a task.
 //
 // Values stand in the statements unescaped, so an application's name can end its quotes and go on
-// as SQL of its own. What keeps that harmless is the authorizer: while one of these statements is
-// compiled, the connection can do nothing but what the statement is for, and that to task_status
-// alone.
+// as SQL of its own; sched_db_text.h says how far it may. The connection is the caller's: its
+// authorizer, limits and hooks are neither needed nor touched here.
 #include <fcntl.h>
 #include <sqlite3.h>
+#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 #include <zelocore.h>
@@ -13,17 +13,20 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
 
+#include "sched_db_text.h"
+#include "sched_db_vfs.h"
 #include "sched_report.h"
+#include "sched_shared_names.h"
 #include "sched_text.h"
 
 namespace {
 
 constexpr char kDatabase[] = "/tmp/sched_status.sqlite";
-constexpr char kTable[] = "task_status";
 constexpr char kCreateTable[] =
     "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, "
     "timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);";
@@ -31,92 +34,11 @@ constexpr int kAnyStatusID = -1;
 constexpr int kAlive = 1;
 constexpr int kMostLockedRetries = 100;
 
-using Statement = BoundedText<4096>;
 using RowCallback = int (*)(void *context, int columns, char **values, char **names);
 
 bool isNamed(const char *szName, const char *szExpected) {
   return szName != nullptr && strcmp(szName, szExpected) == 0;
 }
-
-// What a statement is for. An application's name must not turn one kind into another: a check for
-// running tasks that marks them all as finished, say.
-enum class Purpose { kCreate, kRead, kInsert, kUpdate };
-
-// CREATE TABLE writes the schema table by itself; direct writes to it are SQLite's to refuse.
-bool mayCreate(int action, const char *szTable) {
-  return action == SQLITE_CREATE_TABLE ? isNamed(szTable, kTable)
-                                       : isNamed(szTable, "sqlite_master");
-}
-
-// The key above all is out of reach: UPDATE OR REPLACE that gives several rows one key deletes
-// them.
-bool mayUpdate(const char *szTable, const char *szColumn) {
-  return isNamed(szTable, kTable) &&
-         (isNamed(szColumn, "status_code") || isNamed(szColumn, "comment"));
-}
-
-bool isAllowed(Purpose purpose, int action, const char *szFirst, const char *szSecond) {
-  switch (action) {
-    case SQLITE_SELECT:
-      return true;
-    case SQLITE_READ:
-      return isNamed(szFirst, kTable) || purpose == Purpose::kCreate;
-    case SQLITE_CREATE_TABLE:
-      return purpose == Purpose::kCreate && mayCreate(action, szFirst);
-    case SQLITE_INSERT:
-      return purpose == Purpose::kCreate ? mayCreate(action, szFirst)
-                                         : purpose == Purpose::kInsert && isNamed(szFirst, kTable);
-    case SQLITE_UPDATE:
-      return purpose == Purpose::kCreate
-                 ? mayCreate(action, szFirst)
-                 : purpose == Purpose::kUpdate && mayUpdate(szFirst, szSecond);
-    default:
-      return false;
-  }
-}
-
-// For one attempt at one statement.
-class RestrictedConnection {
- public:
-  RestrictedConnection(sqlite3 *db, Purpose purpose)
-      : db_(db), purpose_(purpose), changesBefore_(sqlite3_total_changes(db)) {
-    sqlite3_set_authorizer(db_, authorize, this);
-    sqlite3_progress_handler(db_, kStepsBetweenQuestions, isTooLong, this);
-  }
-  ~RestrictedConnection() {
-    sqlite3_progress_handler(db_, 0, nullptr, nullptr);
-    sqlite3_set_authorizer(db_, nullptr, nullptr);
-  }
-  RestrictedConnection(const RestrictedConnection &) = delete;
-  RestrictedConnection &operator=(const RestrictedConnection &) = delete;
-
- private:
-  static int authorize(void *context, int action, const char *szFirst, const char *szSecond,
-                       const char *, const char *) {
-    auto *self = static_cast<RestrictedConnection *>(context);
-    return self->isFirstStatement() && isAllowed(self->purpose_, action, szFirst, szSecond)
-               ? SQLITE_OK
-               : SQLITE_DENY;
-  }
-
-  // Once a row is in, whatever is compiled next is not ours. It could be a REPLACE, which takes the
-  // place of other rows and looks like any INSERT here.
-  bool isFirstStatement() const {
-    return purpose_ != Purpose::kInsert || sqlite3_total_changes(db_) == changesBefore_;
-  }
-
-  // A SELECT within a SELECT could go on for ever, with the run lock held.
-  static int isTooLong(void *context) {
-    return ++static_cast<RestrictedConnection *>(context)->questions_ > kMostQuestions ? 1 : 0;
-  }
-
-  static constexpr int kStepsBetweenQuestions = 10000;
-  static constexpr int kMostQuestions = 10000;  // a hundred times what a million rows take
-  sqlite3 *db_;
-  Purpose purpose_;
-  int changesBefore_;
-  int questions_ = 0;
-};
 
 // Random, so that processes which collided do not collide again.
 useconds_t lockedWait() {
@@ -133,9 +55,8 @@ void reportFailedStatement(const char *szSql, const char *szError) {
   SCHED_LOG("Exec sql:[%s] error: %s\n", szSql, szError);
 }
 
-int execute(sqlite3 *db, Purpose purpose, const char *szSql, RowCallback takeRow, void *context) {
+int execute(sqlite3 *db, const char *szSql, RowCallback takeRow, void *context) {
   for (int retries = 0;; ++retries) {
-    const RestrictedConnection restricted(db, purpose);
     char *szError = nullptr;
     if (sqlite3_exec(db, szSql, takeRow, context, &szError) == SQLITE_OK) {
       return 0;
@@ -155,40 +76,34 @@ int execute(sqlite3 *db, Purpose purpose, const char *szSql, RowCallback takeRow
 }
 
 // A statement that was cut could have lost its WHERE clause: it must not run.
-int execute(sqlite3 *db, Purpose purpose, const Statement &statement, RowCallback takeRow,
-            void *context) {
+int execute(sqlite3 *db, const Statement &statement, RowCallback takeRow, void *context) {
   if (statement.wasCut()) {
     reportFailedStatement(statement.c_str(), "statement too long");
     return -1;
   }
-  return execute(db, purpose, statement.c_str(), takeRow, context);
+  return execute(db, statement.c_str(), takeRow, context);
 }
 
-// "/tmp" is everybody's, and SQLite trusts what it finds beside a database: a journal planted there
-// would be rolled back, and files that it names deleted. So each of these files is ours, or not
-// there.
-bool isOurs(const char *szPath) {
-  struct stat info = {};
-  if (lstat(szPath, &info) != 0) {
-    return errno == ENOENT;
+// With a text of somebody's between its apostrophes.
+int execute(sqlite3 *db, const Statement &statement, const char *szText, AfterText after,
+            RowCallback takeRow, void *context) {
+  Refusal reason;
+  if (!statement.wasCut() && isRefused(szText, after, &reason)) {
+    reportFailedStatement(statement.c_str(), reason.c_str());
+    return -1;
   }
-  return S_ISREG(info.st_mode) && info.st_nlink == 1 &&
-         (info.st_uid == 0 || info.st_uid == geteuid()) &&
-         (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
+  return execute(db, statement, takeRow, context);
 }
 
-constexpr char kJournal[] = "/tmp/sched_status.sqlite-journal";
-constexpr const char *kDatabaseFiles[] = {kDatabase, kJournal, "/tmp/sched_status.sqlite-wal",
-                                          "/tmp/sched_status.sqlite-shm"};
 constexpr mode_t kOwnersOnly = 0600;  // a reader's lock would keep every run from being recorded
 
-// Makes the file, when it is missing, before anyone else can. In a sticky directory it stays ours.
-void occupy(const char *szPath) {
-  const int descriptor =
-      open(szPath, O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kOwnersOnly);
-  if (descriptor >= 0) {
-    close(descriptor);
-  }
+const SchedSharedName &nameOf(const char *szPath) {
+  return strcmp(szPath, kSchedJournal.path) == 0 ? kSchedJournal : kSchedDatabase;
+}
+
+bool holdName(const char *szPath, bool mayMake) {
+  return mayMake ? schedTakeName(nameOf(szPath))
+                 : schedLookAt(nameOf(szPath), nullptr) == SchedNameState::kOurs;
 }
 
 void createDatabase() {
@@ -197,7 +112,79 @@ void createDatabase() {
   umask(mask);
 }
 
-// A journal that is kept between transactions keeps its name taken.
+bool takeName(const SchedSharedName &name) {
+  if (schedTakeName(name)) {
+    return true;
+  }
+  const char *szWhy = "cannot be made";
+  schedLookAt(name, &szWhy);
+  BoundedText<128> text;
+  text.append("%s %s", name.path, szWhy != nullptr ? szWhy : "was another user's");
+  SCHED_SET_ERROR(kErrOpen);
+  SCHED_LOG("Can't open database: %s\n", text.c_str());
+  return false;
+}
+
+// A journal is made by nobody who may not write the database: it would be in its owner's way.
+bool takeNames() {
+  if (schedLookAt(kSchedDatabase, nullptr) == SchedNameState::kFree) {
+    createDatabase();
+  }
+  return takeName(kSchedDatabase) && (eaccess(kDatabase, W_OK) != 0 || takeName(kSchedJournal));
+}
+
+// An empty database takes the place of the one that is there, which stays under a name of its own
+// together with its log, so that its rows can still be read. The name is never free.
+bool moveAside() {
+  char aside[] = "/tmp/sched_status.sqlite.wal.XXXXXX";
+  const int descriptor = mkostemp(aside, O_CLOEXEC);
+  if (descriptor < 0) {
+    return false;
+  }
+  close(descriptor);
+  if (renameat2(AT_FDCWD, aside, AT_FDCWD, kDatabase, RENAME_EXCHANGE) != 0) {
+    unlink(aside);
+    return false;
+  }
+  constexpr SchedSharedName kLog = {"/tmp/sched_status.sqlite-wal", kOwnersOnly, false, ""};
+  if (schedLookAt(kLog, nullptr) == SchedNameState::kOurs) {
+    BoundedText<sizeof(aside) + sizeof("-wal")> log;
+    log.append("%s-wal", aside);
+    rename(kLog.path, log.c_str());
+  }
+  SCHED_LOG("%s was in WAL mode and is now %s\n", kDatabase, aside);
+  return true;
+}
+
+int openDatabase(sqlite3 **ppHandle) {
+  return openOwnFilesOnly(kDatabase, holdName, ppHandle);
+}
+
+bool isInWalMode(sqlite3 *db) {
+  return sqlite3_extended_errcode(db) == kInWalMode;
+}
+
+// In WAL mode SQLite would need files whose names others can hold. Processes that find it so take
+// turns, lest one moves aside what another has just made.
+int openInPlaceOfWal(sqlite3 **ppHandle) {
+  const int turn = open(kSchedJournal.path, O_RDWR | O_NOFOLLOW | O_CLOEXEC);
+  if (turn < 0) {
+    return SQLITE_CANTOPEN;
+  }
+  int result = SQLITE_CANTOPEN;
+  if (flock(turn, LOCK_EX) == 0) {
+    sqlite3_close(*ppHandle);
+    result = openDatabase(ppHandle);
+    if (result != SQLITE_OK && isInWalMode(*ppHandle) && moveAside()) {
+      sqlite3_close(*ppHandle);
+      result = openDatabase(ppHandle);
+    }
+  }
+  close(turn);
+  return result;
+}
+
+// Cheaper than to empty it after each transaction.
 void keepJournal(sqlite3 *db) {
   sqlite3_stmt *statement = nullptr;
   if (sqlite3_prepare_v2(db, "PRAGMA journal_mode=PERSIST", -1, &statement, nullptr) == SQLITE_OK) {
@@ -269,7 +256,7 @@ int reportedCode(const ZELO_SCHED_STATUS &row) {
 int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStatusCode,
               char *szComment, size_t cbComment) {
   ZELO_SCHED_STATUS row = {};
-  if (execute(db, Purpose::kRead, select, takeFirstRow, &row) < 0) {
+  if (execute(db, select, takeFirstRow, &row) < 0) {
     return -1;
   }
   if (row.found == 0) {
@@ -289,28 +276,23 @@ int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStat
 
 sqlite3 *ZELOSchedDBInit(void) {
   ZELOSchedRandInit();
-  if (access(kDatabase, F_OK) != 0) {
-    createDatabase();
-  }
-  occupy(kJournal);
-  for (const char *szPath : kDatabaseFiles) {
-    if (!isOurs(szPath)) {
-      SCHED_SET_ERROR(kErrOpen);
-      SCHED_LOG("Can't open database: %s\n", "a file of it is not its owner's alone");
-      return nullptr;
-    }
+  if (!takeNames()) {
+    return nullptr;
   }
   sqlite3 *db = nullptr;
-  if (sqlite3_open(kDatabase, &db) != SQLITE_OK) {
+  int result = openDatabase(&db);
+  if (result != SQLITE_OK && isInWalMode(db)) {
+    result = openInPlaceOfWal(&db);
+  }
+  if (result != SQLITE_OK) {
     SCHED_SET_ERROR(kErrOpen);
     SCHED_LOG("Can't open database: %s\n", sqlite3_errmsg(db));
     sqlite3_close(db);
     return nullptr;
   }
-  if (execute(db, Purpose::kCreate, kCreateTable, nullptr, nullptr) < 0) {
+  if (execute(db, kCreateTable, nullptr, nullptr) < 0) {
     return nullptr;  // The handle stays open, as callers have always found it.
   }
-  occupy(kJournal);  // creating the table has removed it
   keepJournal(db);
   return db;
 }
@@ -322,7 +304,7 @@ int ZELOSchedDBIsTaskRunning(sqlite3 *db, long id, ZELO_SCHED_STATUS *pStatus) {
   select.append(
       "SELECT pid,status_id,task_id from task_status WHERE task_id=%ld AND status_code=%d;", id,
       ZELO_SCHED_STATUS_RUNNING);
-  return execute(db, Purpose::kRead, select, takeFirstLiveRow, pStatus);
+  return execute(db, select, takeFirstLiveRow, pStatus);
 }
 
 int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp, ZELO_SCHED_STATUS *pStatus) {
@@ -332,7 +314,7 @@ int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp, ZELO_SCHED_STATUS *p
   Statement select;
   select.append("SELECT pid,status_id,task_id from task_status WHERE app='%s' AND status_code=%d;",
                 szApp, ZELO_SCHED_STATUS_RUNNING);
-  return execute(db, Purpose::kRead, select, takeFirstLiveRow, pStatus);
+  return execute(db, select, szApp, AfterText::kCondition, takeFirstLiveRow, pStatus);
 }
 
 int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatusID) {
@@ -346,7 +328,7 @@ int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatus
       "INSERT INTO task_status (app, pid, timestamp, task_id, status_code) "
       "VALUES ('%s', %d, %ld, %ld, %d);",
       pTask->App, pid, now, taskID, ZELO_SCHED_STATUS_RUNNING);
-  if (execute(db, Purpose::kInsert, insert, nullptr, nullptr) < 0) {
+  if (execute(db, insert, pTask->App, AfterText::kNothing, nullptr, nullptr) < 0) {
     return -1;
   }
   Statement select;
@@ -355,7 +337,7 @@ int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatus
       "AND status_code=%d AND pid=%d;",
       pTask->App, taskID, now, ZELO_SCHED_STATUS_RUNNING, pid);
   ZELO_SCHED_STATUS row = {};
-  if (execute(db, Purpose::kRead, select, takeFirstRow, &row) < 0) {
+  if (execute(db, select, takeFirstRow, &row) < 0) {
     return -1;
   }
   if (row.found == 0) {
@@ -373,9 +355,10 @@ int ZELOSchedDBSetStatus(sqlite3 *db, int iStatusID, int orgStatusCode, int newS
   SCHED_CHECK_ARG(db != nullptr, "((void *)0) != db", -1);
   SCHED_CHECK_ARG(orgStatusCode != ZELO_SCHED_STATUS_NONE || iStatusID != kAnyStatusID,
                   "SCHED_STATUS_CODE_NONE != orgStatusCode || -1 != iStatusID", -1);
+  const bool hasComment = szComment != nullptr && szComment[0] != '\0';
   Statement update;
   update.append("UPDATE task_status SET status_code=%d", newStatusCode);
-  if (szComment != nullptr && szComment[0] != '\0') {
+  if (hasComment) {
     update.append(", comment='%s'", szComment);
   }
   if (iStatusID == kAnyStatusID) {
@@ -386,7 +369,7 @@ int ZELOSchedDBSetStatus(sqlite3 *db, int iStatusID, int orgStatusCode, int newS
       update.append(" AND status_code=%d", orgStatusCode);
     }
   }
-  return execute(db, Purpose::kUpdate, update, nullptr, nullptr);
+  return execute(db, update, hasComment ? szComment : "", AfterText::kNothing, nullptr, nullptr);
 }
 
 int ZELOSchedDBGetStatusByStatusID(sqlite3 *db, int iStatusID, int *pStatusCode, char *szComment,

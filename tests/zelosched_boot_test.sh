@@ -1006,10 +1006,12 @@ keeps_none_for_others() {
   refuses_others history --keep && says 1 "cannot make /usr/zelo/var: Permission denied"
 }
 
-knows_that_it_is_up_beside_a_planted_status_database() {
+knows_that_it_is_up_beside_a_refused_status_database() {
   clean
-  install -m 0600 -o "$NOBODY" /dev/null "$STATUS"
+  mkdir "$STATUS"
+  mount -n -t tmpfs none "$STATUS"
   keep
+  umount -n "$STATUS"
   says 1 "cannot read $STATUS" && same "$(sql "$KEPT" 'SELECT seen FROM up')" "$(date -u -d "$NOW" +%s)"
 }
 
@@ -1088,8 +1090,8 @@ check "and a link" refuses_to_keep_in "it is not this user's own file alone" lin
 check "a directory that cannot be made is told" says_that_no_directory_can_be_made
 check_as_root "the kept history is not shown to others" shows_nothing_of_it_to_others
 check_as_root "nor made by them" keeps_none_for_others
-check_as_root "beside a status database that is refused, that the machine is up is noted" \
-  knows_that_it_is_up_beside_a_planted_status_database
+check "beside a status database that is refused, that the machine is up is noted" \
+  knows_that_it_is_up_beside_a_refused_status_database
 check "on a full disk what is kept stays" keeps_what_is_kept_on_a_full_disk
 check "a history that another holds for too long is told" gives_up_on_a_held_history
 check "one that cannot be written is shown" reads_what_cannot_be_written

@@ -443,26 +443,36 @@ ZELO_SCHED_API int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled)
 extern ZELO_SCHED_API FILE *pfLock;
 
 /* Opens the status database, creating it when it is missing. The caller closes
- * it with sqlite3_close; an authorizer of its own on the connection is gone
- * after the calls below. Null on failure: 0x0900 when it cannot be opened, no
- * code, and the connection left open, when the table cannot be created. */
+ * it with sqlite3_close, before the library is unloaded. The database and its
+ * rollback journal are used only while they are root's or the caller's, and
+ * nothing else that lies beside them: the connection knows no WAL mode and no
+ * transaction over attached databases. A database in WAL mode is moved aside,
+ * which the log tells, and made anew. The calls below run their statements on it and leave
+ * its authorizer, limits, hooks and transaction as they are. Null on failure:
+ * 0x0900 when it cannot be opened, no code, and the connection left open, when
+ * the table cannot be created. */
 ZELO_SCHED_API sqlite3 *ZELOSchedDBInit(void);
 
 /* Looks for a run of the task, or of any task of the application, that is still
  * going. 0 with pStatus->found 1 (pid, statusID and taskID are the run's) or
- * untouched, or -1: 0x0D00, no code when the statement failed. */
+ * untouched, or -1: 0x0D00, no code when the statement failed.
+ * szApp stands in the statement as it is: an apostrophe of the name is doubled.
+ * A text that ends its apostrophes may go on with comparisons of columns, numbers
+ * and texts, joined by AND, OR, NOT and ||; anything else fails the call. */
 ZELO_SCHED_API int ZELOSchedDBIsTaskRunning(sqlite3 *db, long id, ZELO_SCHED_STATUS *pStatus);
 ZELO_SCHED_API int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp,
                                            ZELO_SCHED_STATUS *pStatus);
 
 /* Records a run of the task by this process, starting now. pStatusID, which may
  * be null, receives the row's key. 0, or -1: 0x0D00, 0x0B00, not logged, when the
- * row cannot be read back, no code when a statement failed. */
+ * row cannot be read back, no code when a statement failed, which it does when an
+ * apostrophe in pTask->App is not doubled. */
 ZELO_SCHED_API int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatusID);
 
 /* Sets code and comment (null or empty: the comment stays) of the row with that
  * key (-1: of every row) whose code is orgStatusCode (0: any). Not both -1 and
- * 0. 0, or -1: 0x0D00, no code when the statement failed. */
+ * 0. 0, or -1: 0x0D00, no code when the statement failed, which it does when an
+ * apostrophe in szComment is not doubled. */
 ZELO_SCHED_API int ZELOSchedDBSetStatus(sqlite3 *db, int iStatusID, int orgStatusCode,
                                         int newStatusCode, const char *szComment);
 

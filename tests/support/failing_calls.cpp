@@ -236,6 +236,7 @@ struct Forced {
   unsigned timesShorter = 1;
   std::function<void(size_t)> sleepAction;
   std::function<void(const std::string &)> execAction;
+  std::function<void(const std::string &)> callAction;
   std::vector<int> randValues;
   size_t randNext = 0;
 };
@@ -247,6 +248,7 @@ Forced &forced() {
 
 // malloc is called before anything else here is ready, and by everything here.
 bool allocationPlanned = false;
+bool callsAreWatched = false;
 
 State::PerCall &slot(Call call) {
   return state().calls[static_cast<size_t>(call)];
@@ -313,11 +315,20 @@ bool fallsOn(Call call) {
 
 thread_local bool countsAreWritten = false;
 
+void actBefore(Call call) {
+  if (!callsAreWatched || OwnWork::isGoingOn() || isAllocation(call)) return;
+  const OwnWork own;
+  const int error = errno;
+  forced().callAction(kCalls[static_cast<size_t>(call)].name);
+  errno = error;
+}
+
 // Counts the call. The plan by which it fails, or null.
 const Plan *failing(Call call, const char *key = nullptr, size_t size = 0) {
   if (countsAreWritten) return nullptr;
   State::PerCall &calls = slot(call);
   ++calls.count;
+  actBefore(call);
   if (fallsOn(call)) {
     if (call <= Call::k_ZELOEncodingBase64Decode) {
       QLIBCErrSetEx(kInjectedCode, kInjectedFile, kInjectedLine);
@@ -438,6 +449,7 @@ unsigned callCount(const std::string &call) {
 
 void resetFailingCalls() {
   allocationPlanned = false;
+  callsAreWatched = false;
   for (State::PerCall &calls : state().calls) {
     calls.count = 0;
     for (Plan &plan : calls.plans) plan.stands = false;
@@ -540,6 +552,11 @@ void onSleep(std::function<void(size_t)> action) {
 
 void onExec(std::function<void(const std::string &)> action) {
   forced().execAction = std::move(action);
+}
+
+void beforeEachCall(std::function<void(const std::string &)> action) {
+  forced().callAction = std::move(action);
+  callsAreWatched = true;
 }
 
 void setRandValues(std::vector<int> values) {

@@ -157,6 +157,10 @@ void onSleep(std::function<void(size_t)> action);
 // Called before each QLIBCExec, with "program argument argument".
 void onExec(std::function<void(const std::string &)> action);
 
+// Called before each call that can be made to fail, with its name: the moment at which somebody
+// else acts. What it calls is the test's own work. resetFailingCalls ends it.
+void beforeEachCall(std::function<void(const std::string &call)> action);
+
 // rand() gives these values in turn, over and over; an empty list gives rand() back.
 void setRandValues(std::vector<int> values);
 // The seed that srand() was last given.

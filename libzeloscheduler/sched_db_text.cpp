@@ -1,0 +1,111 @@
+// An application's name comes from whoever made the task, and its apostrophes stand in the
+// statements as they are. SQLite bounds neither the time nor the memory that preparing a statement
+// takes, and its authorizer is the caller's; so a text that would make another statement of the one
+// it stands in is refused before SQLite sees it, by what it has outside of apostrophes.
+//
+// What is let through has no semicolon, comma, bracket, comment or quoted identifier. So the
+// statement remains one, with its own values and its own end, and can call no function, name no
+// table and hold no query.
+#include "sched_db_text.h"
+
+#include <strings.h>
+
+#include <algorithm>
+#include <cctype>
+#include <cstring>
+#include <string_view>
+
+namespace {
+
+constexpr std::string_view kQueryWords[] = {"select", "values", "with"};
+constexpr std::string_view kConditionWords[] = {"and",     "app",         "comment",   "is",
+                                                "not",     "null",        "or",        "pid",
+                                                "task_id", "status_code", "status_id", "timestamp"};
+constexpr char kConditionOperators[] = "<=>!|";
+constexpr int kMostTokens = 64;  // each costs time for every row
+
+// Of a name or a number; SQLite takes every byte that is not ASCII for a letter.
+bool isOfWord(char c) {
+  const auto byte = static_cast<unsigned char>(c);
+  return byte >= 0x80 || isalnum(byte) != 0 || c == '_' || c == '$';
+}
+
+bool isSpace(char c) {
+  return c == ' ' || (c >= '\t' && c <= '\r');
+}
+
+template <size_t N>
+bool isOneOf(const std::string_view (&words)[N], std::string_view word) {
+  return std::any_of(std::begin(words), std::end(words), [&](std::string_view known) {
+    return known.size() == word.size() && strncasecmp(known.data(), word.data(), word.size()) == 0;
+  });
+}
+
+bool isNumber(std::string_view word) {
+  return std::all_of(word.begin(), word.end(), [](char c) { return c >= '0' && c <= '9'; });
+}
+
+// After the apostrophe that ends it, or at the end of the text. An apostrophe at that end is
+// doubled by the statement's own.
+const char *endOfQuoted(const char *szQuoted) {
+  for (const char *end = strchr(szQuoted, '\''); end != nullptr; end = strchr(end + 2, '\'')) {
+    if (end[1] == '\0') {
+      break;
+    }
+    if (end[1] != '\'') {
+      return end + 1;
+    }
+  }
+  return szQuoted + strlen(szQuoted);
+}
+
+const char *endOfToken(const char *szToken) {
+  if (*szToken == '\'') {
+    return endOfQuoted(szToken + 1);
+  }
+  return isOfWord(*szToken) ? std::find_if_not(szToken, szToken + strlen(szToken), isOfWord)
+                            : szToken + 1;
+}
+
+bool isAllowed(std::string_view token, AfterText after) {
+  const char first = token.front();
+  if (first == '\'') {
+    return true;
+  }
+  if (after == AfterText::kNothing) {
+    return false;
+  }
+  return isOfWord(first) ? isNumber(token) || isOneOf(kConditionWords, token)
+                         : strchr(kConditionOperators, first) != nullptr;
+}
+
+bool isUnknownWord(std::string_view token) {
+  return isOfWord(token.front()) && !isOneOf(kQueryWords, token);
+}
+
+}  // namespace
+
+// Where the text ends outside of apostrophes, the statement's own begins a text that has no end.
+// SQLite says so and does nothing, so that such a statement may reach it.
+bool isRefused(const char *szText, AfterText after, Refusal *pReason) {
+  int tokens = 0;
+  for (const char *next = endOfQuoted(szText); *next != '\0';) {
+    if (isSpace(*next)) {
+      ++next;
+      continue;
+    }
+    const char *const end = endOfToken(next);
+    const std::string_view token(next, static_cast<size_t>(end - next));
+    const bool isTooMuch = ++tokens > kMostTokens;
+    if (isTooMuch || !isAllowed(token, after)) {
+      if (!isTooMuch && isUnknownWord(token)) {
+        pReason->append("near \"%.*s\": syntax error", static_cast<int>(token.size()), next);
+      } else {
+        pReason->append("not authorized");
+      }
+      return true;
+    }
+    next = end;
+  }
+  return false;
+}

@@ -1,0 +1,497 @@
+// What others put beside the status database, under the names that SQLite gives its journals.
+#include <gtest/gtest.h>
+#include <sqlite3.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstring>
+#include <filesystem>
+#include <memory>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "sandbox_fixture.h"
+#include "status_db.h"
+#include "tasks.h"
+#include "zelosched.h"
+
+namespace {
+
+using support::beforeEachCall;
+using support::fileExists;
+using support::kStatusDatabase;
+using support::readFile;
+using support::writeFile;
+using Lines = std::vector<std::string>;
+
+const std::string kJournal = std::string(kStatusDatabase) + "-journal";
+const std::string kLog = std::string(kStatusDatabase) + "-wal";
+const std::string kLogIndex = std::string(kStatusDatabase) + "-shm";
+constexpr char kForge[] = "/tmp/forge/database";
+constexpr char kVictim[] = "/tmp/victim";
+constexpr uid_t kNobody = 65534;
+constexpr size_t kPageSize = 4096;
+constexpr size_t kSectorSize = 512;
+
+struct CloseDatabase {
+  void operator()(sqlite3 *db) const { sqlite3_close_v2(db); }
+};
+using Database = std::unique_ptr<sqlite3, CloseDatabase>;
+
+Database openPlainly(const char *szPath) {
+  sqlite3 *db = nullptr;
+  EXPECT_EQ(sqlite3_open_v2(szPath, &db, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr),
+            SQLITE_OK);
+  return Database(db);
+}
+
+// What the statements give, "|" between values and " " between rows, or SQLite's error.
+std::string answer(sqlite3 *db, const std::string &sql) {
+  const support::OwnWork own;
+  std::string rows;
+  char *error = nullptr;
+  sqlite3_exec(
+      db, sql.c_str(),
+      [](void *text, int columns, char **values, char **) {
+        auto *all = static_cast<std::string *>(text);
+        if (!all->empty()) all->append(" ");
+        for (int i = 0; i < columns; ++i) {
+          all->append(i > 0 ? "|" : "").append(values[i] != nullptr ? values[i] : "");
+        }
+        return 0;
+      },
+      &rows, &error);
+  if (error != nullptr) rows = error;
+  sqlite3_free(error);
+  return rows;
+}
+
+std::string applications(const Database &db) {
+  return answer(db.get(), "SELECT app FROM task_status ORDER BY status_id");
+}
+
+void giveAway(const std::string &path) {
+  EXPECT_EQ(chown(path.c_str(), kNobody, kNobody), 0) << path;
+}
+
+std::string bigEndian(size_t number) {
+  std::string bytes;
+  for (int shift = 24; shift >= 0; shift -= 8) {
+    bytes.push_back(static_cast<char>(number >> static_cast<unsigned>(shift)));
+  }
+  return bytes;
+}
+
+constexpr char kJournalMagic[] = "\xd9\xd5\x05\xf9\x20\xa1\x63\xd7";
+
+// A rollback journal that makes the database what `pages` is.
+std::string journalOf(const std::string &pages) {
+  const size_t count = pages.size() / kPageSize;
+  std::string journal = kJournalMagic + bigEndian(count) + bigEndian(0) + bigEndian(count) +
+                        bigEndian(kSectorSize) + bigEndian(kPageSize);
+  journal.resize(kSectorSize);
+  for (size_t page = 0; page < count; ++page) {
+    const std::string bytes = pages.substr(page * kPageSize, kPageSize);
+    constexpr size_t kStep = 200;
+    unsigned sum = 0;
+    for (size_t i = kPageSize - kStep; i > 0; i -= kStep <= i ? kStep : i) {
+      sum += static_cast<unsigned char>(bytes[i]);
+    }
+    journal += bigEndian(page + 1) + bytes + bigEndian(sum);
+  }
+  return journal;
+}
+
+// That the journal is one of several, which this super-journal holds together.
+std::string naming(const std::string &superJournal) {
+  constexpr size_t kPageOfLocks = (size_t{1} << 30U) / kPageSize + 1;
+  unsigned sum = 0;
+  for (const char c : superJournal) sum += static_cast<unsigned>(c);
+  return bigEndian(kPageOfLocks) + superJournal + bigEndian(superJournal.size()) + bigEndian(sum) +
+         kJournalMagic;
+}
+
+class PlantedJournalTest : public support::SandboxTest {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    forget();
+    std::filesystem::create_directory("/tmp/forge");
+  }
+  void TearDown() override {
+    support::resetFailingCalls();
+    forget();
+    SandboxTest::TearDown();
+  }
+
+  static void forget() {
+    for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {
+      const std::string name = entry.path().filename();
+      if (name.starts_with("sched_status.sqlite") || name == "forge" || name == "victim") {
+        std::filesystem::remove_all(entry.path());
+      }
+    }
+  }
+
+  // A closed database with one row.
+  static void makeGenuine() {
+    const Database db = init();
+    add(db, "genuine");
+  }
+  static Database init() { return Database(ZELOSchedDBInit()); }
+  static int add(const Database &db, const char *szApp) {
+    const support::Task task = support::makeTask("task", "");
+    support::setText(task->App, szApp);
+    return ZELOSchedDBAddRecord(db.get(), task.get(), nullptr);
+  }
+  // A copy of the genuine database, to change.
+  static Database forge() {
+    const support::OwnWork own;
+    std::filesystem::copy_file(kStatusDatabase, kForge,
+                               std::filesystem::copy_options::overwrite_existing);
+    return openPlainly(kForge);
+  }
+  static std::string forgedLog() {
+    const support::OwnWork own;
+    const Database db = forge();
+    answer(db.get(), "PRAGMA journal_mode=WAL; UPDATE task_status SET app='forged'");
+    return readFile(std::string(kForge) + "-wal");
+  }
+  static std::string forgedJournal() {
+    const support::OwnWork own;
+    answer(forge().get(), "UPDATE task_status SET app='forged'");
+    return journalOf(readFile(kForge));
+  }
+  static void plant(const std::string &path, const std::string &contents) {
+    const support::OwnWork own;
+    writeFile(path, contents, 0666);
+    giveAway(path);
+  }
+  static void expectStillHis(const std::string &path, const std::string &contents) {
+    struct stat info = {};
+    ASSERT_EQ(lstat(path.c_str(), &info), 0) << path;
+    EXPECT_EQ(info.st_uid, kNobody);
+    EXPECT_EQ(readFile(path), contents);
+  }
+};
+
+// The forgeries are what SQLite takes for its own.
+TEST_F(PlantedJournalTest, SqliteBelievesThemByItself) {
+  makeGenuine();
+  writeFile(kLog, forgedLog());
+  EXPECT_EQ(applications(openPlainly(kStatusDatabase)), "forged");
+  forget();
+  std::filesystem::create_directory("/tmp/forge");
+  makeGenuine();
+  writeFile(kVictim, "important");
+  writeFile(kJournal, forgedJournal() + naming(kVictim));
+  EXPECT_EQ(applications(openPlainly(kStatusDatabase)), "forged");
+  EXPECT_FALSE(fileExists(kVictim));
+}
+
+TEST_F(PlantedJournalTest, ALogThatIsThereIsNeitherReadNorTouched) {
+  REQUIRE_OTHER_USERS();
+  makeGenuine();
+  const std::string log = forgedLog();
+  plant(kLog, log);
+  plant(kLogIndex, "his");
+  const Database db = init();
+  ASSERT_NE(db, nullptr);
+  EXPECT_EQ(add(db, "next"), 0);
+  EXPECT_EQ(applications(db), "genuine next");
+  expectStillHis(kLog, log);
+  expectStillHis(kLogIndex, "his");
+  EXPECT_EQ(support::logged(), Lines{});
+}
+
+// Whenever a log appears, between any two calls of an opening and a recording.
+TEST_F(PlantedJournalTest, ALogThatAppearsMeanwhileIsNeitherReadNorTouched) {
+  REQUIRE_OTHER_USERS();
+  bool wasLast = false;
+  for (unsigned nth = 1; !wasLast; ++nth) {
+    SCOPED_TRACE(nth);
+    forget();
+    std::filesystem::create_directory("/tmp/forge");
+    makeGenuine();
+    const std::string log = forgedLog();
+    unsigned calls = 0;
+    beforeEachCall([&](const std::string &) {
+      if (++calls == nth) plant(kLog, log);
+    });
+    const Database db = init();
+    ASSERT_NE(db, nullptr);
+    EXPECT_EQ(add(db, "next"), 0);
+    support::resetFailingCalls();
+    wasLast = calls < nth;
+    EXPECT_EQ(applications(db), "genuine next");
+    if (!wasLast) expectStillHis(kLog, log);
+  }
+}
+
+// Once taken, so that nobody can put another in its place.
+TEST_F(PlantedJournalTest, TheNameOfTheJournalIsNeverFreeAgain) {
+  bool wasTaken = false;
+  unsigned timesFree = 0;
+  const auto watch = [&] {
+    beforeEachCall([&](const std::string &call) {
+      const bool isTaken = fileExists(kJournal);
+      if (wasTaken && !isTaken) {
+        ++timesFree;
+        ADD_FAILURE() << "free before " << call;
+      }
+      wasTaken = isTaken;
+    });
+  };
+  watch();
+  const Database db = init();
+  ASSERT_NE(db, nullptr);
+  EXPECT_EQ(add(db, "first"), 0);
+  // Also when a caller wants another mode.
+  for (const char *mode : {"delete", "truncate", "memory", "off", "delete"}) {
+    EXPECT_EQ(answer(db.get(), std::string("PRAGMA journal_mode=") + mode), mode);
+    watch();
+    EXPECT_EQ(add(db, "next"), 0) << mode;
+  }
+  const Database second = init();
+  EXPECT_EQ(timesFree, 0U);
+  EXPECT_TRUE(fileExists(kJournal));
+  EXPECT_FALSE(fileExists(kLog));
+}
+
+TEST_F(PlantedJournalTest, AJournalThatIsNoLongerOursIsMovedAwayAndNotRolledBack) {
+  REQUIRE_OTHER_USERS();
+  makeGenuine();
+  const std::string journal = forgedJournal() + naming(kVictim);
+  writeFile(kVictim, "important");
+  const Database db = init();
+  // As root's own sqlite3 does, which knows nothing of others.
+  std::filesystem::remove(kJournal);
+  plant(kJournal, journal);
+  EXPECT_EQ(applications(db), "genuine");
+  support::failCall("renameat2", {.error = EIO});
+  EXPECT_EQ(add(db, "next"), -1);
+  EXPECT_EQ(applications(db), "genuine");
+  expectStillHis(kJournal, journal);
+  EXPECT_EQ(add(db, "next"), 0);
+  EXPECT_EQ(applications(db), "genuine next");
+  EXPECT_EQ(readFile(support::movedAway(kJournal)), journal);
+  EXPECT_EQ(readFile(kVictim), "important");
+}
+
+TEST_F(PlantedJournalTest, AJournalOfOursThatIsHotIsRolledBack) {
+  makeGenuine();
+  writeFile(kJournal, forgedJournal(), 0600);
+  EXPECT_EQ(applications(init()), "forged");
+}
+
+TEST_F(PlantedJournalTest, ASuperJournalIsNeitherBelievedNorDeleted) {
+  makeGenuine();
+  writeFile(kVictim, "important");
+  writeFile(kJournal, forgedJournal() + naming(kVictim), 0600);
+  EXPECT_EQ(applications(init()), "genuine");
+  EXPECT_EQ(readFile(kVictim), "important");
+}
+
+// A file that somebody moved there from a directory of his own can be root's.
+TEST_F(PlantedJournalTest, AJournalBesideAMissingDatabaseIsNotRolledBack) {
+  makeGenuine();
+  writeFile(kVictim, "important");
+  const std::string journal = forgedJournal();
+  for (const std::string &end : {std::string(), naming(kVictim)}) {
+    std::filesystem::remove(kStatusDatabase);
+    writeFile(kJournal, journal + end, 0600);
+    EXPECT_EQ(applications(init()), "");
+    EXPECT_EQ(readFile(kVictim), "important");
+  }
+}
+
+TEST_F(PlantedJournalTest, ACallerCannotPutTheDatabaseIntoWalMode) {
+  const Database db = init();
+  EXPECT_EQ(answer(db.get(), "PRAGMA journal_mode=WAL"), "persist");
+  EXPECT_EQ(add(db, "next"), 0);
+  EXPECT_EQ(applications(init()), "next");
+  EXPECT_FALSE(fileExists(kLog));
+  EXPECT_FALSE(fileExists(kLogIndex));
+}
+
+// ---- a database in WAL mode
+
+class WalModeTest : public PlantedJournalTest {
+ protected:
+  void SetUp() override {
+    PlantedJournalTest::SetUp();
+    makeGenuine();
+    EXPECT_EQ(answer(openPlainly(kStatusDatabase).get(), "PRAGMA journal_mode=WAL"), "wal");
+    support::clearLog();
+  }
+  static Lines namesAside() {
+    Lines names;
+    for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {
+      const std::string name = entry.path().filename();
+      if (name.starts_with("sched_status.sqlite.wal.")) names.push_back(entry.path());
+    }
+    std::sort(names.begin(), names.end());
+    return names;
+  }
+};
+
+TEST_F(WalModeTest, ItIsMovedAsideAndMadeAnew) {
+  bool wasFree = false;
+  beforeEachCall([&](const std::string &) { wasFree = wasFree || !fileExists(kStatusDatabase); });
+  const Database db = init();
+  support::resetFailingCalls();
+  ASSERT_NE(db, nullptr);
+  EXPECT_FALSE(wasFree);
+  EXPECT_EQ(add(db, "next"), 0);
+  EXPECT_EQ(applications(db), "next");
+  struct stat info = {};
+  ASSERT_EQ(stat(kStatusDatabase, &info), 0);
+  EXPECT_EQ(info.st_mode & 0777U, 0600U);
+  ASSERT_EQ(namesAside().size(), 1U);
+  EXPECT_EQ(applications(openPlainly(namesAside()[0].c_str())), "genuine");
+  EXPECT_EQ(support::logged(), Lines{"sched_task_db.cpp:N " + std::string(kStatusDatabase) +
+                                     " was in WAL mode and is now " + namesAside()[0] + "\n"});
+}
+
+TEST_F(WalModeTest, ItsOwnLogGoesWithIt) {
+  const std::string database = readFile(kStatusDatabase);
+  {
+    const Database open = openPlainly(kStatusDatabase);
+    answer(open.get(), "UPDATE task_status SET app='logged'");
+    const std::string log = readFile(kLog);
+    std::filesystem::remove_all("/tmp/forge");
+    writeFile("/tmp/forge/log", log);
+  }
+  writeFile(kStatusDatabase, database, 0600);
+  writeFile(kLog, readFile("/tmp/forge/log"), 0600);
+  const Database db = init();
+  EXPECT_EQ(applications(db), "");
+  EXPECT_FALSE(fileExists(kLog));
+  ASSERT_EQ(namesAside().size(), 2U);
+  EXPECT_EQ(applications(openPlainly(namesAside()[0].c_str())), "logged");
+}
+
+TEST_F(WalModeTest, SomebodyElsesLogStaysWhereItIs) {
+  REQUIRE_OTHER_USERS();
+  plant(kLog, "his");
+  const Database db = init();
+  ASSERT_NE(db, nullptr);
+  EXPECT_EQ(namesAside().size(), 1U);
+  expectStillHis(kLog, "his");
+}
+
+TEST_F(WalModeTest, WhatAnotherProcessHasJustMadeIsNotMovedAside) {
+  bool isDone = false;
+  beforeEachCall([&](const std::string &call) {
+    if (call != "flock" || isDone) return;
+    isDone = true;
+    std::filesystem::remove(kStatusDatabase);
+    support::addStatusRow({.pid = 1, .app = "made meanwhile"});
+    chmod(kStatusDatabase, 0600);
+  });
+  const Database db = init();
+  support::resetFailingCalls();
+  EXPECT_TRUE(isDone);
+  EXPECT_EQ(applications(db), "made meanwhile");
+  EXPECT_EQ(namesAside(), Lines{});
+}
+
+TEST_F(WalModeTest, WithoutRoomForAnotherTheDatabaseIsNotOpened) {
+  for (const char *call : {"mkostemp", "flock"}) {
+    support::clearLog();
+    support::failCall(call, {.error = ENOSPC});
+    EXPECT_EQ(init(), nullptr) << call;
+    EXPECT_EQ(support::logged(),
+              Lines{"sched_task_db.cpp:N Can't open database: unable to open database file\n"});
+    support::resetFailingCalls();
+  }
+  EXPECT_EQ(namesAside(), Lines{});
+}
+
+// ---- other databases of the process
+
+std::vector<sqlite3_vfs *> allVfs() {
+  std::vector<sqlite3_vfs *> all;
+  for (sqlite3_vfs *vfs = sqlite3_vfs_find(nullptr); vfs != nullptr; vfs = vfs->pNext) {
+    all.push_back(vfs);
+  }
+  return all;
+}
+
+sqlite3_vfs *vfsOf(const Database &db) {
+  sqlite3_vfs *vfs = nullptr;
+  sqlite3_file_control(db.get(), "main", SQLITE_FCNTL_VFS_POINTER, &vfs);
+  return vfs;
+}
+
+TEST_F(PlantedJournalTest, NothingIsLeftInSqliteAfterAnOpening) {
+  const std::vector<sqlite3_vfs *> before = allVfs();
+  const Database db = init();
+  EXPECT_EQ(allVfs(), before);
+  EXPECT_EQ(vfsOf(openPlainly(kForge)), before.front());
+  support::failCall("sqlite3_open");
+  EXPECT_EQ(init(), nullptr);
+  EXPECT_EQ(allVfs(), before);
+}
+
+TEST_F(PlantedJournalTest, WhatACallerAttachesIsOpenedAsEver) {
+  const Database db = init();
+  EXPECT_EQ(answer(db.get(),
+                   "ATTACH '/tmp/forge/other' AS other; CREATE TABLE other.t(a);"
+                   "PRAGMA other.journal_mode=WAL; INSERT INTO other.t VALUES(1)"),
+            "wal");
+  EXPECT_TRUE(fileExists("/tmp/forge/other-wal"));
+  EXPECT_EQ(answer(db.get(), "SELECT a FROM other.t"), "1");
+}
+
+void openOthersMeanwhile() {
+  Database other;
+  Database third;
+  beforeEachCall([&](const std::string &call) {
+    if (call != "sqlite3_open" || other != nullptr) return;
+    other = openPlainly("/tmp/forge/other");
+    third = openPlainly("/tmp/sched_status.sqlite.third");
+  });
+  const Database db(ZELOSchedDBInit());
+  support::resetFailingCalls();
+  ASSERT_NE(other, nullptr);
+  EXPECT_EQ(answer(third.get(), "CREATE TABLE t(a)"), "");
+  // Both in one transaction, for which SQLite makes a super-journal.
+  EXPECT_EQ(answer(other.get(),
+                   "CREATE TABLE t(a); ATTACH '/tmp/forge/second' AS second;"
+                   "CREATE TABLE second.t(a); BEGIN; INSERT INTO t VALUES(1);"
+                   "INSERT INTO second.t VALUES(2); COMMIT"),
+            "");
+  EXPECT_FALSE(fileExists("/tmp/forge/other-journal"));
+  EXPECT_EQ(answer(other.get(), "DETACH second; PRAGMA journal_mode=WAL; INSERT INTO t VALUES(3)"),
+            "wal");
+  EXPECT_TRUE(fileExists("/tmp/forge/other-wal"));
+  EXPECT_EQ(answer(other.get(), "SELECT a FROM t"), "1 3");
+  EXPECT_EQ(applications(db), "genuine");
+}
+
+// As another thread can. In a process of its own, since it changes what is passed on from then on.
+TEST_F(PlantedJournalTest, ADatabaseOpenedMeanwhileIsOpenedAsEver) {
+  makeGenuine();
+  if (fork() == 0) {
+    openOthersMeanwhile();
+    fflush(stdout);
+    _exit(HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);
+  }
+  EXPECT_EQ(support::waitForChildRuns(), std::vector<int>{0});
+}
+
+// A process that closes any descriptor of a file has lost its locks on it.
+TEST_F(PlantedJournalTest, ASecondHandleDropsNoLockOfTheFirst) {
+  const Database first = init();
+  EXPECT_EQ(answer(first.get(), "BEGIN IMMEDIATE"), "");
+  EXPECT_NE(init(), nullptr);
+  if (fork() == 0) {
+    const bool isLocked =
+        answer(openPlainly(kStatusDatabase).get(), "BEGIN IMMEDIATE") == "database is locked";
+    _exit(isLocked ? EXIT_SUCCESS : EXIT_FAILURE);
+  }
+  EXPECT_EQ(support::waitForChildRuns(), std::vector<int>{0});
+}
+
+}  // namespace
