@@ -1,0 +1,97 @@
+#!/bin/bash
+# The power goes at any moment of a change. What had been acknowledged by then is there after the boot:
+# the file system of the persistent copy is in an image, of which a copy is taken at that moment, so
+# that only what had been written to the disk is in it.
+#
+# Functions are called by check:
+# shellcheck disable=SC2317
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+# shellcheck source=tests/support/zelosched_test.sh
+. "$here/support/zelosched_test.sh"
+
+readonly SCRATCH=/run/power_cut_test
+readonly KEPT=/usr/zelo/etc
+readonly CUT=$SCRATCH/cut.img
+# Nothing reaches the disk by itself.
+readonly OPTIONS=commit=300
+mkdir -p "$SCRATCH" "$KEPT"
+
+has_disk() {
+  truncate -s 16M "$SCRATCH/disk.img" && mke2fs -q -t ext4 "$SCRATCH/disk.img" &&
+    mount -o "loop,$OPTIONS" "$SCRATCH/disk.img" "$KEPT"
+}
+
+names() {
+  z list | awk 'NR > 1 { print $NF }' | sort | tr '\n' ' '
+}
+
+add() {
+  z add --quiet --daily 02:30 --name "$1" -- true >/dev/null
+}
+
+# The machine comes up with what was on the disk: the tasks are put back, and shown.
+tasks_after_boot() {
+  mkdir -p "$SCRATCH/now"
+  mount --move "$KEPT" "$SCRATCH/now" 2>/dev/null || mount --bind "$KEPT" "$SCRATCH/now"
+  mount -o "loop,$OPTIONS" "$CUT" "$KEPT"
+  rm -rf /tmp/scheduled_tasks
+  z restore >/dev/null 2>"$SCRATCH/said" || cat "$SCRATCH/said"
+  names
+  umount "$KEPT"
+  mount --move "$SCRATCH/now" "$KEPT" 2>/dev/null || umount "$SCRATCH/now"
+  rm -rf /tmp/scheduled_tasks
+  z restore >/dev/null
+}
+
+keeps_three_tasks() {
+  add one && add two && add three || return 1
+  cp "$SCRATCH/disk.img" "$CUT"
+  same "$(tasks_after_boot)" "one three two "
+}
+
+# In place of /bin/cp: the power goes when it has emptied its target, and the target is on the disk
+# like that.
+cut_in_copies_of() {
+  cat >"$SCRATCH/cp" <<CP
+#!/bin/sh
+if [ "\$3" = "$1" ]; then
+  : >"\$3"
+  sync "\$3"
+  $SCRATCH/real_cp "$SCRATCH/disk.img" "$CUT"
+fi
+exec $SCRATCH/real_cp "\$@"
+CP
+  chmod 755 "$SCRATCH/cp"
+  cp /bin/cp "$SCRATCH/real_cp"
+  mount -n --bind "$SCRATCH/cp" /bin/cp
+}
+
+# is_whole_when_cut TARGET TASKS COMMAND...
+is_whole_when_cut() {
+  local target=$1 wanted=$2
+  shift 2
+  rm -f "$CUT"
+  cut_in_copies_of "$target"
+  local status=0
+  "$@" || status=$?
+  umount -n /bin/cp
+  [[ $status == 0 && -e $CUT ]] && same "$(tasks_after_boot)" "$wanted"
+}
+
+if ((EUID != 0)) || ! has_disk 2>"$SCRATCH/why"; then
+  skip "what is acknowledged outlives the loss of power" "no image can be mounted here: $(cat "$SCRATCH/why")"
+  finish
+fi
+check "three acknowledged tasks outlive the loss of power right after" keeps_three_tasks
+check "so they do while the persistent copy is emptied for a fourth" \
+  is_whole_when_cut "$KEPT/scheduled_tasks" "four one three two " add four
+check "and while it is emptied for a removal" \
+  is_whole_when_cut "$KEPT/scheduled_tasks" "four three two " z remove 1 --yes
+check "a task is on the disk before the working copy is written" \
+  is_whole_when_cut /tmp/scheduled_tasks "five four three two " add five
+umount "$KEPT"
+finish
