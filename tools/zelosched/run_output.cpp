@@ -149,10 +149,11 @@ void RunOutput::show(std::string_view bytes) {
 
 // A run is not held up by what cannot be written any more: the rest is read, and forgotten.
 void RunOutput::writeAll(std::string_view bytes) {
-  while (!bytes.empty() && fault_.empty()) {
-    const ssize_t count = write(STDOUT_FILENO, bytes.data(), bytes.size());
+  size_t written = 0;
+  while (written < bytes.size() && fault_.empty()) {
+    const ssize_t count = write(STDOUT_FILENO, &bytes[written], bytes.size() - written);
     if (count >= 0) {
-      bytes.remove_prefix(static_cast<size_t>(count));
+      written += static_cast<size_t>(count);
       continue;
     }
     const int reason = errno;
