@@ -1,8 +1,6 @@
-// What a run leaves behind of its caller, and what a command starts with.
+// What a command starts with: environment, directory, file mode mask and ids.
 #include "sched_surroundings.h"
 
-#include <fcntl.h>
-#include <signal.h>
 #include <sys/stat.h>
 #include <syslog.h>
 #include <unistd.h>
@@ -21,8 +19,6 @@ constexpr char kPath[] = "PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin
 constexpr char kDefaultShell[] = "/bin/sh";
 constexpr char kRootDirectory[] = "/";
 constexpr mode_t kFileModeMask = 022;
-constexpr int kFirstOwnDescriptor = STDERR_FILENO + 1;
-constexpr unsigned kLastDescriptor = ~0U;
 
 // Of the caller's environment these stay: a command should speak the language and keep the time
 // zone of the machine. Nothing else of it reaches a command.
@@ -94,53 +90,6 @@ bool enterHome(const ZELOUSER *user) {
   return (user != nullptr && chdir(user->szHome) == 0) || chdir(kRootDirectory) == 0;
 }
 
-// One by one where the kernel, or a filter on its calls, does not know the call for all at once.
-bool closeOneByOne(unsigned first, unsigned last) {
-  const long most = sysconf(_SC_OPEN_MAX);
-  if (most < 0) {
-    return false;
-  }
-  for (unsigned descriptor = first; descriptor <= last && descriptor < static_cast<unsigned>(most);
-       ++descriptor) {
-    close(static_cast<int>(descriptor));
-  }
-  return true;
-}
-
-bool closeDescriptors(unsigned first, unsigned last) {
-  return first > last || close_range(first, last, 0) == 0 || closeOneByOne(first, last);
-}
-
-bool closeCallersDescriptors() {
-  const int lock = pfLock != nullptr ? fileno(pfLock) : -1;
-  if (lock < kFirstOwnDescriptor) {
-    return closeDescriptors(kFirstOwnDescriptor, kLastDescriptor);
-  }
-  const auto kept = static_cast<unsigned>(lock);
-  return fcntl(lock, F_SETFD, FD_CLOEXEC) == 0 && closeDescriptors(kFirstOwnDescriptor, kept - 1) &&
-         closeDescriptors(kept + 1, kLastDescriptor);
-}
-
-// A descriptor below 3 that is free would be given to the next file opened, and the command would
-// then write its output into a database.
-void occupyStandardDescriptors() {
-  int descriptor = open("/dev/null", O_RDWR);
-  while (descriptor >= 0 && descriptor < kFirstOwnDescriptor) {
-    descriptor = dup(descriptor);
-  }
-}
-
-void resetSignals() {
-  struct sigaction action = {};
-  action.sa_handler = SIG_DFL;
-  for (int signal = 1; signal < NSIG; ++signal) {
-    sigaction(signal, &action, nullptr);  // SIGKILL and SIGSTOP refuse, and are default anyway
-  }
-  sigset_t none;
-  sigemptyset(&none);
-  sigprocmask(SIG_SETMASK, &none, nullptr);
-}
-
 }  // namespace
 
 int schedSetSurroundings(uid_t uid) {
@@ -153,19 +102,6 @@ int schedSetSurroundings(uid_t uid) {
   umask(kFileModeMask);
   if (!enterHome(user.get())) {
     SCHED_LOG_ERRNO("Failed to change directory: [%u] ", uid);
-    SCHED_SET_ERROR(kErrSystem);
-    return -1;
-  }
-  return 0;
-}
-
-int schedLeaveCaller() {
-  setsid();
-  resetSignals();
-  closelog();  // its descriptor is closed below; the C library would go on using the number
-  occupyStandardDescriptors();
-  if (!closeCallersDescriptors()) {
-    SCHED_LOG_ERRNO("Failed to close descriptors. ");
     SCHED_SET_ERROR(kErrSystem);
     return -1;
   }

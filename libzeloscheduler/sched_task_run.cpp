@@ -12,6 +12,7 @@
 
 #include "sched_backend.h"
 #include "sched_db_guard.h"
+#include "sched_leave_caller.h"
 #include "sched_report.h"
 #include "sched_run_hours.h"
 #include "sched_shared_names.h"

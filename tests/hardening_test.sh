@@ -30,6 +30,27 @@ has_no_text_relocations() {
   ! readelf -dW "$1" | grep TEXTREL >/dev/null
 }
 
+# An empty element is the current directory, and whoever owns that would choose the libraries.
+has_no_empty_run_path() {
+  ! readelf -dW "$1" | sed -n 's/.*(R\(UN\)\{0,1\}PATH).*\[\(.*\)\]$/:\2:/p' | grep '::' >/dev/null
+}
+
+is_program_or_library() {
+  [[ $(head -c 4 "$1") == $'\x7fELF' && $(od -An -j16 -N2 -td2 "$1") -ne 1 ]]
+}
+
+run_paths_have_no_empty_element() {
+  local file count=0 bad=0
+  while IFS= read -r -d '' file; do
+    is_program_or_library "$file" || continue
+    ((++count))
+    has_no_empty_run_path "$file" || { echo "$file"; bad=1; }
+  done < <(find "$BUILD_DIR" -type f ! -name '*.o' ! -name '*.a' ! -name '*.gch' \
+    \( -perm /111 -o -name '*.so*' \) -print0)
+  echo "$count files"
+  ((bad == 0 && count >= ${#LIBRARIES[@]} + ${#TOOLS[@]}))
+}
+
 is_position_independent() {
   readelf -hW "$1" | grep -E 'Type: +DYN' >/dev/null && readelf -dW "$1" | grep -E 'FLAGS_1.* PIE' >/dev/null
 }
@@ -86,6 +107,7 @@ for file in "${LIBRARIES[@]}" "${TOOLS[@]}"; do
     check "$name: calls that write into a buffer know its size" calls "$file" "$FORTIFIED"
   fi
 done
+check "no run path has an empty element" run_paths_have_no_empty_element
 for file in "${TOOLS[@]}"; do
   check "$(basename "$file") can be loaded anywhere" is_position_independent "$file"
 done

@@ -2,7 +2,12 @@
 // command tries and whichever step of giving up rights fails.
 #include <grp.h>
 #include <gtest/gtest.h>
+#include <linux/capability.h>
+#include <linux/securebits.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -25,6 +30,13 @@ constexpr char kHelper[] = "/tmp/take_root_back";
 constexpr char kRootsFile[] = "/tmp/rights_test.root";
 const std::string kTo = " > /tmp/rights_test.out 2>&1";
 const std::string kIds = "grep -E '^(Uid|Gid|Groups):' /proc/self/status" + kTo;
+
+const std::string kCapabilities = "grep -E '^Cap(Inh|Prm|Eff|Amb):' /proc/self/status" + kTo;
+constexpr char kNoCapabilities[] =
+    "CapInh:\t0000000000000000\n"
+    "CapPrm:\t0000000000000000\n"
+    "CapEff:\t0000000000000000\n"
+    "CapAmb:\t0000000000000000\n";
 
 class OwnersRightsTest : public UsersTest {
  protected:
@@ -57,6 +69,45 @@ class OwnersRightsTest : public UsersTest {
     return runSaved(id);
   }
 
+  // The same, started by a process that hands its capabilities on, with these securebits.
+  static int runByHander(uid_t owner, const std::string &command, int securebits) {
+    const Task task = makeTask("task", command);
+    task->Owner = owner;
+    const long id = saveTask(task);
+    resetFailingCalls();
+    std::filesystem::remove(kOutput);
+    fflush(nullptr);
+    const pid_t caller = fork();
+    if (caller == 0) {
+      if (!handCapabilitiesOn() || prctl(PR_SET_SECUREBITS, securebits) != 0) _exit(2);
+      _exit(ZELOSchedTaskRun(id, 0, 0) == 0 ? 0 : 1);
+    }
+    int status = -1;
+    waitpid(caller, &status, 0);
+    EXPECT_EQ(status, 0);
+    waitForChildRuns();
+    const std::vector<StatusRow> rows = statusRows();
+    return rows.empty() ? -1 : rows.back().statusCode;
+  }
+
+  // All that are permitted become inheritable, or none.
+  static bool setInheritable(bool all) {
+    __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
+    __user_cap_data_struct sets[_LINUX_CAPABILITY_U32S_3] = {};
+    if (syscall(SYS_capget, &header, sets) != 0) return false;
+    for (__user_cap_data_struct &set : sets) set.inheritable = all ? set.permitted : 0;
+    return syscall(SYS_capset, &header, sets) == 0;
+  }
+
+  // A few become ambient too.
+  static bool handCapabilitiesOn() {
+    if (!setInheritable(true)) return false;
+    for (const int capability : {CAP_DAC_OVERRIDE, CAP_SETUID, CAP_NET_RAW}) {
+      if (prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_RAISE, capability, 0, 0) != 0) return false;
+    }
+    return true;
+  }
+
   static int runSaved(long id) {
     EXPECT_EQ(ZELOSchedTaskRun(id, 0, 0), 0);
     waitForChildRuns();
@@ -82,13 +133,91 @@ TEST_F(OwnersRightsTest, NobodysTaskHasNoneOfRootsIdsAndGroups) {
 }
 
 TEST_F(OwnersRightsTest, TheCommandHasNoCapabilities) {
-  EXPECT_EQ(run(kOwner, "grep -E '^Cap(Inh|Prm|Eff|Amb):' /proc/self/status" + kTo),
+  EXPECT_EQ(run(kOwner, kCapabilities), ZELO_SCHED_STATUS_FINISHED);
+  EXPECT_EQ(readFile(kOutput), kNoCapabilities);
+}
+
+// NOROOT and the locks are what a container's manager may set.
+constexpr int kSecurebits[] = {
+    0,
+    SECBIT_KEEP_CAPS,
+    SECBIT_NO_SETUID_FIXUP,
+    SECBIT_KEEP_CAPS | SECBIT_NO_SETUID_FIXUP,
+    SECBIT_NO_SETUID_FIXUP | SECBIT_NO_SETUID_FIXUP_LOCKED,
+    SECBIT_NOROOT | SECBIT_NO_SETUID_FIXUP | SECURE_ALL_LOCKS,
+};
+
+TEST_F(OwnersRightsTest, CapabilitiesThatTheCallerHandsOnDoNotReachTheCommand) {
+  for (const int securebits : kSecurebits) {
+    SCOPED_TRACE(securebits);
+    EXPECT_EQ(runByHander(kOwner, kCapabilities, securebits), ZELO_SCHED_STATUS_FINISHED);
+    EXPECT_EQ(readFile(kOutput), kNoCapabilities);
+    EXPECT_EQ(runByHander(kOwner, kIds, securebits), ZELO_SCHED_STATUS_FINISHED);
+    EXPECT_EQ(readFile(kOutput),
+              "Uid:\t4242\t4242\t4242\t4242\n"
+              "Gid:\t4343\t4343\t4343\t4343\n"
+              "Groups:\t4343 4444 \n");
+    EXPECT_EQ(runByHander(kOwner, kHelper + kTo, securebits), ZELO_SCHED_STATUS_FINISHED);
+    EXPECT_EQ(readFile(kOutput), "");
+  }
+}
+
+TEST_F(OwnersRightsTest, RootsTaskIsHandedNoCapabilitiesEither) {
+  EXPECT_EQ(runByHander(0, "grep -E '^Cap(Inh|Amb):' /proc/self/status" + kTo, 0),
             ZELO_SCHED_STATUS_FINISHED);
+  EXPECT_EQ(readFile(kOutput), "CapInh:\t0000000000000000\nCapAmb:\t0000000000000000\n");
+}
+
+// Else a set-uid program that the command starts would keep root's capabilities while it works as
+// its user. What restricts stays.
+TEST_F(OwnersRightsTest, AChangeOfUsersTakesCapabilitiesAgain) {
+  const auto run = SchedBackends[0].run;
+  SchedBackends[0].run = [](ZELO_SCHED_TASK *, int *pStatusCode, char *, size_t) {
+    *pStatusCode = ZELO_SCHED_STATUS_FINISHED;
+    const std::string status = readFile("/proc/self/status");
+    const size_t effective = status.find("CapEff:");
+    writeFile(kOutput, std::to_string(prctl(PR_GET_SECUREBITS)) + " " +
+                           status.substr(effective, status.find('\n', effective) - effective));
+    return 0;
+  };
+  EXPECT_EQ(runByHander(kOwner, "true", SECBIT_NO_SETUID_FIXUP | SECBIT_NO_CAP_AMBIENT_RAISE),
+            ZELO_SCHED_STATUS_FINISHED);
+  SchedBackends[0].run = run;
   EXPECT_EQ(readFile(kOutput),
-            "CapInh:\t0000000000000000\n"
-            "CapPrm:\t0000000000000000\n"
-            "CapEff:\t0000000000000000\n"
-            "CapAmb:\t0000000000000000\n");
+            std::to_string(SECBIT_NO_CAP_AMBIENT_RAISE) + " CapEff:\t0000000000000000");
+}
+
+TEST_F(OwnersRightsTest, CapabilitiesThatCannotBeGivenUpRunNothing) {
+  const std::pair<const char *, std::string> calls[] = {
+      {"prctl", std::to_string(PR_CAP_AMBIENT)}, {"capget", ""}, {"capset", ""}};
+  for (const auto &[call, key] : calls) {
+    SCOPED_TRACE(call);
+    cleanWorld();
+    const Task task = makeTask("task", "true" + kTo);
+    task->Owner = kOwner;
+    const long id = saveTask(task);
+    ASSERT_TRUE(setInheritable(true));
+    clearLog();
+    resetFailingCalls();
+    failCallFor(call, key, {.times = kAlways, .error = EPERM});
+    EXPECT_EQ(runSaved(id), -1);
+    resetFailingCalls();
+    EXPECT_FALSE(fileExists(kOutput));
+    EXPECT_EQ(logged(), Lines{"sched_leave_caller.cpp:N Failed to give up capabilities. Operation "
+                              "not permitted"});
+  }
+  EXPECT_TRUE(setInheritable(false));
+}
+
+// Older kernels have no ambient capabilities, and say so.
+TEST_F(OwnersRightsTest, AKernelWithoutAmbientCapabilitiesKeepsNothingFromRunning) {
+  const Task task = makeTask("task", kCapabilities);
+  task->Owner = kOwner;
+  const long id = saveTask(task);
+  resetFailingCalls();
+  failCallFor("prctl", std::to_string(PR_CAP_AMBIENT), {.times = kAlways, .error = EINVAL});
+  EXPECT_EQ(runSaved(id), ZELO_SCHED_STATUS_FINISHED);
+  EXPECT_EQ(readFile(kOutput), kNoCapabilities);
 }
 
 TEST_F(OwnersRightsTest, NoWayLeadsBackToRoot) {

@@ -105,6 +105,14 @@ check "a live run is in the way, and told" same "$(outcome "$INSTALLED")" \
   "1 task 11 is running as process $live (it's; \$(touch /tmp/broken)  an app)"
 check "what an application calls itself is not run" test ! -e /tmp/broken
 run_row "$live" 12 2
+empty_table
+run_row "$live" 13 2 "a\\tb\\c' || char(27) || '[2J' || char(9, 7, 13, 127, 155, 228) || '"
+check "nothing in what an application calls itself reaches a terminal as a command" \
+  same "$(outcome "$INSTALLED" | od -An -c)" \
+  "$(printf '1 task 13 is running as process %s (%s)\n' "$live" 'a\tb\c?[2J?? ?????' | od -An -c)"
+empty_table
+run_row "$live" 11 2
+run_row "$live" 12 2
 check "every live run is told" same "$(outcome "$INSTALLED" | wc -l)" 2
 
 # What another user may have put there before the first run.

@@ -1,9 +1,15 @@
 // What a task's command finds around it, whatever its caller has open, ignores or exports.
 #include <fcntl.h>
 #include <gtest/gtest.h>
+#include <linux/ioprio.h>
+#include <linux/keyctl.h>
+#include <sched.h>
 #include <sys/file.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -12,12 +18,16 @@
 #include <cstdint>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
+#include <functional>
+#include <iterator>
 #include <map>
 #include <sstream>
 
 #include "captured_log.h"
 #include "failing_calls.h"
 #include "fifos.h"
+#include "shared_memory.h"
 #include "status_db.h"
 #include "tasks.h"
 #include "users.h"
@@ -43,7 +53,13 @@ const std::string kListDescriptors =
 const std::string kListLinks =
     "for i in 0 1 2; do links=\"$links $(readlink /proc/$$/fd/$i)\"; done; "
     "echo \"$links\" > /tmp/surroundings_test.out";
+constexpr char kAllNothing[] = " /dev/null /dev/null /dev/null\n";
 const std::string kListEnvironment = kTo + "tr '\\0' '\\n' < /proc/$$/environ";
+
+// Makes it descriptors 1 and 2.
+void lendOutput(int descriptor) {
+  for (const int output : {1, 2}) dup2(descriptor, output);
+}
 
 class SurroundingsTest : public UsersTest {
  protected:
@@ -80,6 +96,21 @@ class SurroundingsTest : public UsersTest {
 
   static std::string outputOf(uid_t owner, const std::string &command) {
     return outputOf(save(owner, command));
+  }
+
+  // What the command printed, when a process that `prepare` has had its way with starts the run.
+  static std::string outputAfter(const std::function<void()> &prepare, long id) {
+    fflush(nullptr);
+    const pid_t caller = fork();
+    if (caller == 0) {
+      prepare();
+      _exit(ZELOSchedTaskRun(id, 0, 0) == 0 ? 0 : 1);
+    }
+    int status = -1;
+    waitpid(caller, &status, 0);
+    EXPECT_EQ(status, 0);
+    waitForChildRuns();
+    return readFile(kOutput);
   }
 
   static void expectNothingRuns(long id, const Lines &wanted) {
@@ -165,36 +196,142 @@ TEST_F(SurroundingsTest, ARunLockThatTheCallerHoldsDoesNotReachTheCommand) {
 
 TEST_F(SurroundingsTest, ACallerWithoutStandardDescriptorsLeavesThemToNothing) {
   const long id = save(0, "echo lost; echo lost >&2; " + kListLinks);
-  fflush(nullptr);
-  const pid_t caller = fork();
-  if (caller == 0) {
-    for (const int descriptor : {0, 1, 2}) close(descriptor);
-    _exit(ZELOSchedTaskRun(id, 0, 0) == 0 ? 0 : 1);
-  }
-  waitForChildRuns();
-  EXPECT_EQ(readFile(kOutput), " /dev/null /dev/null /dev/null\n");
+  const std::string links = outputAfter(
+      [] {
+        for (const int descriptor : {0, 1, 2}) close(descriptor);
+      },
+      id);
+  EXPECT_EQ(links, kAllNothing);
   const std::vector<StatusRow> rows = statusRows();
   ASSERT_EQ(rows.size(), 1U);
   EXPECT_EQ(rows[0].statusCode, ZELO_SCHED_STATUS_FINISHED);
 }
 
 TEST_F(SurroundingsTest, ACallerWithoutStandardInputOnlyKeepsTheOthers) {
-  const long id = save(0, kListLinks);
-  fflush(nullptr);
-  const pid_t caller = fork();
-  if (caller == 0) {
-    const int output = open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT, 0644);
-    dup2(output, 1);
-    dup2(output, 2);
-    close(0);
-    _exit(ZELOSchedTaskRun(id, 0, 0) == 0 ? 0 : 1);
-  }
-  waitForChildRuns();
-  EXPECT_EQ(readFile(kOutput),
-            " /dev/null /tmp/surroundings_test.stdout /tmp/surroundings_test.stdout\n");
+  const std::string links = outputAfter(
+      [] {
+        const int output = open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT, 0644);
+        lendOutput(output);
+        close(0);
+      },
+      save(0, kListLinks));
+  EXPECT_EQ(links, " /dev/null /tmp/surroundings_test.stdout /tmp/surroundings_test.stdout\n");
 }
 
-// ---- session and signals
+// As a shell's loop that reads what it works on, line by line.
+TEST_F(SurroundingsTest, ARunLeavesItsCallersInputAlone) {
+  const long id = save(0, kTo + "cat; echo end");
+  int input[2];
+  ASSERT_EQ(pipe(input), 0);
+  ASSERT_EQ(write(input[1], "next\n", 5), 5);
+  close(input[1]);
+  EXPECT_EQ(outputAfter([&] { dup2(input[0], 0); }, id), "end\n");
+  char left[8] = "";
+  EXPECT_EQ(read(input[0], left, sizeof left), 5);
+  EXPECT_STREQ(left, "next\n");
+  close(input[0]);
+}
+
+TEST_F(SurroundingsTest, APipeOfTheCallersGetsWhatTheCommandPrints) {
+  const long id = save(0, "echo said; echo complained >&2");
+  int output[2];
+  ASSERT_EQ(pipe(output), 0);
+  outputAfter([&] { lendOutput(output[1]); }, id);
+  close(output[1]);
+  std::string printed(64, '\0');
+  printed.resize(static_cast<size_t>(std::max<ssize_t>(read(output[0], printed.data(), 64), 0)));
+  EXPECT_EQ(printed, "said\ncomplained\n");
+  close(output[0]);
+}
+
+TEST_F(SurroundingsTest, AFileOfTheCallersGetsWhatTheCommandPrints) {
+  outputAfter(
+      [] { lendOutput(open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT | O_TRUNC, 0644)); },
+      save(0, "echo said; echo complained >&2"));
+  EXPECT_EQ(readFile("/tmp/surroundings_test.stdout"), "said\ncomplained\n");
+}
+
+TEST_F(SurroundingsTest, OneOutputOfTheTwoIsReplacedAlone) {
+  const auto lend = [](int kept) {
+    lendOutput(open("/dev/zero", O_RDWR));
+    dup2(open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT, 0644), kept);
+  };
+  const long id = save(0, kListLinks);
+  EXPECT_EQ(outputAfter([&] { lend(1); }, id),
+            " /dev/null /tmp/surroundings_test.stdout /dev/null\n");
+  EXPECT_EQ(outputAfter([&] { lend(2); }, id),
+            " /dev/null /dev/null /tmp/surroundings_test.stdout\n");
+}
+
+// What could be read as well, or is more than a place to write to.
+TEST_F(SurroundingsTest, NoOtherOutputOfTheCallersReachesTheCommand) {
+  const long id = save(0, "echo lost; echo lost >&2; " + kListLinks);
+  ASSERT_EQ(mkfifo("/tmp/surroundings_test.fifo", 0600), 0);
+  const std::pair<const char *, std::function<int()>> kinds[] = {
+      {"a socket",
+       [] {
+         int ends[2];
+         return socketpair(AF_UNIX, SOCK_STREAM, 0, ends) == 0 ? ends[0] : -1;
+       }},
+      {"the reading end of a pipe",
+       [] {
+         int ends[2];
+         return pipe(ends) == 0 ? ends[0] : -1;
+       }},
+      {"a pipe open both ways", [] { return open("/tmp/surroundings_test.fifo", O_RDWR); }},
+      {"a file open both ways",
+       [] { return open("/tmp/surroundings_test.both", O_RDWR | O_CREAT, 0600); }},
+      {"a file open for reading", [] { return open("/etc/passwd", O_RDONLY); }},
+      {"a file that is only named", [] { return open("/etc/passwd", O_PATH); }},
+      {"a directory", [] { return open("/etc", O_RDONLY); }},
+      {"a device open for writing", [] { return open("/dev/zero", O_WRONLY); }},
+  };
+  for (const auto &[kind, make] : kinds) {
+    SCOPED_TRACE(kind);
+    std::filesystem::remove(kOutput);
+    EXPECT_EQ(outputAfter([&] { lendOutput(make()); }, id), kAllNothing);
+  }
+  std::filesystem::remove("/tmp/surroundings_test.fifo");
+}
+
+TEST_F(SurroundingsTest, AnOutputThatIsToBeClosedOnAnExecDoesNotReachTheCommand) {
+  const std::string links = outputAfter(
+      [] {
+        lendOutput(open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT, 0644));
+        fcntl(1, F_SETFD, FD_CLOEXEC);
+        fcntl(2, F_SETFD, FD_CLOEXEC);
+      },
+      save(0, kListLinks));
+  EXPECT_EQ(links, kAllNothing);
+}
+
+TEST_F(SurroundingsTest, ARunLockOnAStandardDescriptorMakesRoom) {
+  const long id = save(0, kListLinks);
+  const Task task = loadTask(id);
+  task->CanRunTaskSameTime = 0;
+  saveTask(task);
+  writeFile("/tmp/lock/lock_sched_run", "");
+  const std::string links = outputAfter(
+      [] {
+        close(0);
+        pfLock = fopen("/tmp/lock/lock_sched_run", "r");
+      },
+      id);
+  EXPECT_EQ(links.substr(0, links.find(' ', 1)), " /dev/null");
+}
+
+TEST_F(SurroundingsTest, StandardDescriptorsThatCannotBeReplacedRunNothing) {
+  const long id = save(0, kListEnvironment);
+  failCallFor("open", "/dev/null", {.error = ENOENT});
+  expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to replace standard descriptors. "
+                               "No such file or directory"}));
+  resetFailingCalls();
+  failCall("dup2", {.error = EBUSY});
+  expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to replace standard descriptors. "
+                               "Device or resource busy"}));
+}
+
+// ---- session
 
 TEST_F(SurroundingsTest, TheRunIsASessionOfItsOwn) {
   const std::string line = outputOf(0, kTo + "read -r line < /proc/$$/stat; echo \"$line\"");
@@ -211,6 +348,148 @@ TEST_F(SurroundingsTest, TheRunIsASessionOfItsOwn) {
   EXPECT_EQ(group, rows[0].pid);
   EXPECT_NE(session, getsid(0));
 }
+
+TEST_F(SurroundingsTest, WithoutASessionOfItsOwnNothingIsRun) {
+  const long id = save(0, kListEnvironment);
+  failCall("setsid", {.error = EPERM});
+  expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to begin a session. Operation not "
+                               "permitted"}));
+}
+
+// ---- keys
+
+constexpr char kKey[] = "surroundings_test";
+
+// In place of the command: the user's rights are the owner's by then, and an exec changes neither
+// of what is looked at here.
+class ForCommand {
+ public:
+  explicit ForCommand(int (*run)(ZELO_SCHED_TASK *, int *, char *, size_t))
+      : former_(SchedBackends[0].run) {
+    SchedBackends[0].run = run;
+  }
+  ~ForCommand() { SchedBackends[0].run = former_; }
+  ForCommand(const ForCommand &) = delete;
+  ForCommand &operator=(const ForCommand &) = delete;
+
+ private:
+  decltype(SchedBackends[0].run) former_;
+};
+
+std::string findKey() {
+  char found[32] = "";
+  const long key = syscall(SYS_keyctl, KEYCTL_SEARCH, KEY_SPEC_SESSION_KEYRING, "user", kKey, 0L);
+  if (key < 0 || syscall(SYS_keyctl, KEYCTL_READ, key, found, sizeof found - 1) < 0) return "none";
+  return found;
+}
+
+// A kernel without keyrings keeps the caller from having any.
+TEST_F(SurroundingsTest, NoKeyOfTheCallersSessionReachesTheCommand) {
+  const long id = save(0, "true");
+  const ForCommand search([](ZELO_SCHED_TASK *, int *, char *, size_t) {
+    writeFile(kOutput, findKey());
+    return 0;
+  });
+  const std::string found = outputAfter(
+      [] {
+        const bool hasKeyrings =
+            syscall(SYS_keyctl, KEYCTL_JOIN_SESSION_KEYRING, nullptr) >= 0 &&
+            syscall(SYS_add_key, "user", kKey, "secret", 6L, KEY_SPEC_SESSION_KEYRING) >= 0;
+        if (hasKeyrings && findKey() != "secret") _exit(2);
+      },
+      id);
+  EXPECT_EQ(found, "none");
+  EXPECT_EQ(statusRows().size(), 1U);
+}
+
+TEST_F(SurroundingsTest, AKernelWithoutKeyringsKeepsNothingFromRunning) {
+  const long id = save(0, kTo + "echo ran");
+  for (const int error : {ENOSYS, EPERM}) {
+    resetFailingCalls();
+    std::filesystem::remove(kOutput);
+    failCall("keyctl", {.times = kAlways, .error = error});
+    EXPECT_EQ(outputOf(id), "ran\n");
+    EXPECT_EQ(callCount("keyctl"), 1U);
+  }
+}
+
+TEST_F(SurroundingsTest, WithoutASessionKeyringOfItsOwnNothingIsRun) {
+  const long id = save(0, kListEnvironment);
+  failCall("keyctl", {.times = kAlways, .error = EDQUOT});
+  expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to begin a session keyring. Disk "
+                               "quota exceeded"}));
+}
+
+// ---- scheduling
+
+// Fields of /proc/PID/stat behind the name.
+constexpr size_t kNice = 16;
+constexpr size_t kPolicy = 38;
+
+TEST_F(SurroundingsTest, PriorityAndSchedulingAreTheUsualOnesWhateverTheCallersAre) {
+  const long id = save(0, kTo +
+                              "read -r line < /proc/$$/stat; echo \"$line\"; "
+                              "read -r score < /proc/$$/oom_score_adj; echo $score");
+  // A user namespace's root may not raise its priority.
+  int *const nice = static_cast<int *>(sharedMemory(sizeof(int)));
+  const std::string output = outputAfter(
+      [&] {
+        std::ofstream("/proc/self/oom_score_adj") << "300";
+        const sched_param none{};
+        sched_setscheduler(0, SCHED_BATCH, &none);
+        setpriority(PRIO_PROCESS, 0, 10);
+        const bool canRaise = setpriority(PRIO_PROCESS, 0, 9) == 0;
+        *nice = canRaise ? 0 : 10;
+        setpriority(PRIO_PROCESS, 0, 10);
+      },
+      id);
+  const Lines lines = linesOf(output);
+  ASSERT_EQ(lines.size(), 2U) << output;
+  std::istringstream fields(lines[0].substr(lines[0].rfind(") ") + 2));
+  const Lines stat{std::istream_iterator<std::string>(fields), {}};
+  ASSERT_GT(stat.size(), kPolicy);
+  EXPECT_EQ(stat[kNice], std::to_string(*nice));
+  EXPECT_EQ(stat[kPolicy], std::to_string(SCHED_OTHER));
+  EXPECT_EQ(lines[1], "0");
+}
+
+TEST_F(SurroundingsTest, TheDiskPriorityIsTheUsualOneWhateverTheCallersIs) {
+  const long id = save(0, "true");
+  const ForCommand look([](ZELO_SCHED_TASK *, int *, char *, size_t) {
+    writeFile(kOutput, std::to_string(syscall(SYS_ioprio_get, IOPRIO_WHO_PROCESS, 0L) >>
+                                      IOPRIO_CLASS_SHIFT));
+    return 0;
+  });
+  const std::string ioClass = outputAfter(
+      [] {
+        syscall(SYS_ioprio_set, IOPRIO_WHO_PROCESS, 0L, IOPRIO_PRIO_VALUE(IOPRIO_CLASS_IDLE, 0L));
+      },
+      id);
+  EXPECT_NE(ioClass, std::to_string(IOPRIO_CLASS_IDLE));
+}
+
+// A kernel without /proc, say.
+TEST_F(SurroundingsTest, AScoreThatCannotBeWrittenKeepsNothingFromRunning) {
+  const long id = save(0, kTo + "echo ran");
+  failCallFor("open", "/proc/self/oom_score_adj", {.times = kAlways, .error = ENOENT});
+  EXPECT_EQ(outputOf(id), "ran\n");
+  EXPECT_EQ(logged(), Lines{});
+}
+
+// sudo and its like go on working in a command.
+TEST_F(SurroundingsTest, ACommandMayStillGainRightsAndOutlivesTheCallersDeathSignal) {
+  const long id = save(0, "true");
+  const ForCommand look([](ZELO_SCHED_TASK *, int *, char *, size_t) {
+    int signal = -1;
+    prctl(PR_GET_PDEATHSIG, &signal);
+    writeFile(kOutput, std::to_string(prctl(PR_GET_NO_NEW_PRIVS, 0L, 0L, 0L, 0L)) + " " +
+                           std::to_string(signal));
+    return 0;
+  });
+  EXPECT_EQ(outputAfter([] { prctl(PR_SET_PDEATHSIG, SIGKILL); }, id), "0 0");
+}
+
+// ---- signals
 
 // Signals that a caller may have ignored, as a daemon does, and all signals blocked, for as long as
 // this lives.
@@ -376,7 +655,7 @@ TEST_F(SurroundingsTest, ACallersDescriptorsThatCannotBeClosedRunNothing) {
   const long id = save(0, kListEnvironment);
   failCall("close_range", {.times = kAlways, .error = ENOSYS});
   failCall("sysconf", {.times = kAlways, .error = EINVAL});
-  expectNothingRuns(id, (Lines{"sched_surroundings.cpp:N Failed to close descriptors. "
+  expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to close descriptors. "
                                "Invalid argument"}));
 }
 

@@ -728,7 +728,95 @@ shows_the_output_when_told_to() {
   add --daily 08:30 -- 'echo said; echo complained >&2' >/dev/null
   gives 0 "task 1 (Task 1) finished" run --wait 1 &&
     gives 0 "said
-task 1 (Task 1) finishedcomplained" run --output 1
+complained
+task 1 (Task 1) finished" run --output 1
+}
+
+# fails_in_run_of EXIT_CODE ID: what the run prints, which a shell could not hold, is in a file.
+fails_in_run_of() {
+  local status=0
+  z run --output "$2" >"$SCRATCH/out" 2>"$SCRATCH/err" || status=$?
+  same "$status: $(cat "$SCRATCH/err")" "1: zelosched: task $2 (Task $2) failed with exit code $1"
+}
+
+passes_output_on_unchanged() {
+  clean
+  add --daily 08:30 -- 'printf "\033[1m\303\0\r\n\377"; exit 3' >/dev/null
+  printf '\033[1m\303\0\r\n\377' >"$SCRATCH/wanted"
+  fails_in_run_of 3 1 && cmp "$SCRATCH/out" "$SCRATCH/wanted"
+}
+
+output_does_not_wait_for_a_daemon() {
+  clean
+  add --daily 08:30 -- 'sleep 1000 & echo said' >/dev/null
+  add --daily 08:30 -- 'yes & exit 4' >/dev/null
+  gives 0 "said
+task 1 (Task 1) finished" run --output 1 || return 1
+  fails_in_run_of 4 2
+}
+
+streams_output() {
+  clean
+  add --daily 08:30 -- 'head -c 1000000000 /dev/zero' >/dev/null
+  local counts
+  counts=$(python3 -c '
+import resource, subprocess, sys
+run = subprocess.Popen(sys.argv[1:], stdout=subprocess.PIPE)
+size = 0
+while part := run.stdout.read(1 << 20):
+    size += len(part)
+status = run.wait()
+print(status, size, resource.getrusage(resource.RUSAGE_CHILDREN).ru_maxrss < 100 << 10)
+' timeout 60 "$ZELOSCHED" run --output 1)
+  same "$counts" "0 $((1000000000 + $(printf 'task 1 (Task 1) finished\n' | wc -c))) True"
+}
+
+goes_on_when_the_reader_is_gone() {
+  clean
+  rm -f "$SCRATCH/ran" "$SCRATCH/fifo"
+  mkfifo "$SCRATCH/fifo"
+  add --daily 08:30 -- "echo said; read go <$SCRATCH/fifo; seq 100000 && echo ran >$SCRATCH/ran" >/dev/null
+  z run --output 1 2>"$SCRATCH/err" | head -n 1 >"$SCRATCH/first" &
+  local pipeline=$!
+  echo go >"$SCRATCH/fifo"
+  wait "$pipeline" || true
+  same "$(cat "$SCRATCH/first" "$SCRATCH/err")" said || return 1
+  until [[ -s $SCRATCH/ran ]]; do :; done
+}
+
+tells_of_output_that_cannot_be_written() {
+  clean
+  add --daily 08:30 -- "seq 100000; echo ran >$SCRATCH/ran" >/dev/null
+  local full=0 closed=0
+  rm -f "$SCRATCH/ran"
+  z run --output 1 >/dev/full 2>"$SCRATCH/full" || full=$?
+  test -s "$SCRATCH/ran" || return 1
+  z run --output 1 >&- 2>"$SCRATCH/closed" || closed=$?
+  local said="zelosched: task 1 (Task 1) finished, and what it printed could not be written:"
+  same "$full $(cat "$SCRATCH/full")" "1 $said No space left on device" &&
+    same "$closed $(cat "$SCRATCH/closed")" "1 $said Bad file descriptor"
+}
+
+leaves_input_to_its_caller() {
+  clean
+  add --daily 08:30 --overlap yes -- "cat >>$SCRATCH/eaten; exit 0" >/dev/null
+  local way
+  rm -f "$SCRATCH/eaten"
+  for way in '' --wait --output; do
+    # shellcheck disable=SC2086
+    same "$(printf 'a\nb\n' | while read -r line; do z run $way 1 >/dev/null; echo "$line"; done)" $'a\nb' ||
+      return 1
+  done
+  test ! -s "$SCRATCH/eaten"
+}
+
+an_owner_may_name_the_output() {
+  clean
+  add --daily 08:30 --owner nobody -- \
+    'echo said >/dev/stdout; echo complained >/dev/stderr; (head -c 1 </dev/stdout) 2>/dev/null && echo read; exit 0' >/dev/null
+  gives 0 "said
+complained
+task 1 (Task 1) finished" run --output 1
 }
 
 tells_that_a_run_gave_up() {
@@ -1242,6 +1330,17 @@ check "a run's result is told" runs_and_tells_the_result
 check "a wait is for its own run alone" waits_for_its_own_run_only
 check "without --wait the run goes on by itself" lets_the_run_go_on
 check "what a run prints is shown when wanted" shows_the_output_when_told_to
+check "what a run prints goes into a file as it is" passes_output_on_unchanged
+check "a daemon that a run leaves behind is not waited for" output_does_not_wait_for_a_daemon
+check "of a long output no more is held than was read at once" streams_output
+check "a run goes on when nobody reads its output any more" goes_on_when_the_reader_is_gone
+check "a run is not held up by output that cannot be written" tells_of_output_that_cannot_be_written
+check "a run leaves the input to its caller" leaves_input_to_its_caller
+if chown 65534 "$SCRATCH" 2>/dev/null && chown "$EUID" "$SCRATCH"; then
+  check "an owner may open the output by name, for writing alone" an_owner_may_name_the_output
+else
+  skip "an owner may open the output by name, for writing alone" "needs other users"
+fi
 check "a run that gave up is told" tells_that_a_run_gave_up
 check "and one that cannot have its turn" tells_that_a_run_cannot_have_its_turn
 check "a run that died is told" tells_that_a_run_died

@@ -34,6 +34,29 @@ TEST(ZeloschedTextTest, BytesThatAreNoUtf8AreEscaped) {
   EXPECT_EQ(printable("\xf4\x90\x80\x80"), "\\xf4\\x90\\x80\\x80");  // beyond the last character
 }
 
+TEST(ZeloschedTextTest, LinesKeepTheirEndsAndTabs) {
+  EXPECT_EQ(printableLines("a\tb\n\nc\r\n\x1b[2J\xff\n"), "a\tb\n\nc\\r\n\\x1b[2J\\xff\n");
+}
+
+TEST(ZeloschedTextTest, ACharacterThatIsCutOffIsFoundAtTheEndAlone) {
+  const std::pair<const char *, size_t> texts[] = {
+      {"", 0},
+      {"a", 0},
+      {"a\xc3", 1},
+      {"a\xc3\xa4", 0},
+      {"\xe6\xbc", 2},
+      {"\xe6\xbc\xa2", 0},
+      {"\xf0\x9f\x98", 3},
+      {"\xf0\x9f\x98\x80", 0},
+      {"\x80\x80\x80\x80", 0},  // no beginning
+      {"\xff", 0},
+      {"\xc3\xa4\xa4", 0},
+  };
+  for (const auto &[text, bytes] : texts) {
+    EXPECT_EQ(cutCharacterLength(text), bytes) << printable(text);
+  }
+}
+
 TEST(ZeloschedTextTest, OtherTextStaysAsItIs) {
   for (const char *text : {"", "Nightly backup", "größe", "漢字", "\xf0\x9f\x98\x80", "a\\b"}) {
     EXPECT_EQ(printable(text), text);

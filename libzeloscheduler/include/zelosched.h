@@ -436,7 +436,14 @@ typedef struct ZELO_SCHED_STATUS {
  * skipDisabled 1: not when the task is disabled. 0 when a child was started or
  * there was nothing to do, or -1: 0x2000 when the task is not found, or what
  * the callee left. How the run went is told by the status database and the log
- * alone. */
+ * alone.
+ * Of the caller's descriptors the command keeps 1 and 2 alone, and each of these
+ * only where it is a pipe or a regular file, open for writing alone and not to be
+ * closed on an exec: it prints there, for as long as it likes, and who reads the
+ * pipe decides how that is shown. Any other 1 or 2 (a terminal, a socket, open
+ * for reading too, closed) is /dev/null in its place, and so is 0 always. The
+ * names /dev/stdout and /dev/stderr can be opened only where the task's owner may
+ * open what is behind them; a pipe is that of the user who made it. */
 ZELO_SCHED_API int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled);
 
 /* The stream of the run lock file while this process holds the run lock. */

@@ -10,6 +10,7 @@
 #include <spawn.h>
 #include <sqlite3.h>
 #include <sys/file.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/wait.h>
@@ -105,6 +106,7 @@ namespace {
   X(fdatasync, '~')                \
   X(fcntl64, '~')                  \
   X(dup, '~')                      \
+  X(dup2, '~')                     \
   X(fcntl, '~')                    \
   X(pipe2, '~')                    \
   X(seteuid, '=')                  \
@@ -117,6 +119,10 @@ namespace {
   X(initgroups, '~')               \
   X(getpwuid_r, '~')               \
   X(setsid, '~')                   \
+  X(prctl, '=')                    \
+  X(keyctl, '~')                   \
+  X(capget, '~')                   \
+  X(capset, '~')                   \
   X(close_range, '~')              \
   X(sysconf, '~')                  \
   X(clearenv, '~')                 \
@@ -576,6 +582,7 @@ unsigned lastSeed() {
 using support::Call;
 using support::failing;
 using support::isStandard;
+using support::Plan;
 using support::resultOf;
 
 #define NEXT(variable, name) \
@@ -914,6 +921,10 @@ int dup(int descriptor) noexcept {
   FAIL_OR_CALL(dup, nullptr, -1, descriptor);
 }
 
+int dup2(int descriptor, int wanted) noexcept {
+  FAIL_OR_CALL(dup2, nullptr, -1, descriptor, wanted);
+}
+
 int fcntl(int descriptor, int command, ...) {
   va_list list;
   va_start(list, command);
@@ -1059,6 +1070,35 @@ int getpwuid_r(uid_t uid, struct passwd *entry, char *buffer, size_t size, struc
 
 pid_t setsid() noexcept {
   FAIL_OR_CALL(setsid, nullptr, pid_t{-1});
+}
+
+int prctl(int option, ...) noexcept {
+  va_list list;
+  va_start(list, option);
+  const auto second = va_arg(list, unsigned long);
+  const auto third = va_arg(list, unsigned long);
+  const auto fourth = va_arg(list, unsigned long);
+  const auto fifth = va_arg(list, unsigned long);
+  va_end(list);
+  FAIL_OR_CALL(prctl, std::to_string(option), -1, option, second, third, fourth, fifth);
+}
+
+// The calls that the C library has no function for.
+long syscall(long number, ...) noexcept {
+  constexpr size_t kMostArguments = 6;
+  std::array<long, kMostArguments> arguments{};
+  va_list list;
+  va_start(list, number);
+  for (long &argument : arguments) argument = va_arg(list, long);
+  va_end(list);
+  const Plan *plan = nullptr;
+  if (number == SYS_keyctl) plan = failing(Call::k_keyctl);
+  if (number == SYS_capget) plan = failing(Call::k_capget);
+  if (number == SYS_capset) plan = failing(Call::k_capset);
+  if (plan != nullptr) return resultOf(*plan, -1L);
+  REAL(syscall);
+  return real_syscall(number, arguments[0], arguments[1], arguments[2], arguments[3], arguments[4],
+                      arguments[5]);
 }
 
 int close_range(unsigned first, unsigned last, int flags) noexcept {

@@ -13,7 +13,8 @@
 // What the second argument of failCallFor is compared with
 //   hash key           QLIBCSzHashSetValue, QLIBCSzHashGetValue            equal
 //   number             QLIBCProcAlive (pid), ZELOUserGetByUID, seteuid, setegid (id),
-//                      QLIBPluginAction (stage), QLIBCSzHashAlloc (capacity)              equal
+//                      prctl (option), QLIBPluginAction (stage),
+//                      QLIBCSzHashAlloc (capacity)                                        equal
 //   plugin argument    QLIBPluginSetArg, QLIBPluginSetArgByInt             equal
 //   section name       QLIBCFile{Get,Set,Add,Remove}Section                equal
 //   path or text       QLIBCFileExist, QLIBCFileTouch, QLIBCFileEnumSection, QLIBCExec (program and
@@ -27,9 +28,9 @@
 // QLIBPluginExit fsync fstat fchown fchmod ftruncate fflush fclose getline (getdelim too) read
 // write fwrite (and all other writing to a stream) flock setreuid setresuid setregid setresgid
 // setgroups localtime localtime_r mktime malloc calloc realloc sleep usleep nanosleep rand srand
-// setsid close_range fork getpwuid_r futimens fdopendir dup fcntl (for F_DUPFD_CLOEXEC and F_SETFD)
-// pipe2 readdir close pread64 pwrite64 fdatasync fcntl64 sysconf clearenv pidfd_open poll waitid
-// waitpid sqlite3_close.
+// setsid keyctl capget capset (these three by syscall) close_range fork getpwuid_r futimens
+// fdopendir dup dup2 fcntl (for F_DUPFD_CLOEXEC and F_SETFD) pipe2 readdir close pread64 pwrite64
+// fdatasync fcntl64 sysconf clearenv pidfd_open poll waitid waitpid sqlite3_close.
 //
 // Streams and descriptors 0 to 2 are never touched. close, fclose, waitid, waitpid (somebody else
 // took the status), sqlite3_close and QLIBPluginExit that are made to fail have done their work all

@@ -36,13 +36,14 @@ def plain(*arguments):
 
 
 def on_terminal(arguments, columns=80, answer="", interrupted_at=None, **variables):
-    """What the program shows on a terminal, and its exit status. As by a key of the terminal, it and
+    """What the program shows on the terminal that controls it, and its exit status. As by a key of the terminal, it and
     what it has started are interrupted when there is more to read and that file is there."""
     environment = {"PATH": os.environ["PATH"], "TERM": "xterm", "LC_ALL": "C.UTF-8", **variables}
     master, slave = pty.openpty()
     fcntl.ioctl(slave, termios.TIOCSWINSZ, struct.pack("HHHH", 24, columns, 0, 0))
     with subprocess.Popen([PROGRAM, *arguments], stdin=slave, stdout=slave, stderr=slave,
-                          env=environment, start_new_session=True) as process:
+                          env=environment, start_new_session=True,
+                          preexec_fn=lambda: fcntl.ioctl(0, termios.TIOCSCTTY, 0)) as process:
         os.close(slave)
         os.write(master, answer.encode())
         shown = b""
@@ -157,6 +158,38 @@ check("the progress fits a narrow terminal",
       all(len(line) < 20 for line in lines if line.startswith("task 2")), text)
 seen = subprocess.run([PROGRAM, "run", "--wait", "2"], capture_output=True, text=True, check=False)
 check("without a terminal there is no progress", seen.stdout == "", seen.stdout)
+
+plain("edit", "2", "--", r"printf 'a\033[2Jb\tc\rd\n\342\202\n\303\244\233\n\342'; exit 3")
+text, _ = on_terminal(["run", "--output", "2"])
+check("nothing that a command prints reaches the terminal as a command of its own",
+      text == "a\\x1b[2Jb\tc\\rd\n\\xe2\\x82\nä\\x9b\n\\xe2zelosched: task 2 (fails) failed with exit "
+      "code 3\n", text)
+text, _ = on_terminal(["run", "--output", "2"], LC_ALL="C")
+check("nor does it in a locale without characters beyond ASCII",
+      text.isascii() and "\\xc3\\xa4\\x9b\n" in text, text)
+
+plain("edit", "2", "--", "printf x; head -c 200000 /dev/zero | sed 's/\\x00/ä/g'; echo")
+text, _ = on_terminal(["run", "--output", "2"])
+check("a character that comes in two pieces is shown as one",
+      text == "x" + "ä" * 200000 + "\ntask 2 (fails) finished\n", (len(text), text[-100:]))
+
+plain("edit", "2", "--", "for i in 0 1 2; do if test -t $i; then echo terminal $i; fi; done; "
+      "head -c 1; (: </dev/tty) 2>/dev/null && echo tty; ls -l /proc/self/fd | grep -c pts; "
+      "readlink /proc/$$/fd/0")
+text, status = on_terminal(["run", "--output", "2"], answer="typed\n")
+check("a command whose output is shown has no way to the terminal",
+      text == "typed\n0\n/dev/null\ntask 2 (fails) finished\n" and status == 0, text)
+
+plain("edit", "2", "--", f"echo >{GO}.begun; echo begun; read go <{GO}; "
+      f"for i in 1 2 3; do echo more || exit 1; done; seq 100000; echo >{GO}.done")
+os.mkfifo(GO)
+text, status = on_terminal(["run", "--output", "2"], interrupted_at=GO + ".begun")
+check("an interrupt ends the showing of what a run prints", status == -signal.SIGINT, (text, status))
+with open(GO, "w", encoding="ascii") as go:
+    go.write("\n")
+check("the run that prints goes on", appears(GO + ".done"))
+for name in (GO, GO + ".begun", GO + ".done"):
+    os.remove(name)
 
 plain("edit", "2", "--", f"echo >{GO}.begun; read go <{GO}; echo >{GO}.done")
 os.mkfifo(GO)

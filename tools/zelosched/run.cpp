@@ -18,6 +18,7 @@
 #include "for_each_id.h"
 #include "options.h"
 #include "result_text.h"
+#include "run_output.h"
 #include "runs.h"
 #include "save.h"
 #include "start_run.h"
@@ -104,16 +105,16 @@ void catchInterrupts() {
   }
 }
 
-// One line that is written over, on a terminal only, and not where the command itself writes.
+// One line that is written over, on a terminal only.
 class Progress {
  public:
-  Progress(std::string title, bool isShown) : title_(std::move(title)), isShown_(isShown) {}
+  explicit Progress(std::string title) : title_(std::move(title)) {}
   ~Progress() { clear(); }
   Progress(const Progress &) = delete;
   Progress &operator=(const Progress &) = delete;
 
   void show(const char *what) {
-    const std::optional<size_t> columns = isShown_ ? terminalColumns() : std::nullopt;
+    const std::optional<size_t> columns = terminalColumns();
     const auto seconds =
         std::chrono::duration_cast<std::chrono::seconds>(Clock::now() - start_).count();
     if (!columns || seconds == shown_) return;
@@ -132,14 +133,22 @@ class Progress {
   }
 
   std::string title_;
-  bool isShown_;
   Clock::time_point start_ = Clock::now();
   long shown_ = -1;
 };
 
+bool hasEnded(pid_t process) {
+  return waitpid(process, nullptr, WNOHANG) != 0;
+}
+
+void showUntilEnd(pid_t process, RunOutput *output) {
+  while (!hasEnded(process)) output->pass(kPause);
+  output->passRest();
+}
+
 void waitForEnd(pid_t process, long lastStatusId, const RunDatabase &database, Progress *progress) {
   bool isRecorded = false;
-  while (waitpid(process, nullptr, WNOHANG) == 0) {
+  while (!hasEnded(process)) {
     isRecorded = isRecorded || database.runOfProcess(process, lastStatusId).has_value();
     progress->show(isRecorded ? "is running" : "waits for its turn");
     std::this_thread::sleep_for(kPause);
@@ -153,16 +162,21 @@ void runAndWait(const ZELO_SCHED_TASK &task, bool showsOutput) {
   const RunDatabase database;
   const long lastStatusId = database.lastStatusId();
   const std::map<pid_t, ProcessStat> before = children();
+  std::optional<RunOutput> output;
   if (showsOutput) {
-    startRun(task);
+    output.emplace();
+    startRun(task, output->descriptorOfRun());
+    output->runHasBegun();
   } else {
     startRunUnseen(task);
   }
   const pid_t process = newChild(before);
   if (process == 0)
     throw Failure(titleOf(task) + " was started, but its process is not to be found");
-  {
-    Progress progress(titleOf(task), !showsOutput);
+  if (output) {
+    showUntilEnd(process, &*output);
+  } else {
+    Progress progress(titleOf(task));
     waitForEnd(process, lastStatusId, database, &progress);
   }
   const std::optional<Run> run = database.runOfProcess(process, lastStatusId);
@@ -172,6 +186,9 @@ void runAndWait(const ZELO_SCHED_TASK &task, bool showsOutput) {
                   "long (the system log says which)");
   }
   const std::string result = titleOf(task) + " " + resultInWords(run->statusCode, run->comment);
+  if (output && !output->fault().empty()) {
+    throw Failure(result + ", and what it printed could not be written: " + output->fault());
+  }
   if (run->statusCode != ZELO_SCHED_STATUS_FINISHED) throw Failure(result);
   std::puts(result.c_str());
 }
@@ -210,7 +227,8 @@ const Command kRunCommand = {
     "\n"
     "  -w, --wait                     wait for the end and tell the result; the exit status\n"
     "                                 is 0 only when the command exited with 0\n"
-    "  --output                       wait, and show what the command prints; else that is\n"
+    "  --output                       wait, and show what the command prints, with control\n"
+    "                                 characters made visible on a terminal; else that is\n"
     "                                 seen by nobody\n"
     "  --force                        even if its application does not let it be run\n",
     runRun};

@@ -12,29 +12,36 @@
 
 namespace {
 
-// While one of these lives, the standard streams lead nowhere.
-class NoStreams {
+constexpr int kFirstOwnDescriptor = STDERR_FILENO + 1;
+
+int openNowhere(int access) {
+  return open("/dev/null", access | O_CLOEXEC);
+}
+
+// While one of these lives, standard output and error lead there, and standard input leads nowhere.
+class LentStreams {
  public:
-  NoStreams() {
-    const int nowhere = open("/dev/null", O_RDWR | O_CLOEXEC);
+  explicit LentStreams(int output) {
     for (size_t i = 0; i < std::size(kept_); ++i) {
-      const int stream = static_cast<int>(i);
-      kept_[i] = fcntl(stream, F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
-      dup2(nowhere, stream);
+      kept_[i] = fcntl(static_cast<int>(i), F_DUPFD_CLOEXEC, kFirstOwnDescriptor);
     }
+    const int nowhere = openNowhere(O_RDONLY);
+    dup2(nowhere, STDIN_FILENO);
     close(nowhere);
+    dup2(output, STDOUT_FILENO);
+    dup2(output, STDERR_FILENO);
   }
-  ~NoStreams() {
+  ~LentStreams() {
     for (size_t i = 0; i < std::size(kept_); ++i) {
       dup2(kept_[i], static_cast<int>(i));
       close(kept_[i]);
     }
   }
-  NoStreams(const NoStreams &) = delete;
-  NoStreams &operator=(const NoStreams &) = delete;
+  LentStreams(const LentStreams &) = delete;
+  LentStreams &operator=(const LentStreams &) = delete;
 
  private:
-  int kept_[STDERR_FILENO + 1];
+  int kept_[kFirstOwnDescriptor];
 };
 
 // A run that cannot be recorded ends at once, which only the system log says.
@@ -47,10 +54,10 @@ void requireRecords() {
 
 }  // namespace
 
-void startRun(const ZELO_SCHED_TASK &task, Disabled disabled) {
-  requireRecords();
-  // The run's process begins as a copy of this one.
+void startRun(const ZELO_SCHED_TASK &task, int output, Disabled disabled) {
   std::fflush(stdout);
+  const LentStreams streams(output);
+  requireRecords();
   forgetError();
   constexpr int kAnyTime = 0;
   if (ZELOSchedTaskRun(task.ID, kAnyTime, static_cast<int>(disabled)) < 0) {
@@ -59,7 +66,12 @@ void startRun(const ZELO_SCHED_TASK &task, Disabled disabled) {
 }
 
 void startRunUnseen(const ZELO_SCHED_TASK &task, Disabled disabled) {
-  std::fflush(stdout);
-  const NoStreams nowhere;
-  startRun(task, disabled);
+  const int nowhere = openNowhere(O_WRONLY);
+  try {
+    startRun(task, nowhere, disabled);
+  } catch (...) {
+    close(nowhere);
+    throw;
+  }
+  close(nowhere);
 }

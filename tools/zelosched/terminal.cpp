@@ -14,16 +14,16 @@ namespace {
 constexpr size_t kUsualColumns = 80;
 constexpr long kMostColumns = 10000;
 
-bool isTerminal() {
-  return isatty(STDOUT_FILENO) == 1;
-}
-
 const char *variable(const char *name) {
   const char *value = std::getenv(name);
   return value != nullptr ? value : "";
 }
 
 }  // namespace
+
+bool isTerminal() {
+  return isatty(STDOUT_FILENO) == 1;
+}
 
 std::optional<size_t> terminalColumns() {
   if (!isTerminal()) return std::nullopt;

@@ -4,6 +4,8 @@
 #include <cstddef>
 #include <optional>
 
+bool isTerminal();
+
 // Columns of the terminal; nothing when the output is none, and lines may be of any length.
 std::optional<size_t> terminalColumns();
 

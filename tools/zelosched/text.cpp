@@ -91,6 +91,21 @@ void appendEscaped(std::string *out, std::string_view bytes) {
   }
 }
 
+std::string escaped(std::string_view text, std::string_view kept) {
+  std::string out;
+  while (!text.empty()) {
+    const std::optional<Character> next = firstCharacter(text);
+    const size_t bytes = next ? next->bytes : 1;
+    if ((next && canBeShown(next->code)) || kept.find(text[0]) != std::string_view::npos) {
+      out += text.substr(0, bytes);
+    } else {
+      appendEscaped(&out, text.substr(0, bytes));
+    }
+    text.remove_prefix(bytes);
+  }
+  return out;
+}
+
 // Widths do not depend on the user's locale, but the C library knows them in a UTF-8 one only.
 int columnsOf(uint32_t code) {
   static const locale_t unicode = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
@@ -120,18 +135,23 @@ bool needsQuotes(std::string_view word) {
 }  // namespace
 
 std::string printable(std::string_view text) {
-  std::string out;
-  while (!text.empty()) {
-    const std::optional<Character> next = firstCharacter(text);
-    const size_t bytes = next ? next->bytes : 1;
-    if (next && canBeShown(next->code)) {
-      out += text.substr(0, bytes);
-    } else {
-      appendEscaped(&out, text.substr(0, bytes));
+  return escaped(text, "");
+}
+
+std::string printableLines(std::string_view text) {
+  return escaped(text, "\n\t");
+}
+
+size_t cutCharacterLength(std::string_view text) {
+  for (size_t bytes = 1; bytes < std::size(kLeads) && bytes <= text.size(); ++bytes) {
+    const unsigned char byte = byteAt(text, text.size() - bytes);
+    if ((byte & kTailMask) == kTail) continue;
+    for (size_t tails = bytes; tails < std::size(kLeads); ++tails) {
+      if ((byte & kLeads[tails].mask) == kLeads[tails].bits) return bytes;
     }
-    text.remove_prefix(bytes);
+    return 0;
   }
-  return out;
+  return 0;
 }
 
 size_t utf8Length(std::string_view text) {

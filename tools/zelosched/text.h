@@ -9,6 +9,13 @@
 // UTF-8.
 std::string printable(std::string_view text);
 
+// The same of several lines: line feeds and tabs stay.
+std::string printableLines(std::string_view text);
+
+// The bytes at the end of a text that begin a character whose rest may follow; 0 when there are
+// none.
+size_t cutCharacterLength(std::string_view text);
+
 // The bytes of the character that a text begins with; 0 when that is no UTF-8.
 size_t utf8Length(std::string_view text);
 
