@@ -84,7 +84,7 @@ struct ZELO_SCHED_TASK {
   char NextTriggerTime[1024]; /* "YYYY-MM-DD hh:mm" or "N/A"; never stored */
   int32_t State;              /* 0 disabled, 1 enabled, 2 not existing */
   int32_t Type;               /* 0 once, 1 daily, 2 weekly, 3 monthly, 4 yearly */
-  char Week[8];               /* seven characters from Sunday on; '0' = off */
+  char Week[8];               /* seven from Sunday on; '0' = off, all else and the end = on */
   uint32_t StartYear;         /* day of the first or only run */
   uint32_t StartMonth;        /* 1 to 12 */
   uint32_t StartDay;          /* 1 to 31 */

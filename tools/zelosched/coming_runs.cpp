@@ -4,6 +4,8 @@
 #include <cstdio>
 #include <tuple>
 
+#include "sched_week.h"
+
 namespace {
 
 using std::chrono::days;
@@ -11,7 +13,6 @@ using std::chrono::sys_days;
 using std::chrono::year_month_day;
 
 constexpr uint32_t kHours = 24;
-constexpr char kDayOff = '0';
 constexpr days kSearched{366 * 9};  // 29 February comes after eight years at the latest
 constexpr uint32_t kLastYear = 9999;
 constexpr int kFirstYear = 1900;  // of struct tm
@@ -50,7 +51,7 @@ bool isDayOf(const ZELO_SCHED_TASK &task, sys_days day) {
     case ZELO_SCHED_TYPE_DAILY:
       return true;
     case ZELO_SCHED_TYPE_WEEKLY:
-      return task.Week[weekdayOf(day)] != kDayOff;
+      return schedIsDayOn(task.Week, weekdayOf(day));
     case ZELO_SCHED_TYPE_MONTHLY:
       return date.day == start.day;
     case ZELO_SCHED_TYPE_YEARLY:

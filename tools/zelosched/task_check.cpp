@@ -5,6 +5,7 @@
 
 #include "coming_runs.h"
 #include "owner.h"
+#include "sched_week.h"
 #include "schedule_text.h"
 #include "task_list.h"
 #include "text.h"
@@ -15,7 +16,6 @@ constexpr uint32_t kLastHour = 23;
 constexpr uint32_t kLastMinute = 59;
 constexpr uint32_t kMonths = 12;
 constexpr uint32_t kMostDays = 31;
-constexpr size_t kDaysOfWeek = 7;
 constexpr uint32_t kLastYear = 9999;
 constexpr int kLeapYear = 2024;
 
@@ -41,7 +41,9 @@ size_t weekLength(const ZELO_SCHED_TASK &task) {
 }
 
 bool isWeekEmpty(const ZELO_SCHED_TASK &task) {
-  return std::string(task.Week, weekLength(task)).find_first_not_of('0') == std::string::npos;
+  uint32_t day = 0;
+  while (day < kDaysOfWeek && !schedIsDayOn(task.Week, day)) ++day;
+  return day == kDaysOfWeek;
 }
 
 bool dayExists(int year, const ZELO_SCHED_TASK &task) {
