@@ -12,6 +12,7 @@
 #include <string>
 #include <string_view>
 
+#include "sched_cron_fields.h"
 #include "sched_guards.h"
 #include "sched_json.h"
 #include "sched_parm_table.h"
@@ -196,8 +197,24 @@ bool isStored(ZELO_SCHED_TASK *pTask) {
   return true;
 }
 
+void reportConversion(const ZELO_SCHED_TASK &task) {
+  SCHED_LOG("hash to task failed, task id=%ld", static_cast<long>(task.ID));
+}
+
+// A disabled task is judged like an enabled one: whoever enables it looks at its state alone. A
+// power time has no line of the scheduler's, and the platform judges it.
+bool canBeKept(const ZELO_SCHED_TASK &task, bool overwrites) {
+  return (overwrites && task.Backend == ZELO_SCHED_BACKEND_AUTOPOWER) ||
+         schedIsCronLineReadable(task);
+}
+
 int save(ZELO_SCHED_TASK *pTask, bool create) {
-  if (!create && isStored(pTask)) {
+  const bool overwrites = !create && isStored(pTask);
+  if (!canBeKept(*pTask, overwrites)) {
+    reportConversion(*pTask);
+    return -1;
+  }
+  if (overwrites) {
     if (ZELOSchedTaskEdit(pTask) != 0) {
       SCHED_LOG("overwrite failed, task=%ld", static_cast<long>(pTask->ID));
       return -1;
@@ -234,7 +251,7 @@ int saveFromJson(const char *szJson, bool create) {
     return task->ID;
   }
   if (ZELOSchedInitTaskFromHash(task.get(), hash.get()) < 0) {
-    SCHED_LOG("hash to task failed, task id=%ld", static_cast<long>(task->ID));
+    reportConversion(*task);
     return -1;
   }
   return save(task.get(), create);

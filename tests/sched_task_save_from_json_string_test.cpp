@@ -478,6 +478,102 @@ TEST_F(TaskFromJsonTest, TheIdThatWasReadStandsInTheLine) {
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x4000, "sched_parm_table.cpp"}));
 }
 
+// ---- what cron could not read -----------------------------------------------------------------
+
+// One such line, and cron starts nothing of the whole crontab.
+const Members kUnreadable[] = {
+    {{"run hour", "24"}},
+    {{"run hour", "4294967295"}},
+    {{"run hour", "24"}, {"repeat hour", "1"}, {"last work hour", "23"}},
+    {{"run hour", "99"}, {"repeat hour", "24"}, {"last work hour", "4294967295"}},
+    {{"run min", "60"}},
+    {{"run min", "99"}},
+    {{"type", "once"}, {"start day", "0"}},
+    {{"type", "once"}, {"start day", "32"}},
+    {{"type", "once"}, {"start month", "0"}},
+    {{"type", "once"}, {"start month", "13"}},
+    {{"type", "monthly"}, {"start day", "0"}},
+    {{"type", "monthly"}, {"start day", "4294967295"}},
+    {{"type", "yearly"}, {"start day", "32"}},
+    {{"type", "yearly"}, {"start month", "13"}},
+    {{"type", "weekly"}, {"week", "0000000"}},
+};
+
+TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsRefused) {
+  for (const Members &schedule : kUnreadable) {
+    SCOPED_TRACE(objectOf(schedule));
+    expectRefused(taskText(schedule), "hash to task failed, task id=-1");
+    for (const char *state : {"disabled", "NotExisted"}) {
+      SCOPED_TRACE(state);
+      Members changes = schedule;
+      changes.emplace_back("state",
+                           state);  // it may be enabled later, by who looks at nothing else
+      expectRefused(taskText(changes), "hash to task failed, task id=-1");
+    }
+    support::clearLog();
+    EXPECT_EQ(save(taskText(schedule), 1), -1);
+    EXPECT_EQ(logged(), Lines{std::string(kUnit) + "hash to task failed, task id=-1"});
+  }
+}
+
+TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsNotSavedOverTheStoredTask) {
+  ASSERT_EQ(save(taskText()), 1);
+  const std::string before = support::readFile(support::kStore);
+  for (Members schedule : kUnreadable) {
+    SCOPED_TRACE(objectOf(schedule));
+    schedule.emplace_back("id", "1");
+    EXPECT_EQ(save(taskText(schedule)), -1);
+    EXPECT_EQ(logged().back(), std::string(kUnit) + "hash to task failed, task id=1");
+    EXPECT_EQ(support::readFile(support::kStore), before);
+    EXPECT_EQ(support::crontabLines().size(), 1U);
+  }
+}
+
+TEST_F(TaskFromJsonTest, WhatCronReadsIsSaved) {
+  const Members kReadable[] = {
+      {{"run hour", "23"}, {"run min", "59"}},
+      {{"last work hour", "99"}},                                // of no effect without repeats
+      {{"repeat hour", "1"}, {"last work hour", "4294967295"}},  // the line ends with hour 23
+      {{"start day", "0"}, {"start month", "99"}},               // of a daily task
+      {{"type", "monthly"}, {"start day", "31"}, {"start month", "0"}},
+      {{"type", "yearly"}, {"start day", "31"}, {"start month", "2"}},  // which never comes
+      {{"type", "once"}, {"start day", "1"}, {"start month", "12"}},
+      {{"type", "weekly"}, {"week", "0000001"}},
+      {{"type", "weekly"}, {"week", "000"}},  // the days behind its end are on
+      {{"type", "weekly"}, {"week", ""}},
+      {{"week", "0000000"}},  // of a daily task
+  };
+  int id = 0;
+  for (const Members &schedule : kReadable) {
+    SCOPED_TRACE(objectOf(schedule));
+    EXPECT_EQ(save(taskText(schedule), 1), ++id);
+  }
+}
+
+TEST_F(TaskFromJsonTest, AWeekOfOneCharacterTakesNoDaysFromTheTaskBeforeIt) {
+  const auto weekly = [](const char *week) {
+    return taskText({{"type", "weekly"}, {"week", week}});
+  };
+  ASSERT_EQ(save(weekly("0000010")), 1);
+  ASSERT_EQ(save(weekly("0")), 2);
+  ASSERT_EQ(support::crontabLines().size(), 2U);
+  EXPECT_EQ(support::crontabLines()[1],
+            "2\t1\t*\t*\t1,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=2");
+}
+
+// It has no line of its own, and the platform knows how to keep it.
+TEST_F(TaskFromJsonTest, APowerTimeWithoutADayIsOverwrittenInItsPlaceButIsNoOrdinaryTask) {
+  support::haveClock();
+  support::setPowerList(support::kOff, {{1, 0, 5, 7}});
+  constexpr long kId = 90000507;
+  const std::string text = jsonOf(kId);
+  EXPECT_EQ(save(text), kId);
+  EXPECT_EQ(support::powerList(support::kOff), (support::Entries{{1, 0, 5, 7}}));
+  EXPECT_EQ(save(text, 1), -1);
+  EXPECT_EQ(logged().back(), std::string(kUnit) + "hash to task failed, task id=90000507");
+  EXPECT_FALSE(support::fileExists(support::kStore));
+}
+
 TEST_F(TaskFromJsonTest, AFailedAllocationOfTheTaskIsReportedWithTheRecord) {
   if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
   const std::string text = taskText();

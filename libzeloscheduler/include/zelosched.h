@@ -144,7 +144,13 @@ ZELO_SCHED_API int ZELOSchedTaskLoad(long id, ZELO_SCHED_TASK *pTask);
  * backend's result (0 or more), or -1: 0x0D00, 0x2000 when no backend has that
  * id, or what the backend left. After a failure the record has its new id when
  * the task was stored and what follows from it was not done; that of a power time
- * has it, and its new name, after any failure. */
+ * has it, and its new name, after any failure.
+ *
+ * What the schedule says goes into the crontab as it is, here and in
+ * ZELOSchedTaskEdit: the caller checks it. Debian's cron passes over the whole of
+ * /etc/crontab, and starts nothing, for one enabled task with an hour above 23, a
+ * minute above 59, a day other than 1 to 31 (once, monthly, yearly), a month other
+ * than 1 to 12 (once, yearly) or no day of the week (weekly). */
 ZELO_SCHED_API int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask);
 
 /* Overwrites the stored task of the record's id; plugins hear of it before and
@@ -249,8 +255,10 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
  * The text may come from anyone. A root that is no object, a member that is no
  * string or whose string is no JSON string, half of a surrogate pair, a zero
  * byte, too deep a nesting, anything but blanks and comments after the end, a
- * number that does not fit its field, a command of more than 12287 bytes, and a
- * text of more than 4 MiB are failures, and then nothing is saved. Bytes that are
+ * number that does not fit its field, a command of more than 12287 bytes, a
+ * schedule that cron cannot read (see ZELOSchedTaskCreate; also that of a task
+ * that is not enabled), and a text of more than 4 MiB are failures, and then
+ * nothing is saved. Bytes that are
  * not UTF-8 are saved as they are; another text that is longer than its field is
  * cut to it.
  *

@@ -5,6 +5,7 @@
 #include <cstring>
 #include <fstream>
 
+#include "sched_run_hours.h"
 #include "sched_week.h"
 #include "task_list.h"
 #include "text.h"
@@ -15,23 +16,22 @@ constexpr char kCrontab[] = "/etc/crontab";
 constexpr char kTaskProgram[] = "/tmp/zeloschedtask";  // what marks a line as a task's
 constexpr char kPowerOffProgram[] = "/usr/zelo/bin/zelo_poweroff_feasible_check";
 constexpr char kPowerOff[] = "poweroff";
-constexpr size_t kMostHourText = 127;  // what the library has room for
 
 using Tasks = std::vector<const ZELO_SCHED_TASK *>;
 
-void appendItem(std::string *list, uint64_t number) {
+// The library writes a number of a list with its sign.
+void appendItem(std::string *list, uint32_t number) {
   if (!list->empty()) *list += ',';
-  *list += std::to_string(number);
+  *list += std::to_string(static_cast<int32_t>(number));
 }
 
 std::string hours(const ZELO_SCHED_TASK &task) {
   std::string list;
-  const uint32_t last = std::max(task.RunHour, task.LastWorkHour);
-  for (uint64_t hour = task.RunHour; hour <= last; hour += task.RepeatHour) {
+  anyRunHour(task, [&](uint32_t hour) {
     appendItem(&list, hour);
-    if (task.RepeatHour == 0 || list.size() >= kMostHourText) break;
-  }
-  return list.substr(0, kMostHourText);
+    return false;
+  });
+  return list;
 }
 
 std::string weekdays(const ZELO_SCHED_TASK &task) {
