@@ -287,8 +287,23 @@ TEST_F(TaskFromJsonTest, OfMembersGivenTwiceTheLastCounts) {
   EXPECT_STREQ(loadTask(1)->Name, "last");
 }
 
-TEST_F(TaskFromJsonTest, ABadMemberThatIsGivenAgainCountsAsTheLast) {
-  ASSERT_EQ(save(textWithRawMember("name", R"({"x":[1]},"name":"\"last\"")")), 1);
+TEST_F(TaskFromJsonTest, AnArrayOrAnObjectIsRefusedAlsoWhereItsMemberIsGivenAgain) {
+  for (const char *first : {R"({"x":[1]})", "[]", "/**/ {}", "{\"name\":\"\\\"n\\\"\"}"}) {
+    expectMemberRefused(first + std::string(R"(,"name":"\"last\"")"));
+  }
+}
+
+TEST_F(TaskFromJsonTest, AnotherBadMemberThatIsGivenAgainCountsAsTheLast) {
+  int id = 0;
+  for (const char *first : {"1", "null", "-1.5e3", "\"\""}) {
+    EXPECT_EQ(save(textWithRawMember("name", first + std::string(R"(,"name":"\"last\"")"))), ++id);
+  }
+}
+
+TEST_F(TaskFromJsonTest, WhatLooksLikeAMemberWithinAStringOrACommentIsNone) {
+  ASSERT_EQ(save(textWithRawMember("name", R"("\":1,[{\\","name": /*":[*/ //":[
+                                              "\"last\"")")),
+            1);
   EXPECT_STREQ(loadTask(1)->Name, "last");
 }
 
