@@ -311,7 +311,7 @@ imports_power_times_whole_or_not_at_all() {
   sed '1d;$d' "$SCRATCH/power" | grep poweron | sed 's/,$//' >"$SCRATCH/on"
   { echo "["; for i in {1..104}; do sed "s/\"run hour\":7/\"run hour\":$((i / 60))/;s/\"run min\":0/\"run min\":$((i % 60))/" "$SCRATCH/on"; echo ","; done; cat "$SCRATCH/on"; echo "]"; } |
     tr '\n' ' ' >"$SCRATCH/many"
-  fails_saying 1 "no more are shown" z import --new "$SCRATCH/many" || bad=1
+  fails_saying 1 "no more fit" z import --new "$SCRATCH/many" || bad=1
   return "$bad"
 }
 

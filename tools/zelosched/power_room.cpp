@@ -9,7 +9,7 @@
 
 namespace {
 
-constexpr size_t kMostTimes = 100;  // of each direction; the library shows no more
+constexpr size_t kMostTimes = 100;  // of each direction; the platform takes no more
 constexpr int32_t kPowerOn = 60000000;
 constexpr int32_t kPowerOff = 80000000;
 constexpr int32_t kEnabled = 10000000;
@@ -49,7 +49,7 @@ void PowerRoom::take(const ZELO_SCHED_TASK &task) {
                                    [&](int32_t other) { return (other >= kPowerOff) == isOff; });
   if (static_cast<size_t>(taken) >= kMostTimes) {
     throw Failure("there are " + std::to_string(taken) + " power-" + directionOf(task) +
-                  " times already, and no more are shown: remove one first");
+                  " times already, and no more fit: remove one first");
   }
   ids_.insert(id);
 }
