@@ -282,6 +282,20 @@ TEST_F(TaskFromJsonTest, AMemberThatIsNoKeyOfATaskIsPassedOver) {
   EXPECT_EQ(loadTask(2)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
 }
 
+// As the header warns: the text alone decides, and what is no number counts as 0.
+TEST_F(TaskFromJsonTest, AnOwnerThatIsMissingOrSaysNothingIsRoot) {
+  int id = 0;
+  for (const char *owner : {"", " 0", "-0", "0"}) {
+    SCOPED_TRACE(owner);
+    ASSERT_EQ(save(taskText({{"owner", owner}})), ++id);
+    EXPECT_EQ(loadTask(id)->Owner, 0U);
+  }
+  ASSERT_EQ(save(taskText()), ++id);
+  EXPECT_EQ(loadTask(id)->Owner, 0U);
+  ASSERT_EQ(save(textWithRawMember("owner", R"("\"1000\"","owner":"\"0\"")")), ++id);
+  EXPECT_EQ(loadTask(id)->Owner, 0U);
+}
+
 TEST_F(TaskFromJsonTest, OfMembersGivenTwiceTheLastCounts) {
   ASSERT_EQ(save(textWithRawMember("name", R"("\"first\"","name":"\"last\"")")), 1);
   EXPECT_STREQ(loadTask(1)->Name, "last");

@@ -262,6 +262,12 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
  * not UTF-8 are saved as they are; another text that is longer than its field is
  * cut to it.
  *
+ * Whose task it is, the text alone decides. One whose "owner" is missing, "" or
+ * " 0", "-0" or another way to write nothing, or comes again as 0, is root's, and
+ * its command runs as root; and one that repeats id, name and app of anybody's task,
+ * which everybody can read, is saved over it. So a back end does not hand the text
+ * of a user on: examples/save_for_user.c shows how it saves for him.
+ *
  * The id of the saved task (0 or more), or -1: no code of its own for a null or
  * empty text or one that cannot be read, else what the callee left. An object
  * without members saves nothing and gives the id of a new record, which is -1,
