@@ -176,8 +176,10 @@ TEST_F(CrontabTest, AWeekThatIsTooShortTakesNoDaysFromTheTaskBeforeIt) {
         setText(task->Week, week);
       });
     }
-    ASSERT_EQ(crontabLines().size(), 3U);
-    EXPECT_EQ(crontabLines()[1], "0\t0\t*\t*\t0,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=2");
+    const Lines lines = crontabLines();  // in the order of the records in memory
+    EXPECT_EQ(std::count(lines.begin(), lines.end(),
+                         "0\t0\t*\t*\t0,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=2"),
+              1);
   }
 }
 
