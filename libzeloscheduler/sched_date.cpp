@@ -8,13 +8,12 @@
 #include "sched_run_hours.h"
 #include "sched_text.h"
 #include "sched_trigger_clock.h"
+#include "sched_week.h"
 
 namespace {
 
 constexpr uint32_t kFirstYear = 1900;  // of struct tm
-constexpr uint32_t kDaysOfWeek = 7;
-constexpr uint32_t kHundred = 100;  // a time of day is hour * 100 + minute
-constexpr char kDayOff = '0';
+constexpr uint32_t kHundred = 100;     // a time of day is hour * 100 + minute
 constexpr char kNever[] = "N/A";
 
 using TriggerText = BoundedText<64>;
@@ -25,10 +24,6 @@ ZELO_SCHED_DATE startDate(const ZELO_SCHED_TASK &task) {
   date.month = task.StartMonth;
   date.day = task.StartDay;
   return date;
-}
-
-bool isWeekdayOn(const ZELO_SCHED_TASK &task, uint32_t weekday) {
-  return task.Week[weekday] != kDayOff;
 }
 
 bool isDayOfMonth(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
@@ -76,7 +71,7 @@ Today ZELOSchedTDayNextRunTime(const ZELO_SCHED_TASK *pTask, const ZELO_SCHED_DA
 // Without any day of the week the search ends eight days ahead; the display shows just that.
 uint32_t daysToNextWeekday(const ZELO_SCHED_TASK &task, uint32_t weekday) {
   uint32_t days = 1;
-  while (days <= kDaysOfWeek && !isWeekdayOn(task, (weekday + days) % kDaysOfWeek)) {
+  while (days <= kDaysOfWeek && !schedIsDayOn(task.Week, (weekday + days) % kDaysOfWeek)) {
     ++days;
   }
   return days;
@@ -140,7 +135,7 @@ bool runsToday(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now, int nowT
     case ZELO_SCHED_TYPE_DAILY:
       return true;
     default:
-      return isWeekdayOn(task, now.weekday);
+      return schedIsDayOn(task.Week, now.weekday);
   }
 }
 

@@ -18,6 +18,7 @@
 #include "sched_shared_names.h"
 #include "sched_surroundings.h"
 #include "sched_user.h"
+#include "sched_week.h"
 
 FILE *pfLock;
 
@@ -32,7 +33,6 @@ constexpr int kLockTries = 101;
 constexpr useconds_t kLockPause = 50000;
 constexpr int kMostRetries = 20;  // lock failures and conflicts together
 constexpr size_t kCommentCapacity = 1024;
-constexpr char kDayOff = '0';
 constexpr int kForkedCaller = 1;
 
 // ---- is now one of the task's minutes? --------------------------------------------------------
@@ -45,7 +45,7 @@ bool isDayOfTask(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now, bool i
     case ZELO_SCHED_TYPE_DAILY:
       return true;
     case ZELO_SCHED_TYPE_WEEKLY:
-      return task.Week[now.weekday] != kDayOff;
+      return schedIsDayOn(task.Week, now.weekday);
     case ZELO_SCHED_TYPE_MONTHLY:
       return now.day == task.StartDay;
     case ZELO_SCHED_TYPE_YEARLY:

@@ -4,6 +4,7 @@
 #include <zelosched.h>
 #include <zelosdk.h>
 
+#include <algorithm>
 #include <charconv>
 #include <cstdint>
 #include <cstdlib>
@@ -12,6 +13,7 @@
 #include <string>
 #include <string_view>
 
+#include "sched_cron_fields.h"
 #include "sched_guards.h"
 #include "sched_json.h"
 #include "sched_parm_table.h"
@@ -25,25 +27,67 @@ constexpr int kHashCapacity = 512;
 constexpr size_t kLongestText = size_t{4} << 20;
 constexpr char kCommandKey[] = "cmd";
 
-// The reader stops at the end of the value. Blanks and comments may follow, nothing else.
-bool isAllThereIs(std::string_view rest) {
+bool isBlank(char c) {
+  return c == ' ' || c == '\t' || c == '\r' || c == '\n';
+}
+
+// Goes past blanks and comments. False when the last comment does not end.
+bool skipBlanks(std::string_view *text) {
   for (;;) {
-    const size_t next = rest.find_first_not_of(" \t\r\n");
-    if (next == std::string_view::npos) {
+    const auto *next = std::find_if_not(text->begin(), text->end(), isBlank);
+    text->remove_prefix(static_cast<size_t>(next - text->begin()));
+    const bool isBlock = text->starts_with("/*");
+    if (!isBlock && !text->starts_with("//")) {
       return true;
     }
-    rest.remove_prefix(next);
-    const bool isBlock = rest.starts_with("/*");
-    if (!isBlock && !rest.starts_with("//")) {
-      return false;
-    }
     constexpr size_t kMarkLength = 2;
-    const size_t end = isBlock ? rest.find("*/", kMarkLength) : rest.find('\n');
+    const size_t end = isBlock ? text->find("*/", kMarkLength) : text->find('\n');
     if (end == std::string_view::npos) {
+      text->remove_prefix(text->size());
       return !isBlock;
     }
-    rest.remove_prefix(isBlock ? end + kMarkLength : end);
+    text->remove_prefix(isBlock ? end + kMarkLength : end);
   }
+}
+
+// The reader stops at the end of the value. Blanks and comments may follow, nothing else.
+bool isAllThereIs(std::string_view rest) {
+  return skipBlanks(&rest) && rest.empty();
+}
+
+// The first character of a value says what it is.
+constexpr char kObject = '{';
+constexpr char kString = '"';
+
+bool beginsWith(std::string_view text, char first) {
+  return skipBlanks(&text) && text.starts_with(first);
+}
+
+constexpr char kArray = '[';
+
+size_t lengthOfString(std::string_view text) {
+  size_t length = 1;
+  while (text[length] != kString) {
+    length += text[length] == '\\' ? 2 : 1;
+  }
+  return length + 1;
+}
+
+// Whether there is an array or an object in the root object, given a text that could be read. In
+// what was read of it, one whose member is given again does not show any more.
+bool isNested(std::string_view text) {
+  constexpr size_t kRoot = 1;
+  skipBlanks(&text);
+  text.remove_prefix(kRoot);
+  const bool isPossible =
+      text.find(kArray) != std::string_view::npos || text.find(kObject) != std::string_view::npos;
+  while (isPossible && skipBlanks(&text) && !text.empty()) {
+    if (text.front() == kArray || text.front() == kObject) {
+      return true;
+    }
+    text.remove_prefix(text.front() == kString ? lengthOfString(text) : 1);
+  }
+  return false;
 }
 
 constexpr unsigned kFirstHighSurrogate = 0xD800;
@@ -83,10 +127,12 @@ bool hasHalfPair(std::string_view text) {
   return false;
 }
 
-// The reader throws where a text is nested too deeply.
-bool parse(SchedJsonReader *reader, std::string_view text, Json::Value *value) {
+// A value of another kind is not read, as one of many small values takes several times as long as
+// the texts of a task do. The reader throws where a text is nested too deeply.
+bool parse(SchedJsonReader *reader, std::string_view text, char first, Json::Value *value) {
   try {
-    return text.size() <= kLongestText && reader->read(text, value) && !hasHalfPair(text) &&
+    return text.size() <= kLongestText && beginsWith(text, first) && reader->read(text, value) &&
+           !hasHalfPair(text) &&
            isAllThereIs(text.substr(static_cast<size_t>(value->getOffsetLimit())));
   } catch (const Json::Exception &) {
     return false;
@@ -108,7 +154,7 @@ bool isPlainText(std::string_view text) {
 
 // The value that is written in a member's string, which must be a string again.
 bool decodeMember(SchedJsonReader *reader, const Json::Value &member, Json::Value *inner) {
-  return member.isString() && parse(reader, textOf(member), inner) && inner->isString() &&
+  return member.isString() && parse(reader, textOf(member), kString, inner) &&
          isPlainText(textOf(*inner));
 }
 
@@ -196,8 +242,24 @@ bool isStored(ZELO_SCHED_TASK *pTask) {
   return true;
 }
 
+void reportConversion(const ZELO_SCHED_TASK &task) {
+  SCHED_LOG("hash to task failed, task id=%ld", static_cast<long>(task.ID));
+}
+
+// A disabled task is judged like an enabled one: whoever enables it looks at its state alone. A
+// power time has no line of the scheduler's, and the platform judges it.
+bool canBeKept(const ZELO_SCHED_TASK &task, bool overwrites) {
+  return (overwrites && task.Backend == ZELO_SCHED_BACKEND_AUTOPOWER) ||
+         schedIsCronLineReadable(task);
+}
+
 int save(ZELO_SCHED_TASK *pTask, bool create) {
-  if (!create && isStored(pTask)) {
+  const bool overwrites = !create && isStored(pTask);
+  if (!canBeKept(*pTask, overwrites)) {
+    reportConversion(*pTask);
+    return -1;
+  }
+  if (overwrites) {
     if (ZELOSchedTaskEdit(pTask) != 0) {
       SCHED_LOG("overwrite failed, task=%ld", static_cast<long>(pTask->ID));
       return -1;
@@ -217,7 +279,7 @@ int saveFromJson(const char *szJson, bool create) {
   }
   SchedJsonReader reader;
   Json::Value root;
-  if (!parse(&reader, szJson, &root) || !root.isObject()) {
+  if (!parse(&reader, szJson, kObject, &root)) {
     SCHED_LOG("parse json failed, szJson=%s", szJson);
     return -1;
   }
@@ -226,7 +288,7 @@ int saveFromJson(const char *szJson, bool create) {
     SCHED_LOG("Out of memory");
     return -1;
   }
-  if (!fillHash(root, &reader, &hash)) {
+  if (isNested(szJson) || !fillHash(root, &reader, &hash)) {
     SCHED_LOG("save appargs failed");
     return -1;
   }
@@ -234,7 +296,7 @@ int saveFromJson(const char *szJson, bool create) {
     return task->ID;
   }
   if (ZELOSchedInitTaskFromHash(task.get(), hash.get()) < 0) {
-    SCHED_LOG("hash to task failed, task id=%ld", static_cast<long>(task->ID));
+    reportConversion(*task);
     return -1;
   }
   return save(task.get(), create);

@@ -1211,12 +1211,18 @@ TEST_F(PowerTasksTest, ASyncWritesBothBackendsOut) {
             (Lines{"0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=1", kWorkdaysOffLine}));
 }
 
-TEST_F(PowerTasksTest, TheHundredAndFirstIsStoredButNotListed) {
+TEST_F(PowerTasksTest, TheHundredAndFirstIsRefusedUntilOneIsRemoved) {
   Entries full;
   for (unsigned char i = 0; i < 100; ++i) full.push_back({0, i, 1, 1});
   setLists(full, {});
+  support::clearLog();
+  EXPECT_EQ(ZELOSchedTaskSave(powerTask("poweron", kDailyOn).get()), -1);
+  EXPECT_EQ(logged().front(),
+            line("ZELOAutoPowerConfSet failed. num:[101] [0x0D00 power_schedule.cpp:N]"));
+  EXPECT_EQ(powerList(kOn), full);
+  ASSERT_EQ(ZELOSchedTaskRemove(60000101), 0);
   EXPECT_EQ(ZELOSchedTaskSave(powerTask("poweron", kDailyOn).get()), 0);
-  EXPECT_EQ(powerList(kOn).size(), 101U);
+  EXPECT_EQ(powerList(kOn).size(), 100U);
   EXPECT_EQ(list().result, 100);
 }
 

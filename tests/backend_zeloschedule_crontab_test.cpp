@@ -138,6 +138,15 @@ TEST_F(CrontabTest, EachTypeHasItsDayFields) {
       {"weekly, every day", [&](auto *task) { weekly(task, "1111111"); },
        "0\t8\t*\t*\t0,1,2,3,4,5,6"},
       {"weekly, no day", [&](auto *task) { weekly(task, "0000000"); }, "0\t8\t*\t*\t"},
+      {"weekly, two characters", [&](auto *task) { weekly(task, "01"); },
+       "0\t8\t*\t*\t1,2,3,4,5,6"},
+      {"weekly, no character", [&](auto *task) { weekly(task, ""); }, "0\t8\t*\t*\t0,1,2,3,4,5,6"},
+      {"weekly, something behind the end",
+       [&](auto *task) {
+         weekly(task, "0100000");
+         task->Week[2] = '\0';
+       },
+       "0\t8\t*\t*\t1,2,3,4,5,6"},
       {"weekly, any character but zero", [&](auto *task) { weekly(task, "x0y 0z0"); },
        "0\t8\t*\t*\t0,2,3,5"},
       {"a start date that was never set", [&](auto *task) { start(task, 4, 0, 0); },
@@ -153,6 +162,24 @@ TEST_F(CrontabTest, EachTypeHasItsDayFields) {
   for (const LineCase &each : cases) {
     SCOPED_TRACE(each.what);
     EXPECT_EQ(fieldsOf(each.change), each.fields);
+  }
+}
+
+// Records are used for one task after the other, their texts emptied by the first byte alone.
+TEST_F(CrontabTest, AWeekThatIsTooShortTakesNoDaysFromTheTaskBeforeIt) {
+  for (const char *before : {"0000000", "1111111", "0101010"}) {
+    SCOPED_TRACE(before);
+    cleanWorld();
+    for (const char *week : {before, "10", before}) {
+      create([&](auto *task) {
+        task->Type = ZELO_SCHED_TYPE_WEEKLY;
+        setText(task->Week, week);
+      });
+    }
+    const Lines lines = crontabLines();  // in the order of the records in memory
+    EXPECT_EQ(std::count(lines.begin(), lines.end(),
+                         "0\t0\t*\t*\t0,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=2"),
+              1);
   }
 }
 

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <array>
 #include <cstdlib>
+#include <cstring>
 #include <map>
 #include <random>
 #include <set>
@@ -97,7 +98,10 @@ std::map<int, std::string> linesById() {
 bool startsOnDay(const ZELO_SCHED_TASK &task, const Minute &now) {
   const bool sameDay = static_cast<uint32_t>(now.day) == task.StartDay;
   const bool sameMonth = static_cast<uint32_t>(now.month) == task.StartMonth;
-  if (task.Type == ZELO_SCHED_TYPE_WEEKLY) return task.Week[now.weekday] == '1';
+  const auto weekday = static_cast<size_t>(now.weekday);
+  if (task.Type == ZELO_SCHED_TYPE_WEEKLY) {
+    return weekday >= std::strlen(task.Week) || task.Week[weekday] == '1';
+  }
   if (task.Type == ZELO_SCHED_TYPE_MONTHLY) return sameDay;
   // A crontab knows no years: what runs once does so on its day of every year.
   if (task.Type == ZELO_SCHED_TYPE_YEARLY || task.Type == ZELO_SCHED_TYPE_ONCE) {
@@ -183,6 +187,7 @@ Task randomTask(std::mt19937 *random, int id) {
   task->RepeatHour = number(0, 1) == 0 ? 0 : number(1, 24);
   task->LastWorkHour = number(0, 23);
   for (size_t i = 0; i < 7; ++i) task->Week[i] = number(0, 1) == 0 ? '0' : '1';
+  if (number(0, 9) == 0) task->Week[number(0, 6)] = '\0';
   return task;
 }
 

@@ -119,6 +119,65 @@ failed_run() {
   same "$text, $status" "$2, 1"
 }
 
+readonly -a new_task=(owner=65534 name=n cmd=true 'run hour=1' 'run min=2')
+
+# Owner, name, command, hour and minute of a stored task.
+stored_fields() {
+  with_library "$PREFIX/sbin/zelosched" export "$1" | python3 -c 'import json, sys
+task = json.load(sys.stdin)[0]
+print(*(task[key] for key in ("owner", "name", "cmd", "run hour", "run min")))'
+}
+
+# refused UID PAIR...: with status 1, and nothing stored is another one than before
+refused() {
+  local before status=0
+  before=$(cat /tmp/scheduled_tasks /etc/crontab)
+  with_library "$BIN/save_for_user" "$@" >/dev/null 2>&1 || status=$?
+  [[ $status == 1 && $(cat /tmp/scheduled_tasks /etc/crontab) == "$before" ]] ||
+    { echo "status $status: $*"; return 1; }
+}
+
+refuses_every_other_owner() {
+  local owner bad=0
+  for owner in '' 0 ' 0' -0 +0 00 0x0 ' ' 1000 065534 ' 65534' '65534 ' 65534.0 4295032830 -1 nobody; do
+    refused 65534 "owner=$owner" "${new_task[@]:1}" || bad=1
+  done
+  refused 65534 "${new_task[@]:1}" || bad=1
+  refused 65534 owner=0 "${new_task[@]}" || bad=1
+  refused 65534 "${new_task[@]}" owner=0 || bad=1
+  refused 65534 "${new_task[@]}" owner=65534 || bad=1
+  refused 65534 "${new_task[@]}" Owner=0 || bad=1
+  return "$bad"
+}
+
+# The first is root's, and its name and app are what everybody can read.
+refuses_the_tasks_of_others() {
+  local id bad=0
+  for id in 1 2 01 ' 1' -0 +1 1x '' 4294967297 99 71270730; do
+    refused 65534 "id=$id" "${new_task[@]}" || bad=1
+  done
+  refused 65534 owner=65534 id=1 name=good || bad=1
+  refused 65534 owner=65534 id=3 id=1 name=good || bad=1
+  refused 1000 owner=1000 id=3 name=mine || bad=1
+  same "$(stored_fields 1)" "0 good exit 0 2 30" && return "$bad"
+}
+
+refuses_bad_fields() {
+  local pair bad=0
+  for pair in 'run hour=24' 'run hour=-1' 'run hour=' 'run hour= 1' 'run min=60' 'run min=4294967297' \
+    "cmd=$(printf %012288d 0)" "name=$(printf %04096d 0)" app=x state=enabled '' = 'run hour' =1; do
+    refused 65534 owner=65534 id=3 "$pair" || { echo "taken: ${pair:0:40}"; bad=1; }
+  done
+  for pair in name cmd 'run hour' 'run min'; do
+    local rest=() given
+    for given in "${new_task[@]}"; do
+      if [[ $given != "$pair="* ]]; then rest+=("$given"); fi
+    done
+    refused 65534 "${rest[@]}" || { echo "a new task without $pair"; bad=1; }
+  done
+  return "$bad"
+}
+
 check "everything is installed into an empty prefix" install_all
 check "nothing is installed outside of it" same "$(installed_outside)" ""
 lib=$(cd "$PREFIX" && dirname "$(find . -name libzeloscheduler.so.4)" | sed 's|^\./||')
@@ -144,6 +203,7 @@ if grep -q '^ZELO_SANITIZE:STRING=.' "$BUILD_DIR/CMakeCache.txt"; then
   finish
 fi
 check "save_and_list is built by pkg-config" build_by_pkg_config save_and_list
+check "save_for_user is built by pkg-config" build_by_pkg_config save_for_user
 check "tasks_of_owner is built by pkg-config" build_by_pkg_config tasks_of_owner
 check "watch_run is built by pkg-config" build_by_pkg_config watch_run sqlite3
 check "the C++ examples are built by find_package" build_by_cmake
@@ -161,7 +221,17 @@ check "the filter holds the others back" output_is "0 tasks" "$BIN/tasks_of_owne
 check "the C++ example lists in the order of names" \
   same "$(with_library /tmp/install_test/examples/next_runs | sed 's/:.*//' | tr '\n' ' ')" "bad good "
 check "the Python example lists tasks as JSON" same "$(json_names)" "['bad', 'good']"
-for name in save_and_list tasks_of_owner watch_run; do
+check "a task is saved for a user" output_is "saved as task 3" \
+  "$BIN/save_for_user" 65534 "${new_task[@]}"
+check "and is his" output_is "3 n
+1 tasks" "$BIN/tasks_of_owner" 65534
+check "he changes a field of his task" output_is "saved as task 3" \
+  "$BIN/save_for_user" 65534 owner=65534 id=3 'run hour=23'
+check "that field alone" same "$(stored_fields 3)" "65534 n true 23 2"
+check "every other owner than his plain number is refused" refuses_every_other_owner
+check "a task of another owner is not taken over" refuses_the_tasks_of_others
+check "what cron could not read is refused, and what is no field of his" refuses_bad_fields
+for name in save_and_list save_for_user tasks_of_owner watch_run; do
   check "$name without arguments tells its usage" fails_as_usage "$BIN/$name"
 done
 finish

@@ -91,6 +91,13 @@ bool isDueInMinute(const ZELO_SCHED_TASK &task, int ofDay) {
          (hour - task.RunHour) % task.RepeatHour == 0;
 }
 
+// Behind the end of the text all days are on.
+bool isWeekdayOn(const ZELO_SCHED_TASK &task, sys_days day) {
+  const std::string week = task.Week;
+  const size_t at = weekday(day).c_encoding();
+  return at >= week.size() || week[at] != '0';
+}
+
 bool isRunDay(const ZELO_SCHED_TASK &task, sys_days day) {
   const year_month_day date(day);
   switch (task.Type) {
@@ -99,7 +106,7 @@ bool isRunDay(const ZELO_SCHED_TASK &task, sys_days day) {
     case ZELO_SCHED_TYPE_DAILY:
       return true;
     case ZELO_SCHED_TYPE_WEEKLY:
-      return task.Week[weekday(day).c_encoding()] != '0';
+      return isWeekdayOn(task, day);
     case ZELO_SCHED_TYPE_MONTHLY:
       return unsigned(date.day()) == task.StartDay;
     default:
@@ -218,6 +225,7 @@ class RandomCases {
     made->LastWorkHour = chance(10) ? hostile() : static_cast<uint32_t>(below(30));
     for (int i = 0; i < 7; ++i) made->Week[i] = oneOf({'0', '0', '0', '1', '1', 'x'});
     if (chance(20)) setText(made->Week, "0000000");
+    if (chance(10)) made->Week[below(7)] = '\0';
     return made;
   }
 

@@ -238,18 +238,36 @@ TEST_F(PowerConfTest, AListReadsBackInItsOrderAndLeavesTheOtherAlone) {
   EXPECT_EQ(powerList(kOff), off);
 }
 
-TEST_F(PowerConfTest, AListMayBeLongerThanWhatIsAskedFor) {
-  Entries many;
-  for (unsigned char i = 0; i < 150; ++i) {
-    many.push_back(
+Entries differentEntries(unsigned char count) {
+  Entries entries;
+  for (unsigned char i = 0; i < count; ++i) {
+    entries.push_back(
         {1, 127, static_cast<unsigned char>(i / 60), static_cast<unsigned char>(i % 60)});
   }
+  return entries;
+}
+
+TEST_F(PowerConfTest, AListMayBeLongerThanWhatIsAskedFor) {
+  const Entries many = differentEntries(100);
   setPowerList(kOn, many);
-  Entries some(100);
-  EXPECT_EQ(ZELOAutoPowerConfGet(kOn, 100, some.data()), 100);
+  Entries some(50);
+  EXPECT_EQ(ZELOAutoPowerConfGet(kOn, 50, some.data()), 50);
   EXPECT_TRUE(std::equal(some.begin(), some.end(), many.begin()));
   EXPECT_EQ(powerList(kOn), many);
   EXPECT_EQ(ZELOAutoPowerConfGet(kOn, 0, some.data()), 0);
+}
+
+// Who reads a list has room for as many.
+TEST_F(PowerConfTest, AListOfMoreThanAHundredEntriesIsRefusedAndNothingIsStored) {
+  const Entries full = differentEntries(100);
+  setPowerList(kOn, full);
+  const std::string before = readFile(support::kPowerSchedule);
+  const Entries many = differentEntries(101);
+  for (const int list : {kOn, kOff}) {
+    QLIBCErrSetEx(0, "", 0);
+    EXPECT_TRUE(failedWith(ZELOAutoPowerConfSet(list, 101, many.data()), kBadArgument));
+  }
+  EXPECT_EQ(readFile(support::kPowerSchedule), before);
 }
 
 TEST_F(PowerConfTest, TheFileIsASectionFileForPeopleToReadAndWrite) {

@@ -272,6 +272,16 @@ TEST_F(SchedDateTest, AnyCharacterButAZeroTurnsAWeekdayOn) {
   EXPECT_EQ(nextAt(kTuesdayMorning, weeklyTask("00x0000", 8, 30)), "2013-05-07 08:30");
 }
 
+TEST_F(SchedDateTest, AWeekThatIsTooShortLeavesTheOtherDaysOnWhateverStandsBehindIt) {
+  const Task task = weeklyTask("0000000", 8, 30);
+  task->Week[4] = '\0';
+  EXPECT_EQ(nextAt(kTuesdayMorning, task), "2013-05-09 08:30") << "Thursday";
+  task->Week[2] = '\0';
+  EXPECT_EQ(nextAt(kTuesdayMorning, task), "2013-05-07 08:30") << "the end itself";
+  task->Week[0] = '\0';
+  EXPECT_EQ(nextAt("2013-05-07 08:30", task), "2013-05-08 08:30");
+}
+
 TEST_F(SchedDateTest, WithoutAWeekdayTheNextRunIsShownEightDaysAhead) {
   EXPECT_EQ(nextAt(kTuesdayMorning, weeklyTask("0000000", 8, 30)), "2013-05-15 08:30");
 }

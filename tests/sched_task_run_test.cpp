@@ -377,6 +377,22 @@ TEST_F(DueTest, AWeeklyTaskWithoutADayIsNeverDueAfterItsStartDate) {
   }
 }
 
+TEST_F(DueTest, AWeekThatIsTooShortIsDueOnTheDaysBehindItWhateverStandsThere) {
+  SchedBackends[0].get_by_id = [](long id, ZELO_SCHED_TASK *task) {
+    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
+    task->ID = static_cast<int32_t>(id);
+    task->State = ZELO_SCHED_STATE_ENABLED;
+    setText(task->Week, "1000000");
+    task->Week[2] = '\0';
+    return 1;
+  };
+  constexpr long id = 1;
+  for (int day = 12; day <= 18; ++day) {  // from Sunday
+    const std::string now = "2013-05-" + std::to_string(day) + " 08:30";
+    EXPECT_EQ(isDue(id, now), day != 13) << now;
+  }
+}
+
 TEST_F(DueTest, WithoutRepetitionATaskIsDueInItsHourOnly) {
   EXPECT_EQ(dueHours([](ZELO_SCHED_TASK *task) { task->LastWorkHour = 23; }),
             std::vector<uint32_t>{8});

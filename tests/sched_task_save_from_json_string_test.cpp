@@ -282,13 +282,42 @@ TEST_F(TaskFromJsonTest, AMemberThatIsNoKeyOfATaskIsPassedOver) {
   EXPECT_EQ(loadTask(2)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
 }
 
+// As the header warns: the text alone decides, and what is no number counts as 0.
+TEST_F(TaskFromJsonTest, AnOwnerThatIsMissingOrSaysNothingIsRoot) {
+  int id = 0;
+  for (const char *owner : {"", " 0", "-0", "0"}) {
+    SCOPED_TRACE(owner);
+    ASSERT_EQ(save(taskText({{"owner", owner}})), ++id);
+    EXPECT_EQ(loadTask(id)->Owner, 0U);
+  }
+  ASSERT_EQ(save(taskText()), ++id);
+  EXPECT_EQ(loadTask(id)->Owner, 0U);
+  ASSERT_EQ(save(textWithRawMember("owner", R"("\"1000\"","owner":"\"0\"")")), ++id);
+  EXPECT_EQ(loadTask(id)->Owner, 0U);
+}
+
 TEST_F(TaskFromJsonTest, OfMembersGivenTwiceTheLastCounts) {
   ASSERT_EQ(save(textWithRawMember("name", R"("\"first\"","name":"\"last\"")")), 1);
   EXPECT_STREQ(loadTask(1)->Name, "last");
 }
 
-TEST_F(TaskFromJsonTest, ABadMemberThatIsGivenAgainCountsAsTheLast) {
-  ASSERT_EQ(save(textWithRawMember("name", R"({"x":[1]},"name":"\"last\"")")), 1);
+TEST_F(TaskFromJsonTest, AnArrayOrAnObjectIsRefusedAlsoWhereItsMemberIsGivenAgain) {
+  for (const char *first : {R"({"x":[1]})", "[]", "/**/ {}", "{\"name\":\"\\\"n\\\"\"}"}) {
+    expectMemberRefused(first + std::string(R"(,"name":"\"last\"")"));
+  }
+}
+
+TEST_F(TaskFromJsonTest, AnotherBadMemberThatIsGivenAgainCountsAsTheLast) {
+  int id = 0;
+  for (const char *first : {"1", "null", "-1.5e3", "\"\""}) {
+    EXPECT_EQ(save(textWithRawMember("name", first + std::string(R"(,"name":"\"last\"")"))), ++id);
+  }
+}
+
+TEST_F(TaskFromJsonTest, WhatLooksLikeAMemberWithinAStringOrACommentIsNone) {
+  ASSERT_EQ(save(textWithRawMember("name", R"("\":1,[{\\","name": /*":[*/ //":[
+                                              "\"last\"")")),
+            1);
   EXPECT_STREQ(loadTask(1)->Name, "last");
 }
 
@@ -476,6 +505,103 @@ TEST_F(TaskFromJsonTest, AMissingRequiredKeyIsRefused) {
 TEST_F(TaskFromJsonTest, TheIdThatWasReadStandsInTheLine) {
   expectRefused(taskText({{"id", "7"}, {"run hour", "5x"}}), "hash to task failed, task id=7");
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x4000, "sched_parm_table.cpp"}));
+}
+
+// ---- what cron could not read -----------------------------------------------------------------
+
+// One such line, and cron starts nothing of the whole crontab.
+const Members kUnreadable[] = {
+    {{"run hour", "24"}},
+    {{"run hour", "4294967295"}},
+    {{"run hour", "24"}, {"repeat hour", "1"}, {"last work hour", "23"}},
+    {{"run hour", "99"}, {"repeat hour", "24"}, {"last work hour", "4294967295"}},
+    {{"run min", "60"}},
+    {{"run min", "99"}},
+    {{"type", "once"}, {"start day", "0"}},
+    {{"type", "once"}, {"start day", "32"}},
+    {{"type", "once"}, {"start month", "0"}},
+    {{"type", "once"}, {"start month", "13"}},
+    {{"type", "monthly"}, {"start day", "0"}},
+    {{"type", "monthly"}, {"start day", "4294967295"}},
+    {{"type", "yearly"}, {"start day", "32"}},
+    {{"type", "yearly"}, {"start month", "13"}},
+    {{"type", "weekly"}, {"week", "0000000"}},
+};
+
+TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsRefused) {
+  for (const Members &schedule : kUnreadable) {
+    SCOPED_TRACE(objectOf(schedule));
+    expectRefused(taskText(schedule), "hash to task failed, task id=-1");
+    for (const char *state : {"disabled", "NotExisted"}) {
+      SCOPED_TRACE(state);
+      Members changes = schedule;
+      changes.emplace_back("state",
+                           state);  // it may be enabled later, by who looks at nothing else
+      expectRefused(taskText(changes), "hash to task failed, task id=-1");
+    }
+    support::clearLog();
+    EXPECT_EQ(save(taskText(schedule), 1), -1);
+    EXPECT_EQ(logged(), Lines{std::string(kUnit) + "hash to task failed, task id=-1"});
+  }
+}
+
+TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsNotSavedOverTheStoredTask) {
+  ASSERT_EQ(save(taskText()), 1);
+  const std::string before = support::readFile(support::kStore);
+  for (Members schedule : kUnreadable) {
+    SCOPED_TRACE(objectOf(schedule));
+    schedule.emplace_back("id", "1");
+    EXPECT_EQ(save(taskText(schedule)), -1);
+    EXPECT_EQ(logged().back(), std::string(kUnit) + "hash to task failed, task id=1");
+    EXPECT_EQ(support::readFile(support::kStore), before);
+    EXPECT_EQ(support::crontabLines().size(), 1U);
+  }
+}
+
+TEST_F(TaskFromJsonTest, WhatCronReadsIsSaved) {
+  const Members kReadable[] = {
+      {{"run hour", "23"}, {"run min", "59"}},
+      {{"last work hour", "99"}},                                // of no effect without repeats
+      {{"repeat hour", "1"}, {"last work hour", "4294967295"}},  // the line ends with hour 23
+      {{"start day", "0"}, {"start month", "99"}},               // of a daily task
+      {{"type", "monthly"}, {"start day", "31"}, {"start month", "0"}},
+      {{"type", "yearly"}, {"start day", "31"}, {"start month", "2"}},  // which never comes
+      {{"type", "once"}, {"start day", "1"}, {"start month", "12"}},
+      {{"type", "weekly"}, {"week", "0000001"}},
+      {{"type", "weekly"}, {"week", "000"}},  // the days behind its end are on
+      {{"type", "weekly"}, {"week", ""}},
+      {{"week", "0000000"}},  // of a daily task
+  };
+  int id = 0;
+  for (const Members &schedule : kReadable) {
+    SCOPED_TRACE(objectOf(schedule));
+    EXPECT_EQ(save(taskText(schedule), 1), ++id);
+  }
+}
+
+TEST_F(TaskFromJsonTest, AWeekOfOneCharacterTakesNoDaysFromTheTaskBeforeIt) {
+  const auto weekly = [](const char *week) {
+    return taskText({{"type", "weekly"}, {"week", week}});
+  };
+  ASSERT_EQ(save(weekly("0000010")), 1);
+  ASSERT_EQ(save(weekly("0")), 2);
+  const Lines lines = support::crontabLines();  // in the order of the records in memory
+  EXPECT_EQ(std::count(lines.begin(), lines.end(),
+                       "2\t1\t*\t*\t1,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=2"),
+            1);
+}
+
+// It has no line of its own, and the platform knows how to keep it.
+TEST_F(TaskFromJsonTest, APowerTimeWithoutADayIsOverwrittenInItsPlaceButIsNoOrdinaryTask) {
+  support::haveClock();
+  support::setPowerList(support::kOff, {{1, 0, 5, 7}});
+  constexpr long kId = 90000507;
+  const std::string text = jsonOf(kId);
+  EXPECT_EQ(save(text), kId);
+  EXPECT_EQ(support::powerList(support::kOff), (support::Entries{{1, 0, 5, 7}}));
+  EXPECT_EQ(save(text, 1), -1);
+  EXPECT_EQ(logged().back(), std::string(kUnit) + "hash to task failed, task id=90000507");
+  EXPECT_FALSE(support::fileExists(support::kStore));
 }
 
 TEST_F(TaskFromJsonTest, AFailedAllocationOfTheTaskIsReportedWithTheRecord) {

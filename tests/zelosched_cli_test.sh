@@ -311,7 +311,7 @@ imports_power_times_whole_or_not_at_all() {
   sed '1d;$d' "$SCRATCH/power" | grep poweron | sed 's/,$//' >"$SCRATCH/on"
   { echo "["; for i in {1..104}; do sed "s/\"run hour\":7/\"run hour\":$((i / 60))/;s/\"run min\":0/\"run min\":$((i % 60))/" "$SCRATCH/on"; echo ","; done; cat "$SCRATCH/on"; echo "]"; } |
     tr '\n' ' ' >"$SCRATCH/many"
-  fails_saying 1 "no more are shown" z import --new "$SCRATCH/many" || bad=1
+  fails_saying 1 "no more fit" z import --new "$SCRATCH/many" || bad=1
   return "$bad"
 }
 
@@ -1198,6 +1198,36 @@ import_tells_what_it_cannot_read() {
     echo '[1]' >"$SCRATCH/number" && fails_saying 1 "it is no JSON object" z import "$SCRATCH/number"
 }
 
+# Memory is bounded beside the time: each of these took more than a gigabyte.
+an_import_that_is_meant_to_exhaust_the_machine_is_refused() {
+  all_well
+  local object bad=0 start
+  object=$(z export 1 | sed '1d;$d')
+  yes '0,' | tr -d '\n' | head -c 15000000 >"$SCRATCH/zeros"
+  { printf '['; cat "$SCRATCH/zeros"; printf '0]'; } >"$SCRATCH/wide"
+  { printf '/*"*/{"a":[//"\n'; cat "$SCRATCH/zeros"; printf '0]}'; } >"$SCRATCH/hidden"
+  { cat "$SCRATCH/zeros"; cat "$SCRATCH/zeros"; } >"$SCRATCH/large"
+  times 10001 <<<"$object" | sed 's/"cmd":"true"/"cmd":" "/' >"$SCRATCH/tasks"
+  for ((i = 0; i < 10001; i++)); do echo '{}'; done >"$SCRATCH/lines"
+  start=$SECONDS
+  fails_saying 1 "it holds more values than 10000 tasks have" bounded z import "$SCRATCH/wide" || bad=1
+  fails_saying 1 "it holds more values than 10000 tasks have" bounded z import "$SCRATCH/hidden" || bad=1
+  fails_saying 1 "$SCRATCH/large is larger than 16 MB: divide it" bounded z import "$SCRATCH/large" || bad=1
+  fails_saying 1 "it holds 10001 tasks, and at most 10000 can be read at once" bounded z import "$SCRATCH/tasks" || bad=1
+  fails_saying 1 "it holds 10001 tasks, and at most 10000 can be read at once" bounded z import "$SCRATCH/lines" || bad=1
+  ((SECONDS - start < 30)) || { echo "took $((SECONDS - start)) s"; bad=1; }
+  same "$(ids_of_list)" "[1]" || bad=1
+  return "$bad"
+}
+
+# In 256 MB of addresses, which no program with sanitizers starts in.
+bounded() {
+  (
+    if ! grep -q __asan_init "$BUILD_DIR/bin/zelosched"; then ulimit -v 262144; fi
+    "$@"
+  )
+}
+
 export_tells_of_bytes_that_json_cannot_carry() {
   clean
   add --daily 08:30 --name $'a\xffb' -- true >/dev/null
@@ -1306,6 +1336,8 @@ check "nor does one with a power time that has no room" imports_power_times_whol
 check "an import goes on when its reader is gone" imports_to_the_end_when_the_reader_is_gone
 check "an import of a task without its day is refused" an_import_without_its_day_is_refused
 check "an import without tasks is told" an_empty_import_is_told
+check "an import that is meant to exhaust the machine is refused" \
+  an_import_that_is_meant_to_exhaust_the_machine_is_refused
 check "a minute that never comes is told" a_minute_that_never_comes_is_told
 check "nothing but what was shown is removed" nothing_but_what_was_shown_is_removed
 check "and a power time that was shown, whatever its place" a_power_time_that_was_shown_is_removed

@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include <cstdlib>
+#include <cstring>
 #include <random>
 
 #include "coming_runs.h"
@@ -76,6 +77,15 @@ TEST_F(ZeloschedComingRunsTest, AWeeklyTaskRunsOnItsDays) {
   setText(task->Week, "0100010");
   EXPECT_EQ(next(task, "2026-11-21 00:00", 3),
             (Texts{"2026-11-23 08:30", "2026-11-27 08:30", "2026-11-30 08:30"}));
+}
+
+TEST_F(ZeloschedComingRunsTest, AWeekThatIsTooShortLeavesTheOtherDaysOnWhateverStandsBehindIt) {
+  const Task task = daily(8, 30);
+  task->Type = ZELO_SCHED_TYPE_WEEKLY;
+  setText(task->Week, "0000000");
+  task->Week[5] = '\0';
+  EXPECT_EQ(next(task, "2026-12-01 08:30", 3),
+            (Texts{"2026-12-04 08:30", "2026-12-05 08:30", "2026-12-11 08:30"}));
 }
 
 TEST_F(ZeloschedComingRunsTest, AWeeklyTaskWithoutDaysNeverRuns) {
@@ -197,7 +207,9 @@ bool fires(const ZELO_SCHED_TASK &task, time_t moment) {
   }
   const bool isStart =
       std::tie(year, month, day) == std::tie(task.StartYear, task.StartMonth, task.StartDay);
-  const bool isDay[] = {isStart, true, task.Week[now.tm_wday] != '0', day == task.StartDay,
+  const auto weekday = static_cast<size_t>(now.tm_wday);
+  const bool isOn = weekday >= std::strlen(task.Week) || task.Week[weekday] != '0';
+  const bool isDay[] = {isStart, true, isOn, day == task.StartDay,
                         day == task.StartDay && month == task.StartMonth};
   if (!isDay[task.Type] || static_cast<uint32_t>(now.tm_min) != task.RunMin) return false;
   const auto hour = static_cast<uint32_t>(now.tm_hour);
@@ -219,6 +231,7 @@ class ZeloschedRandomTasksTest : public ZeloschedComingRunsTest {
     Task task = daily(upTo(23), upTo(59));
     task->Type = static_cast<int32_t>(upTo(4));
     for (size_t i = 0; i < 7; ++i) task->Week[i] = upTo(2) == 0 ? '1' : '0';
+    if (upTo(9) == 0) task->Week[upTo(6)] = '\0';
     task->StartYear = upTo(1) == 0 ? 0 : 2024 + upTo(3);
     task->StartMonth = 1 + upTo(11);
     task->StartDay = 1 + upTo(30);

@@ -169,6 +169,8 @@ TEST_F(ZeloschedScheduleTextTest, WhatWasReadIsSaidInWords) {
   EXPECT_EQ(scheduleInWords(*task_), "yearly on 29 month 13 at 08:30");
   setWeekly(task_.get(), "none 08:30");
   EXPECT_EQ(scheduleInWords(*task_), "weekly on no day at 08:30");
+  task_->Week[5] = '\0';  // all days behind the end are on
+  EXPECT_EQ(scheduleInWords(*task_), "weekly on Fri and Sat at 08:30");
   task_->Type = 7;
   EXPECT_EQ(scheduleInWords(*task_), "of unknown type 7 at 08:30");
 }

@@ -3,6 +3,7 @@
 
 #include <functional>
 
+#include "crontab_check.h"
 #include "fake_clock.h"
 #include "sandbox_fixture.h"
 #include "task_check.h"
@@ -45,7 +46,7 @@ TEST_F(ZeloschedTaskCheckTest, EachFaultIsSaidWithWhatToWriteInstead) {
          task.RepeatHour = 1;
          task.LastWorkHour = 24;
        },
-       "the last hour 24 is none of a day: write --until with an hour from 0 to 23", true},
+       "the last hour 24 is none of a day: write --until with an hour from 0 to 23", false},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 0, 0, 0); },
        "day 0 is none of a month: write a day from 1 to 31", true},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 0, 0, 32); },
@@ -157,6 +158,53 @@ TEST_F(ZeloschedTaskCheckTest, WhatIsJustInRangeIsFit) {
       [](auto &task) { setText(task.Command, std::string(12287, 'x')); },
   };
   for (const auto &change : fits) EXPECT_EQ(harms(change), Sentences{});
+}
+
+// Tasks of programs that check nothing. Where the two differ, status reports a difference for ever
+// and the administrator cannot save anything.
+TEST_F(ZeloschedTaskCheckTest, TheLineThatIsExpectedIsTheOneThatTheLibraryWrites) {
+  const std::function<void(ZELO_SCHED_TASK &)> changes[] = {
+      [](auto &) {},
+      [](auto &task) {
+        task.RepeatHour = 1;
+        task.LastWorkHour = 99;
+      },
+      [](auto &task) {
+        task.RunHour = 30;
+        task.RepeatHour = 1;
+        task.LastWorkHour = UINT32_MAX;
+      },
+      [](auto &task) {
+        task.RunHour = UINT32_MAX;
+        task.RepeatHour = UINT32_MAX;
+      },
+      [](auto &task) {
+        task.Type = ZELO_SCHED_TYPE_WEEKLY;
+        setText(task.Week, "10");
+      },
+      [](auto &task) {
+        task.Type = ZELO_SCHED_TYPE_WEEKLY;
+        setText(task.Week, "0000000");
+      },
+      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_YEARLY, 0, 99, UINT32_MAX); },
+  };
+  for (const auto &change : changes) {
+    cleanWorld();
+    const Task task = makeTask("t", "true");
+    change(*task);
+    saveTask(task);
+    EXPECT_EQ(crontabLines(), Sentences{crontabLine(*task)});
+  }
+}
+
+TEST_F(ZeloschedTaskCheckTest, APowerTimeWithoutADayIsRefusedButStopsNoCron) {
+  const Task task = makeTask("t", "");
+  task->Backend = ZELO_SCHED_BACKEND_AUTOPOWER;
+  task->Type = ZELO_SCHED_TYPE_WEEKLY;
+  setText(task->AppArgs, "poweroff");
+  setText(task->Week, "0000000");
+  EXPECT_EQ(harmsOf(*task).size(), 1U);
+  EXPECT_EQ(unreadableFieldsOf(*task), Sentences{});
 }
 
 TEST_F(ZeloschedTaskCheckTest, EveryFaultOfATaskIsSaid) {

@@ -21,6 +21,7 @@
 #include "sched_store_lock.h"
 #include "sched_text.h"
 #include "sched_wait_status.h"
+#include "sched_week.h"
 
 namespace {
 
@@ -35,7 +36,6 @@ constexpr int kNotFound = 0;
 constexpr int kNoIndex = -1;
 constexpr long kNoId = -1;
 constexpr int kListCapacity = 100;
-constexpr size_t kDaysOfWeek = 7;
 constexpr unsigned kEveryDay = 127;
 constexpr char kDayOff = '0';
 constexpr char kDayOn = '1';
@@ -134,13 +134,11 @@ int fillFromEntry(ZELO_SCHED_TASK *pTask, const ZELO_AUTOPOWER *psched, bool pow
 
 // ---- a task as an entry -----------------------------------------------------------------------
 
-// A text of fewer days than seven leaves the others on, as its end is no '0'.
 unsigned char weekdaysOf(const ZELO_SCHED_TASK &task) {
-  const size_t length = strnlen(task.Week, kDaysOfWeek);
   unsigned mask = 0;
-  for (size_t i = 0; i < kDaysOfWeek; ++i) {
-    if (i >= length || task.Week[i] != kDayOff) {
-      mask |= 1U << i;
+  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
+    if (schedIsDayOn(task.Week, day)) {
+      mask |= 1U << day;
     }
   }
   return static_cast<unsigned char>(mask);

@@ -24,6 +24,7 @@
 #include "sched_text.h"
 #include "sched_trigger_clock.h"
 #include "sched_wait_status.h"
+#include "sched_week.h"
 
 // A platform that has no holds looks at the file once a section, and is slower for it.
 #pragma weak QLIBCFileHoldBegin
@@ -52,8 +53,6 @@ constexpr char kTaskProgram[] = "/tmp/zeloschedtask";  // also what marks a cron
 constexpr int kContainerCapacity = 1024;
 constexpr int kFound = 1;
 constexpr int kNotFound = 0;
-constexpr size_t kDaysOfWeek = 7;
-constexpr char kDayOff = '0';
 
 class SectionName {
  public:
@@ -687,9 +686,9 @@ HourList hourList(const ZELO_SCHED_TASK &task) {
 
 WeekdayList weekdayList(const ZELO_SCHED_TASK &task) {
   WeekdayList days;
-  for (size_t i = 0; i < kDaysOfWeek; ++i) {
-    if (task.Week[i] != kDayOff) {
-      appendItem(&days, static_cast<int>(i));
+  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
+    if (schedIsDayOn(task.Week, day)) {
+      appendItem(&days, static_cast<int>(day));
     }
   }
   return days;

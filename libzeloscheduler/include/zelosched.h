@@ -84,7 +84,7 @@ struct ZELO_SCHED_TASK {
   char NextTriggerTime[1024]; /* "YYYY-MM-DD hh:mm" or "N/A"; never stored */
   int32_t State;              /* 0 disabled, 1 enabled, 2 not existing */
   int32_t Type;               /* 0 once, 1 daily, 2 weekly, 3 monthly, 4 yearly */
-  char Week[8];               /* seven characters from Sunday on; '0' = off */
+  char Week[8];               /* seven from Sunday on; '0' = off, all else and the end = on */
   uint32_t StartYear;         /* day of the first or only run */
   uint32_t StartMonth;        /* 1 to 12 */
   uint32_t StartDay;          /* 1 to 31 */
@@ -144,7 +144,13 @@ ZELO_SCHED_API int ZELOSchedTaskLoad(long id, ZELO_SCHED_TASK *pTask);
  * backend's result (0 or more), or -1: 0x0D00, 0x2000 when no backend has that
  * id, or what the backend left. After a failure the record has its new id when
  * the task was stored and what follows from it was not done; that of a power time
- * has it, and its new name, after any failure. */
+ * has it, and its new name, after any failure.
+ *
+ * What the schedule says goes into the crontab as it is, here and in
+ * ZELOSchedTaskEdit: the caller checks it. Debian's cron passes over the whole of
+ * /etc/crontab, and starts nothing, for one enabled task with an hour above 23, a
+ * minute above 59, a day other than 1 to 31 (once, monthly, yearly), a month other
+ * than 1 to 12 (once, yearly) or no day of the week (weekly). */
 ZELO_SCHED_API int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask);
 
 /* Overwrites the stored task of the record's id; plugins hear of it before and
@@ -249,10 +255,18 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
  * The text may come from anyone. A root that is no object, a member that is no
  * string or whose string is no JSON string, half of a surrogate pair, a zero
  * byte, too deep a nesting, anything but blanks and comments after the end, a
- * number that does not fit its field, a command of more than 12287 bytes, and a
- * text of more than 4 MiB are failures, and then nothing is saved. Bytes that are
+ * number that does not fit its field, a command of more than 12287 bytes, a
+ * schedule that cron cannot read (see ZELOSchedTaskCreate; also that of a task
+ * that is not enabled), and a text of more than 4 MiB are failures, and then
+ * nothing is saved. Bytes that are
  * not UTF-8 are saved as they are; another text that is longer than its field is
  * cut to it.
+ *
+ * Whose task it is, the text alone decides. One whose "owner" is missing, "" or
+ * " 0", "-0" or another way to write nothing, or comes again as 0, is root's, and
+ * its command runs as root; and one that repeats id, name and app of anybody's task,
+ * which everybody can read, is saved over it. So a back end does not hand the text
+ * of a user on: examples/save_for_user.c shows how it saves for him.
  *
  * The id of the saved task (0 or more), or -1: no code of its own for a null or
  * empty text or one that cannot be read, else what the callee left. An object

@@ -3,6 +3,9 @@
  */
 #include "szhash.h"
 
+#include <sys/auxv.h>
+#include <sys/random.h>
+
 #include <algorithm>
 #include <bit>
 #include <cstring>
@@ -10,6 +13,7 @@
 #include <numeric>
 #include <string>
 
+#include "siphash.h"
 #include "support.h"
 
 namespace {
@@ -21,34 +25,21 @@ constexpr size_t kMostReserved = 64;
 constexpr size_t kLeastArena = 2048;
 constexpr size_t kExpectedKeySize = 16;
 
-uint64_t LoadWord(const char *at, size_t size) noexcept {
-  uint64_t word = 0;
-  std::memcpy(&word, at, size);
-  return word;
+/* Keys come from outside: members of a JSON text, say. Whoever knew the key of the hash
+ * could make all of them fall into one slot, so each process has one of its own. */
+zelo::SipKey RandomKey() noexcept {
+  zelo::SipKey key;
+  if (getrandom(&key, sizeof(key), GRND_NONBLOCK) == static_cast<ssize_t>(sizeof(key))) {
+    return key;
+  }
+  /* Early at boot, or on a kernel without the call. Every program is given some bytes. */
+  std::memcpy(&key, reinterpret_cast<const void *>(getauxval(AT_RANDOM)), sizeof(key));
+  return key;
 }
 
-uint64_t Mix(uint64_t state, uint64_t word) noexcept {
-  constexpr uint64_t kOddMultiplier = 0x9E3779B97F4A7C15U; /* 2^64 / golden ratio */
-  state = (state ^ word) * kOddMultiplier;
-  return state ^ (state >> 32);
-}
-
-/* Keys are short, so a word at a time beats a byte at a time and a general
- * hash alike. */
 uint32_t HashText(std::string_view text) noexcept {
-  constexpr size_t kWord = sizeof(uint64_t);
-  const char *at = text.data();
-  size_t left = text.size();
-  uint64_t state = left;
-  for (; left > kWord; at += kWord, left -= kWord) {
-    state = Mix(state, LoadWord(at, kWord));
-  }
-  if (text.size() >= kWord) {
-    state = Mix(state, LoadWord(text.data() + text.size() - kWord, kWord));
-  } else {
-    state = Mix(state, LoadWord(at, left));
-  }
-  return static_cast<uint32_t>(Mix(state, state >> 29));
+  static const zelo::SipKey key = RandomKey();
+  return static_cast<uint32_t>(zelo::SipHash::Of(key, text));
 }
 
 }  // namespace

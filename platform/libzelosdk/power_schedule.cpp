@@ -170,8 +170,12 @@ int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries) {
   });
 }
 
+/* Who reads a list has room for as many: one more would be stored, and never come. */
+constexpr int kMostEntries = 100;
+
 int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries) {
-  if (zelo::SectionOf(list) == nullptr || count < 0 || (pEntries == nullptr && count > 0) ||
+  if (zelo::SectionOf(list) == nullptr || count < 0 || count > kMostEntries ||
+      (pEntries == nullptr && count > 0) ||
       !std::all_of(pEntries, pEntries + count, zelo::IsInRange)) {
     return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
   }

@@ -4,14 +4,15 @@
 #include <cstdio>
 #include <tuple>
 
+#include "sched_run_hours.h"
+#include "sched_week.h"
+
 namespace {
 
 using std::chrono::days;
 using std::chrono::sys_days;
 using std::chrono::year_month_day;
 
-constexpr uint32_t kHours = 24;
-constexpr char kDayOff = '0';
 constexpr days kSearched{366 * 9};  // 29 February comes after eight years at the latest
 constexpr uint32_t kLastYear = 9999;
 constexpr int kFirstYear = 1900;  // of struct tm
@@ -50,7 +51,7 @@ bool isDayOf(const ZELO_SCHED_TASK &task, sys_days day) {
     case ZELO_SCHED_TYPE_DAILY:
       return true;
     case ZELO_SCHED_TYPE_WEEKLY:
-      return task.Week[weekdayOf(day)] != kDayOff;
+      return schedIsDayOn(task.Week, weekdayOf(day));
     case ZELO_SCHED_TYPE_MONTHLY:
       return date.day == start.day;
     case ZELO_SCHED_TYPE_YEARLY:
@@ -62,11 +63,10 @@ bool isDayOf(const ZELO_SCHED_TASK &task, sys_days day) {
 
 std::vector<int> hoursOf(const ZELO_SCHED_TASK &task) {
   std::vector<int> hours;
-  const uint32_t last = std::max(task.RunHour, task.LastWorkHour);
-  for (uint64_t hour = task.RunHour; hour <= last && hour < kHours; hour += task.RepeatHour) {
-    hours.push_back(static_cast<int>(hour));
-    if (task.RepeatHour == 0) break;
-  }
+  anyRunHour(task, [&](uint32_t hour) {
+    if (hour <= kLastHourOfDay) hours.push_back(static_cast<int>(hour));
+    return false;
+  });
   return hours;
 }
 

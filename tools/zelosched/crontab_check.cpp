@@ -5,6 +5,8 @@
 #include <cstring>
 #include <fstream>
 
+#include "sched_run_hours.h"
+#include "sched_week.h"
 #include "task_list.h"
 #include "text.h"
 
@@ -14,31 +16,28 @@ constexpr char kCrontab[] = "/etc/crontab";
 constexpr char kTaskProgram[] = "/tmp/zeloschedtask";  // what marks a line as a task's
 constexpr char kPowerOffProgram[] = "/usr/zelo/bin/zelo_poweroff_feasible_check";
 constexpr char kPowerOff[] = "poweroff";
-constexpr char kDayOff = '0';
-constexpr size_t kMostHourText = 127;  // what the library has room for
-constexpr size_t kDays = 7;
 
 using Tasks = std::vector<const ZELO_SCHED_TASK *>;
 
-void appendItem(std::string *list, uint64_t number) {
+// The library writes a number of a list with its sign.
+void appendItem(std::string *list, uint32_t number) {
   if (!list->empty()) *list += ',';
-  *list += std::to_string(number);
+  *list += std::to_string(static_cast<int32_t>(number));
 }
 
 std::string hours(const ZELO_SCHED_TASK &task) {
   std::string list;
-  const uint32_t last = std::max(task.RunHour, task.LastWorkHour);
-  for (uint64_t hour = task.RunHour; hour <= last; hour += task.RepeatHour) {
+  anyRunHour(task, [&](uint32_t hour) {
     appendItem(&list, hour);
-    if (task.RepeatHour == 0 || list.size() >= kMostHourText) break;
-  }
-  return list.substr(0, kMostHourText);
+    return false;
+  });
+  return list;
 }
 
 std::string weekdays(const ZELO_SCHED_TASK &task) {
   std::string list;
-  for (size_t day = 0; day < kDays; ++day) {
-    if (task.Week[day] != kDayOff) appendItem(&list, day);
+  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
+    if (schedIsDayOn(task.Week, day)) appendItem(&list, day);
   }
   return list;
 }
@@ -60,9 +59,10 @@ std::string days(const ZELO_SCHED_TASK &task) {
 
 // The platform writes every day as an asterisk.
 std::string powerOffLine(const ZELO_SCHED_TASK &task) {
-  const bool isEveryDay = std::string(task.Week).find(kDayOff) == std::string::npos;
+  constexpr char kEveryDay[] = "0,1,2,3,4,5,6";
+  const std::string days = weekdays(task);
   return std::to_string(task.RunMin) + "\t" + std::to_string(task.RunHour) + "\t*\t*\t" +
-         (isEveryDay ? "*" : weekdays(task)) + "\troot\t" + kPowerOffProgram;
+         (days == kEveryDay ? "*" : days) + "\troot\t" + kPowerOffProgram;
 }
 
 bool isOurs(const std::string &line) {

@@ -21,7 +21,8 @@ namespace {
 constexpr Option kOptions[] = {{"new"}};
 constexpr char kStandardInput[] = "-";
 constexpr char kPowerApp[] = "ZELO.TOV.TaskScheduler.AutoPower";
-constexpr size_t kMostBytes = size_t{256} << 20;  // thousands of the largest tasks
+constexpr size_t kMegabyte = size_t{1} << 20;
+constexpr size_t kMostBytes = 16 * kMegabyte;
 
 struct CloseFile {
   void operator()(FILE *file) const {
@@ -39,7 +40,10 @@ std::string readAll(const std::string &path) {
   char buffer[65536];
   for (size_t count; (count = std::fread(buffer, 1, sizeof buffer, file.get())) > 0;) {
     text.append(buffer, count);
-    if (text.size() > kMostBytes) throw Failure(printable(path) + " is too large");
+    if (text.size() > kMostBytes) {
+      throw Failure(printable(path) + " is larger than " + std::to_string(kMostBytes / kMegabyte) +
+                    " MB: divide it");
+    }
   }
   if (std::ferror(file.get()) != 0) {
     throw Failure("cannot read " + printable(path) + ": " + std::strerror(errno));
@@ -144,6 +148,7 @@ const Command kImportCommand = {
     "that has the same name and application; every other becomes a new task.\n"
     "\n"
     "When one of them cannot be saved, none is, and each of those is told.\n"
+    "At most 16 MB and 10000 tasks are read at once.\n"
     "\n"
     "  --new                          overwrite nothing: all become new tasks\n",
     runImport};

@@ -277,6 +277,41 @@ std::string firstError(const std::string &errors) {
          (sentence == std::string::npos ? "" : ": " + what.substr(sentence));
 }
 
+// How many bytes of the text are the string or the comment that it begins with; 1 for anything
+// else.
+size_t tokenLength(std::string_view text) {
+  size_t end = 1;
+  if (text.front() == '"') {
+    while (end < text.size() && text[end] != '"') end += text[end] == '\\' ? 2 : 1;
+    ++end;
+  } else if (text.substr(0, 2) == "/*") {
+    end = text.find("*/", 2);
+    end += end == std::string_view::npos ? 0 : 2;
+  } else if (text.substr(0, 2) == "//") {
+    end = text.find('\n');
+  }
+  return std::min(end, text.size());
+}
+
+// Each value that the reader makes takes a hundred bytes, also where its text is "0,".
+void requireFewValues(std::string_view text) {
+  constexpr size_t kMostMembers = 64;  // twice as many as a task has
+  size_t left = kMostTasks * kMostMembers;
+  while (!text.empty()) {
+    const bool isNext = text.front() == ',' || text.front() == '[' || text.front() == '{';
+    if (isNext && left-- == 0) {
+      throw Failure("it holds more values than " + std::to_string(kMostTasks) + " tasks have");
+    }
+    text.remove_prefix(tokenLength(text));
+  }
+}
+
+std::vector<Json::Value> requireFewTasks(std::vector<Json::Value> objects) {
+  if (objects.size() <= kMostTasks) return objects;
+  throw Failure("it holds " + std::to_string(objects.size()) + " tasks, and at most " +
+                std::to_string(kMostTasks) + " can be read at once: divide them");
+}
+
 }  // namespace
 
 Json::Value jsonText(std::string_view text) {
@@ -351,9 +386,10 @@ void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task) {
 std::vector<Json::Value> parseObjects(const std::string &text) {
   // The reader would take what is before it for the whole.
   if (text.find('\0') != std::string::npos) throw Failure("it holds a zero byte");
+  requireFewValues(text);
   std::string errors;
   const Json::Value whole = parse(text, &errors);
-  if (whole.isArray()) return {whole.begin(), whole.end()};
+  if (whole.isArray()) return requireFewTasks({whole.begin(), whole.end()});
   if (whole.isObject()) return {whole};
   if (errors.empty()) throw Failure("it is neither an object nor an array");
   const std::string wholeError = firstError(errors);
@@ -372,7 +408,7 @@ std::vector<Json::Value> parseObjects(const std::string &text) {
     }
     objects.push_back(std::move(object));
   }
-  return objects;
+  return requireFewTasks(std::move(objects));
 }
 
 std::string onOneLine(const Json::Value &value) {

@@ -5,6 +5,7 @@
 #include <json/json.h>
 #include <zelosched.h>
 
+#include <cstddef>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -24,7 +25,11 @@ std::vector<std::string> lossyKeysOf(const ZELO_SCHED_TASK &task);
 // the defaults of the hash form. Throws Failure.
 void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task);
 
-// The objects of a text: an array, one object, or one a line. Throws Failure.
+// So many tasks can be read at once.
+inline constexpr size_t kMostTasks = 10000;
+
+// The objects of a text: an array, one object, or one a line. Throws Failure, also for more of them
+// than kMostTasks, or more values than so many have.
 std::vector<Json::Value> parseObjects(const std::string &text);
 
 // An array to the standard output, an object a line.

@@ -4,18 +4,17 @@
 #include <cstring>
 
 #include "failure.h"
+#include "sched_week.h"
 #include "task_list.h"
 
 namespace {
 
-constexpr size_t kMostTimes = 100;  // of each direction; the library shows no more
-constexpr char kDayOff = '0';
+constexpr size_t kMostTimes = 100;  // of each direction; the platform takes no more
 constexpr int32_t kPowerOn = 60000000;
 constexpr int32_t kPowerOff = 80000000;
 constexpr int32_t kEnabled = 10000000;
 constexpr int32_t kWeekdays = 10000;
 constexpr int32_t kHour = 100;
-constexpr int kDays = 7;
 
 }  // namespace
 
@@ -25,8 +24,8 @@ std::string directionOf(const ZELO_SCHED_TASK &task) {
 
 int32_t powerId(const ZELO_SCHED_TASK &task) {
   int32_t weekdays = 0;
-  for (int day = 0; day < kDays; ++day) {
-    if (task.Week[day] != kDayOff) weekdays |= 1 << day;
+  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
+    if (schedIsDayOn(task.Week, day)) weekdays |= 1 << day;
   }
   const int32_t base = directionOf(task) == "off" ? kPowerOff : kPowerOn;
   return base + (isEnabled(task) ? kEnabled : 0) + weekdays * kWeekdays +
@@ -50,7 +49,7 @@ void PowerRoom::take(const ZELO_SCHED_TASK &task) {
                                    [&](int32_t other) { return (other >= kPowerOff) == isOff; });
   if (static_cast<size_t>(taken) >= kMostTimes) {
     throw Failure("there are " + std::to_string(taken) + " power-" + directionOf(task) +
-                  " times already, and no more are shown: remove one first");
+                  " times already, and no more fit: remove one first");
   }
   ids_.insert(id);
 }

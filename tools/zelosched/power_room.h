@@ -1,4 +1,6 @@
-// Which power times can still be added: no two alike, and no more of a direction than are shown.
+// Which power times can still be added: no two alike, which the library would make one, and no more
+// of a direction than fit. Told beforehand, as an import changes nothing unless all of it can be
+// saved.
 #pragma once
 
 #include <zelosched.h>

@@ -12,16 +12,16 @@
 
 #include "failure.h"
 #include "options.h"
+#include "sched_week.h"
 #include "text.h"
 
 namespace {
 
-constexpr size_t kDays = 7;
 constexpr char kEveryDay[] = "1111111";
 constexpr uint32_t kLastHour = 23;
-constexpr const char *kShortDays[kDays] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
-constexpr const char *kLongDays[kDays] = {"sunday",   "monday", "tuesday", "wednesday",
-                                          "thursday", "friday", "saturday"};
+constexpr const char *kShortDays[kDaysOfWeek] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
+constexpr const char *kLongDays[kDaysOfWeek] = {"sunday",   "monday", "tuesday", "wednesday",
+                                                "thursday", "friday", "saturday"};
 constexpr const char *kMonths[] = {"January",   "February", "March",    "April",
                                    "May",       "June",     "July",     "August",
                                    "September", "October",  "November", "December"};
@@ -110,7 +110,7 @@ std::optional<Halves> halves(const std::string &text, const char *separators) {
 
 std::optional<size_t> weekday(const std::string &name) {
   constexpr size_t kShort = 3;
-  for (size_t day = 0; day < kDays; ++day) {
+  for (size_t day = 0; day < kDaysOfWeek; ++day) {
     const std::string whole = kLongDays[day];
     if (name == whole || name == whole.substr(0, kShort)) return day;
   }
@@ -121,7 +121,7 @@ std::optional<size_t> weekday(const std::string &name) {
 bool addDays(const std::string &item, std::string *week) {
   for (const NamedDays &named : kNamedDays) {
     if (item != named.name) continue;
-    for (size_t day = 0; day < kDays; ++day) {
+    for (size_t day = 0; day < kDaysOfWeek; ++day) {
       if (named.week[day] == '1') (*week)[day] = '1';
     }
     return true;
@@ -130,14 +130,14 @@ bool addDays(const std::string &item, std::string *week) {
   const std::optional<size_t> first = weekday(ends.front());
   const std::optional<size_t> last = weekday(ends.back());
   if (ends.size() > 2 || !first || !last) return false;
-  for (size_t day = *first;; day = (day + 1) % kDays) {
+  for (size_t day = *first;; day = (day + 1) % kDaysOfWeek) {
     (*week)[day] = '1';
     if (day == *last) return true;
   }
 }
 
 std::string parseWeek(const std::string &text) {
-  std::string week(kDays, '0');
+  std::string week(kDaysOfWeek, '0');
   if (text.empty() || text == "none") return week;
   for (const std::string &item : split(lowered(text), ',')) {
     if (!addDays(item, &week)) refuse(item, "day of the week", "mon,wed,fri or mon-fri");
@@ -187,8 +187,8 @@ std::string dateOf(const ZELO_SCHED_TASK &task) {
 
 std::string daysOf(const ZELO_SCHED_TASK &task) {
   std::vector<const char *> names;
-  for (size_t day = 0; day < kDays; ++day) {
-    if (task.Week[day] != '0') names.push_back(kShortDays[day]);
+  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
+    if (schedIsDayOn(task.Week, day)) names.push_back(kShortDays[day]);
   }
   if (names.empty()) return "no day";
   std::string text;

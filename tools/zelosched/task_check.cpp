@@ -5,24 +5,17 @@
 
 #include "coming_runs.h"
 #include "owner.h"
+#include "sched_cron_fields.h"
 #include "schedule_text.h"
 #include "task_list.h"
 #include "text.h"
 
 namespace {
 
-constexpr uint32_t kLastHour = 23;
-constexpr uint32_t kLastMinute = 59;
 constexpr uint32_t kMonths = 12;
 constexpr uint32_t kMostDays = 31;
-constexpr size_t kDaysOfWeek = 7;
 constexpr uint32_t kLastYear = 9999;
 constexpr int kLeapYear = 2024;
-
-bool hasDayOfMonth(const ZELO_SCHED_TASK &task) {
-  return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_MONTHLY ||
-         task.Type == ZELO_SCHED_TYPE_YEARLY;
-}
 
 bool hasMonth(const ZELO_SCHED_TASK &task) {
   return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_YEARLY;
@@ -38,10 +31,6 @@ bool isMonth(const ZELO_SCHED_TASK &task) {
 
 size_t weekLength(const ZELO_SCHED_TASK &task) {
   return strnlen(task.Week, sizeof task.Week);
-}
-
-bool isWeekEmpty(const ZELO_SCHED_TASK &task) {
-  return std::string(task.Week, weekLength(task)).find_first_not_of('0') == std::string::npos;
 }
 
 bool dayExists(int year, const ZELO_SCHED_TASK &task) {
@@ -62,39 +51,40 @@ std::string number(uint32_t value) {
 // ---- what cron could not read ---------------------------------------------------------------
 
 std::string badHour(const ZELO_SCHED_TASK &task) {
-  if (task.RunHour <= kLastHour) return "";
+  if (schedAreHoursReadable(task)) return "";
   return "the hour " + number(task.RunHour) + " is none of a day: write a time from 00:00 to 23:59";
 }
 
 std::string badMinute(const ZELO_SCHED_TASK &task) {
-  if (task.RunMin <= kLastMinute) return "";
+  if (schedIsMinuteReadable(task)) return "";
   return "the minute " + number(task.RunMin) +
          " is none of an hour: write minutes from 00 to 59, as in 08:30";
 }
 
-std::string badLastHour(const ZELO_SCHED_TASK &task) {
-  if (task.RepeatHour == 0 || task.LastWorkHour <= kLastHour) return "";
-  return "the last hour " + number(task.LastWorkHour) +
-         " is none of a day: write --until with an hour from 0 to 23";
-}
-
 std::string badDay(const ZELO_SCHED_TASK &task) {
-  if (!hasDayOfMonth(task) || isDay(task)) return "";
+  if (schedIsDayReadable(task)) return "";
   return "day " + number(task.StartDay) + " is none of a month: write a day from 1 to 31";
 }
 
 std::string badMonth(const ZELO_SCHED_TASK &task) {
-  if (!hasMonth(task) || isMonth(task)) return "";
+  if (schedIsMonthReadable(task)) return "";
   return "month " + number(task.StartMonth) +
          " is none of a year: write a month from 01 to 12, as in 02-29 for 29 February";
 }
 
 std::string noWeekday(const ZELO_SCHED_TASK &task) {
-  if (task.Type != ZELO_SCHED_TYPE_WEEKLY || !isWeekEmpty(task)) return "";
+  if (schedAreWeekdaysReadable(task)) return "";
   return "a weekly task needs a day of the week: write --weekly mon,wed,fri 08:30";
 }
 
 // ---- what makes the task itself useless -----------------------------------------------------
+
+// The line ends with the last hour of the day all the same.
+std::string badLastHour(const ZELO_SCHED_TASK &task) {
+  if (task.RepeatHour == 0 || task.LastWorkHour <= kLastHourOfDay) return "";
+  return "the last hour " + number(task.LastWorkHour) +
+         " is none of a day: write --until with an hour from 0 to 23";
+}
 
 std::string lateYear(const ZELO_SCHED_TASK &task) {
   if (task.StartYear <= kLastYear) return "";
@@ -200,10 +190,10 @@ std::string badDirection(const ZELO_SCHED_TASK &task) {
 }
 
 using Check = std::string (*)(const ZELO_SCHED_TASK &task);
-constexpr Check kUnreadable[] = {badHour, badMinute, badLastHour, badDay, badMonth, noWeekday};
-constexpr Check kUseless[] = {lateYear,   neverExists, badStart, badWeek,
-                              badType,    badState,    earlyEnd, unknownOwner,
-                              apostrophe, longCommand, lineFeed, badDirection};
+constexpr Check kUnreadable[] = {badHour, badMinute, badDay, badMonth, noWeekday};
+constexpr Check kUseless[] = {badLastHour, lateYear, neverExists, badStart,     badWeek,
+                              badType,     badState, earlyEnd,    unknownOwner, apostrophe,
+                              longCommand, lineFeed, badDirection};
 
 template <size_t count>
 void collect(const Check (&checks)[count], const ZELO_SCHED_TASK &task,
@@ -227,14 +217,15 @@ bool isSkipped(const ZELO_SCHED_TASK &task) {
 }  // namespace
 
 std::vector<std::string> harmsOf(const ZELO_SCHED_TASK &task) {
-  std::vector<std::string> found = unreadableFieldsOf(task);
+  std::vector<std::string> found;
+  collect(kUnreadable, task, &found);
   collect(kUseless, task, &found);
   return found;
 }
 
 std::vector<std::string> unreadableFieldsOf(const ZELO_SCHED_TASK &task) {
   std::vector<std::string> found;
-  collect(kUnreadable, task, &found);
+  if (!isPower(task)) collect(kUnreadable, task, &found);
   return found;
 }
 

@@ -18,7 +18,8 @@ inline constexpr size_t kMostCommandBytes = 12287;
 // fit to be saved.
 std::vector<std::string> harmsOf(const ZELO_SCHED_TASK &task);
 
-// Those of harmsOf that stand in a crontab line which cron could not read.
+// Those of harmsOf that stand in a crontab line which cron could not read; a power time has none
+// that the platform would not have refused.
 std::vector<std::string> unreadableFieldsOf(const ZELO_SCHED_TASK &task);
 
 // A sentence when a task that runs once has no run after `now`, else nothing.

@@ -80,8 +80,8 @@ typedef struct ZELO_AUTOPOWER {
  * arguments, 0x4000 for a file that holds something else than power times, or
  * what reading the file left (0x0900, 0x0B00, 0x0200). */
 int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries);
-/* Replaces a list, of any length; the other one stays. 0, or -1: 0x0D00 for a
- * list that does not exist, a negative count and an entry out of its ranges, or
+/* Replaces a list; the other one stays. 0, or -1: 0x0D00 for a list that does not
+ * exist, a negative count, more than 100 entries and one out of its ranges, or
  * what writing the file left (0x0900, 0x0B00, 0x2800, 0x0200). */
 int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries);
 
