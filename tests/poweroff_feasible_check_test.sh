@@ -151,10 +151,20 @@ rm "$DATABASE"
 empty_table
 for beside in journal wal shm; do
   mkfifo "$DATABASE-$beside"
-  check "a planted $beside is in the way, and not opened" \
-    same "$(outcome timeout 10 "$INSTALLED")" "1 $DATABASE-$beside is not this user's own file"
+  check "a planted $beside is neither opened nor in the way" \
+    same "$(outcome timeout 10 "$INSTALLED")" "0 "
   rm "$DATABASE-$beside"
 done
+
+mkdir -p /tmp/lock
+touch /tmp/lock/lock_sched_run
+(exec 8</tmp/lock/lock_sched_run; flock 8; sleep 100) &
+holder=$!
+until ! flock -n /tmp/lock/lock_sched_run true; do :; done
+check "a run that is being recorded for too long is in the way" \
+  same "$(outcome timeout 20 "$INSTALLED")" "1 a run is being recorded"
+pkill -P "$holder"
+wait "$holder" || true
 check "without them the machine may go off" same "$(outcome "$INSTALLED")" "0 "
 
 echo "no database" >"$DATABASE"

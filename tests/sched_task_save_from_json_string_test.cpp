@@ -116,7 +116,7 @@ class TaskFromJsonTest : public support::SandboxTest {
     ASSERT_FALSE(logged().empty());
     EXPECT_TRUE(logged().back() == kUnit + lastLine) << logged().back().substr(0, 200);
     for (const int priority : support::loggedPriorities()) EXPECT_EQ(priority, 3);
-    EXPECT_FALSE(support::fileExists(support::kStore));
+    EXPECT_FALSE(support::hasStoredTasks());
     EXPECT_FALSE(support::fileExists(support::kPersistentStore));
     EXPECT_EQ(support::crontabLines(), Lines{});
   }
@@ -245,7 +245,7 @@ TEST_F(TaskFromJsonTest, APowerTaskIsOverwrittenInItsPlaceOrBecomesAnOrdinaryTas
   changed.replace(text.find(enabled), enabled.size(), R"("state":"\"disabled\"\n")");
   EXPECT_EQ(save(changed), kFirst);
   EXPECT_EQ(support::powerList(support::kOn), (support::Entries{{0, 127, 5, 7}, {1, 127, 6, 8}}));
-  EXPECT_FALSE(support::fileExists(support::kStore));
+  EXPECT_FALSE(support::hasStoredTasks());
   EXPECT_EQ(save(text, 1), 1);
   EXPECT_EQ(loadTask(1)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
   EXPECT_STREQ(loadTask(1)->Command, "");
@@ -271,7 +271,7 @@ TEST_F(TaskFromJsonTest, AnEmptyObjectSavesNothingAndGivesTheIdOfANewRecord) {
   EXPECT_EQ(save("{}"), -1);
   EXPECT_EQ(save(" { } \n", 1), -1);
   EXPECT_EQ(logged(), Lines{});
-  EXPECT_FALSE(support::fileExists(support::kStore));
+  EXPECT_FALSE(support::hasStoredTasks());
   const FakeBackends fakes(1);  // whose new records have the id 0
   EXPECT_EQ(save("{}"), 0);
 }
@@ -601,7 +601,7 @@ TEST_F(TaskFromJsonTest, APowerTimeWithoutADayIsOverwrittenInItsPlaceButIsNoOrdi
   EXPECT_EQ(support::powerList(support::kOff), (support::Entries{{1, 0, 5, 7}}));
   EXPECT_EQ(save(text, 1), -1);
   EXPECT_EQ(logged().back(), std::string(kUnit) + "hash to task failed, task id=90000507");
-  EXPECT_FALSE(support::fileExists(support::kStore));
+  EXPECT_FALSE(support::hasStoredTasks());
 }
 
 TEST_F(TaskFromJsonTest, AFailedAllocationOfTheTaskIsReportedWithTheRecord) {
@@ -656,7 +656,7 @@ TEST_F(TaskFromJsonTest, AShortageOfMemoryForTheTextIsReported) {
   EXPECT_EQ(result, -1);
   EXPECT_EQ(logged(), Lines{std::string(kUnit) + "Out of memory"});
   EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
-  EXPECT_FALSE(support::fileExists(support::kStore));
+  EXPECT_FALSE(support::hasStoredTasks());
 }
 
 TEST_F(TaskFromJsonTest, TheHashIsAskedForWithRoomFor512Keys) {

@@ -87,7 +87,7 @@ TEST_F(TaskSaveTest, AnUnknownIdFailsInTheFirstStepOfTheEdit) {
                    "sched_task_edit.cpp:N get task failed. id:[7] [0x2000 sched_task_get.cpp:N]",
                    "sched_task_save.cpp:N Set task failed. [7] [0x2000 sched_task_get.cpp:N]"}));
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x2000, "sched_task_get.cpp"}));
-  EXPECT_FALSE(support::fileExists(support::kStore));
+  EXPECT_FALSE(support::hasStoredTasks());
 }
 
 TEST_F(TaskSaveTest, ASavedTaskCanBeSavedAgainUnderItsId) {

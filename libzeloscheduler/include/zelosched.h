@@ -17,8 +17,8 @@
  *     record (QLIBCErrGet and its kin) and, but where a function says
  *     otherwise, a line in the system log at priority error that begins with
  *     the file and the line. The codes:
- *     0x0100 array allocation, 0x0200 record allocation, 0x0400 run lock not
- *     taken, 0x0500 run lock not released, 0x0900 file or database not opened,
+ *     0x0100 array allocation, 0x0200 record allocation, 0x0400 lock of runs or
+ *     of changes not taken, 0x0500 run lock not released, 0x0900 file or database not opened,
  *     0x0B00 read or write failed, 0x0D00 bad argument, 0x2000 not found,
  *     0x2700 fstat failed, 0x2800 rename failed, 0x2A00 call on time or
  *     identity failed, 0x4000 malformed number, date or time.
@@ -29,6 +29,15 @@
  *  7. Threads. One thread of a process at a time. Processes may use the
  *     library side by side.
  *  8. Clock. All times are local time; the resolution is the minute.
+ *  9. Turns. Creating, editing, removing and synchronising take turns with other
+ *     processes. Whoever has not had his turn after 30 seconds fails with 0x0400,
+ *     and nothing was read or changed.
+ * 10. "/tmp". The live files are there, under fixed names. A process of root's
+ *     takes a name that is free or another user's, and what stood there is then
+ *     in a directory that only root can enter, which the log names; for any other
+ *     process such a name is a failure (0x0900). A program with a "/tmp" of its
+ *     own (systemd's PrivateTmp, a container) must not use the library: it would
+ *     write a crontab for tasks that cron's machine does not have.
  */
 #ifndef ZELOSCHED_H
 #define ZELOSCHED_H
@@ -258,9 +267,8 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
  * number that does not fit its field, a command of more than 12287 bytes, a
  * schedule that cron cannot read (see ZELOSchedTaskCreate; also that of a task
  * that is not enabled), and a text of more than 4 MiB are failures, and then
- * nothing is saved. Bytes that are
- * not UTF-8 are saved as they are; another text that is longer than its field is
- * cut to it.
+ * nothing is saved. Bytes that are not UTF-8 are saved as they are; another text
+ * that is longer than its field is cut to it.
  *
  * Whose task it is, the text alone decides. One whose "owner" is missing, "" or
  * " 0", "-0" or another way to write nothing, or comes again as 0, is root's, and
@@ -464,14 +472,15 @@ ZELO_SCHED_API int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled)
 extern ZELO_SCHED_API FILE *pfLock;
 
 /* Opens the status database, creating it when it is missing. The caller closes
- * it with sqlite3_close, before the library is unloaded. The database and its
- * rollback journal are used only while they are root's or the caller's, and
- * nothing else that lies beside them: the connection knows no WAL mode and no
- * transaction over attached databases. A database in WAL mode is moved aside,
- * which the log tells, and made anew. The calls below run their statements on it and leave
- * its authorizer, limits, hooks and transaction as they are. Null on failure:
- * 0x0900 when it cannot be opened, no code, and the connection left open, when
- * the table cannot be created. */
+ * it with sqlite3_close, before the library is unloaded. The database is made with
+ * mode 0600 and is therefore root's in practice. It and its rollback journal are
+ * used only while they are root's or the caller's, and nothing else that lies
+ * beside them: the connection knows no WAL mode and no transaction over attached
+ * databases. A database in WAL mode is moved aside, which the log tells, and made
+ * anew. The calls below run their statements on the connection and leave its
+ * authorizer, limits, hooks and transaction as they are. Null on failure: 0x0900
+ * when it cannot be opened, no code, and the connection left open, when the table
+ * cannot be created. */
 ZELO_SCHED_API sqlite3 *ZELOSchedDBInit(void);
 
 /* Looks for a run of the task, or of any task of the application, that is still

@@ -88,6 +88,12 @@ bool otherUsersExist() {
   return false;
 }
 
+bool hasStoredTasks() {
+  const std::vector<std::string> lines = linesOf(readFile(kStore));
+  return std::any_of(lines.begin(), lines.end(),
+                     [](const std::string &line) { return line.starts_with("["); });
+}
+
 std::string movedAway(const std::string &path) {
   const std::filesystem::path name = std::filesystem::path(path).filename();
   for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {

@@ -58,6 +58,8 @@ std::vector<std::string> linesOf(const std::string &text);
 std::vector<std::string> crontabLines();
 ErrorRecord errorRecord();
 bool otherUsersExist();
+// Whether the store has a task. Its name is taken by whoever looks for one.
+bool hasStoredTasks();
 // Where a thing that stood under a name of ours was moved; "" when there is none.
 std::string movedAway(const std::string &path);
 void cleanWorld();
