@@ -31,7 +31,8 @@ bool isBlank(char c) {
   return c == ' ' || c == '\t' || c == '\r' || c == '\n';
 }
 
-// Goes past blanks and comments. False when the last comment does not end.
+// Goes past blanks and comments. False when the last comment does not end. As for the reader, a
+// carriage return ends a line too.
 bool skipBlanks(std::string_view *text) {
   for (;;) {
     const auto *next = std::find_if_not(text->begin(), text->end(), isBlank);
@@ -41,7 +42,7 @@ bool skipBlanks(std::string_view *text) {
       return true;
     }
     constexpr size_t kMarkLength = 2;
-    const size_t end = isBlock ? text->find("*/", kMarkLength) : text->find('\n');
+    const size_t end = isBlock ? text->find("*/", kMarkLength) : text->find_first_of("\r\n");
     if (end == std::string_view::npos) {
       text->remove_prefix(text->size());
       return !isBlock;
@@ -67,10 +68,10 @@ constexpr char kArray = '[';
 
 size_t lengthOfString(std::string_view text) {
   size_t length = 1;
-  while (text[length] != kString) {
+  while (length < text.size() && text[length] != kString) {
     length += text[length] == '\\' ? 2 : 1;
   }
-  return length + 1;
+  return std::min(length + 1, text.size());
 }
 
 // Whether there is an array or an object in the root object, given a text that could be read. In

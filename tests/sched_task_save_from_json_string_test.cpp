@@ -321,6 +321,12 @@ TEST_F(TaskFromJsonTest, WhatLooksLikeAMemberWithinAStringOrACommentIsNone) {
   EXPECT_STREQ(loadTask(1)->Name, "last");
 }
 
+TEST_F(TaskFromJsonTest, ALineOfACommentEndsWithACarriageReturnToo) {
+  ASSERT_EQ(save(textWithRawMember("name", "//\"[\r\"\\\"last\\\"\"")), 1);
+  EXPECT_STREQ(loadTask(1)->Name, "last");
+  EXPECT_EQ(save("//\n{\"id\": \"a\\\"\", \"b\": \"\\\"({\n\"//*\r{\"id\": \"\\\"n\n\re\"}"), -1);
+}
+
 TEST_F(TaskFromJsonTest, TextThatIsNotJsonIsQuotedInTheLog) {
   for (const char *text : {"x", "{", "{\"name\"", "{\"name\":", R"({"name":"\"n\"")", "}", "\"",
                            "{'name':1}", "{\"a\":\"\\q\"}", "{\"a\":\"\\u12\"}", "\xFF\xFE", "%s%n",
