@@ -756,7 +756,7 @@ readonly STAYS="/etc/crontab.backup /etc/crontab.BACKUP /etc/crontab.202611 /etc
 
 plants_scratch_names() {
   saved
-  as_nobody bash -c 'cd /tmp; for ((pid = 1; pid <= 500; pid++)); do mkdir scheduled_tasks.tmp.$pid; done
+  as_nobody bash -c 'cd /tmp; mkdir scheduled_tasks.tmp.{1..500}
     touch scheduled_tasks.tmp.7/his; : >scheduled_tasks.tmp.501'
 }
 

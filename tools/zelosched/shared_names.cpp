@@ -45,7 +45,7 @@ bool isOpenToOthers(const SchedSharedName &name) {
 }
 
 std::string faultOf(const SchedSharedName &name) {
-  const std::string foreign = whyForeign(name);
+  std::string foreign = whyForeign(name);
   if (!foreign.empty()) return foreign;
   return isOpenToOthers(name) ? "can be opened by others" : "";
 }
