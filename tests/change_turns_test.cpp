@@ -6,13 +6,16 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <filesystem>
 #include <functional>
+#include <set>
 
 #include "captured_log.h"
 #include "failing_calls.h"
 #include "power.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
+#include "zelocore.h"
 #include "zelosched.h"
 
 namespace {
@@ -88,6 +91,56 @@ TEST_F(ChangeTurnsTest, NoChangeOfSeveralProcessesIsLost) {
   EXPECT_EQ(linesWith("/tmp/zeloschedtask"), kWriters * kChanges);
   EXPECT_EQ(linesWith("zelo_poweroff_feasible_check"), kWriters * kChanges);
   EXPECT_EQ(support::logged(), Lines{});
+}
+
+// Where a change takes long, not everybody has his turn in time. What was acknowledged is stored
+// all the same, under an id of its own, and nothing else is.
+TEST_F(ChangeTurnsTest, OfManyWritersOfALargeStoreEachIsStoredOrToldThatItIsNot) {
+  constexpr int kStored = 1000;
+  constexpr size_t kMany = 60;
+  constexpr int kNoTurn = 0x0400;
+  support::realSleep(true, 50);  // 0.6 seconds, in place of thirty
+  const Task stored = makeTask("stored", "true");
+  for (int id = 1; id <= kStored; ++id) {
+    stored->ID = id;
+    PSZHASH hash = QLIBCSzHashAlloc(1);
+    EXPECT_EQ(ZELOSchedInitHashFromTask(&hash, stored.get()), 0);
+    const std::string section = std::to_string(id);
+    EXPECT_GE(QLIBCFileAddSection("/run/stored", section.c_str(), hash, 0), 0);
+    QLIBCSzHashFree(hash);
+  }
+  std::filesystem::copy("/run/stored", support::kStore);
+  std::vector<pid_t> writers;
+  for (size_t i = 0; i < kMany; ++i) {
+    const pid_t pid = fork();
+    if (pid == 0) {
+      const Task task = makeTask("new", "true");
+      const bool isSaved = ZELOSchedTaskSave(task.get()) == 0;
+      _exit(isSaved ? task->ID - kStored : QLIBCErrGet() == kNoTurn ? 0 : 255);
+    }
+    writers.push_back(pid);
+  }
+  std::set<int> saved;
+  size_t refused = 0;
+  for (const pid_t pid : writers) {
+    int status = -1;
+    ASSERT_EQ(waitpid(pid, &status, 0), pid);
+    ASSERT_TRUE(WIFEXITED(status));
+    const int id = WEXITSTATUS(status);
+    ASSERT_NE(id, 255) << "failed for another reason";
+    if (id == 0) {
+      ++refused;
+    } else {
+      EXPECT_TRUE(saved.insert(id).second) << "id " << id << " was given twice";
+    }
+  }
+  EXPECT_EQ(saved.size() + refused, kMany);
+  EXPECT_GT(saved.size(), 0U);
+  ZELO_SCHED_TASK *head = nullptr;
+  EXPECT_EQ(ZELOSchedTaskListGet(&head, nullptr), kStored + static_cast<int>(saved.size()));
+  ZELOSchedTaskListFree(&head);
+  std::filesystem::remove("/run/stored");
+  printf("%zu writers beside %d tasks: %zu had their turn\n", kMany, kStored, saved.size());
 }
 
 TEST_F(ChangeTurnsTest, NobodyElseCanKeepTheOthersWaiting) {
