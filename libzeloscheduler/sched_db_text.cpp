@@ -86,8 +86,13 @@ bool isUnknownWord(std::string_view token) {
 }  // namespace
 
 // Where the text ends outside of apostrophes, the statement's own begins a text that has no end.
-// SQLite says so and does nothing, so that such a statement may reach it.
+// SQLite says so and does nothing, so that such a statement may reach it. It quotes the text then,
+// which must not say what it says of a locked database, for which a statement is tried again.
 bool isRefused(const char *szText, AfterText after, Refusal *pReason) {
+  if (strchr(szText, '\'') != nullptr && strstr(szText, kLocked) != nullptr) {
+    pReason->append("not authorized");
+    return true;
+  }
   int tokens = 0;
   for (const char *next = endOfQuoted(szText); *next != '\0';) {
     if (isSpace(*next)) {

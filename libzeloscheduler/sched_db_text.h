@@ -7,6 +7,9 @@
 using Statement = BoundedText<4096>;
 using Refusal = BoundedText<4096 + 32>;  // may name a word as long as a statement
 
+// By these words in an error SQLite says that another process has the database.
+inline constexpr char kLocked[] = "database is locked";
+
 // What may follow when a text ends the apostrophes that it stands in.
 enum class AfterText {
   kNothing,    // in a statement that writes

@@ -26,8 +26,9 @@ constexpr unsigned kLastDescriptor = ~0U;
 
 // ---- session and keys -------------------------------------------------------------------------
 
+// A platform's fork may have begun it already.
 bool beginSession() {
-  return setsid() >= 0;
+  return setsid() >= 0 || getsid(0) == getpid();
 }
 
 // A command that has the caller's session keyring can read the keys in it, whoever it runs as.

@@ -19,7 +19,7 @@ constexpr mode_t kOpenDirectory = 0755;
 constexpr char kStorePath[] = "/tmp/scheduled_tasks";
 // A store of no bytes beside a persistent copy that has some is one that was cut off, and is
 // refused.
-constexpr char kNoTasks[] = "# No task was saved yet.\n";
+constexpr char kNoTasks[] = "# The scheduler's tasks.\n";
 
 constexpr int kTries = 1000;  // against somebody who is in the way again and again
 
@@ -63,7 +63,7 @@ void removeEither(const char *szPath) {
 }
 
 // What becomes of a file that is ours by now, where another was found before.
-enum class Ours { kStays, kGoes };
+enum class Ours { kStays, kGoes, kIsKept };
 
 // A new file or directory of the name's kind, in a directory that nobody else can enter, and with
 // it gone unless something was moved there.
@@ -116,6 +116,7 @@ class Replacement {
       if (ours_ == Ours::kStays) {
         move(RENAME_EXCHANGE);
       }
+      isKept_ = ours_ == Ours::kIsKept;
     } else if (rmdir(path_) != 0) {
       isKept_ = true;
       SCHED_LOG("%s %s: it is now %s", name_.path, szWhy, path_);
@@ -222,6 +223,10 @@ bool schedTakeName(const SchedSharedName &name) {
 
 bool schedReplaceName(const SchedSharedName &name, SchedMovedTo *pMovedTo) {
   return geteuid() == 0 && replace(name, Ours::kGoes, pMovedTo);
+}
+
+bool schedMoveAside(const SchedSharedName &name, SchedMovedTo *pMovedTo) {
+  return replace(name, Ours::kIsKept, pMovedTo);
 }
 
 bool schedMakeAnew(const SchedSharedName &name) {

@@ -49,6 +49,9 @@ bool schedTakeName(const SchedSharedName &name);
 using SchedMovedTo = char[128];
 bool schedReplaceName(const SchedSharedName &name, SchedMovedTo *pMovedTo);
 
+// Makes it anew and keeps what stood there, also when that is ours; where, is in *pMovedTo.
+bool schedMoveAside(const SchedSharedName &name, SchedMovedTo *pMovedTo);
+
 // The same for a name that nothing is expected under: what stands there, ours too, is removed, or
 // moved away when it is a directory. True when a new file of this process has the name.
 bool schedMakeAnew(const SchedSharedName &name);

@@ -64,7 +64,7 @@ int execute(sqlite3 *db, const char *szSql, RowCallback takeRow, void *context) 
     if (szError == nullptr) {
       return -1;
     }
-    const bool locked = strstr(szError, "database is locked") != nullptr;
+    const bool locked = strstr(szError, kLocked) != nullptr;
     if (!locked || retries == kMostLockedRetries) {
       reportFailedStatement(szSql, szError);
       sqlite3_free(szError);
@@ -133,26 +133,21 @@ bool takeNames() {
   return takeName(kSchedDatabase) && (eaccess(kDatabase, W_OK) != 0 || takeName(kSchedJournal));
 }
 
-// An empty database takes the place of the one that is there, which stays under a name of its own
-// together with its log, so that its rows can still be read. The name is never free.
+// An empty database takes the place of the one that is there, which is then, together with its log,
+// in a directory that nobody else can enter: there its rows can still be read, and nobody can put a
+// journal beside it. The name is never free.
 bool moveAside() {
-  char aside[] = "/tmp/sched_status.sqlite.wal.XXXXXX";
-  const int descriptor = mkostemp(aside, O_CLOEXEC);
-  if (descriptor < 0) {
-    return false;
-  }
-  close(descriptor);
-  if (renameat2(AT_FDCWD, aside, AT_FDCWD, kDatabase, RENAME_EXCHANGE) != 0) {
-    unlink(aside);
+  SchedMovedTo movedTo;
+  if (!schedMoveAside(kSchedDatabase, &movedTo)) {
     return false;
   }
   constexpr SchedSharedName kLog = {"/tmp/sched_status.sqlite-wal", kOwnersOnly, false, ""};
   if (schedLookAt(kLog, nullptr) == SchedNameState::kOurs) {
-    BoundedText<sizeof(aside) + sizeof("-wal")> log;
-    log.append("%s-wal", aside);
+    BoundedText<sizeof(movedTo) + sizeof("-wal")> log;
+    log.append("%s-wal", movedTo);
     rename(kLog.path, log.c_str());
   }
-  SCHED_LOG("%s was in WAL mode and is now %s\n", kDatabase, aside);
+  SCHED_LOG("%s was in WAL mode and is now %s\n", kDatabase, movedTo);
   return true;
 }
 

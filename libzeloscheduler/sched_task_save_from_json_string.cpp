@@ -13,6 +13,7 @@
 #include <string>
 #include <string_view>
 
+#include "backends/power_id.h"
 #include "sched_cron_fields.h"
 #include "sched_guards.h"
 #include "sched_json.h"
@@ -255,6 +256,12 @@ bool canBeKept(const ZELO_SCHED_TASK &task, bool overwrites) {
 }
 
 int save(ZELO_SCHED_TASK *pTask, bool create) {
+  // Only a power time is looked for before it is refused.
+  const bool mayBePower = !create && isPowerId(pTask->ID);
+  if (!mayBePower && !schedIsCronLineReadable(*pTask)) {
+    reportConversion(*pTask);
+    return -1;
+  }
   const bool overwrites = !create && isStored(pTask);
   if (!canBeKept(*pTask, overwrites)) {
     reportConversion(*pTask);

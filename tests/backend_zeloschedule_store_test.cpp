@@ -203,13 +203,24 @@ TEST_F(StoreTest, AFreeNameIsTakenByWhoeverReadsIt) {
   for (const auto &read : readers) {
     std::filesystem::remove(kStore);
     read();
-    EXPECT_EQ(readFile(kStore), "# No task was saved yet.\n");
+    EXPECT_EQ(readFile(kStore), "# The scheduler's tasks.\n");
     struct stat info = {};
     EXPECT_EQ(lstat(kStore, &info), 0);
     EXPECT_EQ(info.st_mode, static_cast<mode_t>(S_IFREG | 0644));
     read();
   }
+  EXPECT_EQ(create("first"), 1);
+  EXPECT_EQ(recordedExecs().size(), 3U);
+  EXPECT_EQ(listedIds(), Ids{1});
   EXPECT_EQ(logged(), Lines{});
+}
+
+// As tmpfiles.d makes it at boot.
+TEST_F(StoreTest, AStoreThatOnlyHoldsItsNameIsCopiedOnce) {
+  writeFile(kStore, "");
+  EXPECT_EQ(create("first"), 1);
+  EXPECT_EQ(recordedExecs().size(), 3U);
+  EXPECT_EQ(support::recordedSleeps(), std::vector<long>{});
 }
 
 TEST_F(StoreTest, WithoutAStoreCreateMakesOneWithOneSection) {

@@ -326,9 +326,14 @@ class WalModeTest : public PlantedJournalTest {
   }
   static Lines namesAside() {
     Lines names;
-    for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {
-      const std::string name = entry.path().filename();
-      if (name.starts_with("sched_status.sqlite.wal.")) names.push_back(entry.path());
+    const std::string aside = support::movedAway(kStatusDatabase);
+    if (aside.empty()) return names;
+    const std::filesystem::path directory = std::filesystem::path(aside).parent_path();
+    struct stat info = {};
+    EXPECT_EQ(stat(directory.c_str(), &info), 0);
+    EXPECT_EQ(info.st_mode & 0777U, 0700U);
+    for (const auto &entry : std::filesystem::directory_iterator(directory)) {
+      names.push_back(entry.path());
     }
     std::sort(names.begin(), names.end());
     return names;
@@ -397,7 +402,7 @@ TEST_F(WalModeTest, WhatAnotherProcessHasJustMadeIsNotMovedAside) {
 }
 
 TEST_F(WalModeTest, WithoutRoomForAnotherTheDatabaseIsNotOpened) {
-  for (const char *call : {"mkostemp", "flock"}) {
+  for (const char *call : {"mkdtemp", "flock"}) {
     support::clearLog();
     support::failCall(call, {.error = ENOSPC});
     EXPECT_EQ(init(), nullptr) << call;

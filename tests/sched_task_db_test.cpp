@@ -1104,6 +1104,25 @@ TEST_P(InjectionTest, FailsInACommentAndIsLogged) {
   expectNothingHarmed();
 }
 
+// SQLite quotes what it does not understand, and for these words a statement is tried again, for
+// more than a minute and with the run lock held.
+TEST_F(StatusDatabaseTest, NoTextPassesForALockedDatabase) {
+  for (const char *app : {"database is locked'", "x' 'database is locked", "'database is locked",
+                          "x' 'database is locked'"}) {
+    SCOPED_TRACE(app);
+    support::clearSleeps();
+    ZELO_SCHED_STATUS status = {};
+    EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), app, &status), -1);
+    const support::Task task = support::makeTask("task", "");
+    support::setText(task->App, app);
+    EXPECT_EQ(ZELOSchedDBAddRecord(db(), task.get(), nullptr), -1);
+    EXPECT_EQ(ZELOSchedDBSetStatus(db(), 1, 2, 3, app), -1);
+    EXPECT_EQ(recordedSleeps(), std::vector<long>{});
+  }
+  ZELO_SCHED_STATUS status = {};
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), "database is locked", &status), 0);
+}
+
 // SQLite trusts what lies beside a database: a planted journal would be rolled back.
 TEST_F(StatusDatabaseTest, FilesOfTheDatabaseThatAreNotOursAreMovedAwayOrGiveNoHandle) {
   struct Plant {

@@ -398,8 +398,7 @@ int fail(SchedPlace place, int code) {
 // A file made beside another one, gone again unless it took the other one's place.
 class NewFile {
  public:
-  NewFile(const char *szPath, const char *szDirectory)
-      : szPath_(szPath), szDirectory_(szDirectory) {
+  explicit NewFile(const char *szPath) : szPath_(szPath) {
     snprintf(path_, sizeof(path_), "%s.XXXXXX", szPath);
   }
   ~NewFile() {
@@ -449,18 +448,16 @@ class NewFile {
     return 0;
   }
 
-  // On the disk when the call returns, whether it was there before or not.
   int replaceOld() {
     if (rename(path_, szPath_) != 0) {
       return fail(SCHED_HERE, kErrRename);
     }
     made_ = false;
-    return syncFile(szDirectory_, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
+    return 0;
   }
 
  private:
   const char *szPath_;
-  const char *szDirectory_;
   char path_[64];
   bool made_ = false;
   bool endsLine_ = true;
@@ -514,7 +511,8 @@ int copyWorkingCopy(const ScratchFile &scratch) {
       return -1;
     }
     const off_t size = sizeOf(scratch.path());
-    if (size > 0 && size == sizeOf(kWorkingCopy)) {
+    const bool mayBeEmpty = sizeOf(kPersistentCopy) == 0;  // where only the name is taken
+    if (size == sizeOf(kWorkingCopy) && (size > 0 || mayBeEmpty)) {
       return 0;
     }
     usleep(kPause);
@@ -592,11 +590,14 @@ int keepLastGood(const ScratchFile &scratch) {
   like.st_uid = geteuid();
   like.st_gid = getegid();
   like.st_mode = kStoreMode;
-  NewFile file(kLastGoodCopy, kPersistentDirectory);
+  NewFile file(kLastGoodCopy);
   if (file.open() < 0 || fillNewFile(source.get(), &file) < 0 || file.finish(like) < 0) {
     return -1;
   }
-  return file.replaceOld();
+  if (file.replaceOld() < 0) {
+    return -1;
+  }
+  return syncFile(kPersistentDirectory, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
 // A forced copy empties its target before it fills it. When the power goes in between, the tasks
@@ -625,7 +626,15 @@ int publish(const ScratchFile &scratch) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(scratch.path(), kWorkingCopy);
   }
-  return copyFile(scratch.path(), kWorkingCopy) < 0 ? -1 : 1;
+  const off_t before = sizeOf(kWorkingCopy);
+  if (copyFile(scratch.path(), kWorkingCopy) < 0) {
+    // It was emptied, and there was no room to fill it again. The scratch file takes none.
+    if (sizeOf(kWorkingCopy) != before) {
+      rename(scratch.path(), kWorkingCopy);
+    }
+    return -1;
+  }
+  return 1;
 }
 
 // Whether there is a store to build on. For root, what another user has put in its place is moved
@@ -769,14 +778,16 @@ int addTaskLines(const ZELO_SCHED_TASK *pTask, NewFile *crontab) {
   return 0;
 }
 
+void signalCron() {
+  if (QLIBCFileExist(kCronPidFile) != 0 && system(kSignalCron) != 0) {
+    SCHED_LOG("Failed to hup crond.");
+  }
+}
+
 int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   const Stream old(fopen(kCrontab, "r"));
   if (old == nullptr) {
     return -1;  // no crontab, nothing to write it like: none is made
-  }
-  // Cron starts as root whatever stands under that name.
-  if (!schedTakeName(kSchedTaskProgram)) {
-    return fail(SCHED_HERE, kErrOpen);
   }
   struct stat info = {};
   if (fstat(fileno(old.get()), &info) != 0) {
@@ -785,18 +796,19 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   if (S_ISDIR(info.st_mode)) {
     return fail(SCHED_HERE, kErrOpen);
   }
-  NewFile crontab(kCrontab, kCrontabDirectory);
+  // Cron starts as root whatever stands under that name: where it cannot be had, no line may stand.
+  const bool isProgramOurs = schedTakeName(kSchedTaskProgram);
+  NewFile crontab(kCrontab);
   if (crontab.open() < 0 || keepOtherLines(old.get(), &crontab) < 0 ||
-      addTaskLines(tasks, &crontab) < 0 || crontab.finish(info) < 0) {
+      addTaskLines(isProgramOurs ? tasks : nullptr, &crontab) < 0 || crontab.finish(info) < 0 ||
+      crontab.replaceOld() < 0) {
     return -1;
   }
-  return crontab.replaceOld();
-}
-
-void signalCron() {
-  if (QLIBCFileExist(kCronPidFile) != 0 && system(kSignalCron) != 0) {
-    SCHED_LOG("Failed to hup crond.");
+  signalCron();
+  if (!isProgramOurs) {
+    return fail(SCHED_HERE, kErrOpen);
   }
+  return syncFile(kCrontabDirectory, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
 // Every task that list_get lists, but of each record no more than its crontab line needs: the texts
@@ -852,7 +864,6 @@ int writeCrontab() {
     SCHED_LOG_CALLEE("sync task list failed. ");
     return count;
   }
-  signalCron();
   return 0;
 }
 
