@@ -42,6 +42,7 @@ LIB/libzelosdk.so
 LIB/libzeloscheduler.so
 LIB/libzeloscheduler.so.4
 LIB/pkgconfig/zeloscheduler.pc
+LIB/zeloscheduler/take-names
 include/zelocore.h
 include/zelosched.h
 include/zeloschedgetter.h
@@ -51,6 +52,8 @@ libexec/zelosched/zelo_poweroff_feasible_check
 sbin/zelosched
 sbin/zeloschedtask
 share/bash-completion/completions/zelosched
+share/zeloscheduler/take_lines_out
+share/zeloscheduler/zeloschedtask.stand-in
 FILES
 }
 

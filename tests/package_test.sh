@@ -138,7 +138,9 @@ libzelosdk drwxr-xr-x root:root usr/zelo
 libzelosdk drwxr-xr-x root:root usr/zelo/etc
 libzeloscheduler4 -rw-r--r-- root:root usr/LIB/libzeloscheduler.so.4
 libzeloscheduler4 -rw-r--r-- root:root usr/lib/tmpfiles.d/libzeloscheduler4.conf
+libzeloscheduler4 -rwxr-xr-x root:root etc/init.d/zeloscheduler-names
 libzeloscheduler4 -rwxr-xr-x root:root usr/LIB/zeloscheduler/take-names
+libzeloscheduler4 lrwxrwxrwx root:root lib/systemd/system/zeloscheduler-names.service
 libzeloscheduler4 -rwxr-xr-x root:root usr/share/zeloscheduler/take_lines_out
 libzeloscheduler4 -rwxr-xr-x root:root usr/share/zeloscheduler/zeloschedtask.stand-in
 libzeloscheduler4 -rw-r--r-- root:root usr/share/lintian/overrides/libzeloscheduler4
@@ -548,7 +550,8 @@ check "its owner and mode are as they were" same "$(stat -c '%a %u:%g' "$ROOT/et
 check "the names in /tmp stay root's while a task is kept" names_are_roots
 check "nothing is left but the data, these names, and what the purge takes of units" \
   same "$(differences_from "$WORK/before")" "$(printf '> %s ' \
-    etc/init.d/zelosched-restore etc/rcS.d/S01zelosched-restore \
+    etc/init.d/zelosched-restore etc/init.d/zeloscheduler-names \
+    etc/rcS.d/S01zelosched-restore etc/rcS.d/S01zeloscheduler-names \
     etc/systemd/system/basic.target.wants \
     etc/systemd/system/{basic.target.wants/zelosched-restore.service,multi-user.target.wants/zelosched-shutdown.service,timers.target.wants/zelosched-history.timer} \
     run/zeloscheduler.lock \

@@ -152,6 +152,12 @@ void putStoreBack(bool isForced) {
   } else {
     replaceWorkingCopy(persistent);
   }
+}
+
+// Last, since there may be very many. Nobody is changing the store meanwhile.
+void clearScratch() {
+  const StoreLock turn;
+  if (!turn.isHeld()) throw failedTo("take scratch copies away");
   clearScratchNames();
 }
 
@@ -194,6 +200,7 @@ int runRestore(int argc, char **argv) {
       attempt(putProgramBack), attempt([&] { putStoreBack(isForced); }),
       takeSharedNames(),       attempt(removeLeftovers),
       attempt(synchronise),    attempt(markMachineUp),
+      attempt(clearScratch),
   };
   return *std::max_element(std::begin(results), std::end(results));
 }

@@ -72,12 +72,27 @@ std::map<pid_t, ProcessStat> children() {
   return found;
 }
 
+// What a command leaves behind becomes ours, and may be older than the next run's process. But it
+// cannot have root's saved user id, which a run's process keeps as its way back.
+bool isOfRoot(pid_t pid) {
+  std::ifstream status("/proc/" + std::to_string(pid) + "/status");
+  for (std::string line; std::getline(status, line);) {
+    long real = -1;
+    long effective = -1;
+    long saved = -1;
+    if (std::sscanf(line.c_str(), "Uid:\t%ld\t%ld\t%ld", &real, &effective, &saved) == 3) {
+      return saved == 0;
+    }
+  }
+  return false;
+}
+
 // The run's own process is older than whatever its command has left to us by now.
 pid_t newChild(const std::map<pid_t, ProcessStat> &before) {
   pid_t oldest = 0;
   unsigned long long started = 0;
   for (const auto &[pid, stat] : children()) {
-    if (before.count(pid) != 0) continue;
+    if (before.count(pid) != 0 || !isOfRoot(pid)) continue;
     if (oldest == 0 || stat.started < started) {
       oldest = pid;
       started = stat.started;

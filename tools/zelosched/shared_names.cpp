@@ -91,10 +91,11 @@ void forEachScratchName(const std::function<void(int directory, const char *name
 // One directory for all that cannot be removed at once.
 class AsideDirectory {
  public:
-  void receive(const char *name) {
+  // Under a number, as somebody may make the same name again and again.
+  void receive(int directory, const char *name) {
     if (path_.empty()) make();
-    const std::string to = path_ + "/" + name;
-    if (rename((std::string(kDirectory) + "/" + name).c_str(), to.c_str()) != 0) {
+    const std::string to = path_ + "/" + std::to_string(++count_);
+    if (renameat(directory, name, AT_FDCWD, to.c_str()) != 0 && errno != ENOENT) {
       throw cannot(std::string("move ") + name + " away");
     }
   }
@@ -108,7 +109,19 @@ class AsideDirectory {
   }
 
   std::string path_;
+  unsigned long count_ = 0;
 };
+
+// SQLite would believe what is beside the database, were it opened by another program.
+void removeForeignLogs() {
+  for (const char *path : {"/tmp/sched_status.sqlite-wal", "/tmp/sched_status.sqlite-shm"}) {
+    struct stat info {};
+    if (lstat(path, &info) != 0) continue;
+    complain(std::string(path) + " is not ours: it is taken away");
+    if (unlink(path) == 0 || rmdir(path) == 0) continue;
+    AsideDirectory().receive(AT_FDCWD, path);
+  }
+}
 
 }  // namespace
 
@@ -128,7 +141,7 @@ int takeSharedNames() {
   for (const SchedSharedName *name : kNames) {
     status = std::max(status, attempt([&] { take(*name); }));
   }
-  for (const auto step : {makeDatabase, requireNoFault}) {
+  for (const auto step : {removeForeignLogs, makeDatabase, requireNoFault}) {
     status = std::max(status, attempt(step));
   }
   return status;
@@ -148,7 +161,7 @@ void clearScratchNames() {
   AsideDirectory aside;
   forEachScratchName([&](int directory, const char *name) {
     if (unlinkat(directory, name, 0) == 0 || unlinkat(directory, name, AT_REMOVEDIR) == 0) return;
-    if (errno != ENOENT) aside.receive(name);
+    if (errno != ENOENT) aside.receive(directory, name);
   });
   if (!aside.path().empty()) {
     complain("directories under names of scratch copies of the tasks are now in " + aside.path());
