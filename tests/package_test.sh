@@ -357,6 +357,34 @@ boot_without() {
   rm -r "$ROOT/etc/systemd/system/$unit" "$ROOT/etc/systemd/system/local-fs.target.wants"
 }
 
+# A /tmp that outlives the boot, with names of another user in it.
+planted_names_are_not_adopted() {
+  boot "
+    rm -rf ${NAMES[*]}
+    cp /bin/true /tmp/zeloschedtask; echo '[1]' >/tmp/scheduled_tasks; mkdir /tmp/lock; : >/tmp/sched_status.sqlite
+    chown -R 65534:65534 ${NAMES[*]} 2>/dev/null
+    systemd-tmpfiles --create --remove --boot /usr/lib/tmpfiles.d/libzeloscheduler*.conf 2>&1 | grep -v Duplicate
+    $NAMES_ARE_ROOTS; stat -c %s /tmp/scheduled_tasks; $WHICH_PROGRAM" >"$WORK/log"
+  same "$(cat "$WORK/log")" "${ALL_ROOTS}0
+program"
+}
+
+# A process that changes tasks for too long.
+leaves_lines_of_a_held_lock() {
+  in_root sh -c 'mkdir /stub && printf "#!/bin/sh\nexit 1\n" >/stub/flock && chmod 755 /stub/flock
+    PATH=/stub:$PATH /usr/share/zeloscheduler/take_lines_out /tmp/zeloschedtask' >"$WORK/log" 2>&1 &&
+    { echo "the lines were taken out"; return 1; }
+  rm -r "$ROOT/stub"
+  grep -q 'another process has been changing tasks' "$WORK/log" && has_all_lines
+}
+
+takes_names_by_init() {
+  rm -rf "${NAMES[@]/#/$ROOT}"
+  in_root_quietly /etc/init.d/zeloscheduler-names start && names_are_roots &&
+    in_root_quietly /etc/init.d/zelosched-restore start && names_are_roots &&
+    cmp "$ROOT/tmp/scheduled_tasks" "$ROOT/usr/zelo/etc/scheduled_tasks"
+}
+
 readonly WHICH_PROGRAM='
   cmp -s /tmp/zeloschedtask /usr/sbin/zeloschedtask && echo program
   cmp -s /tmp/zeloschedtask /usr/share/zeloscheduler/zeloschedtask.stand-in && echo stand-in'
@@ -515,6 +543,7 @@ program"
     same "$(boot_without /usr/zelo/etc "$NAMES_ARE_ROOTS; systemctl is-active zelosched-restore; $WHICH_PROGRAM")" \
     "${ALL_ROOTS}inactive
 program"
+  check "what another user has in a /tmp that outlives the boot does not become root's" planted_names_are_not_adopted
   check "systemd restores where the library alone names the program" boots_with_the_library_alone
   clear_boot
   check "the machine's kernel settings are as they were" same "$(settings_of_machine)" "$settings"
@@ -531,7 +560,9 @@ check "it keeps the tasks" has_all_tasks
 check "it keeps the lines in the crontab" has_all_lines
 
 check "a crontab that cannot be replaced is told, and stays" goes_on_without_crontab
+check "nor are lines taken out without the lock of changes" leaves_lines_of_a_held_lock
 check "a removal that is broken off is undone" is_undone
+check "without systemd the boot scripts take the names and restore" takes_names_by_init
 check "the tools alone are removed, and the clock is disarmed" disarms_clock
 check "the lines are out of the crontab" cmp "$ROOT/etc/crontab" "$WORK/crontab"
 check "the tasks stay with the library" cmp "$ROOT/tmp/scheduled_tasks" "$ROOT/usr/zelo/etc/scheduled_tasks"
@@ -559,7 +590,14 @@ check "nothing is left but the data, these names, and what the purge takes of un
     tmp/zeloschedtask usr/zelo usr/zelo/etc \
     usr/zelo/etc/{power_sched.conf,scheduled_tasks,scheduled_tasks.last-good} \
     usr/zelo/var usr/zelo/var/history.sqlite)"
+mv "$ROOT/usr/zelo/etc/scheduled_tasks" "$ROOT/kept"
+rm -rf "${NAMES[@]/#/$ROOT}"
+echo "# planted" >"$ROOT/tmp/scheduled_tasks"
+echo "# planted" >"$ROOT/tmp/zeloschedtask"
+mv "$ROOT/kept" "$ROOT/usr/zelo/etc/scheduled_tasks"
 check "all are installed again" install_by_dpkg
+check "what was root's under a free name before is replaced" \
+  same "$(grep -l planted "$ROOT/tmp/scheduled_tasks" "$ROOT/tmp/zeloschedtask")" ""
 check "the tasks are there again" has_all_tasks
 check "and their lines" has_all_lines
 check "all are purged" purge_packages
