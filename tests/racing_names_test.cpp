@@ -175,6 +175,53 @@ int createTask() {
   return ZELOSchedTaskCreate(task.get());
 }
 
+void addRecord() {
+  const std::unique_ptr<sqlite3, int (*)(sqlite3 *)> db(ZELOSchedDBInit(), sqlite3_close);
+  if (db == nullptr) return;
+  int id = 0;
+  if (ZELOSchedDBAddRecord(db.get(), makeTask("own", "").get(), &id) == 0) {
+    ZELOSchedDBSetStatus(db.get(), id, 2, 3, "own");
+  }
+  ZELO_SCHED_STATUS status = {};
+  ZELOSchedDBIsAppRunning(db.get(), "forged", &status);
+  EXPECT_EQ(status.found, 0);
+}
+
+void editTask() {
+  const Task task = makeTask("own", "/bin/true");
+  task->ID = kHisTask;
+  ZELOSchedTaskSave(task.get());
+  EXPECT_STRNE(task->Name, "hostile");
+}
+
+void loadTask() {
+  const Task task = makeTask("", "");
+  const bool isFound = ZELOSchedTaskLoad(kHisTask, task.get()) == 0;
+  EXPECT_FALSE(isFound && task->Name == std::string("hostile"));
+}
+
+void convertTask() {
+  static char text[ZELO_SCHED_JSON_SIZE_ANY];
+  if (ZELOSchedTaskConvertToJsonById(kHisTask, text, sizeof text) < 0) return;
+  EXPECT_EQ(std::string(text).find("hostile"), std::string::npos);
+}
+
+void saveFromJson() {
+  static char text[ZELO_SCHED_JSON_SIZE_ANY];
+  const Task task = makeTask("own", "/bin/true");
+  EXPECT_EQ(ZELOSchedTaskConvertToJson(task.get(), text, sizeof text), 0);
+  ZELOSchedTaskSaveFromJson(text, 0);
+}
+
+void createPowerTask() {
+  const Task task = makeTask("", "");
+  task->Backend = ZELO_SCHED_BACKEND_AUTOPOWER;
+  setText(task->AppArgs, "poweroff");
+  setText(task->Week, "1111111");
+  ZELOSchedTaskCreate(task.get());
+  ZELOSchedTaskRemove(task->ID);
+}
+
 void createAndRun() {
   if (createTask() == 0) ZELOSchedTaskRun(kHisTask, 0, 0);
   waitForChildRuns();
@@ -192,7 +239,14 @@ const Call kCalls[] = {
     {"ZELOSchedTaskCreate", [] { createTask(); }},
     {"ZELOSchedTaskRemove", [] { ZELOSchedTaskRemove(kHisTask); }},
     {"ZELOSchedTaskSync", [] { ZELOSchedTaskSync(); }},
+    {"ZELOSchedTaskLoad", loadTask},
+    {"ZELOSchedTaskSave", editTask},
+    {"ZELOSchedTaskAlloc", [] { ZELOSchedTaskFree(ZELOSchedTaskAlloc()); }},
+    {"ZELOSchedTaskConvertToJsonById", convertTask},
+    {"ZELOSchedTaskSaveFromJson", saveFromJson},
+    {"ZELOSchedTaskCreate (power)", createPowerTask},
     {"ZELOSchedDBInit", useDatabase},
+    {"ZELOSchedDBAddRecord", addRecord},
     {"ZELOSchedTaskCreate and ZELOSchedTaskRun", createAndRun},
 };
 
@@ -201,7 +255,6 @@ class RacingNamesTest : public SandboxTest {
   void SetUp() override {
     SandboxTest::SetUp();
     REQUIRE_OTHER_USERS();
-    ASSERT_EQ(ZELOSchedBackendInit(), 0);
     removeHisThings();
     makeHisThings();
   }
@@ -240,6 +293,29 @@ class RacingNamesTest : public SandboxTest {
     clearLog();
   }
 
+  // In a process of its own, whose children are the runs alone.
+  static void raceOf(const std::function<void(const Call &)> &act) {
+    const int calls = timesSoaked(kUsualCalls);
+    const pid_t root = fork();
+    if (root == 0) {
+      alarm(static_cast<unsigned>(60 + calls / 20));  // a call that hangs ends it
+      prctl(PR_SET_CHILD_SUBREAPER, 1);
+      const std::vector<std::string> names = allNames(getpid());
+      for (int i = 0; i < calls && !HasFailure(); ++i) {
+        const Call &call = kCalls[static_cast<size_t>(i) % std::size(kCalls)];
+        SCOPED_TRACE(call.name + std::string(", call ") + std::to_string(i));
+        freeNames(names);
+        act(call);
+        expectNothingOfHis();
+      }
+      _exit(HasFailure() ? 1 : 0);
+    }
+    const Rival rival(allNames(root));
+    int status = -1;
+    EXPECT_EQ(waitpid(root, &status, 0), root);
+    EXPECT_EQ(status, 0);
+  }
+
   static void expectNothingOfHis() {
     for (const char *path : {kStore, kPersistentStore, kLastGoodStore}) {
       EXPECT_EQ(textOf(path).find("hostile"), std::string::npos) << path;
@@ -253,26 +329,21 @@ class RacingNamesTest : public SandboxTest {
 };
 
 TEST_F(RacingNamesTest, NothingOfHisIsShownRunOrKept) {
-  const int calls = timesSoaked(kUsualCalls);
-  // A process of its own, whose children are the runs alone.
-  const pid_t root = fork();
-  if (root == 0) {
-    alarm(static_cast<unsigned>(60 + calls / 20));  // a call that hangs ends it
-    prctl(PR_SET_CHILD_SUBREAPER, 1);
-    const std::vector<std::string> names = allNames(getpid());
-    for (int i = 0; i < calls && !HasFailure(); ++i) {
-      const Call &call = kCalls[static_cast<size_t>(i) % std::size(kCalls)];
-      SCOPED_TRACE(call.name + std::string(", call ") + std::to_string(i));
-      freeNames(names);
+  raceOf([](const Call &call) { call.act(); });
+}
+
+// It takes all names.
+TEST_F(RacingNamesTest, NorIsItByTheFirstCallOfAProcess) {
+  raceOf([](const Call &call) {
+    const pid_t caller = fork();
+    if (caller == 0) {
       call.act();
-      expectNothingOfHis();
+      _exit(HasFailure() ? 1 : 0);
     }
-    _exit(HasFailure() ? 1 : 0);
-  }
-  const Rival rival(allNames(root));
-  int status = -1;
-  EXPECT_EQ(waitpid(root, &status, 0), root);
-  EXPECT_EQ(status, 0);
+    int status = -1;
+    EXPECT_EQ(waitpid(caller, &status, 0), caller);
+    EXPECT_EQ(status, 0);
+  });
 }
 
 // He makes directories under a name as fast as he can.
