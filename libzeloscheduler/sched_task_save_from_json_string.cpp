@@ -15,6 +15,7 @@
 
 #include "backends/power_id.h"
 #include "sched_cron_fields.h"
+#include "sched_cron_room.h"
 #include "sched_guards.h"
 #include "sched_json.h"
 #include "sched_parm_table.h"
@@ -234,38 +235,45 @@ bool fillHash(const Json::Value &root, SchedJsonReader *reader, HashGuard *hash)
 
 // The task that is stored under the id may be another one by now: one that another program has put
 // there. Only the same one is overwritten, where it is stored.
-bool isStored(ZELO_SCHED_TASK *pTask) {
-  ZELO_SCHED_TASK stored = {};
-  if (ZELOSchedTaskGetByID(pTask->ID, &stored) != 0 || strcmp(stored.App, pTask->App) != 0 ||
-      strcmp(stored.Name, pTask->Name) != 0) {
+bool findStored(ZELO_SCHED_TASK *pTask, ZELO_SCHED_TASK *pStored) {
+  if (ZELOSchedTaskGetByID(pTask->ID, pStored) != 0 || strcmp(pStored->App, pTask->App) != 0 ||
+      strcmp(pStored->Name, pTask->Name) != 0) {
     return false;
   }
-  pTask->Backend = stored.Backend;
+  pTask->Backend = pStored->Backend;
   return true;
 }
 
-void reportConversion(const ZELO_SCHED_TASK &task) {
-  SCHED_LOG("hash to task failed, task id=%ld", static_cast<long>(task.ID));
+bool hasLine(const ZELO_SCHED_TASK &task) {
+  return task.Backend == ZELO_SCHED_BACKEND_SCHEDULE && task.State == ZELO_SCHED_STATE_ENABLED;
 }
 
 // A disabled task is judged like an enabled one: whoever enables it looks at its state alone. A
-// power time has no line of the scheduler's, and the platform judges it.
-bool canBeKept(const ZELO_SCHED_TASK &task, bool overwrites) {
-  return (overwrites && task.Backend == ZELO_SCHED_BACKEND_AUTOPOWER) ||
-         schedIsCronLineReadable(task);
+// power time has no line of the scheduler's, and the platform judges it. A crontab without room is
+// no fault of a task that adds no line to it.
+bool canBeKept(const ZELO_SCHED_TASK &task, const ZELO_SCHED_TASK *stored) {
+  if (stored != nullptr && task.Backend == ZELO_SCHED_BACKEND_AUTOPOWER) {
+    return true;
+  }
+  const bool addsLine = hasLine(task) && (stored == nullptr || !hasLine(*stored));
+  return schedIsCronLineReadable(task) && (!addsLine || schedHasCronRoom(1));
+}
+
+int refuse(const ZELO_SCHED_TASK &task) {
+  SCHED_LOG("hash to task failed, task id=%ld", static_cast<long>(task.ID));
+  return -1;
 }
 
 int save(ZELO_SCHED_TASK *pTask, bool create) {
-  // Only a power time is looked for before it is refused.
+  // Only a power time is looked for before its schedule is refused.
   const bool mayBePower = !create && isPowerId(pTask->ID);
   if (!mayBePower && !schedIsCronLineReadable(*pTask)) {
-    reportConversion(*pTask);
-    return -1;
+    return refuse(*pTask);
   }
-  const bool overwrites = !create && isStored(pTask);
-  if (!canBeKept(*pTask, overwrites)) {
-    reportConversion(*pTask);
-    return -1;
+  ZELO_SCHED_TASK stored = {};
+  const bool overwrites = !create && findStored(pTask, &stored);
+  if (!canBeKept(*pTask, overwrites ? &stored : nullptr)) {
+    return refuse(*pTask);
   }
   if (overwrites) {
     if (ZELOSchedTaskEdit(pTask) != 0) {
@@ -304,8 +312,7 @@ int saveFromJson(const char *szJson, bool create) {
     return task->ID;
   }
   if (ZELOSchedInitTaskFromHash(task.get(), hash.get()) < 0) {
-    reportConversion(*task);
-    return -1;
+    return refuse(*task);
   }
   return save(task.get(), create);
 }

@@ -610,6 +610,95 @@ TEST_F(TaskFromJsonTest, APowerTimeWithoutADayIsOverwrittenInItsPlaceButIsNoOrdi
   EXPECT_FALSE(support::hasStoredTasks());
 }
 
+// ---- a crontab that is too long -----------------------------------------------------------------
+
+// Beyond ten thousand lines cron ignores all of it, and some are left to other programs.
+constexpr size_t kMostLines = 9800;
+
+size_t linesOfCrontab() {
+  const std::string text = support::readFile(support::kCrontab);
+  return static_cast<size_t>(std::count(text.begin(), text.end(), '\n'));
+}
+
+// Comments count like any other line.
+void fillCrontab(size_t lines, const std::string &end = "") {
+  std::string text = support::readFile(support::kCrontab);
+  for (size_t i = linesOfCrontab(); i < lines; ++i) text += "#\n";
+  support::writeFile(support::kCrontab, text + end);
+}
+
+void expectTooLong(const std::string &text, int create, const char *id) {
+  SCOPED_TRACE(text);
+  const std::string store =
+      support::hasStoredTasks() ? support::readFile(support::kStore) : std::string();
+  const std::string crontab = support::readFile(support::kCrontab);
+  EXPECT_EQ(ZELOSchedTaskSaveFromJson(text.c_str(), create), -1);
+  ASSERT_FALSE(logged().empty());
+  EXPECT_EQ(logged().back(), kUnit + std::string("hash to task failed, task id=") + id);
+  EXPECT_EQ(support::hasStoredTasks() ? support::readFile(support::kStore) : std::string(), store);
+  EXPECT_TRUE(support::readFile(support::kCrontab) == crontab) << linesOfCrontab();
+}
+
+TEST_F(TaskFromJsonTest, ALineThatWouldMakeTheCrontabTooLongIsRefused) {
+  fillCrontab(kMostLines - 1);
+  ASSERT_EQ(save(taskText()), 1);
+  ASSERT_EQ(linesOfCrontab(), kMostLines);
+  expectTooLong(taskText(), 0, "-1");
+  expectTooLong(taskText({{"id", "77"}}), 0, "77");
+  expectTooLong(taskText({{"id", "1"}, {"name", "another"}}), 0, "1");
+  support::clearLog();
+  expectTooLong(jsonOf(1), 1, "1");
+  EXPECT_EQ(logged().size(), 1U) << "no stored task is looked for";
+}
+
+TEST_F(TaskFromJsonTest, ALastLineWithoutALineFeedCountsToo) {
+  fillCrontab(kMostLines - 1, "# no line feed");
+  expectTooLong(taskText(), 1, "-1");
+}
+
+TEST_F(TaskFromJsonTest, InACrontabWithoutRoomWhatAddsNoLineIsSaved) {
+  ASSERT_EQ(save(taskText()), 1);
+  ASSERT_EQ(save(taskText({{"state", "disabled"}}), 1), 2);
+  fillCrontab(kMostLines);
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"run hour", "5"}})), 1);
+  EXPECT_EQ(loadTask(1)->RunHour, 5U);
+  EXPECT_EQ(linesOfCrontab(), kMostLines);
+  EXPECT_EQ(save(taskText({{"state", "disabled"}}), 1), 3);
+  EXPECT_EQ(save(taskText({{"id", "2"}, {"state", "disabled"}, {"run hour", "7"}})), 2);
+  EXPECT_EQ(linesOfCrontab(), kMostLines);
+  expectTooLong(taskText({{"id", "2"}}), 0, "2");
+  EXPECT_EQ(save(taskText({{"id", "1"}, {"state", "disabled"}})), 1);
+  EXPECT_EQ(linesOfCrontab(), kMostLines - 1);
+  EXPECT_EQ(save(taskText({{"id", "2"}})), 2) << "the line of the other has become free";
+  EXPECT_EQ(linesOfCrontab(), kMostLines);
+}
+
+TEST_F(TaskFromJsonTest, BesideACrontabWithoutRoomAPowerTimeIsOverwritten) {
+  support::haveClock();
+  support::setPowerList(support::kOn, {{0, 127, 5, 7}});
+  constexpr long kId = 61270507;
+  std::string text = jsonOf(kId);
+  const std::string disabled = R"("state":"\"disabled\"\n")";
+  ASSERT_NE(text.find(disabled), std::string::npos) << text;
+  text.replace(text.find(disabled), disabled.size(), R"("state":"\"enabled\"\n")");
+  fillCrontab(kMostLines);
+  EXPECT_EQ(save(text), kId);
+  EXPECT_EQ(support::powerList(support::kOn), (support::Entries{{1, 127, 5, 7}}));
+  expectTooLong(text, 1, "61270507");
+  expectTooLong(text, 0, "61270507");  // whose id is another one by now
+}
+
+TEST_F(TaskFromJsonTest, BesideACrontabThatIsMissingATaskIsSaved) {
+  ASSERT_EQ(std::remove(support::kCrontab), 0);
+  EXPECT_EQ(save(taskText()), 1);
+}
+
+TEST_F(TaskFromJsonTest, WhatAProgramSavesHasItsLineWhateverTheLengthOfTheCrontab) {
+  fillCrontab(kMostLines);
+  EXPECT_EQ(saveTask(makeTask("of a program", "ls")), 1);
+  EXPECT_EQ(linesOfCrontab(), kMostLines + 1);
+}
+
 TEST_F(TaskFromJsonTest, AFailedAllocationOfTheTaskIsReportedWithTheRecord) {
   if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
   const std::string text = taskText();

@@ -159,7 +159,10 @@ ZELO_SCHED_API int ZELOSchedTaskLoad(long id, ZELO_SCHED_TASK *pTask);
  * ZELOSchedTaskEdit: the caller checks it. Debian's cron passes over the whole of
  * /etc/crontab, and starts nothing, for one enabled task with an hour above 23, a
  * minute above 59, a day other than 1 to 31 (once, monthly, yearly), a month other
- * than 1 to 12 (once, yearly) or no day of the week (weekly). */
+ * than 1 to 12 (once, yearly) or no day of the week (weekly). So it does with a
+ * crontab of more than 10000 lines, those of other programs and comments counted:
+ * each enabled task adds one here, and in ZELOSchedTaskEdit one that was disabled,
+ * however many there are. Who saves tasks for others counts the lines himself. */
 ZELO_SCHED_API int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask);
 
 /* Overwrites the stored task of the record's id; plugins hear of it before and
@@ -266,9 +269,11 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
  * byte, too deep a nesting, anything but blanks and comments after the end, a
  * number that does not fit its field, a command of more than 12287 bytes, a
  * schedule that cron cannot read (see ZELOSchedTaskCreate; also that of a task
- * that is not enabled), and a text of more than 4 MiB are failures, and then
- * nothing is saved. Bytes that are not UTF-8 are saved as they are; another text
- * that is longer than its field is cut to it.
+ * that is not enabled), an enabled task whose line would be one more than 9800 in
+ * /etc/crontab (of which cron ignores all when it has more than 10000), and a text
+ * of more than 4 MiB are failures, and then nothing is saved. Bytes that are not
+ * UTF-8 are saved as they are; another text that is longer than its field is cut
+ * to it.
  *
  * Whose task it is, the text alone decides. One whose "owner" is missing, "" or
  * " 0", "-0" or another way to write nothing, or comes again as 0, is root's, and
