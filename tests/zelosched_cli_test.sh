@@ -452,6 +452,53 @@ a_task_that_cron_cannot_read_can_be_changed() {
     gives 0 "the crontab is in step with the tasks" sync && same "$(task_lines)" 1
 }
 
+# Comments count like any other line. Of more than 10,000 lines cron reads none, and 200 are left to
+# other programs and to power times.
+fill_crontab() {
+  local lines=$1 present
+  present=$(wc -l </etc/crontab)
+  yes '#' | head -n $((lines - present)) >>/etc/crontab
+}
+
+readonly TOO_LONG="not saved: /etc/crontab would have more than 9800 lines, and cron ignores all of it when there are more than 10000: remove or disable tasks first"
+
+no_change_makes_the_crontab_too_long() {
+  local command bad=0
+  all_well
+  add --daily 09:30 --disabled -- true >/dev/null
+  z export 1 >"$SCRATCH/one"
+  z export 2 | sed 's/"disabled"/"enabled"/' >"$SCRATCH/enabled"
+  fill_crontab 9800
+  for command in 'add --daily 10:30 -- true' 'enable 2' "import --new $SCRATCH/one" "import $SCRATCH/enabled"; do
+    # shellcheck disable=SC2086
+    leaves_all_as_it_was z $command || { echo "changed by: $command"; bad=1; }
+    [[ $err == *"$TOO_LONG"* ]] || { echo "$command: $err"; bad=1; }
+  done
+  return "$bad"
+}
+
+# All of a file together: not some, until there is no more room.
+an_import_that_would_make_the_crontab_too_long_saves_nothing() {
+  all_well
+  add --daily 09:30 -- true >/dev/null
+  z export >"$SCRATCH/two"
+  fill_crontab 9799
+  leaves_all_as_it_was z import --new "$SCRATCH/two" && [[ $err == *"$TOO_LONG"* ]] &&
+    z import "$SCRATCH/two" >/dev/null && z disable 1 >/dev/null &&
+    z import --new "$SCRATCH/two" >/dev/null && same "$(task_lines) $(wc -l </etc/crontab)" "3 9800"
+}
+
+what_adds_no_line_is_saved_beside_a_full_crontab() {
+  all_well
+  add --daily 09:30 --disabled -- true >/dev/null
+  z export >"$SCRATCH/two"
+  fill_crontab 9900
+  z edit 1 --daily 10:30 >/dev/null && z edit 2 --daily 11:30 >/dev/null &&
+    add --daily 12:30 --disabled -- true >/dev/null && z import "$SCRATCH/two" >/dev/null &&
+    z power add off --daily 23:00 >/dev/null && z sync >/dev/null && z remove --yes 3 >/dev/null &&
+    z disable 1 >/dev/null && same "$(task_lines) $(wc -l </etc/crontab)" "0 9900"
+}
+
 arms_the_clock_beside_a_task_that_cron_cannot_read() {
   all_well
   z power add on --daily 07:00 >/dev/null
@@ -1000,6 +1047,7 @@ readonly -a DAMAGES=(
   '/etc/crontab lacks the line: 30 8 * * * root /tmp/zeloschedtask --run id=1' 'cp $SCRATCH/crontab /etc/crontab'
   '/etc/crontab has a line that belongs to no task: 1 1 * * * root /tmp/zeloschedtask --run id=7' 'printf "1\t1\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=7\n" >>/etc/crontab'
   '/etc/crontab cannot be read: No such file' 'rm /etc/crontab'
+  '/etc/crontab has 10001 lines, and cron ignores all of it when there are more than 10000' 'fill_crontab 10001'
   'task 1 (Task 1): the hour 25 is none of a day' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
   'cron may pass over all of /etc/crontab' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
   'task 1 (Task 1): there is no user 77777' 'sed -i "s/^owner=.*/owner=\"77777\"/" $STORE'
@@ -1417,6 +1465,9 @@ check "sync writes the crontab again" syncs
 check "but no line that cron cannot read" writes_no_line_that_cron_cannot_read
 check "nor does any change, which is refused" no_change_writes_a_line_that_cron_cannot_read
 check "but that of the task itself" a_task_that_cron_cannot_read_can_be_changed
+check "no change makes the crontab too long for cron" no_change_makes_the_crontab_too_long
+check "nor does an import, all of it together" an_import_that_would_make_the_crontab_too_long_saves_nothing
+check "beside a full crontab what adds no line is saved" what_adds_no_line_is_saved_beside_a_full_crontab
 check "beside such a task the clock is armed" arms_the_clock_beside_a_task_that_cron_cannot_read
 check "and when the tasks cannot be read" arms_the_clock_beside_tasks_that_are_not_there
 check "a damaged power list keeps no task out of the crontab" writes_the_tasks_beside_a_damaged_power_list

@@ -49,7 +49,8 @@ int runAdd(int argc, char **argv) {
 
 const Command kAddCommand = {
     "add", "[OPTION...] -- COMMAND...", "save a new task",
-    "Saves a new task, which runs COMMAND by a shell, and says its id.\n"
+    "Saves a new task, which runs COMMAND by a shell, and says its id. One is refused whose\n"
+    "line would make /etc/crontab longer than cron reads.\n"
     "\n" TASK_OPTIONS_HELP
     "\n"
     "Also:\n"

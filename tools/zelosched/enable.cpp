@@ -44,7 +44,8 @@ int runDisable(int argc, char **argv) {
 
 const Command kEnableCommand = {
     "enable", "ID...", "let tasks run at their times",
-    "Lets the tasks run at their times. One with a fault that would do harm is refused.\n",
+    "Lets the tasks run at their times. One with a fault that would do harm is refused, and\n"
+    "so is one whose line would make /etc/crontab longer than cron reads.\n",
     runEnable};
 
 const Command kDisableCommand = {

@@ -66,11 +66,22 @@ Task taskOf(const Json::Value &object) {
 }
 
 // As the library decides it when it saves from JSON: the stored task of the id, if it is the same.
+Task storedOf(const ZELO_SCHED_TASK &task) {
+  Task stored = findTask(task.ID);
+  const bool isSame = stored != nullptr && stored->Backend == task.Backend &&
+                      std::strcmp(stored->App, task.App) == 0 &&
+                      (isPower(task) || std::strcmp(stored->Name, task.Name) == 0);
+  return isSame ? std::move(stored) : nullptr;
+}
+
 bool isStored(const ZELO_SCHED_TASK &task) {
-  const Task stored = findTask(task.ID);
-  return stored != nullptr && stored->Backend == task.Backend &&
-         std::strcmp(stored->App, task.App) == 0 &&
-         (isPower(task) || std::strcmp(stored->Name, task.Name) == 0);
+  return storedOf(task) != nullptr;
+}
+
+bool addsLine(const ZELO_SCHED_TASK &task, bool isNew) {
+  if (!hasCronLine(task)) return false;
+  const Task stored = isNew ? nullptr : storedOf(task);
+  return stored == nullptr || !hasCronLine(*stored);
 }
 
 std::string orderOf(size_t index, size_t count) {
@@ -101,11 +112,15 @@ std::vector<Task> readTasks(const std::vector<Json::Value> &objects, bool areNew
   return tasks;
 }
 
-// Not some, until the first one that writes the crontab is refused.
-void requireSavable(const std::vector<Task> &tasks) {
+// Not some, until the first one that writes the crontab is refused. A line that another of them
+// takes away may still be there when one is added, so it is not counted.
+void requireSavable(const std::vector<Task> &tasks, bool areNew) {
   const bool hasLine =
       std::any_of(tasks.begin(), tasks.end(), [](const Task &task) { return !isPower(*task); });
   if (hasLine) requireReadableTasks();
+  const auto added = std::count_if(tasks.begin(), tasks.end(),
+                                   [&](const Task &task) { return addsLine(*task, areNew); });
+  requireCronRoom(static_cast<size_t>(added));
 }
 
 void save(ZELO_SCHED_TASK *task, bool isNew) {
@@ -126,7 +141,7 @@ int runImport(int argc, char **argv) {
   const std::vector<Json::Value> objects = parseObjects(readAll(arguments.operands().front()));
   const ChangeLock lock;
   const std::vector<Task> tasks = readTasks(objects, arguments.has("new"));
-  requireSavable(tasks);
+  requireSavable(tasks, arguments.has("new"));
   int status = kDone;
   if (tasks.empty()) std::puts("there is no task to import");
   for (size_t i = 0; i < tasks.size(); ++i) {
@@ -147,7 +162,8 @@ const Command kImportCommand = {
     "form that 'zelosched export' writes. A task overwrites the stored one of its id when\n"
     "that has the same name and application; every other becomes a new task.\n"
     "\n"
-    "When one of them cannot be saved, none is, and each of those is told.\n"
+    "When one of them cannot be saved, none is, and each of those is told. Nor is any when\n"
+    "all together would make /etc/crontab longer than cron reads.\n"
     "At most 16 MB and 10000 tasks are read at once.\n"
     "\n"
     "  --new                          overwrite nothing: all become new tasks\n",

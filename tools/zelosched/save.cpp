@@ -5,6 +5,7 @@
 #include "crontab_check.h"
 #include "failure.h"
 #include "power_room.h"
+#include "sched_cron_room.h"
 #include "task_check.h"
 #include "text.h"
 
@@ -25,6 +26,11 @@ bool isUnreadable(const ZELO_SCHED_TASK &task) {
 
 bool isStored(long id) {
   return findTask(id) != nullptr;
+}
+
+bool hasStoredCronLine(long id) {
+  const Task stored = findTask(id);
+  return stored != nullptr && hasCronLine(*stored);
 }
 
 // A power time is stored before the machine's clock is armed, and stays so when that fails.
@@ -66,12 +72,25 @@ void requireReadableTasks(std::optional<long> changedId) {
   throw Failure("nothing was saved, as cron may then pass over all of /etc/crontab: " + fault);
 }
 
+bool hasCronLine(const ZELO_SCHED_TASK &task) {
+  return isEnabled(task) && !isPower(task);
+}
+
+void requireCronRoom(size_t lines) {
+  if (schedHasCronRoom(lines)) return;
+  throw Failure("not saved: /etc/crontab would have more than " +
+                std::to_string(kSchedMostFilledCronLines) +
+                " lines, and cron ignores all of it when there are more than " +
+                std::to_string(kSchedMostCronLines) + ": remove or disable tasks first");
+}
+
 void createTask(ZELO_SCHED_TASK *task) {
   requireHarmless(*task);
   if (isPower(*task)) {
     PowerRoom().take(*task);
   } else {
     requireReadableTasks();
+    requireCronRoom(hasCronLine(*task) ? 1 : 0);
   }
   forgetError();
   if (ZELOSchedTaskCreate(task) < 0) {
@@ -86,6 +105,7 @@ void editTask(ZELO_SCHED_TASK *task) {
     requireUnlike(*task);
   } else {
     requireReadableTasks(task->ID);
+    if (hasCronLine(*task) && !hasStoredCronLine(task->ID)) requireCronRoom(1);
   }
   forgetError();
   if (ZELOSchedTaskEdit(task) < 0) {

@@ -5,6 +5,7 @@
 
 #include <zelosched.h>
 
+#include <cstddef>
 #include <optional>
 #include <string>
 
@@ -25,6 +26,12 @@ std::string unreadableTask(const TaskList &list);
 
 // There is no such task, or the one that is to be changed is one. Throws Failure.
 void requireReadableTasks(std::optional<long> changedId = std::nullopt);
+
+// A task's line, which is added where the stored task had none.
+bool hasCronLine(const ZELO_SCHED_TASK &task);
+
+// So many more lines leave the crontab short enough for cron. Throws Failure.
+void requireCronRoom(size_t lines);
 
 // The crontab is in step with the store, where no task is kept out of it. Throws Failure.
 void requireCrontabInStep();

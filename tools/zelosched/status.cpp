@@ -1,4 +1,5 @@
 // zelosched status
+#include <sched_cron_room.h>
 #include <sched_shared_names.h>
 #include <sched_store_lock.h>
 #include <sys/stat.h>
@@ -177,6 +178,14 @@ Findings crontabIsInStep(const TaskList &list) {
   return findings;
 }
 
+Findings crontabIsShortEnough() {
+  const size_t lines = schedCountCronLines();
+  if (lines <= kSchedMostCronLines) return {};
+  return {wrong("/etc/crontab has " + std::to_string(lines) +
+                " lines, and cron ignores all of it when there are more than " +
+                std::to_string(kSchedMostCronLines) + ": remove or disable tasks, or other lines")};
+}
+
 // One field that cron cannot read can stop every other task too.
 Findings tasksAreHarmless(const TaskList &list) {
   Findings findings;
@@ -257,8 +266,8 @@ int runStatus(int argc, char **argv) {
       if (!isSaid) all.push_back(wrong(failure.what()));
     }
   };
-  for (const auto check :
-       {cronRuns, programIsThere, namesAreOurs, changesHaveTheirTurn, copiesAgree}) {
+  for (const auto check : {cronRuns, programIsThere, namesAreOurs, changesHaveTheirTurn,
+                           copiesAgree, crontabIsShortEnough}) {
     add(check);
   }
   add([&] {
