@@ -320,6 +320,29 @@ TEST_F(SurroundingsTest, ARunLockOnAStandardDescriptorMakesRoom) {
   EXPECT_EQ(links.substr(0, links.find(' ', 1)), " /dev/null");
 }
 
+TEST_F(SurroundingsTest, ARunLockThatCannotMakeRoomRunsNothing) {
+  const long id = save(0, kListLinks);
+  const Task task = loadTask(id);
+  task->CanRunTaskSameTime = 0;
+  saveTask(task);
+  writeFile("/tmp/lock/lock_sched_run", "");
+  for (const char *call : {"fcntl", "fdopen"}) {
+    SCOPED_TRACE(call);
+    clearLog();
+    const std::string links = outputAfter(
+        [&] {
+          close(0);
+          pfLock = fopen("/tmp/lock/lock_sched_run", "r");
+          failCall(call, {.error = EMFILE});
+        },
+        id);
+    EXPECT_EQ(links, "");
+    EXPECT_EQ(logged(), Lines{"sched_leave_caller.cpp:N Failed to replace standard descriptors. "
+                              "Too many open files"});
+    resetFailingCalls();
+  }
+}
+
 TEST_F(SurroundingsTest, StandardDescriptorsThatCannotBeReplacedRunNothing) {
   const long id = save(0, kListEnvironment);
   failCallFor("open", "/dev/null", {.error = ENOENT});
@@ -347,6 +370,16 @@ TEST_F(SurroundingsTest, TheRunIsASessionOfItsOwn) {
   EXPECT_EQ(session, rows[0].pid);
   EXPECT_EQ(group, rows[0].pid);
   EXPECT_NE(session, getsid(0));
+}
+
+// As a platform's fork may have done.
+TEST_F(SurroundingsTest, ASessionThatHasBegunAlreadyIsTheRuns) {
+  const long id = save(0, kTo + "echo ran");
+  support::beforeEachCall([](const std::string &call) {
+    if (call == "setsid") syscall(SYS_setsid);
+  });
+  EXPECT_EQ(outputOf(id), "ran\n");
+  EXPECT_EQ(logged(), Lines{});
 }
 
 TEST_F(SurroundingsTest, WithoutASessionOfItsOwnNothingIsRun) {

@@ -4,9 +4,13 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <cerrno>
+#include <cstdlib>
 #include <cstring>
 #include <filesystem>
+#include <functional>
 #include <memory>
+#include <thread>
 
 #include "captured_log.h"
 #include "failing_calls.h"
@@ -413,6 +417,66 @@ TEST_F(WalModeTest, WithoutRoomForAnotherTheDatabaseIsNotOpened) {
   EXPECT_EQ(namesAside(), Lines{});
 }
 
+TEST_F(WalModeTest, ADatabaseToBeReadFromALogOnlyIsInWalModeToo) {
+  std::string header = readFile(kStatusDatabase);
+  constexpr size_t kWriteVersion = 18;
+  ASSERT_EQ(header.substr(kWriteVersion, 2), "\2\2");
+  header[kWriteVersion] = 1;
+  writeFile(kStatusDatabase, header, 0600);
+  EXPECT_EQ(applications(init()), "");
+  EXPECT_EQ(namesAside().size(), 1U);
+}
+
+TEST_F(WalModeTest, WithoutTheJournalThereAreNoTurnsAndItIsNotOpened) {
+  bool isDone = false;
+  beforeEachCall([&](const std::string &call) {
+    if (call != "sqlite3_open" || isDone) return;
+    isDone = true;
+    std::filesystem::remove(kJournal);
+  });
+  EXPECT_EQ(init(), nullptr);
+  support::resetFailingCalls();
+  EXPECT_TRUE(isDone);
+  EXPECT_EQ(namesAside(), Lines{});
+}
+
+TEST_F(WalModeTest, AnotherFailureMeanwhileMovesNothingAside) {
+  support::failCall("sqlite3_open", {.from = 2});
+  EXPECT_EQ(init(), nullptr);
+  EXPECT_EQ(namesAside(), Lines{});
+}
+
+// ---- a database that is not this process's
+
+TEST_F(PlantedJournalTest, WhoeverMayOnlyReadItMakesNoJournal) {
+  REQUIRE_OTHER_USERS();
+  makeGenuine();
+  std::filesystem::remove(kJournal);
+  chmod(kStatusDatabase, 0644);
+  ASSERT_EQ(seteuid(kNobody), 0);
+  const Database db = init();
+  const std::string found = db != nullptr ? applications(db) : "";
+  ASSERT_EQ(seteuid(0), 0);
+  EXPECT_EQ(found, "genuine");
+  EXPECT_FALSE(fileExists(kJournal));
+}
+
+TEST_F(PlantedJournalTest, OneThatBecomesOursWhenItCouldNotBeTakenIsNotOpened) {
+  makeGenuine();
+  chmod(kStatusDatabase, 0666);
+  support::failCall("renameat2", {.error = EIO});
+  bool couldNot = false;
+  beforeEachCall([&](const std::string &call) {
+    if (call == "lstat" && couldNot) chmod(kStatusDatabase, 0600);
+    couldNot = couldNot || call == "renameat2";
+  });
+  EXPECT_EQ(init(), nullptr);
+  support::resetFailingCalls();
+  EXPECT_EQ(support::logged(), Lines{"sched_task_db.cpp:N Can't open database: " +
+                                     std::string(kStatusDatabase) + " was another user's\n"});
+  EXPECT_EQ(applications(init()), "genuine");
+}
+
 // ---- other databases of the process
 
 std::vector<sqlite3_vfs *> allVfs() {
@@ -481,9 +545,153 @@ TEST_F(PlantedJournalTest, ADatabaseOpenedMeanwhileIsOpenedAsEver) {
   if (fork() == 0) {
     openOthersMeanwhile();
     fflush(stdout);
-    _exit(HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);
+    exit(HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);  // by which what was run here is counted
   }
   EXPECT_EQ(support::waitForChildRuns(), std::vector<int>{0});
+}
+
+TEST_F(PlantedJournalTest, AProcessWithThreadsOpensAndUsesItTheSame) {
+  const std::vector<sqlite3_vfs *> before = allVfs();
+  std::string found;
+  std::thread([&] {
+    const Database db = init();
+    EXPECT_EQ(add(db, "of a thread"), 0);
+    found = applications(db);
+  }).join();
+  EXPECT_EQ(found, "of a thread");
+  EXPECT_EQ(allVfs(), before);
+}
+
+// ---- what SQLite may ask for by a name
+
+int sizeOnDiskOf(const std::string &path) {
+  return static_cast<int>(std::filesystem::file_size(path));
+}
+
+class NamesTest : public PlantedJournalTest {
+ protected:
+  void SetUp() override {
+    PlantedJournalTest::SetUp();
+    db_ = init();
+    ASSERT_EQ(add(db_, "genuine"), 0);
+    vfs_ = vfsOf(db_);
+    ASSERT_NE(vfs_, nullptr);
+    writeFile(kVictim, "important");
+  }
+  void TearDown() override {
+    db_.reset();
+    PlantedJournalTest::TearDown();
+  }
+
+  bool isThere(const std::string &path) {
+    int answer = -1;
+    EXPECT_EQ(vfs_->xAccess(vfs_, path.c_str(), SQLITE_ACCESS_EXISTS, &answer), SQLITE_OK);
+    return answer != 0;
+  }
+  int remove(const std::string &path) { return vfs_->xDelete(vfs_, path.c_str(), 0); }
+  int open(const std::string &path, int flags) {
+    const std::unique_ptr<char[]> memory(new char[static_cast<size_t>(vfs_->szOsFile)]());
+    auto *file = reinterpret_cast<sqlite3_file *>(memory.get());
+    return vfs_->xOpen(vfs_, path.c_str(), file, flags, nullptr);
+  }
+
+  Database db_;
+  sqlite3_vfs *vfs_ = nullptr;
+};
+
+TEST_F(NamesTest, OnlyTheDatabaseAndItsJournalAreThere) {
+  writeFile(kLog, "a log");
+  EXPECT_TRUE(isThere(kStatusDatabase));
+  EXPECT_TRUE(isThere(kJournal));
+  EXPECT_FALSE(isThere(kLog));
+  EXPECT_FALSE(isThere(kVictim));
+}
+
+TEST_F(NamesTest, OnlyTheJournalIsDeletedAndThatByBeingEmptied) {
+  writeFile(kLog, "a log");
+  EXPECT_GT(sizeOnDiskOf(kJournal), 0);
+  EXPECT_EQ(remove(kJournal), SQLITE_OK);
+  EXPECT_EQ(sizeOnDiskOf(kJournal), 0);
+  EXPECT_EQ(remove(kStatusDatabase), SQLITE_IOERR_DELETE);
+  EXPECT_EQ(remove(kLog), SQLITE_IOERR_DELETE_NOENT);
+  EXPECT_EQ(remove(kVictim), SQLITE_IOERR_DELETE_NOENT);
+  EXPECT_EQ(readFile(kLog), "a log");
+  EXPECT_EQ(readFile(kVictim), "important");
+  std::filesystem::remove(kJournal);
+  EXPECT_EQ(remove(kJournal), SQLITE_IOERR_DELETE);
+  EXPECT_EQ(applications(db_), "genuine");
+}
+
+TEST_F(NamesTest, NeitherALogNorASuperJournalIsOpened) {
+  constexpr int kMake = SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
+  EXPECT_EQ(open(kLog, kMake | SQLITE_OPEN_WAL), SQLITE_CANTOPEN);
+  EXPECT_EQ(open(kVictim, kMake | SQLITE_OPEN_SUPER_JOURNAL), SQLITE_CANTOPEN);
+  EXPECT_EQ(open(std::string(kStatusDatabase) + "-mj01", kMake | SQLITE_OPEN_SUPER_JOURNAL),
+            SQLITE_CANTOPEN);
+  EXPECT_FALSE(fileExists(kLog));
+}
+
+// Temporary files have no name.
+TEST_F(NamesTest, WhatDoesNotFitIntoMemoryGoesIntoATemporaryFile) {
+  bool wasOpened = false;
+  beforeEachCall([&](const std::string &call) { wasOpened = wasOpened || call == "open64"; });
+  char *error = nullptr;
+  EXPECT_EQ(sqlite3_exec(db_.get(),
+                         "PRAGMA temp_store=FILE; CREATE TEMP TABLE many(text);"
+                         "PRAGMA temp.cache_size=1;"
+                         "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i+1 FROM n LIMIT 500) "
+                         "INSERT INTO many SELECT hex(zeroblob(2000)) FROM n",
+                         nullptr, nullptr, &error),
+            SQLITE_OK)
+      << error;
+  EXPECT_TRUE(wasOpened);
+  EXPECT_EQ(answer(db_.get(), "SELECT count(*), sum(length(text)) FROM many"), "500|2000000");
+}
+
+TEST_F(NamesTest, AJournalThatCannotBeEmptiedFailsTheTransaction) {
+  EXPECT_EQ(answer(db_.get(), "PRAGMA synchronous=EXTRA; PRAGMA journal_mode=DELETE"), "delete");
+  const std::function<void()> failures[] = {
+      [] { support::failCallFor("open", "-journal", {.error = EMFILE}); },
+      [] { support::failCall("ftruncate", {.error = EIO}); },
+  };
+  for (const auto &fail : failures) {
+    fail();
+    EXPECT_EQ(add(db_, "lost"), -1);
+    support::resetFailingCalls();
+    EXPECT_EQ(applications(db_), "genuine");
+  }
+  EXPECT_EQ(add(db_, "next"), 0);
+  EXPECT_EQ(applications(db_), "genuine next");
+}
+
+// It is empty then, so nothing can be taken back; whether a power cut keeps it so is not known.
+TEST_F(NamesTest, AnEmptiedJournalThatMayNotHaveReachedTheDiskIsToldAsAFailure) {
+  EXPECT_EQ(answer(db_.get(), "PRAGMA synchronous=EXTRA; PRAGMA journal_mode=DELETE"), "delete");
+  support::failCall("fsync", {.error = EIO});
+  EXPECT_EQ(add(db_, "next"), -1);
+  EXPECT_EQ(support::callCount("fsync"), 1U);
+}
+
+TEST_F(NamesTest, TheRestIsSqlitesOwn) {
+  sqlite3_vfs *const real = sqlite3_vfs_find(nullptr);
+  ASSERT_NE(real, vfs_);
+  EXPECT_STREQ(vfs_->zName, real->zName);
+  EXPECT_EQ(vfs_->xGetSystemCall(vfs_, "open"), real->xGetSystemCall(real, "open"));
+  EXPECT_STREQ(vfs_->xNextSystemCall(vfs_, "open"), real->xNextSystemCall(real, "open"));
+  EXPECT_EQ(vfs_->xSetSystemCall(vfs_, "no such call", nullptr), SQLITE_NOTFOUND);
+  EXPECT_EQ(vfs_->xDlOpen(vfs_, "/nonexistent/library"), nullptr);
+  char text[64] = "";
+  vfs_->xDlError(vfs_, sizeof(text), text);
+  EXPECT_NE(text[0], '\0');
+  EXPECT_EQ(vfs_->xRandomness(vfs_, sizeof(text), text), static_cast<int>(sizeof(text)));
+  EXPECT_GE(vfs_->xSleep(vfs_, 1), 0);
+  double days = 0;
+  sqlite3_int64 milliseconds = 0;
+  EXPECT_EQ(vfs_->xCurrentTime(vfs_, &days), SQLITE_OK);
+  EXPECT_EQ(vfs_->xCurrentTimeInt64(vfs_, &milliseconds), SQLITE_OK);
+  constexpr double kMillisecondsPerDay = 86400000;
+  EXPECT_NEAR(days, static_cast<double>(milliseconds) / kMillisecondsPerDay, 1);
+  vfs_->xGetLastError(vfs_, sizeof(text), text);
 }
 
 // A process that closes any descriptor of a file has lost its locks on it.

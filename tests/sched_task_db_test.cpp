@@ -541,6 +541,16 @@ TEST_F(RunningTest, ALiveRunOfAnyTaskOfTheApplicationIsFound) {
   EXPECT_EQ(status_.taskID, 1234);
 }
 
+TEST_F(RunningTest, ARunOfNoTaskIsFoundWithTheNumberZero) {
+  addStatusRow({.pid = getpid(), .app = "app", .taskId = 8, .statusCode = kRunning});
+  EXPECT_EQ(sqlite3_exec(db(), "UPDATE task_status SET task_id=NULL", nullptr, nullptr, nullptr),
+            SQLITE_OK);
+  status_.taskID = 8;
+  EXPECT_EQ(ZELOSchedDBIsAppRunning(db(), "app", &status_), 0);
+  EXPECT_EQ(status_.found, 1);
+  EXPECT_EQ(status_.taskID, 0);
+}
+
 TEST_F(RunningTest, OtherTasksAndApplicationsDoNotCount) {
   addStatusRow({.pid = getpid(), .app = "App", .taskId = 8, .statusCode = kRunning});
   expectFound(0);

@@ -95,6 +95,7 @@ namespace {
   X(unlink, '~')                   \
   X(chdir, '~')                    \
   X(fstatat, '~')                  \
+  X(statx, '~')                    \
   X(mkostemp, '~')                 \
   X(futimens, '~')                 \
   X(fdopendir, '~')                \
@@ -102,6 +103,7 @@ namespace {
   X(close, '~')                    \
   X(open64, '~')                   \
   X(pread64, '~')                  \
+  X(pwrite, '~')                   \
   X(pwrite64, '~')                 \
   X(fdatasync, '~')                \
   X(fcntl64, '~')                  \
@@ -290,11 +292,12 @@ bool canFail(Call call) {
 // No room and no right to write is found by what writes.
 bool canFailWith(Call call, int error) {
   constexpr Call kWriting[] = {
-      Call::k_open,     Call::k_open64,    Call::k_fopen,   Call::k_fdopen,    Call::k_mkstemp,
-      Call::k_mkostemp, Call::k_mkdir,     Call::k_mkdtemp, Call::k_renameat2, Call::k_write,
-      Call::k_fwrite,   Call::k_pwrite64,  Call::k_fflush,  Call::k_fclose,    Call::k_close,
-      Call::k_fsync,    Call::k_fdatasync, Call::k_rename,  Call::k_unlink,    Call::k_ftruncate,
-      Call::k_fchown,   Call::k_fchmod,    Call::k_chmod,   Call::k_futimens,  Call::k_QLIBCExec};
+      Call::k_open,      Call::k_open64, Call::k_fopen,     Call::k_fdopen,    Call::k_mkstemp,
+      Call::k_mkostemp,  Call::k_mkdir,  Call::k_mkdtemp,   Call::k_renameat2, Call::k_write,
+      Call::k_fwrite,    Call::k_pwrite, Call::k_pwrite64,  Call::k_fflush,    Call::k_fclose,
+      Call::k_close,     Call::k_fsync,  Call::k_fdatasync, Call::k_rename,    Call::k_unlink,
+      Call::k_ftruncate, Call::k_fchown, Call::k_fchmod,    Call::k_chmod,     Call::k_futimens,
+      Call::k_QLIBCExec};
   const bool isOfWriters = error == ENOSPC || error == EDQUOT || error == EROFS;
   return canFail(call) && (!isOfWriters || std::find(std::begin(kWriting), std::end(kWriting),
                                                      call) != std::end(kWriting));
@@ -822,6 +825,10 @@ ssize_t write(int descriptor, const void *buffer, size_t size) {
   FAIL_OR_CALL(write, nullptr, ssize_t{-1}, descriptor, buffer, size);
 }
 
+ssize_t pwrite(int descriptor, const void *buffer, size_t size, off_t at) {
+  FAIL_OR_CALL(pwrite, nullptr, ssize_t{-1}, descriptor, buffer, size, at);
+}
+
 int mkstemp(char *pattern) {
   FAIL_OR_CALL(mkstemp, pattern, -1, pattern);
 }
@@ -890,6 +897,11 @@ int chdir(const char *path) noexcept {
 
 int fstatat(int directory, const char *path, struct stat *status, int flags) noexcept {
   FAIL_OR_CALL(fstatat, path, -1, directory, path, status, flags);
+}
+
+int statx(int directory, const char *path, int flags, unsigned mask,
+          struct statx *status) noexcept {
+  FAIL_OR_CALL(statx, path, -1, directory, path, flags, mask, status);
 }
 
 int mkostemp(char *pattern, int flags) {

@@ -19,7 +19,7 @@
 //   section name       QLIBCFile{Get,Set,Add,Remove}Section                equal
 //   path or text       QLIBCFileExist, QLIBCFileTouch, QLIBCFileEnumSection, QLIBCExec (program and
 //                      arguments), QLIBCStrSep, open, fopen, rename (both paths), mkstemp, mkdir,
-//                      mkostemp, chmod, access, unlink, chdir, fstatat, stat, lstat, system,
+//                      mkostemp, chmod, access, unlink, chdir, fstatat, statx, stat, lstat, system,
 //                      posix_spawn, open64, putenv, kill (pid), sqlite3_open, sqlite3_exec (SQL),
 //                      fdopen (mode), initgroups (name)                                   contained
 //
@@ -29,8 +29,8 @@
 // write fwrite (and all other writing to a stream) flock setreuid setresuid setregid setresgid
 // setgroups localtime localtime_r mktime malloc calloc realloc sleep usleep nanosleep rand srand
 // setsid keyctl capget capset (these three by syscall) close_range fork getpwuid_r futimens
-// fdopendir dup dup2 fcntl (for F_DUPFD_CLOEXEC and F_SETFD) pipe2 readdir close pread64 pwrite64
-// fdatasync fcntl64 sysconf clearenv pidfd_open poll waitid waitpid sqlite3_close.
+// fdopendir dup dup2 fcntl (for F_DUPFD_CLOEXEC and F_SETFD) pipe2 readdir close pread64 pwrite
+// pwrite64 fdatasync fcntl64 sysconf clearenv pidfd_open poll waitid waitpid sqlite3_close.
 //
 // Streams and descriptors 0 to 2 are never touched. close, fclose, waitid, waitpid (somebody else
 // took the status), sqlite3_close and QLIBPluginExit that are made to fail have done their work all

@@ -3,8 +3,7 @@
 //
 //   take-names            takes those that are free or another user's
 //   take-names --anew     for a first installation: nothing that stands there can be ours, but a
-//   store
-//                         that is as the persistent copy says
+//                         store that is as the persistent copy says
 //   take-names --stand-in puts the stand-in in the place of the program that crontab lines start
 //
 // Exits with 1 when one could not be had.

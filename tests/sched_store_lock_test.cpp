@@ -1,0 +1,151 @@
+// The turns at changes, where the lock file does not do what it should, and who is told to hold it.
+// (backend_zeloschedule_store_test has what a change makes of it, change_turns_test many at once.)
+#include "sched_store_lock.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+#include "captured_log.h"
+#include "failing_calls.h"
+#include "sandbox_fixture.h"
+
+namespace {
+
+using support::callCount;
+using support::ErrorRecord;
+using support::errorRecord;
+using support::failCall;
+using support::failCallFor;
+using support::fileExists;
+using support::kAlways;
+using support::logged;
+using support::readFile;
+using support::recordedSleeps;
+using support::writeFile;
+using Lines = std::vector<std::string>;
+
+constexpr char kLock[] = "/run/zeloscheduler.lock";
+
+class StoreLockTest : public support::SandboxTest {
+ protected:
+  void SetUp() override {
+    SandboxTest::SetUp();
+    std::filesystem::remove_all(kLock);
+  }
+  void TearDown() override {
+    support::resetFailingCalls();
+    std::filesystem::remove_all(kLock);
+    SandboxTest::TearDown();
+  }
+
+  static void removeItBeforeTheFirst(const std::string &wanted) {
+    support::beforeEachCall([wanted, isDone = false](const std::string &call) mutable {
+      if (isDone || call != wanted) return;
+      isDone = true;
+      std::filesystem::remove(kLock);
+    });
+  }
+  static void expectNotHeld(const std::string &why) {
+    const StoreLock lock;
+    EXPECT_FALSE(lock.isHeld());
+    EXPECT_EQ(errorRecord(), (ErrorRecord{0x0400, "sched_store_lock.cpp"}));
+    EXPECT_EQ(logged(),
+              Lines{"sched_store_lock.cpp:N Lock [" + std::string(kLock) + "] failed. " + why});
+    EXPECT_EQ(schedStoreLockHolder(), 0);
+  }
+};
+
+TEST_F(StoreLockTest, WhoeverHoldsItIsToldUntilHeGivesItUp) {
+  EXPECT_EQ(schedStoreLockHolder(), 0);
+  EXPECT_FALSE(fileExists(kLock));
+  {
+    const StoreLock lock;
+    EXPECT_TRUE(lock.isHeld());
+    EXPECT_EQ(schedStoreLockHolder(), getpid());
+    struct stat info = {};
+    ASSERT_EQ(stat(kLock, &info), 0);
+    EXPECT_EQ(info.st_mode & 0777U, 0600U);
+  }
+  EXPECT_EQ(schedStoreLockHolder(), 0);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(StoreLockTest, AHolderWhoCouldNotSaySoHoldsItAllTheSame) {
+  failCall("pwrite", {.error = ENOSPC});
+  const StoreLock lock;
+  EXPECT_TRUE(lock.isHeld());
+  EXPECT_EQ(callCount("pwrite"), 1U);
+  EXPECT_EQ(readFile(kLock), "");
+  EXPECT_EQ(schedStoreLockHolder(), 0);
+  EXPECT_EQ(logged(), Lines{});
+}
+
+TEST_F(StoreLockTest, WhatIsNoLockFileIsHeldByNobody) {
+  std::filesystem::create_symlink("/etc/passwd", kLock);
+  EXPECT_EQ(schedStoreLockHolder(), 0);
+  expectNotHeld("Too many levels of symbolic links");
+}
+
+TEST_F(StoreLockTest, ALockThatCannotBeTakenIsNotHeld) {
+  failCall("flock", {.error = ENOLCK});
+  expectNotHeld("No locks available");
+  EXPECT_EQ(recordedSleeps(), std::vector<long>{});
+}
+
+TEST_F(StoreLockTest, ALockFileThatCannotBeOpenedIsNotHeld) {
+  failCallFor("open", kLock, {.error = EMFILE});
+  expectNotHeld("Too many open files");
+  EXPECT_EQ(callCount("flock"), 0U);
+}
+
+TEST_F(StoreLockTest, AFileThatWasRemovedAndCannotBeOpenedAgainIsNotHeld) {
+  failCallFor("open", kLock, {.from = 2, .error = ENFILE});
+  removeItBeforeTheFirst("flock");
+  expectNotHeld("Too many open files in system");
+}
+
+TEST_F(StoreLockTest, AFileThatWasRemovedIsMadeAndLockedAnew) {
+  removeItBeforeTheFirst("flock");
+  const StoreLock lock;
+  EXPECT_TRUE(lock.isHeld());
+  EXPECT_EQ(recordedSleeps(), std::vector<long>{5000});
+  EXPECT_EQ(schedStoreLockHolder(), getpid());
+}
+
+TEST_F(StoreLockTest, AFileThatCannotBeExaminedIsLockedAnew) {
+  for (const unsigned from : {1U, 2U}) {
+    support::resetFailingCalls();
+    failCall("statx", {.from = from, .error = EIO});
+    const StoreLock lock;
+    EXPECT_TRUE(lock.isHeld());
+    EXPECT_EQ(callCount("flock"), 2U);
+  }
+}
+
+TEST_F(StoreLockTest, ASignalDoesNotEndTheWait) {
+  failCall("flock", {.times = 2, .error = EINTR});
+  const StoreLock lock;
+  EXPECT_TRUE(lock.isHeld());
+  EXPECT_EQ(recordedSleeps(), (std::vector<long>{5000, 5000}));
+}
+
+TEST_F(StoreLockTest, AfterThirtySecondsTheHolderIsToldAndNothingIsHeld) {
+  const StoreLock first;
+  ASSERT_TRUE(first.isHeld());
+  const StoreLock second;
+  EXPECT_FALSE(second.isHeld());
+  EXPECT_EQ(recordedSleeps(), std::vector<long>(6000, 5000));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0400, "sched_store_lock.cpp"}));
+  EXPECT_EQ(logged(), Lines{"sched_store_lock.cpp:N Lock [" + std::string(kLock) +
+                            "] failed. Process " + std::to_string(getpid()) + " holds it."});
+}
+
+}  // namespace
