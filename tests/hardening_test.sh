@@ -81,7 +81,7 @@ if [[ $(setting ZELO_HARDEN) != ON || -n $(setting ZELO_SANITIZE) ]]; then
   finish
 fi
 
-readonly LIBRARIES=("$BUILD_DIR"/lib/lib*.so)
+readonly LIBRARIES=("$BUILD_DIR"/lib/lib{zelocore,zeloscheduler,zelosdk}.so)
 readonly TOOLS=("$BUILD_DIR"/bin/zelosched*)
 readonly SOURCES=(libzeloscheduler platform tools)
 # These cannot show it, as nothing in them needs it: no function with an array, no call that writes
