@@ -220,7 +220,7 @@ TEST_F(StoreTest, AStoreThatOnlyHoldsItsNameIsCopiedOnce) {
   writeFile(kStore, "");
   EXPECT_EQ(create("first"), 1);
   EXPECT_EQ(recordedExecs().size(), 3U);
-  EXPECT_EQ(support::recordedSleeps(), std::vector<long>{});
+  EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>{});
 }
 
 TEST_F(StoreTest, WithoutAStoreCreateMakesOneWithOneSection) {
@@ -990,20 +990,6 @@ TEST_F(StoreTest, ASyncThatCannotListFailsTheChangeThoughItIsStored) {
   EXPECT_EQ(listedIds(), Ids{2});
 }
 
-TEST_F(StoreTest, AScratchCopyThatComesOutEmptyIsMadeAgain) {
-  writeFile(kStore, "");
-  const Task task = makeTask("task", "true");
-  resetFailingCalls();
-  EXPECT_EQ(backend_.edit(task.get()), 0);
-  constexpr size_t kTries = 20;
-  constexpr long kPause = 5000;
-  Lines wanted(kTries, copyCommand(kStore, scratchPath()));
-  wanted.push_back(copyCommand(scratchPath(), kPersistentStore));
-  wanted.push_back(copyCommand(scratchPath(), kStore));
-  EXPECT_EQ(recordedExecs(), wanted);
-  EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>(kTries, kPause));
-}
-
 TEST_F(StoreTest, AScratchCopyOfAnotherSizeIsMadeAgain) {
   create("task");
   const std::string whole = readFile(kStore);
@@ -1027,25 +1013,6 @@ TEST_F(StoreTest, AScratchCopyOfAnotherSizeIsMadeAgain) {
 }
 
 // Not even where no other copy could tell that it is not: somebody else may be filling it.
-TEST_F(StoreTest, AnOnlyCopyThatIsFilledMeanwhileIsNotTakenForEmpty) {
-  create("task");
-  const std::string whole = readFile(kStore);
-  for (const bool isEmpty : {false, true}) {
-    if (isEmpty) {
-      writeFile(kPersistentStore, "");
-    } else {
-      std::filesystem::remove(kPersistentStore);
-    }
-    writeFile(kStore, "");
-    resetFailingCalls();
-    onSleep([&](size_t) { writeFile(kStore, whole); });
-    const Task other = makeTask("other", "true");
-    other->ID = 2;
-    EXPECT_EQ(backend_.edit(other.get()), 0);
-    EXPECT_EQ(listedIds(), (Ids{2, 1}));
-  }
-}
-
 TEST_F(StoreTest, AStoreThatIsFilledMeanwhileIsNotTakenForEmpty) {
   create("task");
   const std::string whole = readFile(kStore);
