@@ -3,7 +3,6 @@
 
 #include <fcntl.h>
 #include <linux/capability.h>
-#include <linux/ioprio.h>
 #include <linux/keyctl.h>
 #include <linux/securebits.h>
 #include <sched.h>
@@ -180,7 +179,10 @@ void resetScheduling() {
   const sched_param none = {};
   sched_setscheduler(0, SCHED_OTHER, &none);
   setpriority(PRIO_PROCESS, 0, 0);
-  syscall(SYS_ioprio_set, IOPRIO_WHO_PROCESS, 0, IOPRIO_PRIO_VALUE(IOPRIO_CLASS_NONE, 0));
+  // The kernel's header of these does not compile as C++ everywhere.
+  constexpr int kWhoProcess = 1;
+  constexpr int kDiskPriorityOfNice = 0;
+  syscall(SYS_ioprio_set, kWhoProcess, 0, kDiskPriorityOfNice);
   resetOutOfMemoryScore();
 }
 

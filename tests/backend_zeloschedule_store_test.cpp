@@ -194,7 +194,6 @@ TEST_F(StoreTest, WithoutAStoreThereIsNothingToListFindOrRemove) {
 
 // While the name is free, another user can move a file there that is root's.
 TEST_F(StoreTest, AFreeNameIsTakenByWhoeverReadsIt) {
-  writeFile(kPersistentStore, "tasks of before the boot\n");
   const Task task = makeTask("task", "true");
   const std::function<void()> readers[] = {
       [&] { EXPECT_EQ(listedIds(), Ids{}); },
@@ -213,6 +212,19 @@ TEST_F(StoreTest, AFreeNameIsTakenByWhoeverReadsIt) {
   EXPECT_EQ(recordedExecs().size(), 3U);
   EXPECT_EQ(listedIds(), Ids{1});
   EXPECT_EQ(logged(), Lines{});
+}
+
+// Whoever would build on it would write over the tasks that are kept.
+TEST_F(StoreTest, AFreeNameIsNoStoreWithoutTasksAfterItsFirstReadWhileTasksAreKept) {
+  create("kept");
+  const std::string kept = readFile(kPersistentStore);
+  std::filesystem::remove(kStore);
+  EXPECT_EQ(listedIds(), Ids{});
+  EXPECT_EQ(readFile(kStore), "");
+  EXPECT_EQ(backend_.create(makeTask("new", "true").get()), -1);
+  EXPECT_EQ(errorRecord().code, 0x0B00);
+  EXPECT_EQ(readFile(kPersistentStore), kept);
+  EXPECT_EQ(readFile(support::kLastGoodStore), kept);
 }
 
 // As tmpfiles.d makes it at boot.

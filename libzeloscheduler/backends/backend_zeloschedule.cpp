@@ -74,11 +74,17 @@ bool isCutToNothing(const char *szStore) {
   return sizeOf(szStore) == 0 && sizeOf(kPersistentCopy) > 0;
 }
 
+// As long as tasks that are kept for the next boot are not put back, the store is one that is cut
+// off.
+const SchedSharedName &storeToMake() {
+  return sizeOf(kPersistentCopy) > 0 ? kSchedStoreToRestore : kSchedStore;
+}
+
 // A process that only reads takes the name all the same: while it is free, another user can move a
 // file of root's there.
 void takeFreeStore() {
   if (geteuid() == 0) {
-    schedTakeName(kSchedStore);
+    schedTakeName(storeToMake());
   }
 }
 
@@ -645,8 +651,7 @@ SchedNameState openStore() {
   if (state != SchedNameState::kForeign || geteuid() != 0) {
     return state;
   }
-  const bool isKept = sizeOf(kPersistentCopy) > 0;
-  return schedTakeName(isKept ? kSchedStoreToRestore : kSchedStore) ? SchedNameState::kOurs : state;
+  return schedTakeName(storeToMake()) ? SchedNameState::kOurs : state;
 }
 
 // The one way in which the store changes: one section written, or deleted when pTask is null. 1

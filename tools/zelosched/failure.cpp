@@ -18,7 +18,7 @@ struct Reason {
 constexpr Reason kReasons[] = {
     {0x0100, "out of memory"},
     {0x0200, "out of memory"},
-    {0x0400, "the run lock could not be taken"},
+    {0x0400, "another process holds the lock of runs or of changes; the system log names it"},
     {0x0500, "the run lock could not be released"},
     {0x0900, "a file or the database could not be opened, or is not root's alone"},
     {0x0B00, "reading or writing failed, or a file is cut off"},

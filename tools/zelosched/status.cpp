@@ -134,16 +134,26 @@ bool isWhole(const char *path, int *sections) {
   return *sections >= 0;
 }
 
+constexpr char kPutTasksBack[] = ": 'zelosched restore' puts the tasks back";
+
 Findings copiesAgree() {
   int working = 0;
   const bool isNothing = !exists(kWorkingCopy) || (isWhole(kWorkingCopy, &working) && working == 0);
   if (isNothing && !exists(kPersistentCopy)) return {well("no task was ever saved")};
   for (const char *path : {kWorkingCopy, kPersistentCopy}) {
     int sections = 0;
-    if (!exists(path)) return {wrong(std::string(path) + " is missing")};
+    if (!exists(path)) {
+      return {
+          wrong(std::string(path) + " is missing" +
+                (path == kWorkingCopy ? kPutTasksBack : ": save a task, which writes it anew"))};
+    }
     if (!isWhole(path, &sections)) {
       return {wrong(std::string(path) + " cannot be read: " + errorInWords())};
     }
+  }
+  if (contents(kWorkingCopy).empty()) {
+    return {
+        wrong(std::string(kWorkingCopy) + " has no tasks, though some are kept" + kPutTasksBack)};
   }
   if (contents(kWorkingCopy) == contents(kPersistentCopy)) {
     return {well("the working and the persistent copy of the tasks agree")};
