@@ -76,15 +76,13 @@ std::map<pid_t, ProcessStat> children() {
 // cannot have root's saved user id, which a run's process keeps as its way back.
 bool isOfRoot(pid_t pid) {
   std::ifstream status("/proc/" + std::to_string(pid) + "/status");
-  for (std::string line; std::getline(status, line);) {
-    long real = -1;
-    long effective = -1;
-    long saved = -1;
-    if (std::sscanf(line.c_str(), "Uid:\t%ld\t%ld\t%ld", &real, &effective, &saved) == 3) {
-      return saved == 0;
-    }
+  std::string word;
+  while (status >> word && word != "Uid:") {
   }
-  return false;
+  long real = -1;
+  long effective = -1;
+  long saved = -1;
+  return status >> real >> effective >> saved && saved == 0;
 }
 
 // The run's own process is older than whatever its command has left to us by now.
