@@ -422,8 +422,8 @@ is_for_root() {
 }
 
 refuses_others() {
-  cp "$BUILD_DIR/bin/zelosched" /run/zelosched
-  try setpriv --reuid "$NOBODY" --clear-groups env LD_LIBRARY_PATH="$BUILD_DIR/lib" /run/zelosched "$@"
+  copy_for_others
+  try setpriv --reuid "$NOBODY" --clear-groups "$FOR_OTHERS" "$@"
   says 1 ""
 }
 

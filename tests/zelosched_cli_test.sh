@@ -1237,14 +1237,8 @@ options_stand_behind_ids_always() {
 other_users_see_but_do_not_change() {
   all_well
   z run --wait 1 >/dev/null
-  local nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups "$ZELOSCHED")
-  if ! setpriv --reuid 65534 --regid 65534 --clear-groups test -x "$ZELOSCHED"; then
-    echo "the build directory is closed to other users"
-    install -m 0755 "$ZELOSCHED" "$SCRATCH/zelosched"
-    nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups env "LD_LIBRARY_PATH=$SCRATCH/lib" "$SCRATCH/zelosched")
-    mkdir -p "$SCRATCH/lib" && cp "$BUILD_DIR"/lib/*.so* "$SCRATCH/lib"
-  fi
-  chmod 0755 "$SCRATCH"
+  copy_for_others
+  local nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups "$FOR_OTHERS")
   same "$("${nobody[@]}" list | tail -1 | awk '{ print $1, $7 }')" "1 ?" &&
     fails_saying 1 "changing tasks takes root's rights" "${nobody[@]}" add --daily 08:30 -- true &&
     rm -rf /tmp/sched_status.sqlite* /tmp/lock &&
