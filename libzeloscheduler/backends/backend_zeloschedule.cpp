@@ -68,23 +68,30 @@ off_t sizeOf(const char *szPath) {
   return stat(szPath, &info) == 0 ? info.st_size : 0;
 }
 
-// A store without bytes beside a persistent copy that has some was cut off by a copy that was
-// killed. Nobody must build on that, nor take it for a store without tasks.
+// A store without bytes was cut off by a copy that was killed when tasks are kept. Nobody must
+// build on that, nor take it for a store without tasks.
 bool isCutToNothing(const char *szStore) {
-  return sizeOf(szStore) == 0 && sizeOf(kPersistentCopy) > 0;
+  return sizeOf(szStore) == 0 && schedAreTasksKept();
 }
 
-// As long as tasks that are kept for the next boot are not put back, the store is one that is cut
-// off.
-const SchedSharedName &storeToMake() {
-  return sizeOf(kPersistentCopy) > 0 ? kSchedStoreToRestore : kSchedStore;
+// What there is to be read or built on. A process of root's moves away what another user has put
+// there. The tasks that are kept for the next boot must then be put back before any is changed,
+// since the persistent copy is written as a whole: the store is made as one that is cut off.
+SchedNameState lookAtStore() {
+  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
+  if (state != SchedNameState::kForeign || geteuid() != 0) {
+    return state;
+  }
+  return schedTakeName(schedAreTasksKept() ? kSchedStoreToRestore : kSchedStore)
+             ? SchedNameState::kOurs
+             : state;
 }
 
 // A process that only reads takes the name all the same: while it is free, another user can move a
-// file of root's there.
+// file of root's there. There are no tasks then, before and after.
 void takeFreeStore() {
   if (geteuid() == 0) {
-    schedTakeName(storeToMake());
+    schedTakeName(kSchedStore);
   }
 }
 
@@ -145,7 +152,7 @@ class StoreWalk {
  public:
   // The number of sections, 0 without a store; -1 when they cannot be listed or memory is short.
   int open() {
-    state_ = schedLookAt(kSchedStore, nullptr);
+    state_ = lookAtStore();
     if (state_ == SchedNameState::kFree) {
       return 0;
     }
@@ -262,7 +269,7 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
   }
   pTask->State = ZELO_SCHED_STATE_NOT_EXISTED;
   pTask->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
-  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
+  const SchedNameState state = lookAtStore();
   if (state == SchedNameState::kFree) {
     takeFreeStore();
     return kNotFound;
@@ -517,7 +524,7 @@ int copyWorkingCopy(const ScratchFile &scratch) {
       return -1;
     }
     const off_t size = sizeOf(scratch.path());
-    const bool mayBeEmpty = sizeOf(kPersistentCopy) == 0;  // where only the name is taken
+    const bool mayBeEmpty = !schedAreTasksKept();  // where only the name is taken
     if (size == sizeOf(kWorkingCopy) && (size > 0 || mayBeEmpty)) {
       return 0;
     }
@@ -622,6 +629,21 @@ int copyToPersistent(const ScratchFile &scratch) {
   return 0;
 }
 
+// A file's length and when it was written, by which one that was written again is told.
+class FileState {
+ public:
+  explicit FileState(const char *szPath) { stat(szPath, &info_); }
+  bool isThatOf(const char *szPath) const {
+    struct stat now = {};
+    return stat(szPath, &now) == 0 && now.st_size == info_.st_size &&
+           now.st_mtim.tv_sec == info_.st_mtim.tv_sec &&
+           now.st_mtim.tv_nsec == info_.st_mtim.tv_nsec;
+  }
+
+ private:
+  struct stat info_ = {};
+};
+
 // The persistent copy goes first: a failure in between leaves the working copy, which every read
 // uses, as it was.
 int publish(const ScratchFile &scratch) {
@@ -632,10 +654,10 @@ int publish(const ScratchFile &scratch) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(scratch.path(), kWorkingCopy);
   }
-  const off_t before = sizeOf(kWorkingCopy);
+  const FileState before(kWorkingCopy);
   if (copyFile(scratch.path(), kWorkingCopy) < 0) {
     // It was emptied, and there was no room to fill it again. The scratch file takes none.
-    if (sizeOf(kWorkingCopy) != before) {
+    if (!before.isThatOf(kWorkingCopy)) {
       rename(scratch.path(), kWorkingCopy);
     }
     return -1;
@@ -643,23 +665,12 @@ int publish(const ScratchFile &scratch) {
   return 1;
 }
 
-// Whether there is a store to build on. For root, what another user has put in its place is moved
-// away. The tasks that are kept for the next boot must then be put back before any is changed,
-// since the persistent copy is written as a whole: the store is made as one that is cut off.
-SchedNameState openStore() {
-  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
-  if (state != SchedNameState::kForeign || geteuid() != 0) {
-    return state;
-  }
-  return schedTakeName(storeToMake()) ? SchedNameState::kOurs : state;
-}
-
 // The one way in which the store changes: one section written, or deleted when pTask is null. 1
 // when the store changed, 0 when there was nothing to delete, -1 on failure.
 int write_store(long id, const ZELO_SCHED_TASK *pTask) {
   const ScratchFile scratch;
   const SectionName section(id);
-  const SchedNameState state = openStore();
+  const SchedNameState state = lookAtStore();
   if (state == SchedNameState::kForeign) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(kWorkingCopy, scratch.path());

@@ -166,7 +166,8 @@ Findings copiesAgree() {
   }
   int working = 0;
   const bool isNothing = !exists(kWorkingCopy) || (isWhole(kWorkingCopy, &working) && working == 0);
-  if (isNothing && !exists(kPersistentCopy)) return {well("no task was ever saved")};
+  const bool isNoneKept = !exists(kPersistentCopy) && !exists(kLastGoodCopy);
+  if (isNothing && isNoneKept) return {well("no task was ever saved")};
   for (const char *path : {kWorkingCopy, kPersistentCopy}) {
     int sections = 0;
     if (!exists(path)) {

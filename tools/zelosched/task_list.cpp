@@ -45,10 +45,10 @@ Failure cannotList() {
   const char *why = nullptr;
   if (schedLookAt(kSchedStore, &why) != SchedNameState::kForeign) {
     PSZLIST names = QLIBCSzListAlloc(1);
-    const bool isReadable = QLIBCFileEnumSection(kSchedStore.path, &names) >= 0;
+    const int sections = QLIBCFileEnumSection(kSchedStore.path, &names);
     QLIBCSzListFree(names);
-    if (isReadable) return failure;
-    why = "cannot be read";
+    if (sections > 0 || (sections == 0 && !schedAreTasksKept())) return failure;
+    why = sections < 0 ? "cannot be read" : "has no tasks, though some are kept";
   }
   return Failure(std::string(failure.what()) + "; " + kSchedStore.path + " " + why +
                  ": 'zelosched restore' puts the tasks back");
