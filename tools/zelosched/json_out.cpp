@@ -273,8 +273,9 @@ std::string firstError(const std::string &errors) {
   std::getline(lines, what);
   const size_t word = where.find_first_not_of("* ");
   const size_t sentence = what.find_first_not_of(' ');
+  constexpr size_t kLongest = 200;  // it quotes what it does not like, however long that is
   return (word == std::string::npos ? "" : where.substr(word)) +
-         (sentence == std::string::npos ? "" : ": " + what.substr(sentence));
+         (sentence == std::string::npos ? "" : ": " + what.substr(sentence, kLongest));
 }
 
 // How many bytes of the text are the string or the comment that it begins with; 1 for anything

@@ -17,6 +17,7 @@
 #include <string_view>
 
 #include "failure.h"
+#include "text.h"
 
 namespace {
 
@@ -98,7 +99,7 @@ class AsideDirectory {
     if (path_.empty()) make();
     const std::string to = path_ + "/" + std::to_string(++count_);
     if (renameat(directory, name, AT_FDCWD, to.c_str()) != 0 && errno != ENOENT) {
-      throw cannot(std::string("move ") + name + " away");
+      throw cannot("move " + printable(name) + " away");
     }
   }
   const std::string &path() const { return path_; }
