@@ -159,7 +159,13 @@ int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate) {
   fields.tm_hour = static_cast<int>(pDate->hour);
   fields.tm_min = static_cast<int>(pDate->minute);
   fields.tm_isdst = 0;  // standard time, not "unknown": see the header on summer time
+  fields.tm_wday = -1;  // stays so when mktime fails; its result -1 may also be a moment
   const time_t seconds = mktime(&fields);
+  if (fields.tm_wday < 0) {
+    SCHED_LOG_ERRNO("mktime failed. ");
+    SCHED_SET_ERROR(kErrSystem);
+    return -1;
+  }
   const struct tm *local = localtime(&seconds);
   if (local == nullptr) {
     SCHED_LOG_ERRNO("localtime failed. ");

@@ -140,6 +140,27 @@ TEST_F(SchedDateTest, NormalisingNeedsADate) {
   EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
 }
 
+// Two billion years from now: what follows its last month cannot be counted.
+TEST_F(SchedDateTest, ADateThatCannotBeConvertedStays) {
+  constexpr uint32_t kLastYear = uint32_t{INT32_MAX} + 1900;
+  setZone("UTC");
+  EXPECT_EQ(normalised({kLastYear, 12, 31, 0, 23, 59}), (Fields{kLastYear, 12, 31, 3, 23, 59}));
+  ZELO_SCHED_DATE date = {kLastYear, 13, 1, 9, 8, 7};
+  EXPECT_EQ(ZELOSchedDateNormalize(&date), -1);
+  EXPECT_EQ(fieldsOf(date), (Fields{kLastYear, 13, 1, 9, 8, 7}));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x2A00, "sched_date.cpp"}));
+  EXPECT_EQ(logged(), Lines{std::string("sched_date.cpp:N mktime failed. ") + kOverflowText});
+  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
+}
+
+TEST_F(SchedDateTest, TheSecondBeforeTheEpochIsNoFailure) {
+  setZone("UTC");
+  EXPECT_EQ(normalised({1970, 1, 1, 0, 0, 0}), (Fields{1970, 1, 1, 4, 0, 0}));
+  EXPECT_EQ(normalised({1969, 12, 31, 0, 23, 59}), (Fields{1969, 12, 31, 3, 23, 59}));
+  setZone("XXX-0:00:01");  // where the second that mktime fails with begins a minute
+  EXPECT_EQ(normalised({1970, 1, 1, 0, 0, 0}), (Fields{1970, 1, 1, 4, 0, 0}));
+}
+
 TEST_F(SchedDateTest, ADateThatCannotBeConvertedBackStays) {
   failCall("localtime", {.error = EOVERFLOW});
   ZELO_SCHED_DATE date = {2013, 1, 32, 9, 8, 7};

@@ -348,7 +348,8 @@ ZELO_SCHED_API int ZELOSchedTimeParse(const char *szTimeOrg, ZELO_SCHED_DATE *pD
 
 /* Rolls fields that are out of range over (32 January becomes 1 February) and
  * works out the weekday. The time is taken as standard time: in summer time it
- * comes back one hour later. 0, or -1: 0x0D00, 0x2A00. */
+ * comes back one hour later. 0, or -1 with the date left alone: 0x0D00; 0x2A00,
+ * also when the year would be too great to be counted. */
 ZELO_SCHED_API int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate);
 
 /* Seeds rand() from the time and the process id, once in a process. */
