@@ -225,9 +225,11 @@ ZELO_SCHED_API int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_T
 
 /* Fills the task from a hash; `next`, `Backend` and `NextTriggerTime` are left
  * alone. "id", "run hour", "run min", "name", "app", "app name", "action",
- * "cmd", "state" and "type" must be there, the rest have defaults. 0, or -1:
- * 0x0D00, 0x4000 when a number without a sign ("owner", "run hour", ...) has
- * trailing characters, or what the platform left, with the record partly filled. */
+ * "cmd", "state" and "type" must be there, the rest have defaults. Of a number
+ * that does not fit 32 bits the lowest 32 are kept: "4294967297" is read as 1.
+ * 0, or -1: 0x0D00, 0x4000 when a number without a sign ("owner", "run hour",
+ * ...) has trailing characters, or what the platform left, with the record
+ * partly filled. */
 ZELO_SCHED_API int ZELOSchedInitTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash);
 
 /* ---- JSON: a task as a text for a browser ----------------------------------- */
