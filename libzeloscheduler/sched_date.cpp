@@ -166,18 +166,19 @@ int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate) {
     SCHED_SET_ERROR(kErrSystem);
     return -1;
   }
-  const struct tm *local = localtime(&seconds);
-  if (local == nullptr) {
+  // localtime would look for a change of the time zone once more, which mktime has just done.
+  struct tm local = {};
+  if (localtime_r(&seconds, &local) == nullptr) {
     SCHED_LOG_ERRNO("localtime failed. ");
     SCHED_SET_ERROR(kErrSystem);
     return -1;
   }
-  pDate->year = static_cast<uint32_t>(local->tm_year) + kFirstYear;
-  pDate->month = static_cast<uint32_t>(local->tm_mon + 1);
-  pDate->day = static_cast<uint32_t>(local->tm_mday);
-  pDate->weekday = static_cast<uint32_t>(local->tm_wday);
-  pDate->hour = static_cast<uint32_t>(local->tm_hour);
-  pDate->minute = static_cast<uint32_t>(local->tm_min);
+  pDate->year = static_cast<uint32_t>(local.tm_year) + kFirstYear;
+  pDate->month = static_cast<uint32_t>(local.tm_mon + 1);
+  pDate->day = static_cast<uint32_t>(local.tm_mday);
+  pDate->weekday = static_cast<uint32_t>(local.tm_wday);
+  pDate->hour = static_cast<uint32_t>(local.tm_hour);
+  pDate->minute = static_cast<uint32_t>(local.tm_min);
   return 0;
 }
 

@@ -162,7 +162,7 @@ TEST_F(SchedDateTest, TheSecondBeforeTheEpochIsNoFailure) {
 }
 
 TEST_F(SchedDateTest, ADateThatCannotBeConvertedBackStays) {
-  failCall("localtime", {.error = EOVERFLOW});
+  failCall("localtime_r", {.error = EOVERFLOW});
   ZELO_SCHED_DATE date = {2013, 1, 32, 9, 8, 7};
   EXPECT_EQ(ZELOSchedDateNormalize(&date), -1);
   EXPECT_EQ(fieldsOf(date), (Fields{2013, 1, 32, 9, 8, 7}));
@@ -299,7 +299,7 @@ TEST_F(SchedDateTest, WithoutNormalisationTheFieldStaysAsItWas) {
   const Task task = dailyTask(8, 30);
   task->ID = -1;
   setText(task->NextTriggerTime, kFieldBefore);
-  failCall("localtime", {.from = 2, .error = EOVERFLOW});
+  failCall("localtime_r", {.error = EOVERFLOW});
   EXPECT_EQ(ZELOSchedNextTriggerTime(task.get()), -1);
   EXPECT_STREQ(task->NextTriggerTime, kFieldBefore);
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x2A00, "sched_date.cpp"}));
