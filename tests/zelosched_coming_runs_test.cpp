@@ -3,6 +3,7 @@
 
 #include <cstdlib>
 #include <cstring>
+#include <map>
 #include <random>
 
 #include "coming_runs.h"
@@ -92,6 +93,42 @@ TEST_F(ZeloschedComingRunsTest, AMinuteThatComesTwiceBeginsTheFirstTime) {
   setZone("Europe/Berlin");
   const time_t before = localTime("2026-10-25 01:30");
   EXPECT_EQ(momentOf(localMinute(before + kHour)), before + kHour);
+}
+
+// Minute by minute around changes of the clock: by an hour and by half an hour, of summer time and
+// of a country's time, and one that skips a day.
+TEST_F(ZeloschedComingRunsTest, AMinuteBeginsWhenTheClockFirstShowsItOrNever) {
+  const struct {
+    const char *zone;
+    const char *noon;  // in UTC, of a day beside the change
+  } changes[] = {
+      {"Europe/Berlin", "2026-03-29 12:00"},       {"Europe/Berlin", "2026-10-25 12:00"},
+      {"America/New_York", "2026-03-08 12:00"},    {"America/New_York", "2026-11-01 12:00"},
+      {"Australia/Lord_Howe", "2026-04-05 12:00"}, {"Australia/Lord_Howe", "2026-10-04 12:00"},
+      {"Europe/Moscow", "2014-10-26 12:00"},       {"Pacific/Apia", "2011-12-30 12:00"},
+      {"Africa/Casablanca", "2026-02-15 12:00"},   {"UTC", "2026-01-01 12:00"}};
+  for (const auto &[zone, noon] : changes) {
+    SCOPED_TRACE(std::string(zone) + " " + noon);
+    setZone("UTC");
+    const time_t middle = localTime(noon);
+    const LocalMinute day = localMinute(middle);
+    setZone(zone);
+    std::map<LocalMinute, time_t> firsts;
+    for (time_t moment = middle - 4 * kDay; moment < middle + 4 * kDay; moment += 60) {
+      firsts.emplace(localMinute(moment), moment);
+    }
+    LocalMinute minute = {day.day - std::chrono::days(2), 0, 0};
+    for (; minute.day < day.day + std::chrono::days(2); minute.day += std::chrono::days(1)) {
+      for (minute.hour = 0; minute.hour < 24; ++minute.hour) {
+        for (minute.minute = 0; minute.minute < 60; ++minute.minute) {
+          const auto first = firsts.find(minute);
+          const std::optional<time_t> wanted =
+              first == firsts.end() ? std::nullopt : std::optional(first->second);
+          ASSERT_EQ(momentOf(minute), wanted) << minuteText(minute);
+        }
+      }
+    }
+  }
 }
 
 TEST_F(ZeloschedComingRunsTest, TheLastHourOfASummerDayIsNoDayLate) {
