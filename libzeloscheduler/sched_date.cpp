@@ -1,14 +1,17 @@
-// Dates that roll over, and the minute at which a task runs next.
+// Dates that roll over, and the minute that is shown as a task's next run. What that has in common
+// with the minutes at which the task does run is in the schedule library; here is what the
+// interface requires to be shown beside that.
 #include <zelosched.h>
 
 #include <cstring>
 #include <ctime>
 
 #include "sched_report.h"
-#include "sched_run_hours.h"
 #include "sched_text.h"
 #include "sched_trigger_clock.h"
-#include "sched_week.h"
+#include "schedule_days.h"
+#include "schedule_due.h"
+#include "schedule_hours.h"
 
 namespace {
 
@@ -17,22 +20,6 @@ constexpr uint32_t kHundred = 100;     // a time of day is hour * 100 + minute
 constexpr char kNever[] = "N/A";
 
 using TriggerText = BoundedText<64>;
-
-ZELO_SCHED_DATE startDate(const ZELO_SCHED_TASK &task) {
-  ZELO_SCHED_DATE date = {};
-  date.year = task.StartYear;
-  date.month = task.StartMonth;
-  date.day = task.StartDay;
-  return date;
-}
-
-bool isDayOfMonth(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
-  return now.day == task.StartDay;
-}
-
-bool isDayOfYear(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
-  return now.month == task.StartMonth && now.day == task.StartDay;
-}
 
 TriggerText written(const ZELO_SCHED_DATE &date) {
   constexpr size_t kYearDigits = 4;
@@ -53,25 +40,23 @@ Today ZELOSchedTDayNextRunTime(const ZELO_SCHED_TASK *pTask, const ZELO_SCHED_DA
                                TriggerText *result) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", Today::kFailed);
   const uint32_t nowHM = now.hour * kHundred + now.minute;
-  uint64_t runHM = 0;
-  const bool found = anyRunHour(*pTask, [&](uint32_t hour) {
-    runHM = uint64_t{hour} * kHundred + pTask->RunMin;
-    return runHM > nowHM;
-  });
-  if (!found) {
-    return Today::kOver;
+  for (const uint32_t hour : schedHoursOf(*pTask)) {
+    const uint64_t runHM = uint64_t{hour} * kHundred + pTask->RunMin;
+    if (runHM > nowHM) {
+      ZELO_SCHED_DATE date = now;
+      date.hour = static_cast<uint32_t>(runHM / kHundred);
+      date.minute = static_cast<uint32_t>(runHM % kHundred);
+      *result = written(date);
+      return Today::kFound;
+    }
   }
-  ZELO_SCHED_DATE date = now;
-  date.hour = static_cast<uint32_t>(runHM / kHundred);
-  date.minute = static_cast<uint32_t>(runHM % kHundred);
-  *result = written(date);
-  return Today::kFound;
+  return Today::kOver;
 }
 
 // Without any day of the week the search ends eight days ahead; the display shows just that.
 uint32_t daysToNextWeekday(const ZELO_SCHED_TASK &task, uint32_t weekday) {
   uint32_t days = 1;
-  while (days <= kDaysOfWeek && !schedIsDayOn(task.Week, (weekday + days) % kDaysOfWeek)) {
+  while (days <= kDaysOfWeek && !schedIsWeekdayOn(task, (weekday + days) % kDaysOfWeek)) {
     ++days;
   }
   return days;
@@ -124,24 +109,17 @@ int ZELOSchedNextRunEstimate(const ZELO_SCHED_TASK &task, SchedTriggerClock *clo
   return 0;
 }
 
-bool runsToday(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now, int nowToStart) {
-  switch (task.Type) {
-    case ZELO_SCHED_TYPE_ONCE:
-      return nowToStart == 0;
-    case ZELO_SCHED_TYPE_MONTHLY:
-      return nowToStart == 0 || isDayOfMonth(task, now);
-    case ZELO_SCHED_TYPE_YEARLY:
-      return nowToStart == 0 || isDayOfYear(task, now);
-    case ZELO_SCHED_TYPE_DAILY:
-      return true;
-    default:
-      return schedIsDayOn(task.Week, now.weekday);
-  }
+// Of the other types the start date is passed over, though they do not run before it.
+bool isStartShown(const ZELO_SCHED_TASK &task) {
+  return schedHasDayOfMonth(task);
 }
 
-bool hasStartDate(const ZELO_SCHED_TASK &task) {
-  return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_MONTHLY ||
-         task.Type == ZELO_SCHED_TYPE_YEARLY;
+// A type that does not exist is shown like a weekly one.
+bool isShownToday(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
+  if (isStartShown(task)) {
+    return schedIsDueDay(task, now);
+  }
+  return task.Type == ZELO_SCHED_TYPE_DAILY || schedIsWeekdayOn(task, now.weekday);
 }
 
 int triggerText(const ZELO_SCHED_TASK &task, SchedTriggerClock *clock, TriggerText *result) {
@@ -150,15 +128,14 @@ int triggerText(const ZELO_SCHED_TASK &task, SchedTriggerClock *clock, TriggerTe
     return -1;
   }
   const ZELO_SCHED_DATE &now = clock->now();
-  ZELO_SCHED_DATE start = startDate(task);
-  const int nowToStart = hasStartDate(task) ? ZELOSchedDateComp(&now, &start) : 0;
-  if (nowToStart < 0) {
+  ZELO_SCHED_DATE start = schedStartDay(task);
+  if (isStartShown(task) && schedCompareDays(now, start) < 0) {
     start.hour = task.RunHour;
     start.minute = task.RunMin;
     *result = written(start);
     return 0;
   }
-  if (runsToday(task, now, nowToStart)) {
+  if (isShownToday(task, now)) {
     const Today today = ZELOSchedTDayNextRunTime(&task, now, result);
     if (today == Today::kFailed) {
       SCHED_LOG_CALLEE("ZELOSchedTDayNextRunTime failed. ");
@@ -182,19 +159,26 @@ int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate) {
   fields.tm_hour = static_cast<int>(pDate->hour);
   fields.tm_min = static_cast<int>(pDate->minute);
   fields.tm_isdst = 0;  // standard time, not "unknown": see the header on summer time
+  fields.tm_wday = -1;  // stays so when mktime fails; its result -1 may also be a moment
   const time_t seconds = mktime(&fields);
-  const struct tm *local = localtime(&seconds);
-  if (local == nullptr) {
+  if (fields.tm_wday < 0) {
+    SCHED_LOG_ERRNO("mktime failed. ");
+    SCHED_SET_ERROR(kErrSystem);
+    return -1;
+  }
+  // localtime would look for a change of the time zone once more, which mktime has just done.
+  struct tm local = {};
+  if (localtime_r(&seconds, &local) == nullptr) {
     SCHED_LOG_ERRNO("localtime failed. ");
     SCHED_SET_ERROR(kErrSystem);
     return -1;
   }
-  pDate->year = static_cast<uint32_t>(local->tm_year) + kFirstYear;
-  pDate->month = static_cast<uint32_t>(local->tm_mon + 1);
-  pDate->day = static_cast<uint32_t>(local->tm_mday);
-  pDate->weekday = static_cast<uint32_t>(local->tm_wday);
-  pDate->hour = static_cast<uint32_t>(local->tm_hour);
-  pDate->minute = static_cast<uint32_t>(local->tm_min);
+  pDate->year = static_cast<uint32_t>(local.tm_year) + kFirstYear;
+  pDate->month = static_cast<uint32_t>(local.tm_mon + 1);
+  pDate->day = static_cast<uint32_t>(local.tm_mday);
+  pDate->weekday = static_cast<uint32_t>(local.tm_wday);
+  pDate->hour = static_cast<uint32_t>(local.tm_hour);
+  pDate->minute = static_cast<uint32_t>(local.tm_min);
   return 0;
 }
 

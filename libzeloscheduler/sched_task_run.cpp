@@ -14,11 +14,10 @@
 #include "sched_db_guard.h"
 #include "sched_leave_caller.h"
 #include "sched_report.h"
-#include "sched_run_hours.h"
 #include "sched_shared_names.h"
 #include "sched_surroundings.h"
 #include "sched_user.h"
-#include "sched_week.h"
+#include "schedule_due.h"
 
 FILE *pfLock;
 
@@ -37,41 +36,13 @@ constexpr int kForkedCaller = 1;
 
 // ---- is now one of the task's minutes? --------------------------------------------------------
 
-bool isDayOfTask(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now, bool isStartDate) {
-  if (isStartDate) {
-    return true;
-  }
-  switch (task.Type) {
-    case ZELO_SCHED_TYPE_DAILY:
-      return true;
-    case ZELO_SCHED_TYPE_WEEKLY:
-      return schedIsDayOn(task.Week, now.weekday);
-    case ZELO_SCHED_TYPE_MONTHLY:
-      return now.day == task.StartDay;
-    case ZELO_SCHED_TYPE_YEARLY:
-      return now.month == task.StartMonth && now.day == task.StartDay;
-    default:
-      return false;
-  }
-}
-
-bool isMinuteOfTask(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
-  return now.minute == task.RunMin &&
-         anyRunHour(task, [&](uint32_t hour) { return hour == now.hour; });
-}
-
 int ZELOSchedCheckRunTime(const ZELO_SCHED_TASK &task, bool *pIsDue) {
   ZELO_SCHED_DATE now = {};
   if (ZELOSchedDateGet(&now) < 0) {
     SCHED_LOG_CALLEE("get date failed. ");
     return -1;
   }
-  ZELO_SCHED_DATE start = {};
-  start.year = task.StartYear;
-  start.month = task.StartMonth;
-  start.day = task.StartDay;
-  const int nowToStart = ZELOSchedDateComp(&now, &start);
-  *pIsDue = nowToStart >= 0 && isDayOfTask(task, now, nowToStart == 0) && isMinuteOfTask(task, now);
+  *pIsDue = schedIsDue(task, now);
   return 0;
 }
 

@@ -14,12 +14,12 @@
 #include <string_view>
 
 #include "backends/power_id.h"
-#include "sched_cron_fields.h"
 #include "sched_cron_room.h"
 #include "sched_guards.h"
 #include "sched_json.h"
 #include "sched_parm_table.h"
 #include "sched_report.h"
+#include "schedule_cron.h"
 
 namespace {
 

@@ -8,6 +8,7 @@
 
 #include "sched_report.h"
 #include "sched_text.h"
+#include "schedule_days.h"
 
 namespace {
 
@@ -104,14 +105,7 @@ int ZELOSchedDateGet(ZELO_SCHED_DATE *pDate) {
 int ZELOSchedDateComp(const ZELO_SCHED_DATE *pDate1, const ZELO_SCHED_DATE *pDate2) {
   SCHED_CHECK_ARG(pDate1 != nullptr, "((void *)0) != pDate1", -1);
   SCHED_CHECK_ARG(pDate2 != nullptr, "NULL != pDate2", -1);
-  const uint32_t day1[] = {pDate1->year, pDate1->month, pDate1->day};
-  const uint32_t day2[] = {pDate2->year, pDate2->month, pDate2->day};
-  for (size_t i = 0; i < sizeof(day1) / sizeof(day1[0]); ++i) {
-    if (day1[i] != day2[i]) {
-      return day1[i] < day2[i] ? -1 : 1;
-    }
-  }
-  return 0;
+  return schedCompareDays(*pDate1, *pDate2);
 }
 
 int ZELOSchedDateParse(const char *szDateOrg, ZELO_SCHED_DATE *pDate) {

@@ -14,6 +14,7 @@
 #include "captured_log.h"
 #include "failing_calls.h"
 #include "sandbox_fixture.h"
+#include "schedule_cases.h"
 #include "tasks.h"
 #include "zelocore.h"
 
@@ -24,7 +25,6 @@ using Lines = std::vector<std::string>;
 
 constexpr int kInjectedCode = 0x0B00;
 constexpr mode_t kPermissions = 07777;
-constexpr uint32_t kHuge = UINT32_MAX;
 const std::string kInjected = "[0x0B00 injected.cpp:N]";
 const std::string kHangUp = "/bin/kill -HUP `/bin/cat /var/run/crond.pid` > /dev/null 2>&1";
 const std::string kFirstLine = "0\t0\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=1\n";
@@ -67,17 +67,6 @@ class CrontabTest : public SandboxTest {
     EXPECT_EQ(backend_.create(task.get()), 0);
   }
 
-  // The fields of the only task's line up to the user.
-  std::string fieldsOf(const std::function<void(ZELO_SCHED_TASK *)> &change) const {
-    cleanWorld();
-    create(change);
-    const Lines lines = crontabLines();
-    if (lines.size() != 1) return "not one line";
-    const std::string end = "\troot\t/tmp/zeloschedtask --run id=1";
-    EXPECT_TRUE(lines[0].ends_with(end)) << lines[0];
-    return lines[0].substr(0, lines[0].size() - std::min(end.size(), lines[0].size()));
-  }
-
   static void forget() {
     resetFailingCalls();
     clearLog();
@@ -89,79 +78,13 @@ class CrontabTest : public SandboxTest {
 
 // ---- one line
 
-TEST_F(CrontabTest, ATaskThatRunsOnceGetsItsDayAndMonth) {
-  create();
-  create();
-  create([](ZELO_SCHED_TASK *task) {
-    task->Type = ZELO_SCHED_TYPE_ONCE;
-    task->StartYear = 2031;
-    task->StartMonth = 1;
-    task->StartDay = 17;
-    task->RunHour = 5;
-    task->RunMin = 30;
-  });
-  const Lines lines = crontabLines();
-  EXPECT_NE(
-      std::find(lines.begin(), lines.end(), "30\t5\t17\t1\t*\troot\t/tmp/zeloschedtask --run id=3"),
-      lines.end());
-}
-
-struct LineCase {
-  const char *what;
-  std::function<void(ZELO_SCHED_TASK *)> change;
-  const char *fields;
-};
-
-TEST_F(CrontabTest, EachTypeHasItsDayFields) {
-  const auto start = [](ZELO_SCHED_TASK *task, int32_t type, uint32_t month, uint32_t day) {
-    task->Type = type;
-    task->StartMonth = month;
-    task->StartDay = day;
-    task->RunHour = 8;
-  };
-  const auto weekly = [](ZELO_SCHED_TASK *task, const char *week) {
-    task->Type = ZELO_SCHED_TYPE_WEEKLY;
-    task->RunHour = 8;
-    setText(task->Week, week);
-  };
-  const LineCase cases[] = {
-      {"once", [&](auto *task) { start(task, 0, 12, 31); }, "0\t8\t31\t12\t*"},
-      {"daily", [&](auto *task) { start(task, 1, 12, 31); }, "0\t8\t*\t*\t*"},
-      {"monthly", [&](auto *task) { start(task, 3, 12, 15); }, "0\t8\t15\t*\t*"},
-      {"monthly on day 31", [&](auto *task) { start(task, 3, 1, 31); }, "0\t8\t31\t*\t*"},
-      {"yearly", [&](auto *task) { start(task, 4, 5, 7); }, "0\t8\t7\t5\t*"},
-      {"yearly on 29 February", [&](auto *task) { start(task, 4, 2, 29); }, "0\t8\t29\t2\t*"},
-      {"weekly", [&](auto *task) { weekly(task, "0101010"); }, "0\t8\t*\t*\t1,3,5"},
-      {"weekly, two days", [&](auto *task) { weekly(task, "0100010"); }, "0\t8\t*\t*\t1,5"},
-      {"weekly, Sunday", [&](auto *task) { weekly(task, "1000000"); }, "0\t8\t*\t*\t0"},
-      {"weekly, Saturday", [&](auto *task) { weekly(task, "0000001"); }, "0\t8\t*\t*\t6"},
-      {"weekly, every day", [&](auto *task) { weekly(task, "1111111"); },
-       "0\t8\t*\t*\t0,1,2,3,4,5,6"},
-      {"weekly, no day", [&](auto *task) { weekly(task, "0000000"); }, "0\t8\t*\t*\t"},
-      {"weekly, two characters", [&](auto *task) { weekly(task, "01"); },
-       "0\t8\t*\t*\t1,2,3,4,5,6"},
-      {"weekly, no character", [&](auto *task) { weekly(task, ""); }, "0\t8\t*\t*\t0,1,2,3,4,5,6"},
-      {"weekly, something behind the end",
-       [&](auto *task) {
-         weekly(task, "0100000");
-         task->Week[2] = '\0';
-       },
-       "0\t8\t*\t*\t1,2,3,4,5,6"},
-      {"weekly, any character but zero", [&](auto *task) { weekly(task, "x0y 0z0"); },
-       "0\t8\t*\t*\t0,2,3,5"},
-      {"a start date that was never set", [&](auto *task) { start(task, 4, 0, 0); },
-       "0\t8\t0\t0\t*"},
-      {"the greatest numbers",
-       [&](auto *task) {
-         start(task, 4, kHuge, kHuge);
-         task->RunHour = kHuge;
-         task->RunMin = kHuge;
-       },
-       "4294967295\t4294967295\t4294967295\t4294967295\t*"},
-  };
-  for (const LineCase &each : cases) {
+TEST_F(CrontabTest, EachScheduleHasItsLine) {
+  for (const ScheduleCase &each : scheduleCases()) {
+    if (!isStorable(each.schedule)) continue;
     SCOPED_TRACE(each.what);
-    EXPECT_EQ(fieldsOf(each.change), each.fields);
+    cleanWorld();
+    EXPECT_EQ(backend_.create(taskOf(each.schedule).get()), 0);
+    EXPECT_EQ(crontabLines(), Lines{lineOf(each)});
   }
 }
 
@@ -200,41 +123,6 @@ TEST_F(CrontabTest, NoTextOfATaskReachesTheCrontab) {
   });
   EXPECT_EQ(crontabLines(),
             Lines{"0\t0\t*\t*\t0,1,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=1"});
-}
-
-TEST_F(CrontabTest, RepeatedHoursAreListedUpToTheLast) {
-  struct {
-    uint32_t first;
-    uint32_t repeat;
-    uint32_t last;
-    const char *hours;
-  } cases[] = {
-      {8, 0, 0, "8"},
-      {8, 0, 23, "8"},
-      {23, 0, 0, "23"},
-      {8, 2, 17, "8,10,12,14,16"},
-      {8, 3, 17, "8,11,14,17"},
-      {20, 3, 5, "20"},
-      {20, 3, 20, "20"},
-      {0, 1, 23, "0,1,2,3,4,5,6,7,8,9,10,11,12,13,14,15,16,17,18,19,20,21,22,23"},
-      {0, 23, 23, "0,23"},
-      {0, 24, 23, "0"},
-      {22, 1, kHuge, "22,23"},
-      {22, kHuge, kHuge, "22"},
-      {23, kHuge, kHuge, "23"},
-      {0, 11, 99, "0,11,22"},
-      {24, 1, 99, "24"},
-  };
-  for (const auto &each : cases) {
-    SCOPED_TRACE(testing::Message() << each.first << "+" << each.repeat << ".." << each.last);
-    EXPECT_EQ(fieldsOf([&](ZELO_SCHED_TASK *task) {
-                task->RunMin = 59;
-                task->RunHour = each.first;
-                task->RepeatHour = each.repeat;
-                task->LastWorkHour = each.last;
-              }),
-              "59\t" + std::string(each.hours) + "\t*\t*\t*");
-  }
 }
 
 // ---- the whole crontab

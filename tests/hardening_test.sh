@@ -83,7 +83,7 @@ fi
 
 readonly LIBRARIES=("$BUILD_DIR"/lib/lib{zelocore,zeloscheduler,zelosdk}.so)
 readonly TOOLS=("$BUILD_DIR"/bin/zelosched*)
-readonly SOURCES=(libzeloscheduler platform tools)
+readonly SOURCES=(schedule libzeloscheduler platform tools)
 # These cannot show it, as nothing in them needs it: no function with an array, no call that writes
 # into a buffer or by a format. What they were compiled with is looked at below.
 readonly WITHOUT_ARRAYS=(zeloschedtask)

@@ -512,6 +512,16 @@ TEST_F(SchedTaskConvertTest, AnUnsignedNumberWithTrailingCharactersFailsTheRead)
   }
 }
 
+TEST_F(SchedTaskConvertTest, OfANumberThatDoesNotFitTheLowest32BitsAreKept) {
+  const Task task = plainTask("");
+  EXPECT_EQ(read(with("id", "4294967297"), task), 0);
+  EXPECT_EQ(task->ID, 1);
+  for (const UnsignedRow &row : kUnsignedRows) {
+    EXPECT_EQ(read(with(row.key, "4294967297"), task), 0) << row.key;
+    EXPECT_EQ(task.get()->*row.field, 1U) << row.key;
+  }
+}
+
 TEST_F(SchedTaskConvertTest, ASignedNumberMayHaveTrailingCharacters) {
   const Task task = plainTask("");
   EXPECT_EQ(read(with("id", "12abc"), task), 0);

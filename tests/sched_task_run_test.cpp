@@ -19,6 +19,7 @@
 #include "fake_backends.h"
 #include "fake_clock.h"
 #include "fifos.h"
+#include "schedule_cases.h"
 #include "shared_memory.h"
 #include "status_db.h"
 #include "tasks.h"
@@ -234,13 +235,6 @@ TEST_F(TaskRunTest, AForkThatFailsIsReported) {
 
 // ---- is now one of the task's minutes?
 
-struct DueCase {
-  const char *what;
-  std::function<void(ZELO_SCHED_TASK *)> change;
-  const char *now;
-  bool due;
-};
-
 // Tuesday, at 08:30.
 void startOn7May(ZELO_SCHED_TASK *task, int32_t type) {
   task->Type = type;
@@ -262,188 +256,49 @@ class DueTest : public TaskRunTest {
     return callCount("QLIBCProcForkChildNoWait") == 1;
   }
 
-  // The hours of 8 May at which a daily task from 7 May on, 08:30, is due in its minute.
-  static std::vector<uint32_t> dueHours(const std::function<void(ZELO_SCHED_TASK *)> &change) {
-    const Task task = makeTask("task", "true");
-    startOn7May(task.get(), ZELO_SCHED_TYPE_DAILY);
-    change(task.get());
-    const long id = saveTask(task);
-    std::vector<uint32_t> hours;
-    for (uint32_t hour = 0; hour < 24; ++hour) {
-      const std::string before = "2013-05-08 " + std::to_string(hour);
-      if (isDue(id, before + ":30")) hours.push_back(hour);
-      EXPECT_FALSE(isDue(id, before + ":29")) << hour;
-      EXPECT_FALSE(isDue(id, before + ":31")) << hour;
-    }
-    return hours;
+  // What the task is that every id has.
+  static void serve(Task task) {
+    served() = std::move(task);
+    SchedBackends[0].get_by_id = [](long, ZELO_SCHED_TASK *result) {
+      *result = *served();
+      return 1;
+    };
+  }
+
+ private:
+  static Task &served() {
+    static Task task;
+    return task;
   }
 };
 
-TEST_F(DueTest, ATaskIsDueOnItsDaysOnly) {
-  const auto once = [](ZELO_SCHED_TASK *task) { startOn7May(task, ZELO_SCHED_TYPE_ONCE); };
-  const auto daily = [](ZELO_SCHED_TASK *task) { startOn7May(task, ZELO_SCHED_TYPE_DAILY); };
-  const auto tuesdays = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
-    setText(task->Week, "0010000");
-  };
-  const auto allButTuesdays = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
-    setText(task->Week, "1101111");
-  };
-  const auto sundays = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
-    setText(task->Week, "1000000");
-  };
-  const auto saturdays = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
-    setText(task->Week, "0000001");
-  };
-  const auto anyCharacterButZero = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
-    setText(task->Week, "xxxxxxx");
-  };
-  const auto noDayOfTheWeek = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
-    setText(task->Week, "0000000");
-  };
-  const auto monthly = [](ZELO_SCHED_TASK *task) { startOn7May(task, ZELO_SCHED_TYPE_MONTHLY); };
-  const auto monthlyOn31 = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_MONTHLY);
-    task->StartDay = 31;
-  };
-  const auto yearly = [](ZELO_SCHED_TASK *task) { startOn7May(task, ZELO_SCHED_TYPE_YEARLY); };
-  const auto leapDay = [](ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_YEARLY);
-    task->StartYear = 2012;
-    task->StartMonth = 2;
-    task->StartDay = 29;
-  };
-  const DueCase cases[] = {
-      {"once", once, "2013-05-07 08:30", true},
-      {"once, the day after", once, "2013-05-08 08:30", false},
-      {"once, the day before", once, "2013-05-06 08:30", false},
-      {"once, a year later", once, "2014-05-07 08:30", false},
-      {"daily, on the start date", daily, "2013-05-07 08:30", true},
-      {"daily, the last second of the minute", daily, "2013-05-07 08:30:59", true},
-      {"daily, the day before it starts", daily, "2013-05-06 08:30", false},
-      {"daily, a month before it starts", daily, "2013-04-30 08:30", false},
-      {"daily, a year before it starts", daily, "2012-12-31 08:30", false},
-      {"daily, later", daily, "2014-01-01 08:30", true},
-      {"weekly, on the start date", tuesdays, "2013-05-07 08:30", true},
-      {"weekly, its day before it starts", tuesdays, "2013-04-30 08:30", false},
-      {"weekly, the day after its day", tuesdays, "2013-05-08 08:30", false},
-      {"weekly, the day before its day", tuesdays, "2013-05-13 08:30", false},
-      {"weekly, its day a week later", tuesdays, "2013-05-14 08:30", true},
-      {"weekly, all but one: that one", allButTuesdays, "2013-05-14 08:30", false},
-      {"weekly, all but one: another", allButTuesdays, "2013-05-15 08:30", true},
-      {"weekly, Sunday is the first", sundays, "2013-05-12 08:30", true},
-      {"weekly, Saturday is not the first", sundays, "2013-05-11 08:30", false},
-      {"weekly, Saturday is the last", saturdays, "2013-05-11 08:30", true},
-      {"weekly, any character but zero", anyCharacterButZero, "2013-05-11 08:30", true},
-      {"weekly without a day: its start date counts all the same", noDayOfTheWeek,
-       "2013-05-07 08:30", true},
-      {"monthly, on the start date", monthly, "2013-05-07 08:30", true},
-      {"monthly, a month later", monthly, "2013-06-07 08:30", true},
-      {"monthly, another day", monthly, "2013-06-08 08:30", false},
-      {"monthly, a month before it starts", monthly, "2013-04-07 08:30", false},
-      {"monthly on 31: July", monthlyOn31, "2013-07-31 08:30", true},
-      {"monthly on 31: the last of June", monthlyOn31, "2013-06-30 08:30", false},
-      {"monthly on 31: the first of July", monthlyOn31, "2013-07-01 08:30", false},
-      {"yearly, on the start date", yearly, "2013-05-07 08:30", true},
-      {"yearly, a year later", yearly, "2014-05-07 08:30", true},
-      {"yearly, the same day of another month", yearly, "2014-06-07 08:30", false},
-      {"yearly, another day of the month", yearly, "2014-05-08 08:30", false},
-      {"29 February in a leap year", leapDay, "2016-02-29 08:30", true},
-      {"29 February: 28 February", leapDay, "2013-02-28 08:30", false},
-      {"29 February: 1 March", leapDay, "2013-03-01 08:30", false},
-  };
-  for (const DueCase &each : cases) {
+TEST_F(DueTest, EachScheduleIsDueInItsMinutes) {
+  for (const ScheduleCase &each : scheduleCases()) {
+    serve(taskOf(each.schedule));
+    for (const Moment &moment : each.moments) {
+      SCOPED_TRACE(each.what + " at " + moment.now);
+      EXPECT_EQ(isDue(1, moment.now), moment.isDue);
+    }
+  }
+}
+
+TEST_F(DueTest, OnADayOnWhichItIsDueItIsSoInTheHoursOfItsLineAndTheirMinute) {
+  for (const ScheduleCase &each : scheduleCases()) {
+    const auto due = std::find_if(each.moments.begin(), each.moments.end(),
+                                  [](const Moment &moment) { return moment.isDue; });
+    if (due == each.moments.end()) continue;
     SCOPED_TRACE(each.what);
-    const Task task = makeTask("task", "true");
-    each.change(task.get());
-    const long id = saveTask(task);
-    EXPECT_EQ(isDue(id, each.now), each.due);
-    EXPECT_EQ(ZELOSchedTaskRemove(id), 0);
+    serve(taskOf(each.schedule));
+    const std::string day = std::string(due->now).substr(0, sizeof("2013-05-07"));
+    std::vector<uint32_t> hours;
+    for (uint32_t hour = 0; hour < 24; ++hour) {
+      const std::string before = day + std::to_string(hour);
+      if (isDue(1, before + ":30")) hours.push_back(hour);
+      EXPECT_FALSE(isDue(1, before + ":29")) << hour;
+      EXPECT_FALSE(isDue(1, before + ":31")) << hour;
+    }
+    EXPECT_EQ(hours, hoursOf(each));
   }
-}
-
-TEST_F(DueTest, AWeeklyTaskWithoutADayIsNeverDueAfterItsStartDate) {
-  const Task task = makeTask("task", "true");
-  startOn7May(task.get(), ZELO_SCHED_TYPE_WEEKLY);
-  setText(task->Week, "0000000");
-  const long id = saveTask(task);
-  for (int day = 8; day < 8 + 7; ++day) {
-    EXPECT_FALSE(isDue(id, "2013-05-" + std::to_string(day) + " 08:30")) << day;
-  }
-}
-
-TEST_F(DueTest, AWeekThatIsTooShortIsDueOnTheDaysBehindItWhateverStandsThere) {
-  SchedBackends[0].get_by_id = [](long id, ZELO_SCHED_TASK *task) {
-    startOn7May(task, ZELO_SCHED_TYPE_WEEKLY);
-    task->ID = static_cast<int32_t>(id);
-    task->State = ZELO_SCHED_STATE_ENABLED;
-    setText(task->Week, "1000000");
-    task->Week[2] = '\0';
-    return 1;
-  };
-  constexpr long id = 1;
-  for (int day = 12; day <= 18; ++day) {  // from Sunday
-    const std::string now = "2013-05-" + std::to_string(day) + " 08:30";
-    EXPECT_EQ(isDue(id, now), day != 13) << now;
-  }
-}
-
-TEST_F(DueTest, WithoutRepetitionATaskIsDueInItsHourOnly) {
-  EXPECT_EQ(dueHours([](ZELO_SCHED_TASK *task) { task->LastWorkHour = 23; }),
-            std::vector<uint32_t>{8});
-}
-
-TEST_F(DueTest, ARepeatedTaskIsDueUpToItsLastHour) {
-  EXPECT_EQ(dueHours([](ZELO_SCHED_TASK *task) {
-              task->RepeatHour = 3;
-              task->LastWorkHour = 17;
-            }),
-            (std::vector<uint32_t>{8, 11, 14, 17}));
-}
-
-TEST_F(DueTest, ALastHourBeforeTheFirstLeavesTheFirstAlone) {
-  EXPECT_EQ(dueHours([](ZELO_SCHED_TASK *task) {
-              task->RepeatHour = 3;
-              task->LastWorkHour = 7;
-            }),
-            std::vector<uint32_t>{8});
-}
-
-TEST_F(DueTest, ALastHourFarAboveTheDayEndsWithTheDay) {
-  EXPECT_EQ(dueHours([](ZELO_SCHED_TASK *task) {
-              task->RepeatHour = 5;
-              task->LastWorkHour = UINT32_MAX;
-            }),
-            (std::vector<uint32_t>{8, 13, 18, 23}));
-}
-
-TEST_F(DueTest, ARepetitionThatLeavesTheNumbersDoesNotWrapRound) {
-  EXPECT_EQ(dueHours([](ZELO_SCHED_TASK *task) {
-              task->RepeatHour = UINT32_MAX;
-              task->LastWorkHour = UINT32_MAX;
-            }),
-            std::vector<uint32_t>{8});
-}
-
-TEST_F(DueTest, AnHourThatNoDayHasIsNeverDue) {
-  for (const uint32_t hour : {24U, 32U, UINT32_MAX}) {
-    EXPECT_EQ(dueHours([&](ZELO_SCHED_TASK *task) {
-                task->RunHour = hour;
-                task->RepeatHour = 1;
-                task->LastWorkHour = UINT32_MAX;
-              }),
-              std::vector<uint32_t>{})
-        << hour;
-  }
-}
-
-TEST_F(DueTest, AMinuteThatNoHourHasIsNeverDue) {
-  EXPECT_EQ(dueHours([](ZELO_SCHED_TASK *task) { task->RunMin = 60; }), std::vector<uint32_t>{});
 }
 
 TEST_F(DueTest, ADueTaskIsRunAndAnotherIsNot) {

@@ -11,8 +11,8 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 
 cd "$here/.."
 # Here-strings, as a chroot without /proc has no /dev/fd.
-mapfile -t units <<<"$(find libzeloscheduler platform tools -name '*.cpp' | sort)"
-mapfile -t formatted <<<"$(find libzeloscheduler platform tools tests bench examples fuzz \
+mapfile -t units <<<"$(find schedule libzeloscheduler platform tools -name '*.cpp' | sort)"
+mapfile -t formatted <<<"$(find schedule libzeloscheduler platform tools tests bench examples fuzz \
   \( -name '*.cpp' -o -name '*.h' -o -name '*.c' \) -not -path 'fuzz/corpus/*' | sort)"
 mapfile -t scripts <<<"$(grep -lrE --include='*.sh' '^#!/bin/(ba)?sh' tests packaging | sort
   find scripts .ci -type f | sort
@@ -52,7 +52,7 @@ if have clang-format "sources are formatted"; then
   check "sources are formatted" clang-format --dry-run --Werror "${formatted[@]}"
 fi
 if have cppcheck "sources are checked by cppcheck"; then
-  check "platform and tools are checked by cppcheck" cpp_check platform tools
+  check "schedules, platform and tools are checked by cppcheck" cpp_check schedule platform tools
   check "libzeloscheduler is checked by cppcheck" cpp_check_library
 fi
 if have clang-tidy "every unit is checked by clang-tidy"; then

@@ -6,6 +6,7 @@
 #include "crontab_check.h"
 #include "fake_clock.h"
 #include "sandbox_fixture.h"
+#include "schedule_cases.h"
 #include "task_check.h"
 #include "tasks.h"
 
@@ -160,40 +161,23 @@ TEST_F(ZeloschedTaskCheckTest, WhatIsJustInRangeIsFit) {
   for (const auto &change : fits) EXPECT_EQ(harms(change), Sentences{});
 }
 
-// Tasks of programs that check nothing. Where the two differ, status reports a difference for ever
-// and the administrator cannot save anything.
-TEST_F(ZeloschedTaskCheckTest, TheLineThatIsExpectedIsTheOneThatTheLibraryWrites) {
-  const std::function<void(ZELO_SCHED_TASK &)> changes[] = {
-      [](auto &) {},
-      [](auto &task) {
-        task.RepeatHour = 1;
-        task.LastWorkHour = 99;
-      },
-      [](auto &task) {
-        task.RunHour = 30;
-        task.RepeatHour = 1;
-        task.LastWorkHour = UINT32_MAX;
-      },
-      [](auto &task) {
-        task.RunHour = UINT32_MAX;
-        task.RepeatHour = UINT32_MAX;
-      },
-      [](auto &task) {
-        task.Type = ZELO_SCHED_TYPE_WEEKLY;
-        setText(task.Week, "10");
-      },
-      [](auto &task) {
-        task.Type = ZELO_SCHED_TYPE_WEEKLY;
-        setText(task.Week, "0000000");
-      },
-      [](auto &task) { setDay(task, ZELO_SCHED_TYPE_YEARLY, 0, 99, UINT32_MAX); },
-  };
-  for (const auto &change : changes) {
-    cleanWorld();
-    const Task task = makeTask("t", "true");
-    change(*task);
-    saveTask(task);
-    EXPECT_EQ(crontabLines(), Sentences{crontabLine(*task)});
+// Also of tasks of programs that check nothing. Where the line that the library writes is not the
+// one that is expected, status reports a difference for ever and no task can be saved.
+TEST_F(ZeloschedTaskCheckTest, TheCrontabIsInStepWithTheLineOfEachSchedule) {
+  for (const ScheduleCase &each : scheduleCases()) {
+    SCOPED_TRACE(each.what);
+    const Task task = taskOf(each.schedule);
+    writeFile(kCrontab, kPlainCrontab + lineOf(each) + "\n");
+    EXPECT_EQ(crontabDifferences({task.get()}), Sentences{});
+    writeFile(kCrontab, kPlainCrontab);
+    EXPECT_EQ(crontabDifferences({task.get()}).size(), 1U);
+  }
+}
+
+TEST_F(ZeloschedTaskCheckTest, EachScheduleThatCronCannotReadIsNamed) {
+  for (const ScheduleCase &each : scheduleCases()) {
+    SCOPED_TRACE(each.what);
+    EXPECT_EQ(unreadableFieldsOf(*taskOf(each.schedule)).empty(), each.isReadable);
   }
 }
 

@@ -21,7 +21,7 @@
 #include "sched_store_lock.h"
 #include "sched_text.h"
 #include "sched_wait_status.h"
-#include "sched_week.h"
+#include "schedule_days.h"
 
 namespace {
 
@@ -134,16 +134,6 @@ int fillFromEntry(ZELO_SCHED_TASK *pTask, const ZELO_AUTOPOWER *psched, bool pow
 
 // ---- a task as an entry -----------------------------------------------------------------------
 
-unsigned char weekdaysOf(const ZELO_SCHED_TASK &task) {
-  unsigned mask = 0;
-  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
-    if (schedIsDayOn(task.Week, day)) {
-      mask |= 1U << day;
-    }
-  }
-  return static_cast<unsigned char>(mask);
-}
-
 // Hours and minutes that no clock shows are the platform's to refuse; what does not even fit into
 // the entry would become another time there, and goes no further.
 int makeEntry(ZELO_AUTOPOWER *pSched, const ZELO_SCHED_TASK *pTask) {
@@ -153,7 +143,7 @@ int makeEntry(ZELO_AUTOPOWER *pSched, const ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask->RunHour <= kMostOfByte, "255 >= pTask->RunHour", -1);
   SCHED_CHECK_ARG(pTask->RunMin <= kMostOfByte, "255 >= pTask->RunMin", -1);
   pSched->enabled = pTask->State == ZELO_SCHED_STATE_ENABLED ? 1 : 0;
-  pSched->weekdays = weekdaysOf(*pTask);
+  pSched->weekdays = static_cast<unsigned char>(schedWeekdayMaskOf(*pTask));
   pSched->hour = static_cast<unsigned char>(pTask->RunHour);
   pSched->minute = static_cast<unsigned char>(pTask->RunMin);
   return 0;

@@ -17,14 +17,13 @@
 #include "sched_hash.h"
 #include "sched_record.h"
 #include "sched_report.h"
-#include "sched_run_hours.h"
 #include "sched_shared_names.h"
 #include "sched_store_lock.h"
 #include "sched_surroundings.h"
 #include "sched_text.h"
 #include "sched_trigger_clock.h"
 #include "sched_wait_status.h"
-#include "sched_week.h"
+#include "schedule_cron.h"
 
 // A platform that has no holds looks at the file once a section, and is slower for it.
 #pragma weak QLIBCFileHoldBegin
@@ -48,7 +47,6 @@ constexpr char kCrontab[] = "/etc/crontab";
 constexpr char kCrontabDirectory[] = "/etc";
 constexpr char kCronPidFile[] = "/var/run/crond.pid";
 constexpr char kSignalCron[] = "/bin/kill -HUP `/bin/cat /var/run/crond.pid` > /dev/null 2>&1";
-constexpr char kTaskProgram[] = "/tmp/zeloschedtask";  // also what marks a crontab line as ours
 
 constexpr int kContainerCapacity = 1024;
 constexpr int kFound = 1;
@@ -691,70 +689,9 @@ int write_store(long id, const ZELO_SCHED_TASK *pTask) {
 
 // ---- the crontab --------------------------------------------------------------------------------
 
-using CronLine = BoundedText<8192>;
-using HourList = BoundedText<128>;
-using WeekdayList = BoundedText<16>;
-
-template <class List>
-void appendItem(List *list, int number) {
-  list->append("%s%d", list->c_str()[0] == '\0' ? "" : ",", number);
-}
-
-HourList hourList(const ZELO_SCHED_TASK &task) {
-  HourList hours;
-  anyRunHour(task, [&](uint32_t hour) {
-    appendItem(&hours, static_cast<int>(hour));
-    return false;
-  });
-  return hours;
-}
-
-WeekdayList weekdayList(const ZELO_SCHED_TASK &task) {
-  WeekdayList days;
-  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
-    if (schedIsDayOn(task.Week, day)) {
-      appendItem(&days, static_cast<int>(day));
-    }
-  }
-  return days;
-}
-
-void appendTime(CronLine *line, const ZELO_SCHED_TASK &task) {
-  line->appendNumber(task.RunMin).appendText("\t");
-  if (task.RepeatHour == 0) {
-    line->appendNumber(task.RunHour);
-  } else {
-    line->appendText(hourList(task).c_str());
-  }
-  line->appendText("\t");
-}
-
-// A crontab line cannot say a year: a task that runs once is started on its day every year, and the
-// check at the start of a run turns the other years away.
-void appendDays(CronLine *line, const ZELO_SCHED_TASK &task) {
-  switch (task.Type) {
-    case ZELO_SCHED_TYPE_ONCE:
-    case ZELO_SCHED_TYPE_YEARLY:
-      line->appendNumber(task.StartDay).appendText("\t");
-      line->appendNumber(task.StartMonth).appendText("\t*\t");
-      break;
-    case ZELO_SCHED_TYPE_MONTHLY:
-      line->appendNumber(task.StartDay).appendText("\t*\t*\t");
-      break;
-    case ZELO_SCHED_TYPE_WEEKLY:
-      line->appendText("*\t*\t").appendText(weekdayList(task).c_str()).appendText("\t");
-      break;
-    default:
-      line->appendText("*\t*\t*\t");
-      break;
-  }
-}
-
-int toCronLine(const ZELO_SCHED_TASK *pTask, CronLine *line) {
+int toCronLine(const ZELO_SCHED_TASK *pTask, SchedCronLine *line) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
-  appendTime(line, *pTask);
-  appendDays(line, *pTask);
-  line->append("root\t%s --run id=%ld", kTaskProgram, static_cast<long>(pTask->ID));
+  *line = schedCronLineOf(*pTask);
   return 0;
 }
 
@@ -765,7 +702,7 @@ int keepOtherLines(FILE *old, NewFile *crontab) {
   int result = 0;
   while (result == 0 && (length = getline(&buffer, &capacity, old)) >= 0) {
     const auto count = static_cast<size_t>(length);
-    if (memmem(buffer, count, kTaskProgram, strlen(kTaskProgram)) == nullptr) {
+    if (memmem(buffer, count, kSchedCronProgram, strlen(kSchedCronProgram)) == nullptr) {
       result = crontab->write(buffer, count);
     }
   }
@@ -781,12 +718,12 @@ int addTaskLines(const ZELO_SCHED_TASK *pTask, NewFile *crontab) {
     if (pTask->State != ZELO_SCHED_STATE_ENABLED) {
       continue;
     }
-    CronLine line;
+    SchedCronLine line;
     if (toCronLine(pTask, &line) < 0) {
       SCHED_LOG_CALLEE("Failed to convert task [%ld] to cron line. ", static_cast<long>(pTask->ID));
       return -1;
     }
-    if (crontab->endLine() < 0 || crontab->write(line.c_str(), strlen(line.c_str())) < 0 ||
+    if (crontab->endLine() < 0 || crontab->write(line.text, strlen(line.text)) < 0 ||
         crontab->write("\n", 1) < 0) {
       return -1;
     }

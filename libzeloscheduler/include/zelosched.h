@@ -225,9 +225,11 @@ ZELO_SCHED_API int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_T
 
 /* Fills the task from a hash; `next`, `Backend` and `NextTriggerTime` are left
  * alone. "id", "run hour", "run min", "name", "app", "app name", "action",
- * "cmd", "state" and "type" must be there, the rest have defaults. 0, or -1:
- * 0x0D00, 0x4000 when a number without a sign ("owner", "run hour", ...) has
- * trailing characters, or what the platform left, with the record partly filled. */
+ * "cmd", "state" and "type" must be there, the rest have defaults. Of a number
+ * that does not fit 32 bits the lowest 32 are kept: "4294967297" is read as 1.
+ * 0, or -1: 0x0D00, 0x4000 when a number without a sign ("owner", "run hour",
+ * ...) has trailing characters, or what the platform left, with the record
+ * partly filled. */
 ZELO_SCHED_API int ZELOSchedInitTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash);
 
 /* ---- JSON: a task as a text for a browser ----------------------------------- */
@@ -348,7 +350,8 @@ ZELO_SCHED_API int ZELOSchedTimeParse(const char *szTimeOrg, ZELO_SCHED_DATE *pD
 
 /* Rolls fields that are out of range over (32 January becomes 1 February) and
  * works out the weekday. The time is taken as standard time: in summer time it
- * comes back one hour later. 0, or -1: 0x0D00, 0x2A00. */
+ * comes back one hour later. 0, or -1 with the date left alone: 0x0D00; 0x2A00,
+ * also when the year would be too great to be counted. */
 ZELO_SCHED_API int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate);
 
 /* Seeds rand() from the time and the process id, once in a process. */

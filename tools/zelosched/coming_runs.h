@@ -13,11 +13,12 @@
 
 #include <chrono>
 #include <compare>
-#include <cstddef>
 #include <ctime>
 #include <optional>
 #include <string>
 #include <vector>
+
+#include "schedule_runs.h"
 
 // A minute on the local clock.
 struct LocalMinute {
@@ -38,10 +39,16 @@ std::string timeText(const LocalMinute &minute);  // "18:30"
 std::string minuteText(const LocalMinute &minute);
 const char *weekdayName(const LocalMinute &minute);
 
-// The next runs after `after`, at most `count` and none behind `last`; fewer when there are no
-// more. Whether the task is enabled is not asked.
-std::vector<LocalMinute> comingRuns(const ZELO_SCHED_TASK &task, const LocalMinute &after,
-                                    size_t count, const std::optional<LocalMinute> &last = {});
+// The runs of a task after a minute, one after the other, until there are no more. The task must
+// stay as long as this does. Whether it is enabled is not asked.
+class ComingRuns {
+ public:
+  ComingRuns(const ZELO_SCHED_TASK &task, const LocalMinute &after);
+  std::optional<LocalMinute> next();
+
+ private:
+  SchedRuns runs_;
+};
 
 // Every run after `after`, up to and including `last`.
 std::vector<LocalMinute> runsBetween(const ZELO_SCHED_TASK &task, const LocalMinute &after,

@@ -6,8 +6,5 @@
 #include <string>
 #include <vector>
 
-// The line that starts the task, without its line feed.
-std::string crontabLine(const ZELO_SCHED_TASK &task);
-
 // A sentence for each way in which the crontab and the enabled tasks differ; none when they agree.
 std::vector<std::string> crontabDifferences(const std::vector<const ZELO_SCHED_TASK *> &tasks);

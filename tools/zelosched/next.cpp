@@ -2,6 +2,8 @@
 #include <algorithm>
 #include <cstdio>
 #include <ctime>
+#include <queue>
+#include <tuple>
 
 #include "coming_runs.h"
 #include "command.h"
@@ -21,71 +23,79 @@ constexpr long kMostRuns = 10000;
 
 struct Entry {
   LocalMinute run;
-  int32_t id;
-  std::string name;
-  bool operator<(const Entry &other) const {
-    return std::tie(run, id) < std::tie(other.run, other.id);
-  }
+  const TaskRecord *task;
 };
 
-// The first runs of several tasks. Of a task that comes later, only those before the last of them
-// are worked out, and never more than are wanted of all.
+// The first runs of several tasks, by their time and then by the tasks' ids.
 class FirstRuns {
  public:
-  FirstRuns(const LocalMinute &now, size_t count) : now_(now), count_(count) {}
+  explicit FirstRuns(const LocalMinute &now) : now_(now) {}
 
-  void add(const ZELO_SCHED_TASK &task) {
-    for (const LocalMinute &run : comingRuns(task, now_, count_, last_)) {
-      entries_.push_back({run, task.ID, task.Name});
+  // All of them stay as long as this does.
+  void add(Task task) {
+    add(*task);
+    named_.push_back(std::move(task));
+  }
+  void add(std::unique_ptr<TaskList> list) {
+    for (const TaskRecord *task : list->tasks()) {
+      if (isEnabled(*task)) add(*task);
     }
-    if (entries_.size() > 2 * count_) prune();
+    all_ = std::move(list);
   }
 
-  std::vector<Entry> take() {
-    prune();
-    return std::move(entries_);
+  std::vector<Entry> take(size_t count) {
+    std::priority_queue queue(isLater, std::vector<Source *>());
+    const auto advance = [&](Source *source) {
+      source->run = source->runs.next();
+      if (source->run) queue.push(source);
+    };
+    for (Source &source : sources_) advance(&source);
+    std::vector<Entry> entries;
+    while (entries.size() < count && !queue.empty()) {
+      Source *source = queue.top();
+      queue.pop();
+      entries.push_back({*source->run, source->task});
+      advance(source);
+    }
+    return entries;
   }
 
  private:
-  void prune() {
-    std::sort(entries_.begin(), entries_.end());
-    if (entries_.size() < count_) return;
-    entries_.erase(entries_.begin() + static_cast<long>(count_), entries_.end());
-    last_ = entries_.back().run;
+  struct Source {
+    const TaskRecord *task;
+    ComingRuns runs;
+    std::optional<LocalMinute> run;  // the next one
+  };
+
+  static bool isLater(const Source *a, const Source *b) {
+    return std::tie(*b->run, b->task->ID) < std::tie(*a->run, a->task->ID);
+  }
+
+  void add(const TaskRecord &task) {
+    sources_.push_back({&task, ComingRuns(task, now_), std::nullopt});
   }
 
   LocalMinute now_;
-  size_t count_;
-  std::vector<Entry> entries_;
-  std::optional<LocalMinute> last_;
+  std::vector<Task> named_;
+  std::unique_ptr<TaskList> all_;
+  std::vector<Source> sources_;
 };
 
+// A disabled task is told.
 void addNamed(long id, FirstRuns *runs) {
-  const Task task = loadTask(id);
+  Task task = loadTask(id);
   if (isEnabled(*task)) {
-    runs->add(*task);
+    runs->add(std::move(task));
   } else {
     complain(titleOf(*task) + " is disabled: it will not run");
   }
-}
-
-// Disabled tasks and those that are not there are told.
-int addTasks(const Arguments &arguments, FirstRuns *runs) {
-  if (!arguments.operands().empty()) {
-    return forEachId(parseIds(arguments.operands()), [&](long id) { addNamed(id, runs); });
-  }
-  const TaskList list;
-  for (const ZELO_SCHED_TASK *task : list.tasks()) {
-    if (isEnabled(*task)) runs->add(*task);
-  }
-  return kDone;
 }
 
 void print(const std::vector<Entry> &entries) {
   const size_t columns = terminalColumns().value_or(0);
   size_t idWidth = 0;
   for (const Entry &entry : entries) {
-    idWidth = std::max(idWidth, std::to_string(entry.id).size());
+    idWidth = std::max(idWidth, std::to_string(entry.task->ID).size());
   }
   std::string day;
   for (const Entry &entry : entries) {
@@ -94,10 +104,10 @@ void print(const std::vector<Entry> &entries) {
       day = dayText(entry.run);
       std::printf("%s %s\n", day.c_str(), weekdayName(entry.run));
     }
-    const std::string id = std::to_string(entry.id);
+    const std::string id = std::to_string(entry.task->ID);
     const std::string line = "  " + timeText(entry.run) + "  " +
                              std::string(idWidth - id.size(), ' ') + id + "  " +
-                             printable(entry.name);
+                             printable(entry.task->Name);
     std::puts((columns == 0 ? line : fitted(line, columns)).c_str());
   }
 }
@@ -107,8 +117,8 @@ void printAsJson(const std::vector<Entry> &entries) {
   for (const Entry &entry : entries) {
     Json::Value object;
     object["run"] = minuteText(entry.run);
-    object["id"] = entry.id;
-    object["name"] = jsonText(entry.name);
+    object["id"] = entry.task->ID;
+    object["name"] = jsonText(entry.task->Name);
     objects.push_back(std::move(object));
   }
   printJson(objects);
@@ -119,9 +129,14 @@ int runNext(int argc, char **argv) {
   arguments.requireNoCommand();
   const auto count =
       static_cast<size_t>(arguments.number("count", 1, kMostRuns).value_or(kUsualCount));
-  FirstRuns runs(localMinute(time(nullptr)), count);
-  const int status = addTasks(arguments, &runs);
-  const std::vector<Entry> entries = runs.take();
+  FirstRuns runs(localMinute(time(nullptr)));
+  int status = kDone;
+  if (arguments.operands().empty()) {
+    runs.add(std::make_unique<TaskList>());
+  } else {
+    status = forEachId(parseIds(arguments.operands()), [&](long id) { addNamed(id, &runs); });
+  }
+  const std::vector<Entry> entries = runs.take(count);
   if (arguments.has("json")) {
     printAsJson(entries);
   } else {

@@ -5,6 +5,7 @@
 
 #include <climits>
 #include <cstdint>
+#include <map>
 #include <memory>
 
 #include "options.h"
@@ -16,9 +17,18 @@ struct FreeUser {
 };
 using User = std::unique_ptr<ZELOUSER, FreeUser>;
 
-User lookUp(uid_t uid) {
-  PZELOUSER user = nullptr;
-  return User(ZELOUserGetByUID(uid, &user) == 0 ? user : nullptr);
+// The name; none for a number without a user. The tasks of a list have few owners, and looking one
+// up reads a file.
+const std::optional<std::string> &nameOf(uid_t uid) {
+  static std::map<uid_t, std::optional<std::string>> known;
+  const auto [found, isNew] = known.try_emplace(uid);
+  if (isNew) {
+    PZELOUSER record = nullptr;
+    const bool isUser = ZELOUserGetByUID(uid, &record) == 0;
+    const User user(isUser ? record : nullptr);
+    if (isUser) found->second = user->szName;
+  }
+  return found->second;
 }
 
 }  // namespace
@@ -33,10 +43,9 @@ std::optional<uid_t> findUser(const std::string &nameOrNumber) {
 }
 
 bool userExists(uid_t uid) {
-  return lookUp(uid) != nullptr;
+  return nameOf(uid).has_value();
 }
 
 std::string userName(uid_t uid) {
-  const User user = lookUp(uid);
-  return user != nullptr ? user->szName : std::to_string(uid);
+  return nameOf(uid).value_or(std::to_string(uid));
 }

@@ -4,7 +4,7 @@
 #include <cstring>
 
 #include "failure.h"
-#include "sched_week.h"
+#include "schedule_days.h"
 #include "task_list.h"
 
 namespace {
@@ -23,10 +23,7 @@ std::string directionOf(const ZELO_SCHED_TASK &task) {
 }
 
 int32_t powerId(const ZELO_SCHED_TASK &task) {
-  int32_t weekdays = 0;
-  for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
-    if (schedIsDayOn(task.Week, day)) weekdays |= 1 << day;
-  }
+  const auto weekdays = static_cast<int32_t>(schedWeekdayMaskOf(task));
   const int32_t base = directionOf(task) == "off" ? kPowerOff : kPowerOn;
   return base + (isEnabled(task) ? kEnabled : 0) + weekdays * kWeekdays +
          static_cast<int32_t>(task.RunHour) * kHour + static_cast<int32_t>(task.RunMin);

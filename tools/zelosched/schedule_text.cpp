@@ -12,13 +12,13 @@
 
 #include "failure.h"
 #include "options.h"
-#include "sched_week.h"
+#include "schedule_days.h"
+#include "schedule_hours.h"
 #include "text.h"
 
 namespace {
 
 constexpr char kEveryDay[] = "1111111";
-constexpr uint32_t kLastHour = 23;
 constexpr const char *kShortDays[kDaysOfWeek] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
 constexpr const char *kLongDays[kDaysOfWeek] = {"sunday",   "monday", "tuesday", "wednesday",
                                                 "thursday", "friday", "saturday"};
@@ -188,7 +188,7 @@ std::string dateOf(const ZELO_SCHED_TASK &task) {
 std::string daysOf(const ZELO_SCHED_TASK &task) {
   std::vector<const char *> names;
   for (uint32_t day = 0; day < kDaysOfWeek; ++day) {
-    if (schedIsDayOn(task.Week, day)) names.push_back(kShortDays[day]);
+    if (schedIsWeekdayOn(task, day)) names.push_back(kShortDays[day]);
   }
   if (names.empty()) return "no day";
   std::string text;
@@ -273,10 +273,10 @@ void setEvery(ZELO_SCHED_TASK *task, const std::string &text) {
   }
   const std::string number = text.ends_with('h') ? text.substr(0, text.size() - 1) : text;
   const std::optional<uint32_t> hours = digits(number, kMostDigits);
-  if (!hours || *hours < 1 || *hours > kLastHour) {
+  if (!hours || *hours < 1 || *hours > kLastHourOfDay) {
     refuse(text, "number of hours from 1 to 23", "2h, or off for one run a day");
   }
-  if (task->RepeatHour == 0) task->LastWorkHour = kLastHour;
+  if (task->RepeatHour == 0) task->LastWorkHour = kLastHourOfDay;
   task->RepeatHour = *hours;
 }
 

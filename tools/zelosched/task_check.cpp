@@ -5,28 +5,23 @@
 
 #include "coming_runs.h"
 #include "owner.h"
-#include "sched_cron_fields.h"
+#include "schedule_cron.h"
+#include "schedule_days.h"
+#include "schedule_runs.h"
 #include "schedule_text.h"
 #include "task_list.h"
 #include "text.h"
 
 namespace {
 
-constexpr uint32_t kMonths = 12;
-constexpr uint32_t kMostDays = 31;
-constexpr uint32_t kLastYear = 9999;
 constexpr int kLeapYear = 2024;
 
-bool hasMonth(const ZELO_SCHED_TASK &task) {
-  return task.Type == ZELO_SCHED_TYPE_ONCE || task.Type == ZELO_SCHED_TYPE_YEARLY;
-}
-
 bool isDay(const ZELO_SCHED_TASK &task) {
-  return task.StartDay >= 1 && task.StartDay <= kMostDays;
+  return task.StartDay >= 1 && task.StartDay <= kMostDaysOfMonth;
 }
 
 bool isMonth(const ZELO_SCHED_TASK &task) {
-  return task.StartMonth >= 1 && task.StartMonth <= kMonths;
+  return task.StartMonth >= 1 && task.StartMonth <= kMonthsOfYear;
 }
 
 size_t weekLength(const ZELO_SCHED_TASK &task) {
@@ -92,7 +87,8 @@ std::string lateYear(const ZELO_SCHED_TASK &task) {
 }
 
 std::string neverExists(const ZELO_SCHED_TASK &task) {
-  if (!hasMonth(task) || !isDay(task) || !isMonth(task) || task.StartYear > kLastYear) return "";
+  if (!schedHasMonth(task) || !isDay(task) || !isMonth(task) || task.StartYear > kLastYear)
+    return "";
   const bool isOnce = task.Type == ZELO_SCHED_TYPE_ONCE;
   // 29 February comes in leap years, to a task that runs every year.
   if (isOnce ? dateExists(task) : dayExists(kLeapYear, task)) return "";
@@ -103,7 +99,7 @@ std::string neverExists(const ZELO_SCHED_TASK &task) {
 // Of a start date, a zero stands for the beginning.
 bool canStart(const ZELO_SCHED_TASK &task) {
   if (task.StartMonth != 0 && task.StartDay != 0) return dateExists(task);
-  return task.StartMonth <= kMonths && task.StartDay <= kMostDays;
+  return task.StartMonth <= kMonthsOfYear && task.StartDay <= kMostDaysOfMonth;
 }
 
 // Of the other types the day is the schedule, or the date is, which is looked at above.
@@ -111,7 +107,7 @@ std::string badStart(const ZELO_SCHED_TASK &task) {
   const bool isFree = task.Type == ZELO_SCHED_TYPE_DAILY || task.Type == ZELO_SCHED_TYPE_WEEKLY;
   const bool isMonthly = task.Type == ZELO_SCHED_TYPE_MONTHLY;
   const bool isBad = (isFree && task.StartYear <= kLastYear && !canStart(task)) ||
-                     (isMonthly && task.StartMonth > kMonths);
+                     (isMonthly && task.StartMonth > kMonthsOfYear);
   if (!isBad) return "";
   return "the start date " + number(task.StartYear) + "-" + number(task.StartMonth) + "-" +
          number(task.StartDay) + " does not exist: write --start with a day that its month has";
@@ -231,7 +227,7 @@ std::vector<std::string> unreadableFieldsOf(const ZELO_SCHED_TASK &task) {
 
 std::string pastSchedule(const ZELO_SCHED_TASK &task, time_t now) {
   if (task.Type != ZELO_SCHED_TYPE_ONCE || !harmsOf(task).empty()) return "";
-  if (!comingRuns(task, localMinute(now), 1).empty()) return "";
+  if (ComingRuns(task, localMinute(now)).next()) return "";
   if (isSkipped(task)) {
     return scheduleInWords(task).substr(strlen("once on ")) +
            " does not come, as the clocks go forward then: write another time";

@@ -1,0 +1,14 @@
+// Whether a task that cron has started is to run. Cron starts one also before its start date, and
+// one that runs once every year; this turns them away.
+#ifndef SCHEDULE_DUE_H
+#define SCHEDULE_DUE_H
+
+#include <zelosched.h>
+
+// Whether the task may run on that day: the start date, or a later one that the type names.
+bool schedIsDueDay(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &day);
+
+// Whether it is due in that minute.
+bool schedIsDue(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now);
+
+#endif
