@@ -12,6 +12,7 @@
 #include "fake_backends.h"
 #include "power.h"
 #include "sandbox_fixture.h"
+#include "schedule_cases.h"
 #include "tasks.h"
 
 namespace {
@@ -515,27 +516,34 @@ TEST_F(TaskFromJsonTest, TheIdThatWasReadStandsInTheLine) {
 
 // ---- what cron could not read -----------------------------------------------------------------
 
-// One such line, and cron starts nothing of the whole crontab.
-const Members kUnreadable[] = {
-    {{"run hour", "24"}},
-    {{"run hour", "4294967295"}},
-    {{"run hour", "24"}, {"repeat hour", "1"}, {"last work hour", "23"}},
-    {{"run hour", "99"}, {"repeat hour", "24"}, {"last work hour", "4294967295"}},
-    {{"run min", "60"}},
-    {{"run min", "99"}},
-    {{"type", "once"}, {"start day", "0"}},
-    {{"type", "once"}, {"start day", "32"}},
-    {{"type", "once"}, {"start month", "0"}},
-    {{"type", "once"}, {"start month", "13"}},
-    {{"type", "monthly"}, {"start day", "0"}},
-    {{"type", "monthly"}, {"start day", "4294967295"}},
-    {{"type", "yearly"}, {"start day", "32"}},
-    {{"type", "yearly"}, {"start month", "13"}},
-    {{"type", "weekly"}, {"week", "0000000"}},
-};
+// What the schedule is in JSON.
+Members membersOf(const support::Schedule &schedule) {
+  constexpr const char *kTypes[] = {"once", "daily", "weekly", "monthly", "yearly"};
+  const std::string week(schedule.week.substr(0, schedule.week.find('\0')));
+  return {{"type", kTypes[schedule.type]},
+          {"week", week},
+          {"start year", std::to_string(schedule.start.year)},
+          {"start month", std::to_string(schedule.start.month)},
+          {"start day", std::to_string(schedule.start.day)},
+          {"run hour", std::to_string(schedule.hour)},
+          {"run min", std::to_string(schedule.minute)},
+          {"repeat hour", std::to_string(schedule.repeat)},
+          {"last work hour", std::to_string(schedule.last)}};
+}
+
+// Where cron cannot read one line, it starts nothing of the whole crontab.
+std::vector<Members> schedules(bool isReadable) {
+  std::vector<Members> all;
+  for (const support::ScheduleCase &each : support::scheduleCases()) {
+    if (each.isReadable == isReadable && support::isStorable(each.schedule)) {
+      all.push_back(membersOf(each.schedule));
+    }
+  }
+  return all;
+}
 
 TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsRefused) {
-  for (const Members &schedule : kUnreadable) {
+  for (const Members &schedule : schedules(false)) {
     SCOPED_TRACE(objectOf(schedule));
     expectRefused(taskText(schedule), "hash to task failed, task id=-1");
     for (const char *state : {"disabled", "NotExisted"}) {
@@ -554,7 +562,7 @@ TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsRefused) {
 TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsNotSavedOverTheStoredTask) {
   ASSERT_EQ(save(taskText()), 1);
   const std::string before = support::readFile(support::kStore);
-  for (Members schedule : kUnreadable) {
+  for (Members schedule : schedules(false)) {
     SCOPED_TRACE(objectOf(schedule));
     schedule.emplace_back("id", "1");
     EXPECT_EQ(save(taskText(schedule)), -1);
@@ -565,21 +573,8 @@ TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsNotSavedOverTheStoredTask)
 }
 
 TEST_F(TaskFromJsonTest, WhatCronReadsIsSaved) {
-  const Members kReadable[] = {
-      {{"run hour", "23"}, {"run min", "59"}},
-      {{"last work hour", "99"}},                                // of no effect without repeats
-      {{"repeat hour", "1"}, {"last work hour", "4294967295"}},  // the line ends with hour 23
-      {{"start day", "0"}, {"start month", "99"}},               // of a daily task
-      {{"type", "monthly"}, {"start day", "31"}, {"start month", "0"}},
-      {{"type", "yearly"}, {"start day", "31"}, {"start month", "2"}},  // which never comes
-      {{"type", "once"}, {"start day", "1"}, {"start month", "12"}},
-      {{"type", "weekly"}, {"week", "0000001"}},
-      {{"type", "weekly"}, {"week", "000"}},  // the days behind its end are on
-      {{"type", "weekly"}, {"week", ""}},
-      {{"week", "0000000"}},  // of a daily task
-  };
   int id = 0;
-  for (const Members &schedule : kReadable) {
+  for (const Members &schedule : schedules(true)) {
     SCOPED_TRACE(objectOf(schedule));
     EXPECT_EQ(save(taskText(schedule), 1), ++id);
   }
