@@ -26,10 +26,6 @@
 #include "sched_wait_status.h"
 #include "sched_week.h"
 
-// A platform that has no holds looks at the file once a section, and is slower for it.
-#pragma weak QLIBCFileHoldBegin
-#pragma weak QLIBCFileHoldEnd
-
 namespace {
 
 constexpr char kName[] = "zeloschedule";
@@ -118,27 +114,6 @@ int setNextTrigger(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
   return 0;
 }
 
-// The store as it was when it was last looked at. Nobody's code but ours runs in between: a filter
-// may change the store, and sees what it changed.
-class StoreHold {
- public:
-  StoreHold() {
-    if (isKnown()) {
-      QLIBCFileHoldBegin();
-    }
-  }
-  ~StoreHold() {
-    if (isKnown()) {
-      QLIBCFileHoldEnd();
-    }
-  }
-  StoreHold(const StoreHold &) = delete;
-  StoreHold &operator=(const StoreHold &) = delete;
-
- private:
-  static bool isKnown() { return QLIBCFileHoldBegin != nullptr && QLIBCFileHoldEnd != nullptr; }
-};
-
 // Walks over the sections of the store. One bad section must not hide the others: the walk goes on
 // behind one that cannot be read, and one that is gone since the names were listed is passed over.
 class StoreWalk {
@@ -168,7 +143,6 @@ class StoreWalk {
 
   // To the next section. False at the end.
   bool next() {
-    const StoreHold hold;
     while (next_ < sections_) {
       szSection_ = QLIBCSzListGet(names_.get(), next_++);
       read_ = readSection(szSection_, &hash_);
