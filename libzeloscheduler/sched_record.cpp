@@ -26,7 +26,7 @@ namespace {
 // A record that is kept keeps its block, of two megabytes at most.
 constexpr size_t kMostInBlock = 64;
 
-// The block made or asked for last is in front: lists are mostly freed in order.
+// The newest in front: the records of a list are mostly freed in that order.
 SchedBlock *blocks = nullptr;
 
 SchedBlock *newBlock(size_t room) {
@@ -39,43 +39,27 @@ SchedBlock *newBlock(size_t room) {
   return block;
 }
 
-void toFront(SchedBlock **link) {
-  SchedBlock *block = *link;
-  *link = block->next;
-  block->next = blocks;
-  blocks = block;
-}
-
-// It is in front then. Null for a record that was allocated by itself.
-SchedBlock *blockOf(const ZELO_SCHED_TASK *pTask) {
+// One holder less for the block that the record is in. False for a record that was allocated by
+// itself.
+bool release(const ZELO_SCHED_TASK *pTask) {
   for (SchedBlock **link = &blocks; *link != nullptr; link = &(*link)->next) {
-    if ((*link)->holds(pTask)) {
-      toFront(link);
-      return blocks;
+    SchedBlock *block = *link;
+    if (!block->holds(pTask)) {
+      continue;
     }
+    if (--block->holders == 0) {
+      *link = block->next;
+      free(block);
+    }
+    return true;
   }
-  return nullptr;
-}
-
-void release(SchedBlock *block) {
-  if (--block->holders > 0) {
-    return;
-  }
-  SchedBlock **link = &blocks;
-  while (*link != block) {
-    link = &(*link)->next;
-  }
-  *link = block->next;
-  free(block);
+  return false;
 }
 
 }  // namespace
 
 void schedRecordFree(ZELO_SCHED_TASK *pTask) {
-  SchedBlock *block = blockOf(pTask);
-  if (block != nullptr) {
-    release(block);
-  } else {
+  if (!release(pTask)) {
     free(pTask);
   }
 }
@@ -89,13 +73,13 @@ SchedRecordSource::SchedRecordSource(int mostRecords)
 
 SchedRecordSource::~SchedRecordSource() {
   if (block_ != nullptr) {
-    release(block_);
+    release(block_->records());
   }
 }
 
 TaskGuard SchedRecordSource::take() {
   if (block_ != nullptr && block_->taken == block_->room) {
-    release(block_);
+    release(block_->records());
     block_ = nullptr;
   }
   if (block_ == nullptr) {
