@@ -378,6 +378,21 @@ TEST_F(StoreTest, TheIdsOfTasksAreNotFreeWhileThereIsNoClock) {
                                      "sched_util.cpp:N]"));
 }
 
+TEST_F(StoreTest, ATaskWhoseStateOrTypeHasNoNameIsStoredAndNeverSeenAgain) {
+  for (const auto field : {&ZELO_SCHED_TASK::State, &ZELO_SCHED_TASK::Type}) {
+    const Task task = makeTask("lost", "true");
+    task.get()->*field = 5;
+    EXPECT_EQ(backend_.create(task.get()), 0);
+    EXPECT_EQ(task->ID, 1);
+    ZELO_SCHED_TASK *head = nullptr;
+    EXPECT_EQ(backend_.list_get(&head, nullptr), 0);
+    EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  }
+  const Task task = makeTask("next", "true");
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(task->ID, 1);
+}
+
 TEST_F(StoreTest, ARecordThatCannotBeAllocatedFailsTheWholeList) {
   if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer allocates itself";
   for (const char *section : {"1", "2", "3"}) addSection(section, std::atoi(section));

@@ -25,10 +25,6 @@
 #include "sched_wait_status.h"
 #include "schedule_cron.h"
 
-// A platform that has no holds looks at the file once a section, and is slower for it.
-#pragma weak QLIBCFileHoldBegin
-#pragma weak QLIBCFileHoldEnd
-
 namespace {
 
 constexpr char kName[] = "zeloschedule";
@@ -123,27 +119,6 @@ int setNextTrigger(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
   return 0;
 }
 
-// The store as it was when it was last looked at. Nobody's code but ours runs in between: a filter
-// may change the store, and sees what it changed.
-class StoreHold {
- public:
-  StoreHold() {
-    if (isKnown()) {
-      QLIBCFileHoldBegin();
-    }
-  }
-  ~StoreHold() {
-    if (isKnown()) {
-      QLIBCFileHoldEnd();
-    }
-  }
-  StoreHold(const StoreHold &) = delete;
-  StoreHold &operator=(const StoreHold &) = delete;
-
- private:
-  static bool isKnown() { return QLIBCFileHoldBegin != nullptr && QLIBCFileHoldEnd != nullptr; }
-};
-
 // Walks over the sections of the store. One bad section must not hide the others: the walk goes on
 // behind one that cannot be read, and one that is gone since the names were listed is passed over.
 class StoreWalk {
@@ -173,7 +148,6 @@ class StoreWalk {
 
   // To the next section. False at the end.
   bool next() {
-    const StoreHold hold;
     while (next_ < sections_) {
       szSection_ = QLIBCSzListGet(names_.get(), next_++);
       read_ = readSection(szSection_, &hash_);
@@ -217,10 +191,11 @@ TaskGuard recordFor(const StoreWalk &walk, TaskGuard task) {
 
 // One record that serves for all tasks of a walk, emptied. 0 or -1.
 int emptyRecordFor(const StoreWalk &walk, TaskGuard *task) {
-  if (*task == nullptr && (*task = recordFor(walk, schedRecordAlloc())) == nullptr) {
-    return -1;
+  if (*task == nullptr) {
+    *task = recordFor(walk, schedRecordAlloc());
+    return *task == nullptr ? -1 : 0;
   }
-  schedRecordEmpty(task->get());
+  memset(task->get(), 0, sizeof(ZELO_SCHED_TASK));
   return 0;
 }
 
@@ -235,8 +210,7 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
     takeFreeStore();
     return 0;
   }
-  const auto known = filter == nullptr ? SchedRecordCount::kExpected : SchedRecordCount::kAtMost;
-  SchedRecordSource records(known, sections, SchedRecordExtent::kWhole);
+  SchedRecordSource records(sections);
   TaskChain tasks;
   int count = 0;
   TaskGuard task;
@@ -764,47 +738,73 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   return syncFile(kCrontabDirectory, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
-// Every task that list_get lists, but of each record no more than its crontab line needs: the texts
-// are most of a record, and zeroing them would be most of the work. They are linked in the order of
-// the store, in which they also lie in memory: a sort by a number, which is by memory, leaves it.
-// The number of tasks, or -1.
-int listSchedules(TaskChain *tasks) {
-  StoreWalk walk;
-  const int sections = walk.open();
-  if (sections < 0) {
-    return -1;
+// What says when each task runs, as a list of records in one array. They lie there in the order of
+// the store, which a sort by a number, which is by memory, leaves. The texts of a record, its
+// largest part, stay untouched, and so take no memory.
+class Schedules {
+ public:
+  // The number of tasks, or -1.
+  int read() {
+    StoreWalk walk;
+    const int sections = walk.open();
+    if (sections <= 0) {
+      return sections;
+    }
+    tasks_.reset(static_cast<ZELO_SCHED_TASK *>(
+        calloc(static_cast<size_t>(sections), sizeof(ZELO_SCHED_TASK))));
+    ZELO_SCHED_TASK **end = &head_;
+    int count = 0;
+    TaskGuard task;
+    while (walk.next()) {
+      if (!walk.isRead()) {
+        continue;
+      }
+      if (!hasRoom(walk) || emptyRecordFor(walk, &task) < 0) {
+        return -1;
+      }
+      if (walk.fill(task.get()) == 0) {
+        *end = &tasks_[count++];
+        copySchedule(*end, *task);
+        end = &(*end)->next;
+      }
+    }
+    return count;
   }
-  SchedRecordSource records(SchedRecordCount::kExpected, sections, SchedRecordExtent::kSchedule);
-  ZELO_SCHED_TASK **end = tasks->handle();
-  int count = 0;
-  TaskGuard task;
-  while (walk.next()) {
-    if (!walk.isRead()) {
-      continue;
+
+  ZELO_SCHED_TASK **handle() { return &head_; }
+  const ZELO_SCHED_TASK *head() const { return head_; }
+
+ private:
+  bool hasRoom(const StoreWalk &walk) const {
+    if (tasks_ == nullptr) {
+      recordFor(walk, nullptr);
     }
-    if (emptyRecordFor(walk, &task) < 0) {
-      return -1;
-    }
-    if (walk.fill(task.get()) < 0) {
-      continue;
-    }
-    TaskGuard kept = recordFor(walk, records.take());
-    if (kept == nullptr) {
-      return -1;
-    }
-    schedRecordCopySchedule(kept.get(), *task);
-    *end = kept.release();
-    end = &(*end)->next;
-    ++count;
+    return tasks_ != nullptr;
   }
-  return count;
-}
+
+  static void copySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from) {
+    pTo->ID = from.ID;
+    pTo->State = from.State;
+    pTo->Type = from.Type;
+    memcpy(pTo->Week, from.Week, sizeof(pTo->Week));
+    pTo->StartYear = from.StartYear;
+    pTo->StartMonth = from.StartMonth;
+    pTo->StartDay = from.StartDay;
+    pTo->RunHour = from.RunHour;
+    pTo->RunMin = from.RunMin;
+    pTo->RepeatHour = from.RepeatHour;
+    pTo->LastWorkHour = from.LastWorkHour;
+  }
+
+  std::unique_ptr<ZELO_SCHED_TASK[], MemoryDeleter> tasks_;
+  ZELO_SCHED_TASK *head_ = nullptr;
+};
 
 // A crontab that could not be rewritten is told in the log alone: the task is stored, and the next
 // change or sync writes the crontab whole.
 int writeCrontab() {
-  TaskChain tasks;
-  const int count = listSchedules(&tasks);
+  Schedules tasks;
+  const int count = tasks.read();
   if (count < 0) {
     SCHED_LOG_CALLEE("get task list failed. ");
     return count;

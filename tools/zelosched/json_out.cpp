@@ -12,6 +12,7 @@
 
 #include "failure.h"
 #include "options.h"
+#include "sched_utf8.h"
 #include "task_check.h"
 #include "text.h"
 
@@ -106,7 +107,7 @@ std::string valid(std::string_view text, bool *isWhole) {
   std::string out;
   *isWhole = true;
   while (!text.empty()) {
-    const size_t bytes = utf8Length(text);
+    const size_t bytes = schedFirstCharacter(text).bytes;
     *isWhole = *isWhole && bytes > 0;
     out += bytes > 0 ? std::string(text.substr(0, bytes)) : kReplacement;
     text.remove_prefix(std::max<size_t>(bytes, 1));
