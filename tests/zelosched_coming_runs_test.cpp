@@ -6,7 +6,7 @@
 #include <map>
 #include <random>
 
-#include "coming_runs.h"
+#include "runs/coming_runs.h"
 #include "fake_clock.h"
 #include "sandbox_fixture.h"
 #include "schedule_cases.h"

@@ -5,7 +5,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include "processes.h"
+#include "runs/processes.h"
 #include "sandbox_fixture.h"
 
 namespace support {

@@ -1,9 +1,9 @@
 // Schedules as people say them.
 #include <gtest/gtest.h>
 
-#include "options.h"
+#include "commands/options.h"
 #include "sandbox_fixture.h"
-#include "schedule_text.h"
+#include "terminal/schedule_text.h"
 #include "tasks.h"
 
 namespace support {

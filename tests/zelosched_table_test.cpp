@@ -1,8 +1,8 @@
 // Aligned output: what is safe to print, how wide it is, and how a table fits.
 #include <gtest/gtest.h>
 
-#include "table.h"
-#include "text.h"
+#include "terminal/table.h"
+#include "terminal/text.h"
 
 namespace support {
 namespace {

@@ -3,11 +3,11 @@
 
 #include <functional>
 
-#include "crontab_check.h"
+#include "check/crontab_check.h"
 #include "fake_clock.h"
 #include "sandbox_fixture.h"
 #include "schedule_cases.h"
-#include "task_check.h"
+#include "check/task_check.h"
 #include "tasks.h"
 
 namespace support {

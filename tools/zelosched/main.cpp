@@ -10,9 +10,9 @@
 #include <cstring>
 #include <exception>
 
-#include "command.h"
-#include "options.h"
-#include "text.h"
+#include "commands/command.h"
+#include "commands/options.h"
+#include "terminal/text.h"
 
 namespace {
 

@@ -1,0 +1,59 @@
+// zelosched add
+#include <cstdio>
+#include <ctime>
+
+#include "check/task_check.h"
+#include "commands/command.h"
+#include "commands/task_options.h"
+#include "runs/coming_runs.h"
+#include "store/change_lock.h"
+#include "store/save.h"
+#include "store/task_list.h"
+#include "terminal/failure.h"
+#include "terminal/schedule_text.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr Option kOptions[] = {TASK_OPTIONS, {"disabled"}, {"quiet", Option::kNone, 'q'}};
+
+void announce(const ZELO_SCHED_TASK &task) {
+  const std::optional<LocalMinute> next = nextRun(task, localMinute(time(nullptr)));
+  std::printf("%s added: %s", titleOf(task).c_str(), scheduleInWords(task).c_str());
+  if (next) std::printf("; runs next at %s", minuteText(*next).c_str());
+  std::puts(isEnabled(task) ? "" : "; disabled");
+}
+
+int runAdd(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoOperands();
+  if (!hasSchedule(arguments)) throw UsageError("when? Give --daily 08:30, say");
+  if (!arguments.afterDashes()) throw UsageError("what? Give the command after '--'");
+  const ChangeLock lock;
+  const Task task = newTask(ZELO_SCHED_BACKEND_SCHEDULE);
+  applyTaskOptions(arguments, task.get());
+  if (arguments.has("disabled")) task->State = ZELO_SCHED_STATE_DISABLED;
+  requireHarmless(*task);
+  const std::string past = pastSchedule(*task, time(nullptr));
+  if (!past.empty()) throw Failure("not saved: " + past);
+  createTask(task.get());
+  if (arguments.has("quiet")) {
+    std::printf("%d\n", task->ID);
+  } else {
+    announce(*task);
+  }
+  return kDone;
+}
+
+}  // namespace
+
+const Command kAddCommand = {
+    "add", "[OPTION...] -- COMMAND...", "save a new task",
+    "Saves a new task, which runs COMMAND by a shell, and says its id. One is refused whose\n"
+    "line would make /etc/crontab longer than cron reads.\n"
+    "\n" TASK_OPTIONS_HELP
+    "\n"
+    "Also:\n"
+    "  --disabled                     save it, but do not run it until it is enabled\n"
+    "  -q, --quiet                    print the id and nothing else\n",
+    runAdd};

@@ -1,0 +1,88 @@
+// zelosched catch-up
+#include <cstdio>
+#include <ctime>
+
+#include "commands/command.h"
+#include "commands/options.h"
+#include "runs/coming_runs.h"
+#include "runs/history_keep.h"
+#include "runs/missed.h"
+#include "runs/start_run.h"
+#include "store/change_lock.h"
+#include "terminal/failure.h"
+#include "terminal/number.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr Option kOptions[] = {{"within", Option::kValue}, {"dry-run"}};
+constexpr char kUsualSpan[] = "12h";
+
+struct Unit {
+  char letter;
+  long seconds;
+};
+constexpr Unit kUnits[] = {{'m', 60}, {'h', 60L * 60}, {'d', 24L * 60 * 60}};
+
+// "90m", "12h", "2d".
+long parseSpan(const std::string &text) {
+  for (const Unit &unit : kUnits) {
+    if (text.empty() || text.back() != unit.letter) continue;
+    const std::optional<long> count = parseNumber(text.substr(0, text.size() - 1));
+    if (count && *count > 0 && *count <= kMissedRemembered / unit.seconds) {
+      return *count * unit.seconds;
+    }
+  }
+  throw UsageError("'--within' takes a time from 1m to 7d, such as 90m, 12h or 2d, not '" +
+                   printable(text) + "'");
+}
+
+// Runs the task, unless it is only to be listed.
+void catchUp(const MissedTask &missed, bool isDryRun) {
+  if (!isDryRun) {
+    startRunUnseen(*missed.task, Disabled::kIsSkipped);
+    forgetMissed(*missed.task);
+  }
+  std::printf("%s was due at %s: %s\n", titleOf(*missed.task).c_str(),
+              minuteText(localMinute(missed.due)).c_str(),
+              isDryRun ? "would be started" : "started");
+}
+
+int catchUpAll(const std::string &span, bool isDryRun) {
+  const time_t since = time(nullptr) - parseSpan(span);
+  const TaskList list;
+  const std::vector<MissedTask> all = missedTasks(list, since);
+  if (all.empty()) std::printf("no run was missed within %s\n", span.c_str());
+  int status = kDone;
+  for (const MissedTask &missed : all) {
+    try {
+      catchUp(missed, isDryRun);
+    } catch (const Failure &failure) {
+      status = complain(failure.what());
+    }
+  }
+  return status;
+}
+
+int runCatchUp(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoOperands();
+  arguments.requireNoCommand();
+  const std::string span = arguments.value("within", kUsualSpan);
+  if (arguments.has("dry-run")) return catchUpAll(span, true);
+  // Of two at once, the second finds nothing left to do.
+  const ChangeLock lock;
+  return catchUpAll(span, false);
+}
+
+}  // namespace
+
+const Command kCatchUpCommand = {
+    "catch-up", "[--within TIME] [--dry-run]", "run the tasks that were missed",
+    "Runs once, now, each enabled task whose time passed while the machine was off and\n"
+    "that did not run since. All are started at once, and wait for others as always.\n"
+    "\n"
+    "  --within TIME                  only those due so short a time ago, such as 90m, 12h or\n"
+    "                                 2d; 12h, and 7d at most\n"
+    "  --dry-run                      list them, and run nothing\n",
+    runCatchUp};

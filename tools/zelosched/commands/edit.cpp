@@ -1,0 +1,56 @@
+// zelosched edit
+#include <cstdio>
+#include <ctime>
+
+#include "check/task_check.h"
+#include "commands/command.h"
+#include "commands/task_options.h"
+#include "store/change_lock.h"
+#include "store/save.h"
+#include "store/task_list.h"
+#include "terminal/failure.h"
+#include "terminal/schedule_text.h"
+
+namespace {
+
+constexpr Option kOptions[] = {TASK_OPTIONS, {"force"}};
+
+void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &task) {
+  const bool insists = arguments.has("force");
+  requirePermission(task, task.CanEditFromUI, "edited", insists);
+  if (arguments.has("name")) requirePermission(task, task.CanEditName, "renamed", insists);
+  if (arguments.has("owner")) {
+    requirePermission(task, task.CanEditOwner, "given another owner", insists);
+  }
+}
+
+int runEdit(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  const std::vector<long> ids = parseIds(arguments.operands());
+  if (ids.size() > 1) throw UsageError("one task at a time");
+  if (!hasTaskOption(arguments)) throw UsageError("what is to be changed?");
+  const ChangeLock lock;
+  const Task task = loadTask(ids.front());
+  applyTaskOptions(arguments, task.get());
+  requirePermissions(arguments, *task);
+  requireHarmless(*task);
+  const std::string past = hasSchedule(arguments) ? pastSchedule(*task, time(nullptr)) : "";
+  if (!past.empty()) throw Failure("not saved: " + past);
+  editTask(task.get());
+  std::printf("%s saved: %s\n", titleOf(*task).c_str(), scheduleInWords(*task).c_str());
+  return kDone;
+}
+
+}  // namespace
+
+const Command kEditCommand = {
+    "edit", "ID [OPTION...] [-- COMMAND...]", "change a task",
+    "Changes what the options name; the rest of the task stays. Another kind of\n"
+    "schedule takes the start date away, and keeps --every and --until.\n"
+    "\n"
+    "The id of a power time is made of its times and changes with them.\n"
+    "\n" TASK_OPTIONS_HELP
+    "\n"
+    "Also:\n"
+    "  --force                        even if its application does not let it be edited\n",
+    runEdit};

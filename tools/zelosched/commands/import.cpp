@@ -1,0 +1,172 @@
+// zelosched import
+#include <json/json.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <memory>
+
+#include "check/task_check.h"
+#include "commands/command.h"
+#include "commands/options.h"
+#include "json/json_out.h"
+#include "store/change_lock.h"
+#include "store/power_room.h"
+#include "store/save.h"
+#include "store/task_list.h"
+#include "terminal/failure.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr Option kOptions[] = {{"new"}};
+constexpr char kStandardInput[] = "-";
+constexpr char kPowerApp[] = "ZELO.TOV.TaskScheduler.AutoPower";
+constexpr size_t kMegabyte = size_t{1} << 20;
+constexpr size_t kMostBytes = 16 * kMegabyte;
+
+struct CloseFile {
+  void operator()(FILE *file) const {
+    if (file != stdin) std::fclose(file);
+  }
+};
+
+std::string readAll(const std::string &path) {
+  const std::unique_ptr<FILE, CloseFile> file(
+      path == kStandardInput ? stdin : std::fopen(path.c_str(), "re"));
+  if (file == nullptr) {
+    throw Failure("cannot open " + printable(path) + ": " + std::strerror(errno));
+  }
+  std::string text;
+  char buffer[65536];
+  for (size_t count; (count = std::fread(buffer, 1, sizeof buffer, file.get())) > 0;) {
+    text.append(buffer, count);
+    if (text.size() > kMostBytes) {
+      throw Failure(printable(path) + " is larger than " + std::to_string(kMostBytes / kMegabyte) +
+                    " MB: divide it");
+    }
+  }
+  if (std::ferror(file.get()) != 0) {
+    throw Failure("cannot read " + printable(path) + ": " + std::strerror(errno));
+  }
+  return text;
+}
+
+bool isBlank(const char *text) {
+  return text[std::strspn(text, " \t\r\n")] == '\0';
+}
+
+Task taskOf(const Json::Value &object) {
+  Task task = std::make_unique<TaskRecord>();
+  fillFromJson(object, task.get());
+  const bool isPowerTime = std::strcmp(task->App, kPowerApp) == 0;
+  task->Backend = isPowerTime ? ZELO_SCHED_BACKEND_AUTOPOWER : ZELO_SCHED_BACKEND_SCHEDULE;
+  if (!isPowerTime && isBlank(task->Command)) throw Failure("there is no command");
+  requireHarmless(*task);
+  return task;
+}
+
+// As the library decides it when it saves from JSON: the stored task of the id, if it is the same.
+Task storedOf(const ZELO_SCHED_TASK &task) {
+  Task stored = findTask(task.ID);
+  const bool isSame = stored != nullptr && stored->Backend == task.Backend &&
+                      std::strcmp(stored->App, task.App) == 0 &&
+                      (isPower(task) || std::strcmp(stored->Name, task.Name) == 0);
+  return isSame ? std::move(stored) : nullptr;
+}
+
+bool isStored(const ZELO_SCHED_TASK &task) {
+  return storedOf(task) != nullptr;
+}
+
+bool addsLine(const ZELO_SCHED_TASK &task, bool isNew) {
+  if (!hasCronLine(task)) return false;
+  const Task stored = isNew ? nullptr : storedOf(task);
+  return stored == nullptr || !hasCronLine(*stored);
+}
+
+std::string orderOf(size_t index, size_t count) {
+  return "object " + std::to_string(index + 1) + " of " + std::to_string(count);
+}
+
+// Nothing is saved unless every object is a task that may be saved, beside the others of the file.
+std::vector<Task> readTasks(const std::vector<Json::Value> &objects, bool areNew) {
+  std::vector<Task> tasks;
+  PowerRoom room;
+  for (size_t i = 0; i < objects.size(); ++i) {
+    try {
+      Task task = taskOf(objects[i]);
+      const bool isKnown = !areNew && isStored(*task);
+      if (isPower(*task)) {
+        if (isKnown) room.leave(*task);
+        room.take(*task);
+      }
+      tasks.push_back(std::move(task));
+    } catch (const Failure &failure) {
+      complain(orderOf(i, objects.size()) + ": " + failure.what());
+    }
+  }
+  if (tasks.size() < objects.size()) {
+    throw Failure("nothing was imported: " + counted(objects.size() - tasks.size(), "object") +
+                  " of " + std::to_string(objects.size()) + " cannot be saved");
+  }
+  return tasks;
+}
+
+// Not some, until the first one that writes the crontab is refused. A line that another of them
+// takes away may still be there when one is added, so it is not counted.
+void requireSavable(const std::vector<Task> &tasks, bool areNew) {
+  const bool hasLine =
+      std::any_of(tasks.begin(), tasks.end(), [](const Task &task) { return !isPower(*task); });
+  if (hasLine) requireReadableTasks();
+  const auto added = std::count_if(tasks.begin(), tasks.end(),
+                                   [&](const Task &task) { return addsLine(*task, areNew); });
+  requireCronRoom(static_cast<size_t>(added));
+}
+
+void save(ZELO_SCHED_TASK *task, bool isNew) {
+  if (!isNew && isStored(*task)) {
+    editTask(task);
+    std::printf("%s overwritten\n", titleOf(*task).c_str());
+  } else {
+    task->ID = ZELO_SCHED_ID_NEW;
+    createTask(task);
+    std::printf("%s added\n", titleOf(*task).c_str());
+  }
+}
+
+int runImport(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoCommand();
+  if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
+  const std::vector<Json::Value> objects = parseObjects(readAll(arguments.operands().front()));
+  const ChangeLock lock;
+  const std::vector<Task> tasks = readTasks(objects, arguments.has("new"));
+  requireSavable(tasks, arguments.has("new"));
+  int status = kDone;
+  if (tasks.empty()) std::puts("there is no task to import");
+  for (size_t i = 0; i < tasks.size(); ++i) {
+    try {
+      save(tasks[i].get(), arguments.has("new"));
+    } catch (const Failure &failure) {
+      status = complain(orderOf(i, tasks.size()) + ": " + failure.what());
+    }
+  }
+  return status;
+}
+
+}  // namespace
+
+const Command kImportCommand = {
+    "import", "FILE|- [--new]", "save tasks from JSON",
+    "Saves the tasks of a JSON text: an array, one object, or an object a line, in either\n"
+    "form that 'zelosched export' writes. A task overwrites the stored one of its id when\n"
+    "that has the same name and application; every other becomes a new task.\n"
+    "\n"
+    "When one of them cannot be saved, none is, and each of those is told. Nor is any when\n"
+    "all together would make /etc/crontab longer than cron reads.\n"
+    "At most 16 MB and 10000 tasks are read at once.\n"
+    "\n"
+    "  --new                          overwrite nothing: all become new tasks\n",
+    runImport};

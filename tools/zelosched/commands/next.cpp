@@ -1,0 +1,159 @@
+// zelosched next
+#include <json/json.h>
+
+#include <algorithm>
+#include <cstdio>
+#include <ctime>
+#include <queue>
+#include <tuple>
+
+#include "commands/command.h"
+#include "commands/for_each_id.h"
+#include "commands/options.h"
+#include "json/json_out.h"
+#include "runs/coming_runs.h"
+#include "store/task_list.h"
+#include "terminal/failure.h"
+#include "terminal/terminal.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr Option kOptions[] = {{"count", Option::kValue, 'n'}, {"json"}};
+constexpr long kUsualCount = 20;
+constexpr long kMostRuns = 10000;
+
+struct Entry {
+  LocalMinute run;
+  const TaskRecord *task;
+};
+
+// The first runs of several tasks, by their time and then by the tasks' ids.
+class FirstRuns {
+ public:
+  explicit FirstRuns(const LocalMinute &now) : now_(now) {}
+
+  // All of them stay as long as this does.
+  void add(Task task) {
+    add(*task);
+    named_.push_back(std::move(task));
+  }
+  void add(std::unique_ptr<TaskList> list) {
+    for (const TaskRecord *task : list->tasks()) {
+      if (isEnabled(*task)) add(*task);
+    }
+    all_ = std::move(list);
+  }
+
+  std::vector<Entry> take(size_t count) {
+    std::priority_queue queue(isLater, std::vector<Source *>());
+    const auto advance = [&](Source *source) {
+      source->run = source->runs.next();
+      if (source->run) queue.push(source);
+    };
+    for (Source &source : sources_) advance(&source);
+    std::vector<Entry> entries;
+    while (entries.size() < count && !queue.empty()) {
+      Source *source = queue.top();
+      queue.pop();
+      entries.push_back({*source->run, source->task});
+      advance(source);
+    }
+    return entries;
+  }
+
+ private:
+  struct Source {
+    const TaskRecord *task;
+    ComingRuns runs;
+    std::optional<LocalMinute> run;  // the next one
+  };
+
+  static bool isLater(const Source *a, const Source *b) {
+    return std::tie(*b->run, b->task->ID) < std::tie(*a->run, a->task->ID);
+  }
+
+  void add(const TaskRecord &task) {
+    sources_.push_back({&task, ComingRuns(task, now_), std::nullopt});
+  }
+
+  LocalMinute now_;
+  std::vector<Task> named_;
+  std::unique_ptr<TaskList> all_;
+  std::vector<Source> sources_;
+};
+
+// A disabled task is told.
+void addNamed(long id, FirstRuns *runs) {
+  Task task = loadTask(id);
+  if (isEnabled(*task)) {
+    runs->add(std::move(task));
+  } else {
+    complain(titleOf(*task) + " is disabled: it will not run");
+  }
+}
+
+void print(const std::vector<Entry> &entries) {
+  const size_t columns = terminalColumns().value_or(0);
+  size_t idWidth = 0;
+  for (const Entry &entry : entries) {
+    idWidth = std::max(idWidth, std::to_string(entry.task->ID).size());
+  }
+  std::string day;
+  for (const Entry &entry : entries) {
+    if (dayText(entry.run) != day) {
+      if (!day.empty()) std::puts("");
+      day = dayText(entry.run);
+      std::printf("%s %s\n", day.c_str(), weekdayName(entry.run));
+    }
+    const std::string id = std::to_string(entry.task->ID);
+    const std::string line = "  " + timeText(entry.run) + "  " +
+                             std::string(idWidth - id.size(), ' ') + id + "  " +
+                             printable(entry.task->Name);
+    std::puts((columns == 0 ? line : fitted(line, columns)).c_str());
+  }
+}
+
+void printAsJson(const std::vector<Entry> &entries) {
+  std::vector<Json::Value> objects;
+  for (const Entry &entry : entries) {
+    Json::Value object;
+    object["run"] = minuteText(entry.run);
+    object["id"] = entry.task->ID;
+    object["name"] = jsonText(entry.task->Name);
+    objects.push_back(std::move(object));
+  }
+  printJson(objects);
+}
+
+int runNext(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoCommand();
+  const auto count =
+      static_cast<size_t>(arguments.number("count", 1, kMostRuns).value_or(kUsualCount));
+  FirstRuns runs(localMinute(time(nullptr)));
+  int status = kDone;
+  if (arguments.operands().empty()) {
+    runs.add(std::make_unique<TaskList>());
+  } else {
+    status = forEachId(parseIds(arguments.operands()), [&](long id) { addNamed(id, &runs); });
+  }
+  const std::vector<Entry> entries = runs.take(count);
+  if (arguments.has("json")) {
+    printAsJson(entries);
+  } else {
+    print(entries);
+  }
+  return status;
+}
+
+}  // namespace
+
+const Command kNextCommand = {
+    "next", "[ID...] [--count N] [--json]", "list the coming runs",
+    "Lists the coming runs of all enabled tasks, or of the tasks that are named, day by\n"
+    "day.\n"
+    "\n"
+    "  -n, --count N                  how many runs; 20\n"
+    "  --json                         a JSON array of run, id and name\n",
+    runNext};

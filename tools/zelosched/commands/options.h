@@ -1,0 +1,55 @@
+// The arguments of a sub-command, and what is said when they are wrong.
+//
+//   constexpr Option kOptions[] = {{"json"}, {"limit", Option::kValue}};
+//   const Arguments arguments(argc, argv, kOptions);
+//   if (arguments.has("json")) ...
+//
+// What is wrong is thrown as UsageError; a sub-command's --help is answered before it runs.
+#pragma once
+
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "commands/command.h"
+#include "terminal/failure.h"
+
+struct Option {
+  enum Values { kNone = 0, kValue = 1, kTwoValues = 2 };
+  const char *name;
+  Values values = kNone;
+  char letter = '\0';
+};
+
+class Arguments {
+ public:
+  Arguments(int argc, char **argv, std::span<const Option> options);
+
+  bool has(std::string_view option) const;
+  // The value last given; nothing when the option was not given.
+  std::optional<std::string> value(std::string_view option) const;
+  std::string value(std::string_view option, const char *otherwise) const;
+  // A whole number from `least` to `most`.
+  std::optional<long> number(std::string_view option, long least, long most) const;
+  // Both values of an option that has two, with a blank between them.
+  const std::vector<std::string> &operands() const { return operands_; }
+  // What stands after "--", when that is there.
+  const std::optional<std::vector<std::string>> &afterDashes() const { return afterDashes_; }
+
+  void requireNoOperands() const;
+  void requireNoCommand() const;
+
+ private:
+  std::vector<std::pair<std::string, std::string>> given_;
+  std::vector<std::string> operands_;
+  std::optional<std::vector<std::string>> afterDashes_;
+};
+
+// The operands as task ids; one at least, no id twice.
+std::vector<long> parseIds(const std::vector<std::string> &operands);
+
+// Runs the sub-command: answers --help, and says what is wrong with the arguments.
+int runWithOptions(const Command &command, int argc, char **argv);

@@ -1,0 +1,78 @@
+#include "commands/remove_tasks.h"
+
+#include <json/json.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <string>
+
+#include "commands/for_each_id.h"
+#include "commands/options.h"
+#include "json/json_out.h"
+#include "store/change_lock.h"
+#include "store/save.h"
+#include "store/task_list.h"
+
+namespace {
+
+bool isYes(const std::string &answer) {
+  return answer == "y" || answer == "Y" || answer == "yes";
+}
+
+// Asked on standard error, so that it is seen whatever the output is.
+bool isConfirmed(const ZELO_SCHED_TASK &task) {
+  std::fprintf(stderr, "Remove %s? [y/N] ", titleOf(task).c_str());
+  std::fflush(stderr);
+  std::string answer;
+  for (int c; (c = std::getchar()) != EOF && c != '\n';) answer += static_cast<char>(c);
+  return isYes(answer);
+}
+
+// The id may have been given to another task since. The name of a power time is its place in the
+// list, which is another one as soon as one before it is removed.
+bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
+  Json::Value members[] = {jsonOf(one), jsonOf(other)};
+  for (Json::Value &object : members) {
+    object.removeMember("next trigger time");
+    if (isPower(one)) object.removeMember("name");
+  }
+  return members[0] == members[1];
+}
+
+Task loadRemovable(long id, const RemoveRules &rules) {
+  Task task = loadTask(id);
+  if (rules.powerOnly && !isPower(*task)) throw Failure(titleOf(*task) + " is no power time");
+  requirePermission(*task, task->CanDeleteFromUI, "removed", rules.insists);
+  return task;
+}
+
+void removeAndTell(const ZELO_SCHED_TASK &task) {
+  removeTask(task);
+  std::printf("%s removed\n", titleOf(task).c_str());
+}
+
+// The lock is not held while an answer is waited for.
+void askAndRemove(long id, const RemoveRules &rules) {
+  const Task task = loadRemovable(id, rules);
+  if (!isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");
+  const ChangeLock lock;
+  if (!isSame(*task, *loadTask(id))) {
+    throw Failure(titleOf(*task) + " stays: it has been changed meanwhile");
+  }
+  removeAndTell(*task);
+}
+
+void removeOne(long id, const RemoveRules &rules) {
+  if (!rules.isSure) return askAndRemove(id, rules);
+  const ChangeLock lock;
+  removeAndTell(*loadRemovable(id, rules));
+}
+
+}  // namespace
+
+int removeTasks(const std::vector<long> &ids, const RemoveRules &rules) {
+  if (!rules.isSure && isatty(STDIN_FILENO) != 1) {
+    throw UsageError("there is nobody to ask: give --yes to remove without a question");
+  }
+  return forEachId(ids, [&](long id) { removeOne(id, rules); });
+}

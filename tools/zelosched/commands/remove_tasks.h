@@ -1,0 +1,15 @@
+// Removing tasks with a question before each.
+#pragma once
+
+#include <vector>
+
+#include "commands/command.h"
+
+struct RemoveRules {
+  bool isSure;     // without a question
+  bool insists;    // whatever the application allows
+  bool powerOnly;  // a task that is no power time is refused
+};
+
+// The exit status. Throws UsageError when there is nobody to ask.
+int removeTasks(const std::vector<long> &ids, const RemoveRules &rules);

@@ -1,0 +1,51 @@
+#include "store/owner.h"
+
+#include <pwd.h>
+#include <zelosdk.h>
+
+#include <climits>
+#include <cstdint>
+#include <map>
+#include <memory>
+
+#include "terminal/number.h"
+
+namespace {
+
+struct FreeUser {
+  void operator()(ZELOUSER *user) const { ZELOUserFree(user); }
+};
+using User = std::unique_ptr<ZELOUSER, FreeUser>;
+
+// The name; none for a number without a user. The tasks of a list have few owners, and looking one
+// up reads a file.
+const std::optional<std::string> &nameOf(uid_t uid) {
+  static std::map<uid_t, std::optional<std::string>> known;
+  const auto [found, isNew] = known.try_emplace(uid);
+  if (isNew) {
+    PZELOUSER record = nullptr;
+    const bool isUser = ZELOUserGetByUID(uid, &record) == 0;
+    const User user(isUser ? record : nullptr);
+    if (isUser) found->second = user->szName;
+  }
+  return found->second;
+}
+
+}  // namespace
+
+std::optional<uid_t> findUser(const std::string &nameOrNumber) {
+  if (const passwd *entry = getpwnam(nameOrNumber.c_str())) return entry->pw_uid;
+  const std::optional<long> number = parseNumber(nameOrNumber);
+  if (!number || *number < 0 || *number > UINT32_MAX) return std::nullopt;
+  const auto uid = static_cast<uid_t>(*number);
+  if (!userExists(uid)) return std::nullopt;
+  return uid;
+}
+
+bool userExists(uid_t uid) {
+  return nameOf(uid).has_value();
+}
+
+std::string userName(uid_t uid) {
+  return nameOf(uid).value_or(std::to_string(uid));
+}

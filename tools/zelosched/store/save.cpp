@@ -1,0 +1,144 @@
+#include "store/save.h"
+
+#include <algorithm>
+
+#include "check/crontab_check.h"
+#include "check/task_check.h"
+#include "sched_cron_room.h"
+#include "store/power_room.h"
+#include "terminal/failure.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr int kFlagYes = 1;
+
+// An entry that is edited into one like another would be one less.
+void requireUnlike(const ZELO_SCHED_TASK &task) {
+  PowerRoom room;
+  room.leave(task);
+  room.take(task);
+}
+
+bool isUnreadable(const ZELO_SCHED_TASK &task) {
+  return isEnabled(task) && !unreadableFieldsOf(task).empty();
+}
+
+bool isStored(long id) {
+  return findTask(id) != nullptr;
+}
+
+bool hasStoredCronLine(long id) {
+  const Task stored = findTask(id);
+  return stored != nullptr && hasCronLine(*stored);
+}
+
+// A power time is stored before the machine's clock is armed, and stays so when that fails.
+template <class IsChanged>
+[[noreturn]] void throwFailedChange(const Failure &failure, IsChanged isChanged) {
+  if (!isChanged()) throw failure;
+  throw Failure(std::string(failure.what()) +
+                "; it is stored all the same, and 'zelosched sync' tries to put it into effect");
+}
+
+}  // namespace
+
+void requireHarmless(const ZELO_SCHED_TASK &task) {
+  const std::vector<std::string> harms = harmsOf(task);
+  if (harms.empty()) return;
+  std::string sentences = "not saved: ";
+  for (size_t i = 0; i < harms.size(); ++i) {
+    sentences += (i == 0 ? "" : "\nzelosched: not saved: ") + harms[i];
+  }
+  throw Failure(sentences);
+}
+
+std::string unreadableTask(const TaskList &list) {
+  for (const ZELO_SCHED_TASK *task : list.tasks()) {
+    if (!isUnreadable(*task)) continue;
+    return titleOf(*task) + ": " + unreadableFieldsOf(*task).front() + ", or disable the task";
+  }
+  return "";
+}
+
+void requireReadableTasks(std::optional<long> changedId) {
+  const TaskList list;
+  // Of several, each is mended beside the others.
+  const bool isMended = std::any_of(
+      list.tasks().begin(), list.tasks().end(),
+      [&](const ZELO_SCHED_TASK *task) { return changedId == task->ID && isUnreadable(*task); });
+  const std::string fault = unreadableTask(list);
+  if (fault.empty() || isMended) return;
+  throw Failure("nothing was saved, as cron may then pass over all of /etc/crontab: " + fault);
+}
+
+bool hasCronLine(const ZELO_SCHED_TASK &task) {
+  return isEnabled(task) && !isPower(task);
+}
+
+void requireCronRoom(size_t lines) {
+  if (schedHasCronRoom(lines)) return;
+  throw Failure("not saved: /etc/crontab would have more than " +
+                std::to_string(kSchedMostFilledCronLines) +
+                " lines, and cron ignores all of it when there are more than " +
+                std::to_string(kSchedMostCronLines) + ": remove or disable tasks first");
+}
+
+void createTask(ZELO_SCHED_TASK *task) {
+  requireHarmless(*task);
+  if (isPower(*task)) {
+    PowerRoom().take(*task);
+  } else {
+    requireReadableTasks();
+    requireCronRoom(hasCronLine(*task) ? 1 : 0);
+  }
+  forgetError();
+  if (ZELOSchedTaskCreate(task) < 0) {
+    throwFailedChange(failedTo("save the task"),
+                      [&] { return isPower(*task) && isStored(powerId(*task)); });
+  }
+  requireCrontabInStep();
+}
+
+void editTask(ZELO_SCHED_TASK *task) {
+  if (isPower(*task)) {
+    requireUnlike(*task);
+  } else {
+    requireReadableTasks(task->ID);
+    if (hasCronLine(*task) && !hasStoredCronLine(task->ID)) requireCronRoom(1);
+  }
+  forgetError();
+  if (ZELOSchedTaskEdit(task) < 0) {
+    throwFailedChange(failedTo("save " + titleOf(*task)),
+                      [&] { return isPower(*task) && isStored(powerId(*task)); });
+  }
+  if (isPower(*task)) task->ID = powerId(*task);
+  requireCrontabInStep();
+}
+
+void removeTask(const ZELO_SCHED_TASK &task) {
+  // The lines of power times are others, which no task can harm.
+  if (!isPower(task)) requireReadableTasks(task.ID);
+  forgetError();
+  if (ZELOSchedTaskRemove(task.ID) < 0) {
+    throwFailedChange(failedTo("remove " + titleOf(task)),
+                      [&] { return isPower(task) && !isStored(task.ID); });
+  }
+  requireCrontabInStep();
+}
+
+void requireCrontabInStep() {
+  const TaskList list;
+  // As long as one is kept out of it, the crontab cannot be in step.
+  if (!unreadableTask(list).empty()) return;
+  const std::vector<std::string> differences = crontabDifferences(list.tasks());
+  if (differences.empty()) return;
+  throw Failure("the tasks are saved, but cron does not know them all: " + differences.front() +
+                " (the system log says why; 'zelosched sync' tries again)");
+}
+
+void requirePermission(const ZELO_SCHED_TASK &task, int32_t flag, const char *what, bool insists) {
+  if (flag == kFlagYes || insists) return;
+  throw Failure("the application of " + titleOf(task) + " does not let it be " + what +
+                " by hand: --force does it all the same");
+}

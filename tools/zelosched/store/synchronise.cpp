@@ -1,0 +1,40 @@
+#include "store/synchronise.h"
+
+#include <zelosched.h>
+#include <zelosdk.h>
+
+#include <string>
+
+#include "store/save.h"
+#include "store/task_list.h"
+#include "terminal/failure.h"
+
+namespace {
+
+// A power list that cannot be read is told in the end, but keeps no task out of the crontab.
+void writeTasksOut() {
+  const std::string fault = unreadableTask(TaskList(TaskList::Unreadable::kIsLeftOut));
+  if (!fault.empty()) {
+    throw Failure("the crontab was not written, as cron may then pass over all of it: " + fault);
+  }
+  forgetError();
+  if (ZELOSchedTaskSync() < 0) throw failedTo("write the tasks out");
+  requireCrontabInStep();
+}
+
+void armClock() {
+  forgetError();
+  if (ZELOAutoPoweronSet() < 0) throw failedTo("arm the clock for the next power-on time");
+}
+
+}  // namespace
+
+void synchronise() {
+  try {
+    writeTasksOut();
+  } catch (const Failure &) {
+    // The machine goes on at its time whatever is wrong with the tasks.
+    attempt(armClock);
+    throw;
+  }
+}

@@ -1,0 +1,97 @@
+#include "terminal/table.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <numeric>
+
+#include "terminal/terminal.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr size_t kGap = 2;
+constexpr size_t kNarrowest = 8;  // below, a name tells nothing any more
+
+const char *const kStart[] = {"", "\033[2m", "\033[31m"};
+constexpr char kEnd[] = "\033[0m";
+
+using Widths = std::vector<size_t>;
+
+size_t lineWidth(const Widths &widths) {
+  return std::accumulate(widths.begin(), widths.end(), size_t{0}) + kGap * (widths.size() - 1);
+}
+
+// The widest column that may and can still shrink, or none.
+size_t nextToShrink(const std::vector<Column> &columns, const Widths &widths) {
+  size_t widest = widths.size();
+  for (size_t i = 0; i < widths.size(); ++i) {
+    const size_t floor = std::max(kNarrowest, widthOf(columns[i].title));
+    const bool can = columns[i].shrinks && widths[i] > floor;
+    if (can && (widest == widths.size() || widths[i] > widths[widest])) widest = i;
+  }
+  return widest;
+}
+
+void shrink(const std::vector<Column> &columns, size_t most, Widths *widths) {
+  while (lineWidth(*widths) > most) {
+    const size_t column = nextToShrink(columns, *widths);
+    if (column == widths->size()) return;
+    --(*widths)[column];
+  }
+}
+
+std::string emphasised(const std::string &text, Emphasis emphasis, bool colour) {
+  if (!colour || emphasis == Emphasis::kNone) return text;
+  return kStart[static_cast<size_t>(emphasis)] + text + kEnd;
+}
+
+// Nothing follows the last column, blanks neither.
+void appendCell(std::string *line, const Column &column, const Cell &cell, size_t width, bool last,
+                bool colour) {
+  const std::string text = fitted(cell.text, width);
+  const std::string padding(width - std::min(width, widthOf(text)), ' ');
+  if (column.alignment == Column::kRight) *line += padding;
+  *line += emphasised(text, cell.emphasis, colour);
+  if (column.alignment == Column::kLeft && !last) *line += padding;
+  if (!last) *line += std::string(kGap, ' ');
+}
+
+}  // namespace
+
+Table::Table(std::vector<Column> columns) : columns_(std::move(columns)) {}
+
+void Table::add(std::vector<Cell> row) {
+  for (Cell &cell : row) cell.text = printable(cell.text);
+  rows_.push_back(std::move(row));
+}
+
+std::string Table::text(size_t columns, bool colour) const {
+  std::vector<Cell> titles;
+  Widths widths;
+  for (const Column &column : columns_) {
+    titles.push_back({column.title});
+    widths.push_back(widthOf(column.title));
+  }
+  for (const std::vector<Cell> &row : rows_) {
+    for (size_t i = 0; i < row.size(); ++i) {
+      widths[i] = std::max(widths[i], widthOf(row[i].text));
+    }
+  }
+  if (columns > 0) shrink(columns_, columns, &widths);
+
+  std::string out;
+  const auto appendRow = [&](const std::vector<Cell> &row) {
+    for (size_t i = 0; i < row.size(); ++i) {
+      appendCell(&out, columns_[i], row[i], widths[i], i + 1 == row.size(), colour);
+    }
+    out += '\n';
+  };
+  appendRow(titles);
+  std::for_each(rows_.begin(), rows_.end(), appendRow);
+  return out;
+}
+
+void Table::print() const {
+  const std::string whole = text(terminalColumns().value_or(0), showsColour());
+  std::fwrite(whole.data(), 1, whole.size(), stdout);
+}

@@ -1,0 +1,158 @@
+#include "terminal/text.h"
+
+#include <wchar.h>
+
+#include <algorithm>
+#include <array>
+#include <clocale>
+#include <cstdint>
+#include <cstdio>
+
+#include "sched_utf8.h"
+#include "terminal/terminal.h"
+
+namespace {
+
+struct Range {
+  uint32_t first;
+  uint32_t last;
+};
+// Control characters, the marks that turn the direction of writing or break lines, and
+// what cannot be seen, by which two names that look alike differ.
+constexpr Range kUnsafe[] = {{0x00, 0x1F},     {0x7F, 0x9F},     {0xAD, 0xAD},
+                             {0x061C, 0x061C}, {0x200B, 0x200B}, {0x200E, 0x200F},
+                             {0x2028, 0x202E}, {0x2060, 0x2064}, {0x2066, 0x2069},
+                             {0xFEFF, 0xFEFF}, {0xFFF9, 0xFFFB}, {0xE0000, 0xE007F}};
+
+bool isUnsafe(uint32_t code) {
+  return std::any_of(std::begin(kUnsafe), std::end(kUnsafe),
+                     [&](const Range &range) { return code >= range.first && code <= range.last; });
+}
+
+constexpr uint32_t kLastAscii = 0x7E;
+
+bool canBeShown(uint32_t code) {
+  return !isUnsafe(code) && (code <= kLastAscii || showsUnicode());
+}
+
+void appendEscaped(std::string *out, std::string_view bytes) {
+  constexpr std::string_view kNamed = "\n\t\r";
+  constexpr std::string_view kNames = "ntr";
+  for (const char byte : bytes) {
+    const size_t named = kNamed.find(byte);
+    if (named != std::string_view::npos) {
+      *out += '\\';
+      *out += kNames[named];
+      continue;
+    }
+    char escaped[8];
+    std::snprintf(escaped, sizeof escaped, "\\x%02x",
+                  static_cast<unsigned>(static_cast<unsigned char>(byte)));
+    *out += escaped;
+  }
+}
+
+std::string escaped(std::string_view text, std::string_view kept) {
+  std::string out;
+  while (!text.empty()) {
+    const SchedCharacter next = schedFirstCharacter(text);
+    const size_t bytes = std::max<size_t>(next.bytes, 1);
+    if ((next.bytes > 0 && canBeShown(next.code)) || kept.find(text[0]) != std::string_view::npos) {
+      out += text.substr(0, bytes);
+    } else {
+      appendEscaped(&out, text.substr(0, bytes));
+    }
+    text.remove_prefix(bytes);
+  }
+  return out;
+}
+
+// Widths do not depend on the user's locale, but the C library knows them in a UTF-8 one only.
+int columnsOf(uint32_t code) {
+  static const locale_t unicode = newlocale(LC_CTYPE_MASK, "C.UTF-8", nullptr);
+  if (code <= kLastAscii || unicode == nullptr) return 1;
+  const locale_t users = uselocale(unicode);
+  const int columns = wcwidth(static_cast<wchar_t>(code));
+  uselocale(users);
+  return columns < 0 ? 1 : columns;
+}
+
+// Walks over the characters until `take` says no; bytes that are none count as one each.
+template <class Take>
+void forEachCharacter(std::string_view text, Take take) {
+  while (!text.empty()) {
+    const SchedCharacter next = schedFirstCharacter(text);
+    const size_t bytes = std::max<size_t>(next.bytes, 1);
+    if (!take(text.substr(0, bytes), next.code)) return;
+    text.remove_prefix(bytes);
+  }
+}
+
+bool needsQuotes(std::string_view word) {
+  constexpr std::string_view kPlain =
+      "abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ0123456789@%+:,./-_";
+  return word.empty() || word.find_first_not_of(kPlain) != std::string_view::npos;
+}
+
+}  // namespace
+
+std::string printable(std::string_view text) {
+  return escaped(text, "");
+}
+
+std::string printableLines(std::string_view text) {
+  return escaped(text, "\n\t");
+}
+
+size_t cutCharacterLength(std::string_view text) {
+  constexpr size_t kMostBytes = 4;
+  constexpr unsigned char kTailMask = 0xC0;
+  constexpr unsigned char kTail = 0x80;
+  for (size_t bytes = 1; bytes < kMostBytes && bytes <= text.size(); ++bytes) {
+    const auto byte = static_cast<unsigned char>(text[text.size() - bytes]);
+    if ((byte & kTailMask) == kTail) continue;
+    return schedBytesOfCharacter(byte) > bytes ? bytes : 0;
+  }
+  return 0;
+}
+
+size_t widthOf(std::string_view printable) {
+  size_t width = 0;
+  forEachCharacter(printable, [&](std::string_view, uint32_t code) {
+    width += static_cast<size_t>(columnsOf(code));
+    return true;
+  });
+  return width;
+}
+
+std::string fitted(const std::string &printable, size_t columns) {
+  if (widthOf(printable) <= columns) return printable;
+  const std::string ellipsis = showsUnicode() ? "\u2026" : "...";
+  const size_t room = columns - std::min(columns, widthOf(ellipsis));
+  size_t width = 0;
+  std::string out;
+  forEachCharacter(printable, [&](std::string_view bytes, uint32_t code) {
+    width += static_cast<size_t>(columnsOf(code));
+    if (width > room) return false;
+    out += bytes;
+    return true;
+  });
+  return room == 0 ? out : out + ellipsis;
+}
+
+std::string counted(size_t number, const char *word) {
+  return std::to_string(number) + " " + word + (number == 1 ? "" : "s");
+}
+
+std::string shellQuoted(std::string_view word) {
+  if (!needsQuotes(word)) return std::string(word);
+  std::string quoted = "'";
+  for (const char c : word) {
+    if (c == '\'') {
+      quoted += "'\\''";
+    } else {
+      quoted += c;
+    }
+  }
+  return quoted + "'";
+}
