@@ -89,8 +89,8 @@ bool StampsTell(const CachedFile &cached, const struct stat &status) noexcept {
 }
 
 /* Never destroyed, so that exit handlers can still read. */
-std::unique_ptr<const CachedFile> &Cache() {
-  static auto &cache = *new std::unique_ptr<const CachedFile>;
+std::unique_ptr<CachedFile> &Cache() {
+  static auto &cache = *new std::unique_ptr<CachedFile>;
   return cache;
 }
 
@@ -112,7 +112,7 @@ void Pause() noexcept {
   nanosleep(&pause, nullptr);
 }
 
-std::unique_ptr<const CachedFile> Load(const char *path) {
+std::unique_ptr<CachedFile> Load(const char *path) {
   for (int pauses = 0;; ++pauses) {
     const int64_t opened = Now(CLOCK_REALTIME_COARSE);
     FileContents read;
@@ -120,7 +120,7 @@ std::unique_ptr<const CachedFile> Load(const char *path) {
       return nullptr;
     }
     /* Made in place, since its names are views into itself. */
-    std::unique_ptr<const CachedFile> file(
+    std::unique_ptr<CachedFile> file(
         new CachedFile{path, read.status, opened, SectionText(std::move(read.text))});
     if (pauses < kMostPauses && IsYoung(read.status) && (!read.steady || LooksTorn(file->text))) {
       Pause();
@@ -134,13 +134,26 @@ std::unique_ptr<const CachedFile> Load(const char *path) {
   }
 }
 
-bool IsCurrent(const CachedFile &cached, const char *path, const struct stat &status) noexcept {
-  return IsSameFile(cached, path, status) && StampsTell(cached, status);
+/* In the tick of its last change a file is read at every call. That it still holds the
+ * same is found sooner than where its sections lie. */
+bool ReadsTheSame(CachedFile &cached) {
+  const int64_t opened = Now(CLOCK_REALTIME_COARSE);
+  FileContents read;
+  if (ReadFile(cached.path, 0, &read) < 0 || !read.steady ||
+      !SameContents(cached.status, read.status) || cached.text.contents() != read.text) {
+    return false;
+  }
+  cached.opened = opened;
+  return true;
+}
+
+bool IsCurrent(CachedFile &cached, const char *path, const struct stat &status) {
+  return IsSameFile(cached, path, status) && (StampsTell(cached, status) || ReadsTheSame(cached));
 }
 
 /* The text of the file as it is now. Null on failure (0x0900, 0x0B00). */
 const SectionText *Current(const char *path) {
-  std::unique_ptr<const CachedFile> &cache = Cache();
+  std::unique_ptr<CachedFile> &cache = Cache();
   struct stat status;
   if (stat(path, &status) != 0 || !S_ISREG(status.st_mode)) {
     cache.reset();

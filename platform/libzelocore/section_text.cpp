@@ -27,10 +27,13 @@ void SectionText::IndexSections() {
       if (!sections_.empty()) {
         sections_.back().end = begin;
       }
-      first_of_name_.emplace(name, sections_.size());
       sections_.push_back({name, begin, end, text.size()});
     }
     at = text.find('[', end);
+  }
+  first_of_name_.reserve(sections_.size());
+  for (size_t i = 0; i < sections_.size(); ++i) {
+    first_of_name_.emplace(sections_[i].name, i);
   }
 }
 

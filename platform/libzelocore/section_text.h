@@ -40,6 +40,7 @@ class SectionText {
   SectionText(const SectionText &) = delete;
   SectionText &operator=(const SectionText &) = delete;
 
+  std::string_view contents() const noexcept { return contents_; }
   /* What does not depend on the checksum, which takes as long as all else. */
   bool IsCutOff() const noexcept { return form_ == SectionForm::kCutOff; }
   SectionForm Form() const noexcept;
