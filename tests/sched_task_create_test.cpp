@@ -142,6 +142,7 @@ TEST_F(TaskCreateTest, PluginsThatCannotBePreparedAreLogged) {
              "sched_task_create.cpp:N Fail to execute task plugin (POST)",
              "sched_task_plugin.cpp:N Fail to do plugin exit[0x0D00 plugin.cpp:N]"}));
   EXPECT_EQ(hookCalls(), (Lines{"init task_scheduler task_create", "exit"}));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x2000, "sched_task_create.cpp"}));
 }
 
 TEST_F(TaskCreateTest, TheBackendAssignsTheIdIntoTheTask) {

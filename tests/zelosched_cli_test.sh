@@ -235,12 +235,12 @@ refuses() {
     eval "fails_saying 1 \"$part\" z $line" || { echo "$line"; bad=1; }
     same "$(state_of_files)" "$before" || { echo "changed by: $line"; bad=1; }
   done <<'LINES'
-the hour 24 is none of a day|add --daily 24:00 -- true
-the minute 60 is none of an hour|add --daily 08:60 -- true
-the last hour 24 is none of a day|add --daily 08:00 --every 2h --until 24 -- true
-day 32 is none of a month|add --monthly 32 08:30 -- true
-day 0 is none of a month|add --monthly 0 08:30 -- true
-month 13 is none of a year|add --yearly 13-01 08:30 -- true
+invalid hour 24 (00 to 23)|add --daily 24:00 -- true
+invalid minute 60 (00 to 59)|add --daily 08:60 -- true
+invalid last hour 24 (0 to 23)|add --daily 08:00 --every 2h --until 24 -- true
+invalid day 32 (1 to 31)|add --monthly 32 08:30 -- true
+invalid day 0 (1 to 31)|add --monthly 0 08:30 -- true
+invalid month 13 (01 to 12)|add --yearly 13-01 08:30 -- true
 month 4 never has a day 31|add --yearly 04-31 08:30 -- true
 month 2 never has a day 30 in 2099|add --once 2099-02-30T08:30 -- true
 needs a day of the week|add --weekly none 08:30 -- true
@@ -252,13 +252,13 @@ is over: write a later date|add --once 2001-01-01T08:30 -- true
 shorten it to 4095|add --name $(printf %04096d 0) --daily 08:30 -- true
 shorten it to 1023|add --app $(printf %01024d 0) --daily 08:30 -- true
 only 12287 can be stored|add --daily 08:30 -- $(printf %012288d 0)
-the hour 99 is none of a day|edit 1 --daily 99:00
+invalid hour 99 (00 to 23)|edit 1 --daily 99:00
 is over: write a later date|edit 1 --once 2001-01-01T08:30
 has an apostrophe|edit 1 --app "'"
 there is no task 7|edit 7 --daily 08:30
 there is no task 7|enable 7
 there is no task 7|remove --yes 7
-the hour 24 is none of a day|power add on --daily 24:00
+invalid hour 24 (00 to 23)|power add on --daily 24:00
 needs a day of the week|power add off --weekly none 08:30
 the start date 2027-13-01 does not exist|add --daily 08:30 --start 2027-13-01 -- true
 the start date 2027-02-31 does not exist|add --weekly mon 08:30 --start 2027-02-31 -- true
@@ -414,7 +414,7 @@ writes_no_line_that_cron_cannot_read() {
   sed -i '0,/^run hour=.*/s//run hour="25"/' "$STORE"
   local before
   before=$(cat /etc/crontab)
-  fails_saying 1 "the hour 25 is none of a day" z sync && same "$(cat /etc/crontab)" "$before" &&
+  fails_saying 1 "invalid hour 25 (00 to 23)" z sync && same "$(cat /etc/crontab)" "$before" &&
     sed -i '/zeloschedtask/d' /etc/crontab && try z status &&
     [[ $out == *"once no task has a field that cron cannot read"* ]]
 }
@@ -435,7 +435,7 @@ no_change_writes_a_line_that_cron_cannot_read() {
     "import $SCRATCH/one" "import --new $SCRATCH/one"; do
     # shellcheck disable=SC2086
     leaves_all_as_it_was z $command || { echo "changed by: $command"; bad=1; }
-    [[ $err == *"nothing was saved, as cron may then pass over all of /etc/crontab: task 1 (Task 1): the hour 25 is none of a day"*"or disable the task"* ]] ||
+    [[ $err == *"nothing was saved, as cron may then pass over all of /etc/crontab: task 1 (Task 1): invalid hour 25 (00 to 23)"*"or disable the task"* ]] ||
       { echo "$command: $err"; bad=1; }
   done
   z power add off --daily 23:00 >/dev/null || bad=1
@@ -1049,7 +1049,7 @@ readonly -a DAMAGES=(
   '/etc/crontab has a line that belongs to no task: 1 1 * * * root /tmp/zeloschedtask --run id=7' 'printf "1\t1\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=7\n" >>/etc/crontab'
   '/etc/crontab cannot be read: No such file' 'rm /etc/crontab'
   '/etc/crontab has 10001 lines, and cron ignores all of it when there are more than 10000' 'fill_crontab 10001'
-  'task 1 (Task 1): the hour 25 is none of a day' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
+  'task 1 (Task 1): invalid hour 25 (00 to 23)' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
   'cron may pass over all of /etc/crontab' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
   'task 1 (Task 1): there is no user 77777' 'sed -i "s/^owner=.*/owner=\"77777\"/" $STORE'
   '1 stored task cannot be read' 'sed -i "/^name=/d" $STORE'
@@ -1078,7 +1078,7 @@ a_list_that_fails_says_which_file_it_is() {
 a_fault_can_be_disabled_but_not_enabled() {
   all_well
   sed -i 's/^run hour=.*/run hour="25"/' "$STORE"
-  z disable 1 >/dev/null && fails_saying 1 "the hour 25 is none of a day" z enable 1 &&
+  z disable 1 >/dev/null && fails_saying 1 "invalid hour 25 (00 to 23)" z enable 1 &&
     same "$(task_lines)" 0
 }
 

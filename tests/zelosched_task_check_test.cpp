@@ -40,23 +40,23 @@ void setDay(ZELO_SCHED_TASK &task, int32_t type, uint32_t year, uint32_t month, 
 TEST_F(ZeloschedTaskCheckTest, EachFaultIsSaidWithWhatToWriteInstead) {
   const Fault faults[] = {
       {[](auto &task) { task.RunHour = 24; },
-       "the hour 24 is none of a day: write a time from 00:00 to 23:59", true},
+       "invalid hour 24 (00 to 23)", true},
       {[](auto &task) { task.RunMin = 60; },
-       "the minute 60 is none of an hour: write minutes from 00 to 59, as in 08:30", true},
+       "invalid minute 60 (00 to 59)", true},
       {[](auto &task) {
          task.RepeatHour = 1;
          task.LastWorkHour = 24;
        },
-       "the last hour 24 is none of a day: write --until with an hour from 0 to 23", false},
+       "invalid last hour 24 (0 to 23)", false},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 0, 0, 0); },
-       "day 0 is none of a month: write a day from 1 to 31", true},
+       "invalid day 0 (1 to 31)", true},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 0, 0, 32); },
-       "day 32 is none of a month: write a day from 1 to 31", true},
+       "invalid day 32 (1 to 31)", true},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_YEARLY, 0, 13, 1); },
-       "month 13 is none of a year: write a month from 01 to 12, as in 02-29 for 29 February",
+       "invalid month 13 (01 to 12)",
        true},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_ONCE, 2026, 0, 1); },
-       "month 0 is none of a year: write a month from 01 to 12, as in 02-29 for 29 February", true},
+       "invalid month 0 (01 to 12)", true},
       {[](auto &task) {
          task.Type = ZELO_SCHED_TYPE_WEEKLY;
          setText(task.Week, "0000000");

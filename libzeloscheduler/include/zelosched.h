@@ -267,7 +267,10 @@ ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t c
 /* Saves the task that a JSON text in that form describes. With `create` 0 it
  * overwrites the stored task of its id when that has the same app and name; in
  * every other case, and always with `create` not 0, it becomes a new task, which
- * the crontab backend keeps also when the text was made of a power task. Keys
+ * the crontab backend keeps also when the text was made of a power task. So a
+ * power task that was taken by its id ("Poweroff 0") is saved over itself, and the
+ * same one from a list ("PowerOff task 0"), whose name is another, becomes an
+ * ordinary task. Keys
  * that are missing have the defaults of the hash form; of a member given twice
  * the last counts; members that are no key of a task are passed over.
  *

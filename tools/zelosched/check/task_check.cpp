@@ -43,28 +43,30 @@ std::string number(uint32_t value) {
   return std::to_string(value);
 }
 
+std::string invalid(const char *what, uint32_t value, const char *range) {
+  return std::string("invalid ") + what + " " + number(value) + " (" + range + ")";
+}
+
 // ---- what cron could not read ---------------------------------------------------------------
 
 std::string badHour(const ZELO_SCHED_TASK &task) {
   if (schedAreHoursReadable(task)) return "";
-  return "the hour " + number(task.RunHour) + " is none of a day: write a time from 00:00 to 23:59";
+  return invalid("hour", task.RunHour, "00 to 23");
 }
 
 std::string badMinute(const ZELO_SCHED_TASK &task) {
   if (schedIsMinuteReadable(task)) return "";
-  return "the minute " + number(task.RunMin) +
-         " is none of an hour: write minutes from 00 to 59, as in 08:30";
+  return invalid("minute", task.RunMin, "00 to 59");
 }
 
 std::string badDay(const ZELO_SCHED_TASK &task) {
   if (schedIsDayReadable(task)) return "";
-  return "day " + number(task.StartDay) + " is none of a month: write a day from 1 to 31";
+  return invalid("day", task.StartDay, "1 to 31");
 }
 
 std::string badMonth(const ZELO_SCHED_TASK &task) {
   if (schedIsMonthReadable(task)) return "";
-  return "month " + number(task.StartMonth) +
-         " is none of a year: write a month from 01 to 12, as in 02-29 for 29 February";
+  return invalid("month", task.StartMonth, "01 to 12");
 }
 
 std::string noWeekday(const ZELO_SCHED_TASK &task) {
@@ -77,8 +79,7 @@ std::string noWeekday(const ZELO_SCHED_TASK &task) {
 // The line ends with the last hour of the day all the same.
 std::string badLastHour(const ZELO_SCHED_TASK &task) {
   if (task.RepeatHour == 0 || task.LastWorkHour <= kLastHourOfDay) return "";
-  return "the last hour " + number(task.LastWorkHour) +
-         " is none of a day: write --until with an hour from 0 to 23";
+  return invalid("last hour", task.LastWorkHour, "0 to 23");
 }
 
 std::string lateYear(const ZELO_SCHED_TASK &task) {
