@@ -67,11 +67,36 @@ static int read_pairs(char **pairs, const char *values[COUNT]) {
   return 0;
 }
 
+/* Each enabled task is a line of the crontab, and of one with more than 10,000 lines
+ * cron ignores all: nobody may fill it. */
+enum { MOST_TASKS_OF_A_USER = 50 };
+
+static unsigned long counted_uid;
+static int is_counted(const ZELO_SCHED_TASK *task) {
+  return task->Owner == counted_uid;
+}
+
+static int may_have_another(unsigned long uid) {
+  ZELO_SCHED_TASK *tasks = NULL;
+  const ZELO_SCHED_TASK *task;
+  int count = 0;
+  counted_uid = uid;
+  if (ZELOSchedTaskListGet(&tasks, is_counted) < 0) return 0;
+  for (task = tasks; task != NULL; task = task->next) count++;
+  ZELOSchedTaskListFree(&tasks);
+  return count < MOST_TASKS_OF_A_USER;
+}
+
 /* The stored task that is to be changed, if it is the user's own and may be, or a
  * new one. */
 static ZELO_SCHED_TASK *find(unsigned long uid, const char *id) {
-  ZELO_SCHED_TASK *task = ZELOSchedTaskAlloc();
+  ZELO_SCHED_TASK *task = NULL;
   unsigned long number = 0;
+  if (id == NULL && !may_have_another(uid)) {
+    fprintf(stderr, "this user has %d tasks, and may have no more\n", MOST_TASKS_OF_A_USER);
+    return NULL;
+  }
+  task = ZELOSchedTaskAlloc();
   if (task == NULL || id == NULL) return task;
   if (read_number(id, INT32_MAX, &number) == 0 && ZELOSchedTaskGetByID((long)number, task) == 0 &&
       task->Owner == uid && task->Backend == ZELO_SCHED_BACKEND_SCHEDULE &&
@@ -113,7 +138,7 @@ static int save(unsigned long uid, const char *values[COUNT]) {
   ZELO_SCHED_TASK *task = find(uid, values[ID]);
   int result = -1;
   if (task == NULL) {
-    fprintf(stderr, "there is no such task of this user\n");
+    fprintf(stderr, "no task of this user can be saved under that id\n");
     return -1;
   }
   if (fill(task, values) == 0) {

@@ -11,6 +11,7 @@
 
 #include <dlfcn.h>
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <sys/single_threaded.h>
 #include <unistd.h>
 
@@ -114,13 +115,24 @@ int openFile(sqlite3_vfs *, const char *szName, sqlite3_file *file, int flags, i
                                  : own.real->xOpen(own.real, szName, file, flags, pFlags);
 }
 
-// A journal without contents is none, and keeps its name taken.
+// What was taken from the file system for the file stays so.
+void keepRoom(int descriptor, const struct stat &before) {
+  constexpr off_t kBlock = 512;  // the unit of st_blocks
+  fallocate(descriptor, FALLOC_FL_KEEP_SIZE, 0, before.st_blocks * kBlock);
+}
+
+// A journal without contents is none, and keeps its name and its room taken.
 int emptyJournal(const char *szName, bool toDisk) {
   const int descriptor = open(szName, O_WRONLY | O_NOFOLLOW | O_CLOEXEC);
   if (descriptor < 0) {
     return SQLITE_IOERR_DELETE;
   }
+  struct stat before = {};
+  fstat(descriptor, &before);
   const bool isEmpty = ftruncate(descriptor, 0) == 0 && (!toDisk || fsync(descriptor) == 0);
+  if (before.st_blocks > 0) {
+    keepRoom(descriptor, before);
+  }
   close(descriptor);
   return isEmpty ? SQLITE_OK : SQLITE_IOERR_DELETE;
 }

@@ -21,12 +21,16 @@ struct MemoryDeleter {
 };
 
 // The platform may move a hash or a list when it grows, which is why its calls take the address of
-// the handle; handle() is that address.
+// the handle; handle() is that address. Not every platform frees null.
 template <class Handle, class Deleter>
 class PlatformHandle {
  public:
   explicit PlatformHandle(Handle handle) : handle_(handle) {}
-  ~PlatformHandle() { Deleter()(handle_); }
+  ~PlatformHandle() {
+    if (handle_ != nullptr) {
+      Deleter()(handle_);
+    }
+  }
   PlatformHandle(const PlatformHandle &) = delete;
   PlatformHandle &operator=(const PlatformHandle &) = delete;
 

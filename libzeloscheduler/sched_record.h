@@ -17,32 +17,15 @@ using TaskGuard = std::unique_ptr<ZELO_SCHED_TASK, TaskDeleter>;
 // One zeroed record; null, with errno set, when memory is short.
 TaskGuard schedRecordAlloc();
 
-// Sets all numbers to 0 and all texts to "". What lies behind the texts' ends stays, which spares a
-// record that is filled over and over most of its bytes; none that a caller gets is made this way.
-void schedRecordEmpty(ZELO_SCHED_TASK *pTask);
+struct SchedBlock;
 
-// Copies the id, the state and what says when the task runs.
-void schedRecordCopySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from);
-
-// How much of a record there is: all of it, or what schedRecordCopySchedule copies. The rest, its
-// largest part, must then not be touched: the next records lie in it.
-enum class SchedRecordExtent { kWhole, kSchedule };
-
-// What is known beforehand of the number of a list's records: that there will hardly be fewer, or
-// only that there will not be more.
-enum class SchedRecordCount { kExpected, kAtMost };
-
-struct SchedSlab;
-
-// The records of one list. A record is large and mostly empty, and of many records taken one by one
-// it is the page faults that a list costs most. They are therefore taken from slabs, those of long
-// lists of huge pages; a slab is freed with the last of its records, in whatever order they are
-// freed. Within a slab they lie in the order in which they were taken, schedules in one slab. Where
-// it is not known how many there will be, slabs begin below a huge page and grow with what is
-// taken.
+// The records of one list. The allocator gives the memory of records that were taken one by one
+// back to the kernel after each list, and the page faults of the next one are then most of its
+// time. They are therefore taken from blocks of a few; a block is freed with the last of its
+// records, in whatever order they are freed.
 class SchedRecordSource {
  public:
-  SchedRecordSource(SchedRecordCount count, int records, SchedRecordExtent extent);
+  explicit SchedRecordSource(int mostRecords);
   ~SchedRecordSource();
   SchedRecordSource(const SchedRecordSource &) = delete;
   SchedRecordSource &operator=(const SchedRecordSource &) = delete;
@@ -51,13 +34,8 @@ class SchedRecordSource {
   TaskGuard take();
 
  private:
-  size_t roomOfNextSlab() const;  // in records
-
-  SchedRecordCount count_;
-  SchedRecordExtent extent_;
   size_t left_;  // that may still be taken
-  size_t taken_ = 0;
-  SchedSlab *slab_ = nullptr;
+  SchedBlock *block_ = nullptr;
 };
 
 #endif

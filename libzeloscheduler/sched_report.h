@@ -44,11 +44,17 @@ struct SchedPlace {
 #define SCHED_LOG_ERRNO(format, ...) \
   SCHED_LOG(format "%s" __VA_OPT__(, ) __VA_ARGS__, strerror(errno))
 
+// Not every platform has a name there before the first failure.
+inline const char *schedErrorFile() {
+  const char *szFile = QLIBCErrorGetFile();
+  return szFile != nullptr ? szFile : "";
+}
+
 // For a failure passed up from a callee: its error record is appended to the line and stays as it
 // is. `format` ends with whatever stands before the bracket.
 #define SCHED_LOG_CALLEE_AT(place, format, ...)                           \
   SCHED_LOG_AT(place, format "[0x%04X %s:%d]" __VA_OPT__(, ) __VA_ARGS__, \
-               static_cast<unsigned>(QLIBCErrGet()), QLIBCErrorGetFile(), QLIBCErrorGetLine())
+               static_cast<unsigned>(QLIBCErrGet()), schedErrorFile(), QLIBCErrorGetLine())
 
 #define SCHED_LOG_CALLEE(format, ...) \
   SCHED_LOG_CALLEE_AT(SCHED_HERE, format __VA_OPT__(, ) __VA_ARGS__)
@@ -59,7 +65,7 @@ struct SchedPlace {
 class SchedErrorRecord {
  public:
   SchedErrorRecord() : code_(QLIBCErrGet()), line_(QLIBCErrorGetLine()) {
-    copyText(file_, QLIBCErrorGetFile());
+    copyText(file_, schedErrorFile());
   }
   void restore() const { QLIBCErrSetEx(code_, file_, line_); }
 

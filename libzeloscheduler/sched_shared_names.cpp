@@ -17,9 +17,16 @@ constexpr mode_t kReadableByAll = 0644;
 constexpr mode_t kOwnersOnly = 0600;  // whoever can open it can keep every run waiting
 constexpr mode_t kOpenDirectory = 0755;
 constexpr char kStorePath[] = "/tmp/scheduled_tasks";
+constexpr char kPersistentStore[] = "/usr/zelo/etc/scheduled_tasks";
+constexpr char kLastGoodStore[] = "/usr/zelo/etc/scheduled_tasks.last-good";
 // A store of no bytes beside a persistent copy that has some is one that was cut off, and is
 // refused.
 constexpr char kNoTasks[] = "# The scheduler's tasks.\n";
+
+// Another user can fill the file system, and a run that cannot be recorded is not begun. This is
+// room for some 10,000 runs, and for the journal of one.
+constexpr off_t kRoomForRuns = 1 << 20;
+constexpr off_t kRoomForJournal = 1 << 17;
 
 constexpr int kTries = 1000;  // against somebody who is in the way again and again
 
@@ -41,19 +48,26 @@ bool writeAll(int descriptor, std::string_view contents) {
   return true;
 }
 
-bool makeFile(const char *szPath, mode_t mode, std::string_view contents) {
+// A file system that cannot give it now may have room when it is needed.
+void reserve(const SchedSharedName &name, int descriptor) {
+  if (name.reserve > 0) {
+    fallocate(descriptor, FALLOC_FL_KEEP_SIZE, 0, name.reserve);
+  }
+}
+
+bool makeFile(const SchedSharedName &name, const char *szPath) {
   constexpr int kFlags = O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC;
-  const int descriptor = open(szPath, kFlags, mode & S_IRWXU);
+  const int descriptor = open(szPath, kFlags, name.mode & S_IRWXU);
   if (descriptor < 0) {
     return false;
   }
-  const bool isWritten = writeAll(descriptor, contents) && fchmod(descriptor, mode) == 0;
+  const bool isWritten = writeAll(descriptor, name.contents) && fchmod(descriptor, name.mode) == 0;
+  reserve(name, descriptor);
   return close(descriptor) == 0 && isWritten;
 }
 
 bool make(const SchedSharedName &name, const char *szPath) {
-  return name.isDirectory ? makeDirectory(szPath, name.mode)
-                          : makeFile(szPath, name.mode, name.contents);
+  return name.isDirectory ? makeDirectory(szPath, name.mode) : makeFile(name, szPath);
 }
 
 void removeEither(const char *szPath) {
@@ -172,8 +186,10 @@ const SchedSharedName kSchedTaskProgram = {"/tmp/zeloschedtask", kOpenDirectory,
                                            kSchedStandIn};
 const SchedSharedName kSchedLockDirectory = {"/tmp/lock", kOpenDirectory, true, ""};
 const SchedSharedName kSchedLockFile = {"/tmp/lock/lock_sched_run", kOwnersOnly, false, ""};
-const SchedSharedName kSchedDatabase = {"/tmp/sched_status.sqlite", kOwnersOnly, false, ""};
-const SchedSharedName kSchedJournal = {"/tmp/sched_status.sqlite-journal", kOwnersOnly, false, ""};
+const SchedSharedName kSchedDatabase = {"/tmp/sched_status.sqlite", kOwnersOnly, false, "",
+                                        kRoomForRuns};
+const SchedSharedName kSchedJournal = {"/tmp/sched_status.sqlite-journal", kOwnersOnly, false, "",
+                                       kRoomForJournal};
 
 const char *schedWhyForeign(const SchedSharedName &name, const struct stat &info) {
   if (info.st_uid != 0 && info.st_uid != geteuid()) {
@@ -221,6 +237,14 @@ bool schedTakeName(const SchedSharedName &name) {
   return false;
 }
 
+void schedReserve(const SchedSharedName &name) {
+  const int descriptor = open(name.path, O_WRONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+  if (descriptor >= 0) {
+    reserve(name, descriptor);
+    close(descriptor);
+  }
+}
+
 bool schedReplaceName(const SchedSharedName &name, SchedMovedTo *pMovedTo) {
   return geteuid() == 0 && replace(name, Ours::kGoes, pMovedTo);
 }
@@ -240,6 +264,13 @@ bool schedMakeAnew(const SchedSharedName &name) {
     }
   }
   return schedReplaceName(name, nullptr);
+}
+
+bool schedAreTasksKept() {
+  struct stat kept = {};
+  struct stat lastGood = {};
+  return stat(kPersistentStore, &kept) == 0 &&
+         (kept.st_size > 0 || (stat(kLastGoodStore, &lastGood) == 0 && lastGood.st_size > 0));
 }
 
 void schedTakeNames() {

@@ -17,6 +17,7 @@ struct SchedSharedName {
   mode_t mode;
   bool isDirectory;
   std::string_view contents;  // of a file that is made under the name
+  off_t reserve = 0;          // bytes that it takes from the file system beforehand
 };
 
 extern const SchedSharedName kSchedStore;
@@ -43,6 +44,10 @@ SchedNameState schedLookAt(const SchedSharedName &name, const char **pszWhy);
 // which the log names; an empty directory is removed. It logs nothing else, and sets no error code.
 bool schedTakeName(const SchedSharedName &name);
 
+// Takes the room that a file of ours shall have, where it was made in another way. Nobody may hold a
+// POSIX lock on it yet: closing the file would drop it.
+void schedReserve(const SchedSharedName &name);
+
 // Makes it anew, in one step, whatever stands there: for root alone. True when the name has it;
 // where the log names what was moved away, it is in *pMovedTo, which may be null, and is ""
 // otherwise.
@@ -55,6 +60,10 @@ bool schedMoveAside(const SchedSharedName &name, SchedMovedTo *pMovedTo);
 // The same for a name that nothing is expected under: what stands there, ours too, is removed, or
 // moved away when it is a directory. True when a new file of this process has the name.
 bool schedMakeAnew(const SchedSharedName &name);
+
+// Whether tasks are kept for the next boot. A persistent copy without bytes was cut off, by a loss
+// of power, when there is a last good one.
+bool schedAreTasksKept();
 
 // Takes all names but the store's, when the process is root's: a name that is free could be given
 // to a file of root's that another user moved there.

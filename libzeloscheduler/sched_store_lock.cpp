@@ -3,16 +3,19 @@
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
+#include <sys/sysmacros.h>
 #include <unistd.h>
 
+#include <cctype>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 
 #include "sched_report.h"
 
 namespace {
 
-constexpr char kFile[] = "/run/zeloscheduler.lock";
+constexpr const char *kFile = kSchedStoreLockFile;
 constexpr mode_t kMode = 0600;
 constexpr int kTries = 6000;  // thirty seconds in all
 constexpr useconds_t kPause = 5000;
@@ -27,19 +30,37 @@ bool isStillThere(int file) {
          held.stx_dev_minor == there.stx_dev_minor;
 }
 
-// The lock does not say who holds it, so the holder does.
-void sayWhoHolds(int file) {
-  char text[32];
-  const int length = snprintf(text, sizeof(text), "%ld\n", static_cast<long>(getpid()));
-  if (pwrite(file, text, static_cast<size_t>(length), 0) != length) {
-    return;  // nobody is told then; the lock is held all the same
+// The word before szEnd.
+pid_t lastNumber(const char *szLine, const char *szEnd) {
+  const char *szNumber = szEnd;
+  while (szNumber > szLine && isdigit(static_cast<unsigned char>(szNumber[-1])) != 0) {
+    --szNumber;
   }
+  return static_cast<pid_t>(strtol(szNumber, nullptr, 10));
 }
 
+// The kernel's list says it of whoever locked the file, with this library or without. It has no
+// entry of a process that is in another pid namespace.
 pid_t whoHolds(int file) {
-  char text[32] = "";
-  const ssize_t length = pread(file, text, sizeof(text) - 1, 0);
-  return length > 0 ? static_cast<pid_t>(strtol(text, nullptr, 10)) : 0;
+  struct stat info = {};
+  FILE *const locks = fstat(file, &info) == 0 ? fopen("/proc/locks", "re") : nullptr;
+  if (locks == nullptr) {
+    return kSchedUnknownHolder;
+  }
+  char where[64];
+  snprintf(where, sizeof(where), " %02x:%02x:%lu ", major(info.st_dev), minor(info.st_dev),
+           static_cast<unsigned long>(info.st_ino));
+  pid_t holder = kSchedUnknownHolder;
+  char line[256];
+  while (holder <= 0 && fgets(line, sizeof(line), locks) != nullptr) {
+    const char *const szWhere = strstr(line, where);
+    const bool isHeld = strstr(line, ": FLOCK ") != nullptr;  // a waiting one has "->" there
+    if (szWhere != nullptr && isHeld) {
+      holder = lastNumber(line, szWhere);
+    }
+  }
+  fclose(locks);
+  return holder > 0 ? holder : kSchedUnknownHolder;
 }
 
 int openFile() {
@@ -70,16 +91,23 @@ Turn lock(int *pFile) {
   return turn;
 }
 
+void reportHolder(pid_t holder) {
+  if (holder == kSchedUnknownHolder) {
+    SCHED_LOG("Lock [%s] failed. Another process holds it.", kFile);
+  } else {
+    SCHED_LOG("Lock [%s] failed. Process %ld holds it.", kFile, static_cast<long>(holder));
+  }
+}
+
 }  // namespace
 
 StoreLock::StoreLock() : file_(openFile()) {
   const Turn turn = lock(&file_);
   if (turn == Turn::kOurs) {
-    sayWhoHolds(file_);
     return;
   }
   if (turn == Turn::kWait) {
-    SCHED_LOG("Lock [%s] failed. Process %ld holds it.", kFile, static_cast<long>(whoHolds(file_)));
+    reportHolder(whoHolds(file_));
   } else {
     SCHED_LOG_ERRNO("Lock [%s] failed. ", kFile);
   }
@@ -96,8 +124,8 @@ StoreLock::~StoreLock() {
   }
 }
 
-pid_t schedStoreLockHolder() {
-  const int file = open(kFile, O_RDWR | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+pid_t schedLockHolder(const char *szFile) {
+  const int file = open(szFile, O_RDWR | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
   if (file < 0) {
     return 0;
   }

@@ -4,6 +4,8 @@
 
 #include <sys/types.h>
 
+constexpr char kSchedStoreLockFile[] = "/run/zeloscheduler.lock";
+
 // Keeps two processes from changing these files at once: each would write what it read over the
 // other's change. The lock is on a file that nobody else can open: one that anyone could take would
 // keep everyone waiting. It is not taken twice: an operation that holds it calls what needs it and
@@ -25,7 +27,9 @@ class StoreLock {
   int file_;
 };
 
-// The process that holds it, 0 when that is not known or there is none. It waits for nothing.
-pid_t schedStoreLockHolder();
+// The process that holds the lock on a file (flock), 0 when there is none. It waits for nothing.
+pid_t schedLockHolder(const char *szFile);
+
+constexpr pid_t kSchedUnknownHolder = -1;  // of another container, say
 
 #endif

@@ -12,50 +12,12 @@
 #include "sched_json.h"
 #include "sched_report.h"
 #include "sched_text.h"
+#include "sched_utf8.h"
 
 namespace {
 
 constexpr size_t kSmallestBuffer = ZELO_SCHED_JSON_SIZE_MIN;
 constexpr int kContainerCapacity = 512;
-
-// UTF-8 by its first byte: how long a character is, and the range of its second byte, which is what
-// tells overlong forms, surrogates and numbers beyond Unicode. Any further byte is 80 to BF.
-struct Utf8Form {
-  unsigned char firstLead;
-  unsigned char lastLead;
-  size_t length;
-  unsigned char firstSecond;
-  unsigned char lastSecond;
-};
-constexpr Utf8Form kUtf8Forms[] = {
-    {0x00, 0x7F, 1, 0x00, 0x00}, {0xC2, 0xDF, 2, 0x80, 0xBF}, {0xE0, 0xE0, 3, 0xA0, 0xBF},
-    {0xE1, 0xEC, 3, 0x80, 0xBF}, {0xED, 0xED, 3, 0x80, 0x9F}, {0xEE, 0xEF, 3, 0x80, 0xBF},
-    {0xF0, 0xF0, 4, 0x90, 0xBF}, {0xF1, 0xF3, 4, 0x80, 0xBF}, {0xF4, 0xF4, 4, 0x80, 0x8F},
-};
-
-bool isWithin(char byte, unsigned char first, unsigned char last) {
-  const auto number = static_cast<unsigned char>(byte);
-  return first <= number && number <= last;
-}
-
-// The length of the character that `text` begins with, or 0 when it begins with none.
-size_t characterLength(std::string_view text) {
-  for (const Utf8Form &form : kUtf8Forms) {
-    if (!isWithin(text[0], form.firstLead, form.lastLead)) {
-      continue;
-    }
-    if (text.size() < form.length) {
-      return 0;
-    }
-    for (size_t i = 1; i < form.length; ++i) {
-      if (!isWithin(text[i], i == 1 ? form.firstSecond : 0x80, i == 1 ? form.lastSecond : 0xBF)) {
-        return 0;
-      }
-    }
-    return form.length;
-  }
-  return 0;
-}
 
 // JSON has no way to carry a byte that is not UTF-8, and the writer takes whatever follows one for
 // a part of it. So each such byte is replaced by itself, and the characters around it stay.
@@ -64,18 +26,18 @@ std::string wellFormed(std::string_view text) {
   std::string result;
   result.reserve(text.size());
   while (!text.empty()) {
-    const size_t length = characterLength(text);
-    result += length > 0 ? text.substr(0, length) : kReplacement;
-    text.remove_prefix(length > 0 ? length : 1);
+    const size_t bytes = schedFirstCharacter(text).bytes;
+    result += bytes > 0 ? text.substr(0, bytes) : kReplacement;
+    text.remove_prefix(bytes > 0 ? bytes : 1);
   }
   return result;
 }
 
-constexpr unsigned char kLastAscii = kUtf8Forms[0].lastLead;
-
 Json::Value valueOf(std::string_view text) {
-  const bool isAscii = std::all_of(text.begin(), text.end(),
-                                   [](char byte) { return isWithin(byte, 0x00, kLastAscii); });
+  constexpr unsigned char kLastAscii = 0x7F;
+  const bool isAscii = std::all_of(text.begin(), text.end(), [](char byte) {
+    return static_cast<unsigned char>(byte) <= kLastAscii;
+  });
   return isAscii ? Json::Value(text.data(), text.data() + text.size())
                  : Json::Value(wellFormed(text));
 }

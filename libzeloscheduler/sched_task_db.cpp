@@ -110,6 +110,7 @@ void createDatabase() {
   const mode_t mask = umask(static_cast<mode_t>(~kOwnersOnly) & 0777);
   QLIBCFileTouch(kDatabase);
   umask(mask);
+  schedReserve(kSchedDatabase);
 }
 
 bool takeName(const SchedSharedName &name) {
@@ -179,7 +180,7 @@ int openInPlaceOfWal(sqlite3 **ppHandle) {
   return result;
 }
 
-// Cheaper than to empty it after each transaction.
+// Cheaper than to empty it after each transaction, and its room stays ours.
 void keepJournal(sqlite3 *db) {
   sqlite3_stmt *statement = nullptr;
   if (sqlite3_prepare_v2(db, "PRAGMA journal_mode=PERSIST", -1, &statement, nullptr) == SQLITE_OK) {

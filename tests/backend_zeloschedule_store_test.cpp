@@ -214,17 +214,20 @@ TEST_F(StoreTest, AFreeNameIsTakenByWhoeverReadsIt) {
   EXPECT_EQ(logged(), Lines{});
 }
 
-// Whoever would build on it would write over the tasks that are kept.
-TEST_F(StoreTest, AFreeNameIsNoStoreWithoutTasksAfterItsFirstReadWhileTasksAreKept) {
+// Whether somebody has read it before makes no difference to who comes later.
+TEST_F(StoreTest, AFreeNameIsAStoreWithoutTasksAlsoWhileSomeAreKept) {
   create("kept");
-  const std::string kept = readFile(kPersistentStore);
   std::filesystem::remove(kStore);
-  EXPECT_EQ(listedIds(), Ids{});
-  EXPECT_EQ(readFile(kStore), "");
-  EXPECT_EQ(backend_.create(makeTask("new", "true").get()), -1);
-  EXPECT_EQ(errorRecord().code, 0x0B00);
-  EXPECT_EQ(readFile(kPersistentStore), kept);
-  EXPECT_EQ(readFile(support::kLastGoodStore), kept);
+  const Task task = makeTask("new", "true");
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_EQ(listedIds(), Ids{});
+    EXPECT_EQ(backend_.get_by_id(1, task.get()), 0);
+    EXPECT_EQ(task->State, ZELO_SCHED_STATE_NOT_EXISTED);
+    EXPECT_EQ(backend_.remove(1), 0);
+  }
+  EXPECT_EQ(create("first"), 1);
+  EXPECT_EQ(listedIds(), Ids{1});
+  EXPECT_EQ(logged(), Lines{});
 }
 
 // As tmpfiles.d makes it at boot.
@@ -375,6 +378,21 @@ TEST_F(StoreTest, TheIdsOfTasksAreNotFreeWhileThereIsNoClock) {
                                      "sched_util.cpp:N]"));
 }
 
+TEST_F(StoreTest, ATaskWhoseStateOrTypeHasNoNameIsStoredAndNeverSeenAgain) {
+  for (const auto field : {&ZELO_SCHED_TASK::State, &ZELO_SCHED_TASK::Type}) {
+    const Task task = makeTask("lost", "true");
+    task.get()->*field = 5;
+    EXPECT_EQ(backend_.create(task.get()), 0);
+    EXPECT_EQ(task->ID, 1);
+    ZELO_SCHED_TASK *head = nullptr;
+    EXPECT_EQ(backend_.list_get(&head, nullptr), 0);
+    EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
+  }
+  const Task task = makeTask("next", "true");
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(task->ID, 1);
+}
+
 TEST_F(StoreTest, ARecordThatCannotBeAllocatedFailsTheWholeList) {
   if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer allocates itself";
   for (const char *section : {"1", "2", "3"}) addSection(section, std::atoi(section));
@@ -455,11 +473,41 @@ TEST_F(StoreTest, ATaskThatCannotBeReadIsReported) {
 
 // ---- "/tmp" is everybody's
 
-TEST_F(StoreTest, AStoreThatSomebodyElsePlantedIsNotRead) {
+// The persistent copy is written as a whole, so nothing is read or changed before its tasks are put
+// back.
+TEST_F(StoreTest, AStoreThatSomebodyElsePlantedIsMovedAwayAndNotRead) {
   REQUIRE_OTHER_USERS();
   create("own");
   const std::string store = readFile(kStore);
-  ASSERT_EQ(chown(kStore, 65534, 65534), 0);
+  const Task task = makeTask("new", "true");
+  task->ID = 1;
+  ZELO_SCHED_TASK *tasks = nullptr;
+  const std::function<int()> calls[] = {
+      [&] { return backend_.list_get(&tasks, nullptr); },
+      [&] { return backend_.get_by_id(1, task.get()); },
+      [&] { return backend_.create(task.get()); },
+      [&] { return backend_.edit(task.get()); },
+      [&] { return backend_.remove(1); },
+  };
+  for (const auto &call : calls) {
+    writeFile(kStore, store);
+    ASSERT_EQ(chown(kStore, 65534, 65534), 0);
+    for (int i = 0; i < 2; ++i) {
+      EXPECT_EQ(call(), -1);
+      EXPECT_EQ(errorRecord().code, 0x0B00);
+      EXPECT_EQ(readFile(kStore), "");
+    }
+    const std::string moved = support::movedAway(kStore);
+    EXPECT_EQ(readFile(moved), store);
+    std::filesystem::remove_all(std::filesystem::path(moved).parent_path());
+  }
+  EXPECT_EQ(readFile(kPersistentStore), store);
+}
+
+TEST_F(StoreTest, AStoreThatCannotBeMovedAwayIsNotRead) {
+  create("own");
+  ASSERT_EQ(chmod(kStore, 0666), 0);
+  failCall("mkdtemp", {.times = support::kAlways, .error = ENOSPC});
   ZELO_SCHED_TASK *tasks = nullptr;
   EXPECT_EQ(backend_.list_get(&tasks, nullptr), -1);
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
@@ -468,22 +516,6 @@ TEST_F(StoreTest, AStoreThatSomebodyElsePlantedIsNotRead) {
   EXPECT_EQ(backend_.get_by_id(1, task.get()), -1);
   EXPECT_EQ(logged(), Lines{backendLine("Get section [1] from [/tmp/scheduled_tasks] failed. "
                                         "[0x0900 backend_zeloschedule.cpp:N]")});
-  EXPECT_EQ(readFile(kStore), store);
-}
-
-// The persistent copy is written as a whole, so nothing is changed before its tasks are put back.
-TEST_F(StoreTest, AChangeMovesAStoreOfSomebodyElseAwayAndWaitsForARestore) {
-  REQUIRE_OTHER_USERS();
-  create("own");
-  const std::string store = readFile(kStore);
-  ASSERT_EQ(chown(kStore, 65534, 65534), 0);
-  EXPECT_EQ(backend_.create(makeTask("new", "true").get()), -1);
-  EXPECT_EQ(errorRecord().code, 0x0900);
-  EXPECT_EQ(backend_.edit(makeTask("new", "true").get()), -1);
-  EXPECT_EQ(errorRecord().code, 0x0B00);
-  EXPECT_EQ(readFile(support::movedAway(kStore)), store);
-  EXPECT_EQ(readFile(kStore), "");
-  EXPECT_EQ(readFile(kPersistentStore), store);
 }
 
 TEST_F(StoreTest, AFirstTaskTakesThePlaceOfAStoreOfSomebodyElse) {
@@ -502,7 +534,8 @@ TEST_F(StoreTest, AStoreThatOthersCanWriteIsNotRead) {
   ASSERT_EQ(chmod(kStore, 0666), 0);
   ZELO_SCHED_TASK *tasks = nullptr;
   EXPECT_EQ(backend_.list_get(&tasks, nullptr), -1);
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0B00, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(readFile(kStore), "");
 }
 
 // A forced copy onto a directory would copy into it, through whatever link lies there.
@@ -553,6 +586,22 @@ TEST_F(StoreTest, NothingIsBuiltOnAStoreWithoutBytesBesideAPersistentCopyThatHas
   EXPECT_EQ(readFile(kPersistentStore), whole);
 }
 
+// The power went before the persistent copy was filled again; the last good one has every task.
+TEST_F(StoreTest, NothingIsBuiltOnAStoreWithoutBytesBesideAPersistentCopyThatWasCutToNothing) {
+  create("first");
+  const std::string whole = readFile(support::kLastGoodStore);
+  writeFile(kPersistentStore, "");
+  writeFile(kStore, "");
+  const Task task = makeTask("new", "true");
+  ZELO_SCHED_TASK *tasks = nullptr;
+  EXPECT_EQ(backend_.list_get(&tasks, nullptr), -1);
+  EXPECT_EQ(backend_.create(task.get()), -1);
+  task->ID = 2;
+  EXPECT_EQ(backend_.edit(task.get()), -1);
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0B00, "backend_zeloschedule.cpp"}));
+  EXPECT_EQ(readFile(support::kLastGoodStore), whole);
+}
+
 TEST_F(StoreTest, AChangeWaitsForItsTurnAndChangesNothingWithoutIt) {
   create("first");
   const int file = open("/run/zeloscheduler.lock", O_RDWR);
@@ -565,7 +614,6 @@ TEST_F(StoreTest, AChangeWaitsForItsTurnAndChangesNothingWithoutIt) {
   EXPECT_EQ(support::recordedSleeps().size(), 3U);
   support::onSleep({});
   ASSERT_EQ(flock(file, LOCK_EX), 0);
-  ASSERT_EQ(pwrite(file, "4711\n", 5, 0), 5);
   const std::string store = readFile(kStore);
   const std::string crontab = readFile(kCrontab);
   const Task task = makeTask("third", "true");
@@ -584,7 +632,8 @@ TEST_F(StoreTest, AChangeWaitsForItsTurnAndChangesNothingWithoutIt) {
     EXPECT_EQ(support::recordedSleeps(), std::vector<long>(6000, 5000));
     EXPECT_EQ(errorRecord(), (ErrorRecord{0x0400, "sched_store_lock.cpp"}));
     EXPECT_EQ(logged(), Lines{"sched_store_lock.cpp:N Lock [/run/zeloscheduler.lock] failed. "
-                              "Process 4711 holds it."});
+                              "Process " +
+                              std::to_string(getpid()) + " holds it."});
     EXPECT_EQ(recordedExecs(), Lines{});
   }
   close(file);
@@ -1024,7 +1073,6 @@ TEST_F(StoreTest, AScratchCopyOfAnotherSizeIsMadeAgain) {
   }
 }
 
-// Not even where no other copy could tell that it is not: somebody else may be filling it.
 TEST_F(StoreTest, AStoreThatIsFilledMeanwhileIsNotTakenForEmpty) {
   create("task");
   const std::string whole = readFile(kStore);
@@ -1038,8 +1086,9 @@ TEST_F(StoreTest, AStoreThatIsFilledMeanwhileIsNotTakenForEmpty) {
 
 // ---- a store in the way
 
-TEST_F(StoreTest, AStoreThatIsADirectoryIsNotReadAndMakesWayForAChange) {
+TEST_F(StoreTest, AStoreThatIsADirectoryMakesWayOrIsNotRead) {
   writeFile(std::string(kStore) + "/file", "");
+  support::failCall("renameat2", {.times = support::kAlways, .error = EIO});
   ZELO_SCHED_TASK *head = nullptr;
   EXPECT_EQ(backend_.list_get(&head, nullptr), -1);
   EXPECT_EQ(errorRecord().code, 0x0900);
@@ -1050,12 +1099,13 @@ TEST_F(StoreTest, AStoreThatIsADirectoryIsNotReadAndMakesWayForAChange) {
   EXPECT_EQ(backend_.create(task.get()), -1);
   EXPECT_EQ(backend_.get_default(task.get()), -1);
   EXPECT_EQ(backend_.sync(), -1);
-  support::failCall("renameat2", {.error = EIO});
   EXPECT_EQ(backend_.edit(task.get()), -1);
   EXPECT_EQ(errorRecord().code, 0x0900);
   EXPECT_FALSE(fileExists(kPersistentStore));
-  EXPECT_EQ(backend_.edit(task.get()), 0);
+  resetFailingCalls();
+  EXPECT_EQ(listedIds(), Ids{});
   EXPECT_TRUE(fileExists(support::movedAway(kStore) + "/file"));
+  EXPECT_EQ(create("first"), 1);
 }
 
 TEST_F(StoreTest, AStoreThatTheCallerMayNotReadFailsTheOperations) {

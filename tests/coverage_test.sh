@@ -15,9 +15,7 @@ readonly LEAST_LINES=99
 readonly LEAST_BRANCHES=94
 
 build() {
-  BUILD_DIR=$COVERED JOBS=1 "$root/scripts/build" -DCMAKE_BUILD_TYPE=Debug \
-    -DCMAKE_CXX_FLAGS_DEBUG="-O0 -g1" -DCMAKE_C_FLAGS_DEBUG="-O0 -g1" -DZELO_TESTS=OFF \
-    -DZELO_COVERAGE=ON >"$BUILD_DIR/covered.log" 2>&1 ||
+  BUILD_DIR=$COVERED JOBS=1 "$root/scripts/build" --preset=coverage >"$BUILD_DIR/covered.log" 2>&1 ||
     { tail -50 "$BUILD_DIR/covered.log"; return 1; }
   find "$COVERED" -name '*.gcda' -delete
 }

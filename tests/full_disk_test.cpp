@@ -161,6 +161,25 @@ TEST_F(FullDiskTest, AFullWorkingCopyLosesNothingAndGoesOnWithRoom) {
   EXPECT_EQ(filesIn("/tmp"), Lines{"scheduled_tasks"});
 }
 
+// A copy that found no room behind the pages that it had freed itself is as long as what it
+// replaces.
+TEST_F(FullDiskTest, AWorkingCopyThatIsCutOffAtItsOldLengthIsMadeWhole) {
+  ASSERT_EQ(saveTask(smallTask(1)), 1);
+  const std::string before = readFile(kStore);
+  support::failCall("QLIBCExec", {.from = 3, .times = 1, .result = 1});
+  support::onExec([&](const std::string &command) {
+    if (command.ends_with(std::string(" ") + kStore)) {
+      writeFile(kStore, std::string(before.size(), '#'));
+    }
+  });
+  EXPECT_EQ(ZELOSchedTaskSave(smallTask(2).get()), -1);
+  support::onExec(nullptr);
+  support::resetFailingCalls();
+  EXPECT_EQ(readFile(kStore), readFile(kPersistentStore));
+  EXPECT_EQ(saveTask(smallTask(3)), 3);
+  expectStored(3);
+}
+
 TEST_F(FullDiskTest, ARemovalWithoutRoomTakesNothingAwayAndWorksWithRoom) {
   const SmallFileSystem disk("/tmp");
   constexpr int kTasks = 5;
@@ -372,6 +391,18 @@ TEST_F(FullStatusTest, RowsStayWhereThereIsNoRoomForMore) {
   disk.makeRoom();
   ids.push_back(addRow(static_cast<long>(ids.size()) + 1));
   expectRows(ids);
+}
+
+// Another user fills it, beside the names that were taken before.
+TEST_F(FullStatusTest, RunsAreRecordedInTheRoomThatWasReserved) {
+  const SmallFileSystem disk("/tmp");
+  disk.grow();
+  std::vector<int> ids = {addRow(1)};
+  disk.fill();
+  clearLog();
+  for (long i = 2; i <= 1000; ++i) ids.push_back(addRow(i));
+  expectRows(ids);
+  EXPECT_EQ(logged(), Lines{});
 }
 
 TEST_F(FullStatusTest, ARunThatCannotBeRecordedIsNotStarted) {

@@ -165,6 +165,15 @@ refuses_the_tasks_of_others() {
   same "$(stored_fields 1)" "0 good exit 0 2 30" && return "$bad"
 }
 
+has_no_more_than_fifty() {
+  local number
+  for number in {2..50}; do
+    with_library "$BIN/save_for_user" 65534 "${new_task[@]}" >/dev/null || return 1
+  done
+  refused 65534 "${new_task[@]}" &&
+    output_is "saved as task 3" "$BIN/save_for_user" 65534 owner=65534 id=3 'run hour=22'
+}
+
 refuses_bad_fields() {
   local pair bad=0
   for pair in 'run hour=24' 'run hour=-1' 'run hour=' 'run hour= 1' 'run min=60' 'run min=4294967297' \
@@ -234,6 +243,7 @@ check "that field alone" same "$(stored_fields 3)" "65534 n true 23 2"
 check "every other owner than his plain number is refused" refuses_every_other_owner
 check "a task of another owner is not taken over" refuses_the_tasks_of_others
 check "what cron could not read is refused, and what is no field of his" refuses_bad_fields
+check "he has no more than fifty tasks" has_no_more_than_fifty
 for name in save_and_list save_for_user tasks_of_owner watch_run; do
   check "$name without arguments tells its usage" fails_as_usage "$BIN/$name"
 done

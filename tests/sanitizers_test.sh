@@ -17,9 +17,7 @@ readonly SCRIPTS=(json_python_test poweroff_feasible_check_test power_crontab_cr
 
 # Optimising would cost more time than it saves.
 build() {
-  BUILD_DIR=$SANITIZED JOBS=1 "$root/scripts/build" -DCMAKE_BUILD_TYPE=Debug \
-    -DCMAKE_CXX_FLAGS_DEBUG="-O0 -g1" -DCMAKE_C_FLAGS_DEBUG="-O0 -g1" \
-    -DZELO_SANITIZE=address,undefined >"$BUILD_DIR/sanitized.log" 2>&1 ||
+  BUILD_DIR=$SANITIZED JOBS=1 "$root/scripts/build" --preset=asan >"$BUILD_DIR/sanitized.log" 2>&1 ||
     { tail -50 "$BUILD_DIR/sanitized.log"; return 1; }
 }
 

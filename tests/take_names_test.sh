@@ -123,6 +123,24 @@ check "one that is equal but can be written by others does so too" same \
 check "and is told where it is" same "$(moved_from "$STORE")" "a task"
 
 forget
+echo "a task" >"$KEPT.last-good"
+: >"$KEPT"
+check "where the persistent copy was cut off it makes room for what a restore fills, too" same \
+  "$(outcome "$TAKE" --anew) $(stat -c %s "$STORE")" "0  0"
+rm -f "$KEPT.last-good"
+
+forget
+echo "a task" >"$KEPT"
+echo "another task" >"$STORE"
+flock --no-fork /run/zeloscheduler.lock sleep 600 &
+until ! flock --nonblock /run/zeloscheduler.lock true; do :; done
+check "no store is replaced while tasks are changed" same \
+  "$(FAKE_PATIENCE=1 LD_PRELOAD=$BUILD_DIR/tests/fake_time.so outcome "$TAKE" --anew) $(cat "$STORE")" \
+  "1 take-names: changes of tasks are locked: the system log says by whom another task"
+kill $!
+rm /run/zeloscheduler.lock
+
+forget
 mkdir -p "$DATABASE/inside"
 check "what is moved away is named" same \
   "$(outcome "$TAKE" --anew | sed 's/zeloscheduler\.[^/]*/NEW/')" \

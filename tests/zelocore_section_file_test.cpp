@@ -391,7 +391,6 @@ TEST_F(ZelocoreSectionFile, AZeroByteEndsTheNameOfASection) {
   EXPECT_EQ(Section("1"), (Keys{{"a", "b"}, {"c", "d"}}));
 }
 
-/* The first section that is asked for is searched, the others are looked up. */
 TEST_F(ZelocoreSectionFile, SectionsAreFoundInWhateverOrderTheyAreAskedFor) {
   Write("[1]\na=\"1\"\n[2]\na=\"2\"\n[2]\na=\"another\"\n[3]\na=\"3\"\n");
   MakeOld();
@@ -1025,63 +1024,6 @@ TEST_F(ZelocoreSectionIndex, NoFileStaysOpen) {
   const int open_after = open("/dev/null", O_RDONLY);
   close(open_after);
   EXPECT_EQ(open_after, open_before);
-}
-
-/* Holds the file that was read last for as long as it lives. */
-class Hold {
- public:
-  Hold() { QLIBCFileHoldBegin(); }
-  Hold(const Hold &) = delete;
-  Hold &operator=(const Hold &) = delete;
-  ~Hold() { QLIBCFileHoldEnd(); }
-};
-
-TEST_F(ZelocoreSectionIndex, AHeldFileIsReadAsItWas) {
-  Rewrite('x');
-  ASSERT_EQ(Enumerate(), 1);
-  {
-    const Hold hold;
-    Rewrite('y');
-    EXPECT_EQ(Value(), "x");
-    ASSERT_EQ(unlink(path_.c_str()), 0);
-    EXPECT_EQ(Value(), "x");
-    EXPECT_EQ(Get("2"), 0);
-  }
-  EXPECT_TRUE(FailedWith(Get("1"), QLIBC_ERR_OPEN));
-}
-
-TEST_F(ZelocoreSectionIndex, HoldsNest) {
-  Rewrite('x');
-  ASSERT_EQ(Enumerate(), 1);
-  {
-    const Hold outer;
-    { const Hold inner; }
-    Rewrite('y');
-    EXPECT_EQ(Value(), "x");
-  }
-  EXPECT_EQ(Value(), "y");
-}
-
-TEST_F(ZelocoreSectionIndex, AHoldIsOfTheFileThatWasReadLast) {
-  Rewrite('x');
-  ASSERT_EQ(Enumerate(), 1);
-  const std::string first = path_;
-  const Hold hold;
-  path_ = directory_ + "/other";
-  Rewrite('y');
-  EXPECT_EQ(Value(), "y");
-  path_ = first;
-  Rewrite('z');
-  EXPECT_EQ(Value(), "z");
-}
-
-TEST_F(ZelocoreSectionIndex, EnumeratingLooksAtAHeldFileAgain) {
-  Rewrite('x');
-  ASSERT_EQ(Enumerate(), 1);
-  const Hold hold;
-  Write("[1]\na=\"x\"\n[2]\na=\"x\"\n");
-  EXPECT_EQ(Enumerate(), 2);
-  EXPECT_EQ(Get("2"), 1);
 }
 
 TEST_F(ZelocoreSectionIndex, StampsOfWholeSecondsAreTrustedLater) {

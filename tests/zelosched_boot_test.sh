@@ -302,7 +302,17 @@ not_even_by_force() {
   saved
   truncate -s -40 "$PERSISTENT"
   try z restore --force
-  says 1 "save a task, which writes it anew" && same "$(names)" "one two "
+  same "$status $(names)" "0 one two " && cmp "$PERSISTENT" "$STORE" && cmp "$LAST_GOOD" "$STORE" &&
+    [[ $err == *"$PERSISTENT"*"it was written anew from $STORE"* ]]
+}
+
+# What it holds may be somebody's work: a save takes it up or not, a restore does not decide that.
+leaves_what_was_changed_by_hand() {
+  saved
+  sed -i 's/"one"/"changed"/' "$PERSISTENT"
+  cp "$PERSISTENT" "$SCRATCH/changed"
+  try z restore
+  says 1 "save a task, which writes it anew" && cmp "$PERSISTENT" "$SCRATCH/changed"
 }
 
 # "$@" plants something once /tmp is empty.
@@ -412,8 +422,8 @@ is_for_root() {
 }
 
 refuses_others() {
-  cp "$BUILD_DIR/bin/zelosched" /run/zelosched
-  try setpriv --reuid "$NOBODY" --clear-groups env LD_LIBRARY_PATH="$BUILD_DIR/lib" /run/zelosched "$@"
+  copy_for_others
+  try setpriv --reuid "$NOBODY" --clear-groups "$FOR_OTHERS" "$@"
   says 1 ""
 }
 
@@ -566,7 +576,8 @@ check "when neither copy is fit, that is said and nothing made" gives_up_without
 check "and when there is no last good one" gives_up_without_a_last_good_copy
 check "tasks that stand in /tmp are kept from an older persistent copy" keeps_what_stands
 check "but not by force" replaces_by_force
-check "which a damaged persistent copy does not get" not_even_by_force
+check "nor by one that is cut off, which is written anew from them" not_even_by_force
+check "one that was changed by hand stays" leaves_what_was_changed_by_hand
 check_as_root "another user's file in place of the store is replaced" \
   replaces_what_is_not_ours "is not root's alone" plant_file
 check "so is one that others can write" replaces_what_is_not_ours "is not root's alone" plant_shared

@@ -1005,6 +1005,7 @@ all_well() {
 
 status_is_well() {
   all_well
+  rm -rf /tmp/zeloscheduler.*
   gives 0 "ok     cron is running (process $(cat /var/run/crond.pid))
 ok     /tmp/zeloschedtask is there, and root's
 ok     no other user is in the way of a run
@@ -1052,8 +1053,27 @@ readonly -a DAMAGES=(
   'cron may pass over all of /etc/crontab' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
   'task 1 (Task 1): there is no user 77777' 'sed -i "s/^owner=.*/owner=\"77777\"/" $STORE'
   '1 stored task cannot be read' 'sed -i "/^name=/d" $STORE'
-  'cannot list the tasks: a file or the database could not be opened' 'chmod 0666 $STORE'
+  '/tmp/scheduled_tasks can be written by others' 'chmod 0666 $STORE'
+  '/usr/zelo/etc/scheduled_tasks.last-good is missing' 'rm $PERSISTENT.last-good'
+  '/usr/zelo/etc/scheduled_tasks.last-good is not as /usr/zelo/etc/scheduled_tasks is' 'truncate -s 100 $PERSISTENT.last-good'
 )
+
+status_shows_what_was_moved_away() {
+  all_well
+  mkdir -m 0700 /tmp/zeloscheduler.abcdef
+  try z status
+  rmdir /tmp/zeloscheduler.abcdef
+  [[ $status == 0 && $out == *"moved to /tmp/zeloscheduler.abcdef: look at it and delete it"* ]]
+}
+
+a_list_that_fails_says_which_file_it_is() {
+  all_well
+  chmod 0666 "$STORE"
+  fails_saying 1 "$STORE has no tasks, though some are kept: 'zelosched restore' puts the tasks back" z list || return 1
+  cp "$PERSISTENT" "$STORE"
+  truncate -s -10 "$STORE"
+  fails_saying 1 "$STORE cannot be read: 'zelosched restore' puts the tasks back" z list
+}
 
 a_fault_can_be_disabled_but_not_enabled() {
   all_well
@@ -1104,7 +1124,7 @@ tells_the_error_in_words() {
 tells_of_a_store_that_cannot_be_written() {
   all_well
   chmod 0666 "$STORE"
-  fails_saying 1 "is not root's alone [0x0900 " z add --daily 08:30 -- true
+  fails_saying 1 "a file is cut off [0x0B00 " z add --daily 08:30 -- true
 }
 
 # Not even root can move a directory away on which something is mounted.
@@ -1216,14 +1236,8 @@ options_stand_behind_ids_always() {
 other_users_see_but_do_not_change() {
   all_well
   z run --wait 1 >/dev/null
-  local nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups "$ZELOSCHED")
-  if ! setpriv --reuid 65534 --regid 65534 --clear-groups test -x "$ZELOSCHED"; then
-    echo "the build directory is closed to other users"
-    install -m 0755 "$ZELOSCHED" "$SCRATCH/zelosched"
-    nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups env "LD_LIBRARY_PATH=$SCRATCH/lib" "$SCRATCH/zelosched")
-    mkdir -p "$SCRATCH/lib" && cp "$BUILD_DIR"/lib/*.so* "$SCRATCH/lib"
-  fi
-  chmod 0755 "$SCRATCH"
+  copy_for_others
+  local nobody=(setpriv --reuid 65534 --regid 65534 --clear-groups "$FOR_OTHERS")
   same "$("${nobody[@]}" list | tail -1 | awk '{ print $1, $7 }')" "1 ?" &&
     fails_saying 1 "changing tasks takes root's rights" "${nobody[@]}" add --daily 08:30 -- true &&
     rm -rf /tmp/sched_status.sqlite* /tmp/lock &&
@@ -1242,14 +1256,35 @@ lock_is_no_link() {
   [[ $result == 0 && $err == *"cannot open /run/zelosched.lock: "* && ! -e $SCRATCH/victim ]]
 }
 
+# A process that holds the lock on a file until it is ended.
+hold_lock() {
+  flock --no-fork "$1" sleep 600 &
+  held=$!
+  until ! flock --nonblock "$1" true; do :; done
+}
+
 waiting_for_the_lock_ends() {
   all_well
-  exec {held}>/run/zelosched.lock
-  flock "$held"
+  hold_lock /run/zelosched.lock
   FAKE_PATIENCE=1 LD_PRELOAD=$FAKE leaves_all_as_it_was z add --daily 08:30 -- true
   local result=$?
-  exec {held}>&-
-  [[ $result == 0 && $err == *"waiting for another zelosched command"*"for 30 seconds: nothing was changed"* ]]
+  kill "$held"
+  [[ $result == 0 && $err == *"waiting for process $held (sleep), which is changing tasks"* &&
+    $err == *"process $held (sleep) has been changing tasks for 30 seconds: nothing was changed"* ]]
+}
+
+# The library itself waits in silence.
+who_holds_the_librarys_lock_is_named() {
+  all_well
+  hold_lock /run/zeloscheduler.lock
+  FAKE_PATIENCE=1 LD_PRELOAD=$FAKE leaves_all_as_it_was z add --daily 08:30 -- true
+  local result=$?
+  local said=$err
+  FAKE_PATIENCE=1 LD_PRELOAD=$FAKE try z status
+  kill "$held"
+  [[ $result == 0 &&
+    $said == *"waiting for process $held (sleep), which holds /run/zeloscheduler.lock"* &&
+    $out == *"WRONG  process $held (sleep) keeps changes of tasks waiting: it holds /run/zeloscheduler.lock"* ]]
 }
 
 import_tells_what_it_cannot_read() {
@@ -1456,6 +1491,8 @@ check "no more power times are added than are shown" power_lists_are_bounded
 check "power times are exported and imported" exports_power_times
 check "a clock that cannot be armed is told" tells_of_a_clock_that_fails
 check "status is well when all is" status_is_well
+check "status shows what was moved away" status_shows_what_was_moved_away
+check "a list that fails says which file it is" a_list_that_fails_says_which_file_it_is
 for ((i = 0; i < ${#DAMAGES[@]}; i += 2)); do
   check "status finds: ${DAMAGES[i]} ($((i / 2 + 1)))" status_finds "${DAMAGES[i]}" "${DAMAGES[i + 1]}"
 done
@@ -1490,6 +1527,7 @@ else
 fi
 check "the lock file is no link" lock_is_no_link
 check "waiting for the lock ends" waiting_for_the_lock_ends
+check "who holds the library's lock is named" who_holds_the_librarys_lock_is_named
 check "an import that cannot be read is told" import_tells_what_it_cannot_read
 check "an export tells of bytes that JSON cannot carry" export_tells_of_bytes_that_json_cannot_carry
 check "output that cannot be written is a failure" output_that_fails

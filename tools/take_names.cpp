@@ -16,6 +16,7 @@
 #include <string>
 
 #include "sched_shared_names.h"
+#include "sched_store_lock.h"
 
 namespace {
 
@@ -39,12 +40,11 @@ bool replace(const SchedSharedName &name) {
 // The one that is kept for the next boot is written first, so a store of ours is never ahead of it.
 bool replaceStore() {
   const std::string kept = contentsOf(kPersistentCopy);
-  const bool isKept = !kept.empty();
-  if (isKept && schedLookAt(kSchedStore, nullptr) == SchedNameState::kOurs &&
+  if (!kept.empty() && schedLookAt(kSchedStore, nullptr) == SchedNameState::kOurs &&
       contentsOf(kSchedStore.path) == kept) {
     return true;
   }
-  return replace(isKept ? kSchedStoreToRestore : kSchedStore);
+  return replace(schedAreTasksKept() ? kSchedStoreToRestore : kSchedStore);
 }
 
 bool said(const SchedSharedName &name, bool isTaken) {
@@ -52,8 +52,18 @@ bool said(const SchedSharedName &name, bool isTaken) {
   return isTaken;
 }
 
+// Between the two copies of a change the store is behind what is kept.
+bool takeStore(bool isAnew) {
+  const StoreLock turn;
+  if (!turn.isHeld()) {
+    fprintf(stderr, "take-names: changes of tasks are locked: the system log says by whom\n");
+    return false;
+  }
+  return said(kSchedStore, isAnew ? replaceStore() : schedTakeName(kSchedStoreToRestore));
+}
+
 int take(bool isAnew) {
-  bool isDone = said(kSchedStore, isAnew ? replaceStore() : schedTakeName(kSchedStoreToRestore));
+  bool isDone = takeStore(isAnew);
   for (const SchedSharedName *name : kNames) {
     isDone = said(*name, isAnew ? replace(*name) : schedTakeName(*name)) && isDone;
   }

@@ -25,10 +25,6 @@
 #include "sched_wait_status.h"
 #include "schedule_cron.h"
 
-// A platform that has no holds looks at the file once a section, and is slower for it.
-#pragma weak QLIBCFileHoldBegin
-#pragma weak QLIBCFileHoldEnd
-
 namespace {
 
 constexpr char kName[] = "zeloschedule";
@@ -66,23 +62,30 @@ off_t sizeOf(const char *szPath) {
   return stat(szPath, &info) == 0 ? info.st_size : 0;
 }
 
-// A store without bytes beside a persistent copy that has some was cut off by a copy that was
-// killed. Nobody must build on that, nor take it for a store without tasks.
+// A store without bytes was cut off by a copy that was killed when tasks are kept. Nobody must
+// build on that, nor take it for a store without tasks.
 bool isCutToNothing(const char *szStore) {
-  return sizeOf(szStore) == 0 && sizeOf(kPersistentCopy) > 0;
+  return sizeOf(szStore) == 0 && schedAreTasksKept();
 }
 
-// As long as tasks that are kept for the next boot are not put back, the store is one that is cut
-// off.
-const SchedSharedName &storeToMake() {
-  return sizeOf(kPersistentCopy) > 0 ? kSchedStoreToRestore : kSchedStore;
+// What there is to be read or built on. A process of root's moves away what another user has put
+// there. The tasks that are kept for the next boot must then be put back before any is changed,
+// since the persistent copy is written as a whole: the store is made as one that is cut off.
+SchedNameState lookAtStore() {
+  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
+  if (state != SchedNameState::kForeign || geteuid() != 0) {
+    return state;
+  }
+  return schedTakeName(schedAreTasksKept() ? kSchedStoreToRestore : kSchedStore)
+             ? SchedNameState::kOurs
+             : state;
 }
 
 // A process that only reads takes the name all the same: while it is free, another user can move a
-// file of root's there.
+// file of root's there. There are no tasks then, before and after.
 void takeFreeStore() {
   if (geteuid() == 0) {
-    schedTakeName(storeToMake());
+    schedTakeName(kSchedStore);
   }
 }
 
@@ -116,34 +119,13 @@ int setNextTrigger(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
   return 0;
 }
 
-// The store as it was when it was last looked at. Nobody's code but ours runs in between: a filter
-// may change the store, and sees what it changed.
-class StoreHold {
- public:
-  StoreHold() {
-    if (isKnown()) {
-      QLIBCFileHoldBegin();
-    }
-  }
-  ~StoreHold() {
-    if (isKnown()) {
-      QLIBCFileHoldEnd();
-    }
-  }
-  StoreHold(const StoreHold &) = delete;
-  StoreHold &operator=(const StoreHold &) = delete;
-
- private:
-  static bool isKnown() { return QLIBCFileHoldBegin != nullptr && QLIBCFileHoldEnd != nullptr; }
-};
-
 // Walks over the sections of the store. One bad section must not hide the others: the walk goes on
 // behind one that cannot be read, and one that is gone since the names were listed is passed over.
 class StoreWalk {
  public:
   // The number of sections, 0 without a store; -1 when they cannot be listed or memory is short.
   int open() {
-    state_ = schedLookAt(kSchedStore, nullptr);
+    state_ = lookAtStore();
     if (state_ == SchedNameState::kFree) {
       return 0;
     }
@@ -166,7 +148,6 @@ class StoreWalk {
 
   // To the next section. False at the end.
   bool next() {
-    const StoreHold hold;
     while (next_ < sections_) {
       szSection_ = QLIBCSzListGet(names_.get(), next_++);
       read_ = readSection(szSection_, &hash_);
@@ -210,10 +191,11 @@ TaskGuard recordFor(const StoreWalk &walk, TaskGuard task) {
 
 // One record that serves for all tasks of a walk, emptied. 0 or -1.
 int emptyRecordFor(const StoreWalk &walk, TaskGuard *task) {
-  if (*task == nullptr && (*task = recordFor(walk, schedRecordAlloc())) == nullptr) {
-    return -1;
+  if (*task == nullptr) {
+    *task = recordFor(walk, schedRecordAlloc());
+    return *task == nullptr ? -1 : 0;
   }
-  schedRecordEmpty(task->get());
+  memset(task->get(), 0, sizeof(ZELO_SCHED_TASK));
   return 0;
 }
 
@@ -228,8 +210,7 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
     takeFreeStore();
     return 0;
   }
-  const auto known = filter == nullptr ? SchedRecordCount::kExpected : SchedRecordCount::kAtMost;
-  SchedRecordSource records(known, sections, SchedRecordExtent::kWhole);
+  SchedRecordSource records(sections);
   TaskChain tasks;
   int count = 0;
   TaskGuard task;
@@ -260,7 +241,7 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
   }
   pTask->State = ZELO_SCHED_STATE_NOT_EXISTED;
   pTask->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
-  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
+  const SchedNameState state = lookAtStore();
   if (state == SchedNameState::kFree) {
     takeFreeStore();
     return kNotFound;
@@ -515,7 +496,7 @@ int copyWorkingCopy(const ScratchFile &scratch) {
       return -1;
     }
     const off_t size = sizeOf(scratch.path());
-    const bool mayBeEmpty = sizeOf(kPersistentCopy) == 0;  // where only the name is taken
+    const bool mayBeEmpty = !schedAreTasksKept();  // where only the name is taken
     if (size == sizeOf(kWorkingCopy) && (size > 0 || mayBeEmpty)) {
       return 0;
     }
@@ -620,6 +601,21 @@ int copyToPersistent(const ScratchFile &scratch) {
   return 0;
 }
 
+// A file's length and when it was written, by which one that was written again is told.
+class FileState {
+ public:
+  explicit FileState(const char *szPath) { stat(szPath, &info_); }
+  bool isThatOf(const char *szPath) const {
+    struct stat now = {};
+    return stat(szPath, &now) == 0 && now.st_size == info_.st_size &&
+           now.st_mtim.tv_sec == info_.st_mtim.tv_sec &&
+           now.st_mtim.tv_nsec == info_.st_mtim.tv_nsec;
+  }
+
+ private:
+  struct stat info_ = {};
+};
+
 // The persistent copy goes first: a failure in between leaves the working copy, which every read
 // uses, as it was.
 int publish(const ScratchFile &scratch) {
@@ -630,10 +626,10 @@ int publish(const ScratchFile &scratch) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(scratch.path(), kWorkingCopy);
   }
-  const off_t before = sizeOf(kWorkingCopy);
+  const FileState before(kWorkingCopy);
   if (copyFile(scratch.path(), kWorkingCopy) < 0) {
     // It was emptied, and there was no room to fill it again. The scratch file takes none.
-    if (sizeOf(kWorkingCopy) != before) {
+    if (!before.isThatOf(kWorkingCopy)) {
       rename(scratch.path(), kWorkingCopy);
     }
     return -1;
@@ -641,23 +637,12 @@ int publish(const ScratchFile &scratch) {
   return 1;
 }
 
-// Whether there is a store to build on. For root, what another user has put in its place is moved
-// away. The tasks that are kept for the next boot must then be put back before any is changed,
-// since the persistent copy is written as a whole: the store is made as one that is cut off.
-SchedNameState openStore() {
-  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
-  if (state != SchedNameState::kForeign || geteuid() != 0) {
-    return state;
-  }
-  return schedTakeName(storeToMake()) ? SchedNameState::kOurs : state;
-}
-
 // The one way in which the store changes: one section written, or deleted when pTask is null. 1
 // when the store changed, 0 when there was nothing to delete, -1 on failure.
 int write_store(long id, const ZELO_SCHED_TASK *pTask) {
   const ScratchFile scratch;
   const SectionName section(id);
-  const SchedNameState state = openStore();
+  const SchedNameState state = lookAtStore();
   if (state == SchedNameState::kForeign) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(kWorkingCopy, scratch.path());
@@ -753,47 +738,73 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   return syncFile(kCrontabDirectory, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
-// Every task that list_get lists, but of each record no more than its crontab line needs: the texts
-// are most of a record, and zeroing them would be most of the work. They are linked in the order of
-// the store, in which they also lie in memory: a sort by a number, which is by memory, leaves it.
-// The number of tasks, or -1.
-int listSchedules(TaskChain *tasks) {
-  StoreWalk walk;
-  const int sections = walk.open();
-  if (sections < 0) {
-    return -1;
+// What says when each task runs, as a list of records in one array. They lie there in the order of
+// the store, which a sort by a number, which is by memory, leaves. The texts of a record, its
+// largest part, stay untouched, and so take no memory.
+class Schedules {
+ public:
+  // The number of tasks, or -1.
+  int read() {
+    StoreWalk walk;
+    const int sections = walk.open();
+    if (sections <= 0) {
+      return sections;
+    }
+    tasks_.reset(static_cast<ZELO_SCHED_TASK *>(
+        calloc(static_cast<size_t>(sections), sizeof(ZELO_SCHED_TASK))));
+    ZELO_SCHED_TASK **end = &head_;
+    int count = 0;
+    TaskGuard task;
+    while (walk.next()) {
+      if (!walk.isRead()) {
+        continue;
+      }
+      if (!hasRoom(walk) || emptyRecordFor(walk, &task) < 0) {
+        return -1;
+      }
+      if (walk.fill(task.get()) == 0) {
+        *end = &tasks_[count++];
+        copySchedule(*end, *task);
+        end = &(*end)->next;
+      }
+    }
+    return count;
   }
-  SchedRecordSource records(SchedRecordCount::kExpected, sections, SchedRecordExtent::kSchedule);
-  ZELO_SCHED_TASK **end = tasks->handle();
-  int count = 0;
-  TaskGuard task;
-  while (walk.next()) {
-    if (!walk.isRead()) {
-      continue;
+
+  ZELO_SCHED_TASK **handle() { return &head_; }
+  const ZELO_SCHED_TASK *head() const { return head_; }
+
+ private:
+  bool hasRoom(const StoreWalk &walk) const {
+    if (tasks_ == nullptr) {
+      recordFor(walk, nullptr);
     }
-    if (emptyRecordFor(walk, &task) < 0) {
-      return -1;
-    }
-    if (walk.fill(task.get()) < 0) {
-      continue;
-    }
-    TaskGuard kept = recordFor(walk, records.take());
-    if (kept == nullptr) {
-      return -1;
-    }
-    schedRecordCopySchedule(kept.get(), *task);
-    *end = kept.release();
-    end = &(*end)->next;
-    ++count;
+    return tasks_ != nullptr;
   }
-  return count;
-}
+
+  static void copySchedule(ZELO_SCHED_TASK *pTo, const ZELO_SCHED_TASK &from) {
+    pTo->ID = from.ID;
+    pTo->State = from.State;
+    pTo->Type = from.Type;
+    memcpy(pTo->Week, from.Week, sizeof(pTo->Week));
+    pTo->StartYear = from.StartYear;
+    pTo->StartMonth = from.StartMonth;
+    pTo->StartDay = from.StartDay;
+    pTo->RunHour = from.RunHour;
+    pTo->RunMin = from.RunMin;
+    pTo->RepeatHour = from.RepeatHour;
+    pTo->LastWorkHour = from.LastWorkHour;
+  }
+
+  std::unique_ptr<ZELO_SCHED_TASK[], MemoryDeleter> tasks_;
+  ZELO_SCHED_TASK *head_ = nullptr;
+};
 
 // A crontab that could not be rewritten is told in the log alone: the task is stored, and the next
 // change or sync writes the crontab whole.
 int writeCrontab() {
-  TaskChain tasks;
-  const int count = listSchedules(&tasks);
+  Schedules tasks;
+  const int count = tasks.read();
   if (count < 0) {
     SCHED_LOG_CALLEE("get task list failed. ");
     return count;

@@ -155,6 +155,11 @@ ZELO_SCHED_API int ZELOSchedTaskLoad(long id, ZELO_SCHED_TASK *pTask);
  * the task was stored and what follows from it was not done; that of a power time
  * has it, and its new name, after any failure.
  *
+ * A state or a type other than those of the record is not stored, here and in
+ * ZELOSchedTaskEdit. The call succeeds all the same, but the task can then be neither
+ * read nor listed, has no crontab line, and its id is given to the next new task,
+ * which takes its place.
+ *
  * What the schedule says goes into the crontab as it is, here and in
  * ZELOSchedTaskEdit: the caller checks it. Debian's cron passes over the whole of
  * /etc/crontab, and starts nothing, for one enabled task with an hour above 23, a
@@ -181,9 +186,8 @@ ZELO_SCHED_API int ZELOSchedTaskRemove(long id);
 /* Lists the tasks of every backend, each with its next trigger time; `filter`
  * may be null (all). When there are any, *pTaskList becomes the list, which
  * the caller frees with ZELOSchedTaskListFree; else it is left alone. A
- * backend that fails is logged and adds nothing. A record that is kept may
- * keep the memory of up to 240 with it. Their number (0 = none), or -1: 0x0D00,
- * or what the registration of the backends left. */
+ * backend that fails is logged and adds nothing. Their number (0 = none), or
+ * -1: 0x0D00, or what the registration of the backends left. */
 ZELO_SCHED_API int ZELOSchedTaskListGet(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter);
 
 /* The record after pTask, or null after the last one and for null. */
@@ -219,8 +223,9 @@ ZELO_SCHED_API int ZELOSchedTaskListSortEx(ZELO_SCHED_TASK **pTaskList, int inde
 
 /* Empties the hash and fills it from the task: numbers as decimal text, state
  * and type by name, the command in Base64, line feeds in every other text as
- * blanks. *ppHash is an existing hash (it may grow). 0, or -1: 0x0D00, or what
- * the platform left, with the hash partly filled. */
+ * blanks. A state or a type without a name is left out, and no task can be filled
+ * from the hash then. *ppHash is an existing hash (it may grow). 0, or -1: 0x0D00,
+ * or what the platform left, with the hash partly filled. */
 ZELO_SCHED_API int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_TASK *pTask);
 
 /* Fills the task from a hash; `next`, `Backend` and `NextTriggerTime` are left

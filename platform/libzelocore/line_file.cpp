@@ -2,37 +2,16 @@
 
 #include <fcntl.h>
 
-#include "read_file.h"
 #include "replace_file.h"
-#include "support.h"
 
 namespace zelo {
 
-int ReadLineFile(const std::string &path, LineFile *file) {
-  /* Not blocking, for a FIFO would hang the open. */
-  const Descriptor opened(
-      open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | O_NOFOLLOW));
-  if (!opened.valid()) {
-    return Fail(QLIBC_ERR_OPEN);
-  }
-  if (fstat(opened.get(), &file->status) != 0) {
-    return Fail(QLIBC_ERR_IO);
-  }
-  if (!S_ISREG(file->status.st_mode)) {
-    return Fail(QLIBC_ERR_OPEN);
-  }
-  Bytes contents;
-  if (file->status.st_size > kMostFileBytes ||
-      !ReadAll(opened.get(), static_cast<size_t>(file->status.st_size), &contents)) {
-    return Fail(QLIBC_ERR_IO);
-  }
-  file->text = contents.text();
-  return 0;
+int ReadLineFile(const std::string &path, FileContents *file) {
+  return ReadFile(path, O_NOFOLLOW, file);
 }
 
-int WriteLineFile(const std::string &path, const LineFile &file) {
-  const std::string_view contents = file.text;
-  return ReplaceFile(path, {&contents, 1}, &file.status, Durability::kSynced);
+int WriteLineFile(const std::string &path, const FileContents &file) {
+  return ReplaceFile(path, file.text, &file.status, Durability::kSynced);
 }
 
 LineRange FindLine(const std::string &text, std::string_view key) noexcept {

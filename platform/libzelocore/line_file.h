@@ -4,25 +4,20 @@
 #ifndef ZELOCORE_LINE_FILE_H
 #define ZELOCORE_LINE_FILE_H
 
-#include <sys/stat.h>
-
 #include <string>
 #include <string_view>
 
-namespace zelo {
+#include "read_file.h"
 
-struct LineFile {
-  std::string text;
-  struct stat status;
-};
+namespace zelo {
 
 /* Reads a regular file; a link is refused, for a change would replace the link
  * and not the file. 0, or -1 (0x0900, 0x0B00). */
-int ReadLineFile(const std::string &path, LineFile *file);
+int ReadLineFile(const std::string &path, FileContents *file);
 
 /* Writes it back as a whole, on the disk when the call returns. 0, or -1
  * (0x0900, 0x0B00, 0x2800). */
-int WriteLineFile(const std::string &path, const LineFile &file);
+int WriteLineFile(const std::string &path, const FileContents &file);
 
 struct LineRange {
   size_t begin;

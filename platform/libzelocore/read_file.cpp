@@ -1,45 +1,69 @@
 #include "read_file.h"
 
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstring>
-#include <utility>
 
 namespace zelo {
-
 namespace {
 
-void Grow(Bytes *contents, size_t *room) {
-  constexpr size_t kLeastStep = 4096;
-  *room += *room / 2 + kLeastStep;
-  auto wider = std::make_unique_for_overwrite<char[]>(*room);
-  std::memcpy(wider.get(), contents->data.get(), contents->size);
-  contents->data = std::move(wider);
+/* Far above any file of the platform, and below what would exhaust the machine. */
+constexpr off_t kMostFileBytes = off_t{1} << 30;
+
+bool SameTime(const timespec &a, const timespec &b) noexcept {
+  return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec;
 }
 
 }  // namespace
 
-bool ReadAll(int fd, size_t expected, Bytes *contents) {
-  size_t room = expected + 1; /* the one more sees the end without another step */
-  contents->data = std::make_unique_for_overwrite<char[]>(room);
-  contents->size = 0;
-  for (;;) {
-    if (contents->size == room) {
-      Grow(contents, &room);
+bool ReadAll(int fd, size_t expected, std::string *contents) {
+  constexpr size_t kLeastStep = 4096;
+  contents->resize(expected + 1); /* the one more sees the end without another step */
+  for (size_t size = 0;;) {
+    if (size == contents->size()) {
+      contents->resize(size + size / 2 + kLeastStep);
     }
-    const ssize_t count = read(fd, contents->data.get() + contents->size, room - contents->size);
+    const ssize_t count = read(fd, contents->data() + size, contents->size() - size);
     if (count < 0 && errno == EINTR) {
       continue;
     }
-    if (count < 0 || contents->size > static_cast<size_t>(kMostFileBytes)) {
+    if (count < 0 || size > static_cast<size_t>(kMostFileBytes)) {
       return false;
     }
     if (count == 0) {
+      contents->resize(size);
       return true;
     }
-    contents->size += static_cast<size_t>(count);
+    size += static_cast<size_t>(count);
   }
+}
+
+bool SameContents(const struct stat &a, const struct stat &b) noexcept {
+  return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_size == b.st_size &&
+         SameTime(a.st_mtim, b.st_mtim) && SameTime(a.st_ctim, b.st_ctim);
+}
+
+int ReadFile(const std::string &path, int flags, FileContents *file, Place where) {
+  /* Not blocking, for a FIFO would hang the open. */
+  const Descriptor opened(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
+  if (!opened.valid()) {
+    return Fail(QLIBC_ERR_OPEN, where);
+  }
+  if (fstat(opened.get(), &file->status) != 0) {
+    return Fail(QLIBC_ERR_IO, where);
+  }
+  if (!S_ISREG(file->status.st_mode)) {
+    return Fail(QLIBC_ERR_OPEN, where);
+  }
+  struct stat after;
+  if (file->status.st_size > kMostFileBytes ||
+      !ReadAll(opened.get(), static_cast<size_t>(file->status.st_size), &file->text) ||
+      fstat(opened.get(), &after) != 0) {
+    return Fail(QLIBC_ERR_IO, where);
+  }
+  file->steady = SameContents(file->status, after);
+  return 0;
 }
 
 }  // namespace zelo

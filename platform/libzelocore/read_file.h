@@ -4,20 +4,31 @@
 #ifndef ZELOCORE_READ_FILE_H
 #define ZELOCORE_READ_FILE_H
 
+#include <sys/stat.h>
 #include <sys/types.h>
 
 #include <cstddef>
+#include <string>
 
-#include "bytes.h"
+#include "support.h"
 
 namespace zelo {
 
-/* Far above any file of the platform, and below what would exhaust the machine. */
-inline constexpr off_t kMostFileBytes = off_t{1} << 30;
-
 /* Reads up to the end of the file, which need not be where fstat saw it. False
  * when a read fails or the file is too large. Throws when memory is short. */
-bool ReadAll(int fd, size_t expected, Bytes *contents);
+bool ReadAll(int fd, size_t expected, std::string *contents);
+
+struct FileContents {
+  std::string text;
+  struct stat status; /* before the first byte was read */
+  bool steady;        /* nobody wrote while it was read */
+};
+
+bool SameContents(const struct stat &a, const struct stat &b) noexcept;
+
+/* Reads a regular file, opened with these flags too. 0, or -1 (0x0900, 0x0B00). Throws
+ * when memory is short. */
+int ReadFile(const std::string &path, int flags, FileContents *file, Place where = Place::Here());
 
 }  // namespace zelo
 

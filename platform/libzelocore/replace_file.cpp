@@ -3,7 +3,6 @@
 #include <fcntl.h>
 #include <stdlib.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 
@@ -47,23 +46,18 @@ class Temporary {
   bool exists_ = false;
 };
 
-bool WriteAll(int fd, std::string_view piece) noexcept {
-  while (!piece.empty()) {
-    const ssize_t written = write(fd, piece.data(), piece.size());
+bool WriteAll(int fd, std::string_view contents) noexcept {
+  while (!contents.empty()) {
+    const ssize_t written = write(fd, contents.data(), contents.size());
     if (written < 0 && errno == EINTR) {
       continue;
     }
     if (written <= 0) {
       return false;
     }
-    piece.remove_prefix(static_cast<size_t>(written));
+    contents.remove_prefix(static_cast<size_t>(written));
   }
   return true;
-}
-
-bool WriteAll(int fd, std::span<const std::string_view> contents) noexcept {
-  return std::all_of(contents.begin(), contents.end(),
-                     [fd](std::string_view piece) { return WriteAll(fd, piece); });
 }
 
 /* The mask can only be read by setting it; the stricter one stands for the
@@ -104,8 +98,8 @@ bool SyncDirectoryOf(const std::string &path) {
 
 }  // namespace
 
-int ReplaceFile(const std::string &path, std::span<const std::string_view> contents,
-                const struct stat *old, Durability durability) {
+int ReplaceFile(const std::string &path, std::string_view contents, const struct stat *old,
+                Durability durability) {
   const bool synced = durability == Durability::kSynced;
   Temporary temporary(path);
   if (!temporary.exists()) {

@@ -6,7 +6,6 @@
 
 #include <sys/stat.h>
 
-#include <span>
 #include <string>
 #include <string_view>
 
@@ -17,14 +16,14 @@ enum class Durability {
   kSynced, /* the new file is on the disk when the call returns */
 };
 
-/* Replaces `path` by a file with these contents, piece after piece, written
- * beside it and renamed over it. `old` describes the file that is replaced,
+/* Replaces `path` by a file with these contents, written beside it and renamed
+ * over it. `old` describes the file that is replaced,
  * whose owner and mode are kept; null when there is none. 0, or -1 (0x0900,
  * 0x0B00, 0x2800) with the old file as it was and no temporary left; only when
  * the directory cannot be synced is the new file in place already. Throws when
  * memory is short. */
-int ReplaceFile(const std::string &path, std::span<const std::string_view> contents,
-                const struct stat *old, Durability durability);
+int ReplaceFile(const std::string &path, std::string_view contents, const struct stat *old,
+                Durability durability);
 
 }  // namespace zelo
 

@@ -3,13 +3,13 @@
  *
  * A list of n sections is one enumeration and n reads. The last file that was
  * read is therefore kept with an index of its sections, and each call costs one
- * stat and one look-up for as long as the file is the same, and the look-up alone
- * while it is held.
+ * stat and one look-up for as long as the file is the same.
  */
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <time.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 #include <memory>
@@ -18,6 +18,7 @@
 
 #include "read_file.h"
 #include "replace_file.h"
+#include "section_line.h"
 #include "section_text.h"
 #include "support.h"
 #include "szhash.h"
@@ -52,51 +53,12 @@ int64_t Now(clockid_t clock) noexcept {
   return Nanoseconds(now);
 }
 
-bool SameContents(const struct stat &a, const struct stat &b) noexcept {
-  return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_size == b.st_size &&
-         Nanoseconds(a.st_mtim) == Nanoseconds(b.st_mtim) &&
-         Nanoseconds(a.st_ctim) == Nanoseconds(b.st_ctim);
-}
-
-/* ---- reading ---- */
-
-struct Snapshot {
-  Bytes contents;
-  struct stat status; /* before the first byte was read */
-  int64_t opened;     /* the clock that stamps files, before the file was opened */
-  bool steady;        /* nobody wrote while it was read */
-};
-
-/* 0, or -1 (0x0900, 0x0B00). */
-int ReadSnapshot(const std::string &path, int flags, Snapshot *snapshot) {
-  snapshot->opened = Now(CLOCK_REALTIME_COARSE);
-  /* Not blocking, for a FIFO would hang the open. */
-  Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
-  if (!file.valid()) {
-    return Fail(QLIBC_ERR_OPEN);
-  }
-  if (fstat(file.get(), &snapshot->status) != 0) {
-    return Fail(QLIBC_ERR_IO);
-  }
-  if (!S_ISREG(snapshot->status.st_mode)) {
-    return Fail(QLIBC_ERR_OPEN);
-  }
-  struct stat after;
-  if (snapshot->status.st_size > kMostFileBytes ||
-      !ReadAll(file.get(), static_cast<size_t>(snapshot->status.st_size), &snapshot->contents) ||
-      fstat(file.get(), &after) != 0) {
-    return Fail(QLIBC_ERR_IO);
-  }
-  snapshot->steady = SameContents(snapshot->status, after);
-  return 0;
-}
-
 /* ---- the file that was read last ---- */
 
 struct CachedFile {
   std::string path;
   struct stat status;
-  int64_t opened;
+  int64_t opened; /* the clock that stamps files, before the file was opened */
   SectionText text;
 };
 
@@ -139,10 +101,7 @@ bool IsYoung(const struct stat &status) noexcept {
   return -kCopyInProgress < age && age < kCopyInProgress;
 }
 
-bool LooksTorn(const Snapshot &snapshot, const SectionText &text) noexcept {
-  if (!snapshot.steady) {
-    return true;
-  }
+bool LooksTorn(const SectionText &text) noexcept {
   const SectionForm form = text.Form();
   return form == SectionForm::kEmpty || form == SectionForm::kCutOff ||
          form == SectionForm::kEdited;
@@ -155,14 +114,15 @@ void Pause() noexcept {
 
 std::unique_ptr<const CachedFile> Load(const char *path) {
   for (int pauses = 0;; ++pauses) {
-    Snapshot snapshot;
-    if (ReadSnapshot(path, 0, &snapshot) < 0) {
+    const int64_t opened = Now(CLOCK_REALTIME_COARSE);
+    FileContents read;
+    if (ReadFile(path, 0, &read) < 0) {
       return nullptr;
     }
     /* Made in place, since its names are views into itself. */
-    std::unique_ptr<const CachedFile> file(new CachedFile{
-        path, snapshot.status, snapshot.opened, SectionText(std::move(snapshot.contents))});
-    if (pauses < kMostPauses && IsYoung(snapshot.status) && LooksTorn(snapshot, file->text)) {
+    std::unique_ptr<const CachedFile> file(
+        new CachedFile{path, read.status, opened, SectionText(std::move(read.text))});
+    if (pauses < kMostPauses && IsYoung(read.status) && (!read.steady || LooksTorn(file->text))) {
       Pause();
       continue;
     }
@@ -194,14 +154,6 @@ const SectionText *Current(const char *path) {
   return cache == nullptr ? nullptr : &cache->text;
 }
 
-int holds = 0;
-
-/* As Current; while the file that was read last is held, as it was then. */
-const SectionText *HeldOrCurrent(const char *path) {
-  const std::unique_ptr<const CachedFile> &cache = Cache();
-  return holds > 0 && cache != nullptr && cache->path == path ? &cache->text : Current(path);
-}
-
 /* ---- writing ---- */
 
 /* A file that is about to be changed. Its writer works on a copy of its own,
@@ -214,13 +166,13 @@ struct Original {
 /* A link is refused, for the change would replace the link and not the file.
  * 0, or -1 (0x0900, 0x0B00). */
 int ReadOriginal(const char *path, Original *original) {
-  Snapshot snapshot;
-  if (ReadSnapshot(path, O_NOFOLLOW, &snapshot) < 0) {
+  FileContents read;
+  if (ReadFile(path, O_NOFOLLOW, &read) < 0) {
     return -1;
   }
-  original->status = snapshot.status;
-  original->text = std::make_unique<const SectionText>(std::move(snapshot.contents));
-  if (!snapshot.steady || original->text->IsCutOff()) {
+  original->status = read.status;
+  original->text = std::make_unique<const SectionText>(std::move(read.text));
+  if (!read.steady || original->text->IsCutOff()) {
     return Fail(QLIBC_ERR_IO);
   }
   return 0;
@@ -236,12 +188,8 @@ bool AreKnownFlags(int flags) noexcept {
 }
 
 bool HasWritableKeys(const QLIBC_SZHASH &hash) noexcept {
-  for (const QLIBC_SZHASH::Entry &entry : hash.entries()) {
-    if (!IsSectionKey(hash.Key(entry))) {
-      return false;
-    }
-  }
-  return true;
+  return std::all_of(hash.entries().begin(), hash.entries().end(),
+                     [](const auto &entry) { return IsSectionKey(entry.first); });
 }
 
 int Changed(int replaced) noexcept {
@@ -258,16 +206,16 @@ int SetSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash
   if (section == nullptr) {
     return 0;
   }
-  return Changed(ReplaceFile(path, original.text->WithSet(*section, hash).Views(), &original.status,
-                             durability));
+  return Changed(
+      ReplaceFile(path, original.text->WithSet(*section, hash), &original.status, durability));
 }
 
 int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash,
                Durability durability) {
   struct stat status;
   if (lstat(path, &status) != 0 && errno == ENOENT) {
-    const SectionText empty{Bytes{}};
-    return Changed(ReplaceFile(path, empty.WithAdded(name, hash).Views(), nullptr, durability));
+    const SectionText empty{std::string()};
+    return Changed(ReplaceFile(path, empty.WithAdded(name, hash), nullptr, durability));
   }
   Original original;
   if (ReadOriginal(path, &original) < 0) {
@@ -276,8 +224,8 @@ int AddSection(const char *path, std::string_view name, const QLIBC_SZHASH &hash
   if (original.text->Find(name) != nullptr) {
     return Fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return Changed(ReplaceFile(path, original.text->WithAdded(name, hash).Views(), &original.status,
-                             durability));
+  return Changed(
+      ReplaceFile(path, original.text->WithAdded(name, hash), &original.status, durability));
 }
 
 int RemoveSection(const char *path, std::string_view name) {
@@ -289,8 +237,8 @@ int RemoveSection(const char *path, std::string_view name) {
   if (section == nullptr) {
     return 0;
   }
-  return Changed(ReplaceFile(path, original.text->WithRemoved(*section).Views(), &original.status,
-                             Durability::kNone));
+  return Changed(
+      ReplaceFile(path, original.text->WithRemoved(*section), &original.status, Durability::kNone));
 }
 
 }  // namespace
@@ -318,20 +266,12 @@ int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
   return count;
 }
 
-void QLIBCFileHoldBegin(void) {
-  ++zelo::holds;
-}
-
-void QLIBCFileHoldEnd(void) {
-  --zelo::holds;
-}
-
 int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHash) {
   if (szPath == nullptr || szSection == nullptr || ppHash == nullptr || *ppHash == nullptr) {
     return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
   }
   return zelo::AtBoundary(-1, [&] {
-    const zelo::SectionText *text = zelo::HeldOrCurrent(szPath);
+    const zelo::SectionText *text = zelo::Current(szPath);
     if (text == nullptr) {
       return -1;
     }

@@ -37,7 +37,7 @@ int SetLine(const char *path, const char *key, const char *value) {
   if (value == nullptr && QLIBCFileExist(path) == 0) {
     return 0;
   }
-  LineFile file;
+  FileContents file;
   if (ReadLineFile(path, &file) < 0) {
     return -1;
   }

@@ -66,7 +66,7 @@ std::string Line(const ZELO_SCHEDULE &schedule) {
 }
 
 int AddLine(const ZELO_SCHEDULE &schedule) {
-  LineFile crontab;
+  FileContents crontab;
   if (ReadLineFile(kCrontab, &crontab) < 0) {
     return -1;
   }
@@ -91,7 +91,7 @@ int Reload() {
   if (QLIBCFileExist(kCronPidFile) == 0) {
     return 0;
   }
-  LineFile file;
+  FileContents file;
   if (ReadLineFile(kCronPidFile, &file) < 0) {
     return -1;
   }

@@ -118,9 +118,9 @@ int WriteAlarm(const std::string &text) {
  * taken for armed. */
 bool IsArmed() {
   const Descriptor file(open(kWakeAlarm, O_RDONLY | O_CLOEXEC));
-  Bytes contents;
+  std::string contents;
   return !file.valid() || !ReadAll(file.get(), kMostAlarmBytes, &contents) ||
-         std::strtoll(std::string(contents.text()).c_str(), nullptr, kDecimal) != 0;
+         std::strtoll(contents.c_str(), nullptr, kDecimal) != 0;
 }
 
 /* Only an alarm that is armed is written to: a machine that cannot be woken at

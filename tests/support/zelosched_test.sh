@@ -24,3 +24,19 @@ try() {
   out=$(cat "$SCRATCH/out")
   err=$(cat "$SCRATCH/err")
 }
+
+# A program that every user can run, wherever the checkout lies: below root's home, say, which is
+# closed to others.
+readonly FOR_OTHERS=/run/for_others/zelosched
+copy_for_others() {
+  local directory=${FOR_OTHERS%/*}
+  mkdir -p "$directory"
+  cp "$BUILD_DIR"/lib/*.so* "$directory"
+  cp "$ZELOSCHED" "$directory/zelosched.program"
+  cat >"$FOR_OTHERS" <<EOF
+#!/bin/sh
+LD_LIBRARY_PATH=$directory exec $directory/zelosched.program "\$@"
+EOF
+  chmod -R a+rX "$directory"
+  chmod a+x "$FOR_OTHERS"
+}

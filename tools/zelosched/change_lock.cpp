@@ -1,6 +1,7 @@
 #include "change_lock.h"
 
 #include <fcntl.h>
+#include <sched_store_lock.h>
 #include <signal.h>
 #include <sys/file.h>
 #include <unistd.h>
@@ -8,14 +9,13 @@
 #include <cerrno>
 #include <chrono>
 #include <cstring>
-#include <string>
+#include <fstream>
 #include <thread>
 
 #include "failure.h"
 
 namespace {
 
-constexpr char kLockFile[] = "/run/zelosched.lock";
 constexpr mode_t kLockFileMode = 0600;  // who can open it can hold every change up
 constexpr std::chrono::milliseconds kPause(20);
 constexpr std::chrono::seconds kSaidAfter(2);
@@ -25,15 +25,36 @@ using Clock = std::chrono::steady_clock;
 
 int openLockFile() {
   constexpr int kFlags = O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK;
-  const int file = open(kLockFile, kFlags, kLockFileMode);
+  const int file = open(kChangeLockFile, kFlags, kLockFileMode);
   if (file >= 0) return file;
   const int reason = errno;
   const bool isRights = reason == EACCES || reason == EPERM;
-  throw Failure(std::string("cannot open ") + kLockFile + ": " + std::strerror(reason) +
+  throw Failure(std::string("cannot open ") + kChangeLockFile + ": " + std::strerror(reason) +
                 (isRights ? " (changing tasks takes root's rights)" : ""));
 }
 
+// The library waits for its own lock in silence.
+void sayWhoHoldsTheLibrarysLock() {
+  const Clock::time_point start = Clock::now();
+  pid_t holder = schedLockHolder(kSchedStoreLockFile);
+  while (holder != 0 && Clock::now() - start < kSaidAfter) {
+    std::this_thread::sleep_for(kPause);
+    holder = schedLockHolder(kSchedStoreLockFile);
+  }
+  if (holder != 0) {
+    complain("waiting for " + processText(holder) + ", which holds " + kSchedStoreLockFile);
+  }
+}
+
 }  // namespace
+
+std::string processText(pid_t pid) {
+  if (pid == kSchedUnknownHolder) return "another process";
+  const std::string number = std::to_string(pid);
+  std::string name;
+  std::getline(std::ifstream("/proc/" + number + "/comm"), name);
+  return "process " + number + " (" + name + ")";
+}
 
 ChangeLock::ChangeLock() : file_(openLockFile()) {
   // A reader that goes away must not end us between two changes.
@@ -44,18 +65,23 @@ ChangeLock::ChangeLock() : file_(openLockFile()) {
     const int reason = errno;
     const Clock::duration waited = Clock::now() - start;
     if ((reason != EWOULDBLOCK && reason != EINTR) || waited >= kPatience) {
+      const pid_t holder = schedLockHolder(kChangeLockFile);
       close(file_);
       throw Failure(reason == EWOULDBLOCK
-                        ? "another zelosched command has been changing tasks for 30 seconds: "
-                          "nothing was changed, try again when it is done"
-                        : std::string("cannot lock ") + kLockFile + ": " + std::strerror(reason));
+                        ? processText(holder) +
+                              " has been changing tasks for 30 seconds: nothing was changed, try "
+                              "again when it is done"
+                        : std::string("cannot lock ") + kChangeLockFile + ": " +
+                              std::strerror(reason));
     }
     if (!isSaid && waited >= kSaidAfter) {
-      complain("waiting for another zelosched command that is changing tasks");
+      complain("waiting for " + processText(schedLockHolder(kChangeLockFile)) +
+               ", which is changing tasks");
       isSaid = true;
     }
     std::this_thread::sleep_for(kPause);
   }
+  sayWhoHoldsTheLibrarysLock();
 }
 
 ChangeLock::~ChangeLock() {

@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <iterator>
+#include <sstream>
 
 #include "command.h"
 #include "text.h"
@@ -56,6 +57,10 @@ Failure failedTo(const std::string &what) {
 }
 
 int complain(const std::string &sentence) {
-  std::fprintf(stderr, "zelosched: %s\n", sentence.c_str());
+  // Names of other users' files stand in some, and standard error may be a terminal.
+  std::istringstream lines(sentence);
+  std::string shown = "zelosched:";
+  for (std::string line; std::getline(lines, line);) shown += " " + printable(line) + "\n";
+  std::fputs(shown.c_str(), stderr);
   return kFailed;
 }

@@ -12,6 +12,7 @@
 
 #include "failure.h"
 #include "options.h"
+#include "sched_utf8.h"
 #include "task_check.h"
 #include "text.h"
 
@@ -106,7 +107,7 @@ std::string valid(std::string_view text, bool *isWhole) {
   std::string out;
   *isWhole = true;
   while (!text.empty()) {
-    const size_t bytes = utf8Length(text);
+    const size_t bytes = schedFirstCharacter(text).bytes;
     *isWhole = *isWhole && bytes > 0;
     out += bytes > 0 ? std::string(text.substr(0, bytes)) : kReplacement;
     text.remove_prefix(std::max<size_t>(bytes, 1));
@@ -273,8 +274,9 @@ std::string firstError(const std::string &errors) {
   std::getline(lines, what);
   const size_t word = where.find_first_not_of("* ");
   const size_t sentence = what.find_first_not_of(' ');
+  constexpr size_t kLongest = 200;  // it quotes what it does not like, however long that is
   return (word == std::string::npos ? "" : where.substr(word)) +
-         (sentence == std::string::npos ? "" : ": " + what.substr(sentence));
+         (sentence == std::string::npos ? "" : ": " + what.substr(sentence, kLongest));
 }
 
 // How many bytes of the text are the string or the comment that it begins with; 1 for anything

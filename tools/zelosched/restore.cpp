@@ -120,6 +120,16 @@ void keepWorkingCopy(const StoreCopy &working, const StoreCopy &persistent) {
   }
   std::printf("%s %s: it stays\n", kWorkingCopy, what);
   const std::string why = persistent.why.empty() ? "is missing" : persistent.why;
+  // As the next change would: what is cut off has nothing that the working copy lacks.
+  const bool isCutOff =
+      persistent.condition == StoreCopy::kDamaged || persistent.condition == StoreCopy::kMissing;
+  if (working.isWhole() && isCutOff) {
+    placeFile(kPersistentCopy, contentsOf(kWorkingCopy), kStoreMode);
+    keepLastGood();
+    complain(std::string(kPersistentCopy) + " " + why + ": it was written anew from " +
+             kWorkingCopy);
+    return;
+  }
   throw Failure(std::string(kPersistentCopy) + " " + why +
                 ": save a task, which writes it anew, or all are lost at the next boot");
 }

@@ -1,5 +1,4 @@
 // zelosched run
-#include <dirent.h>
 #include <signal.h>
 #include <sys/prctl.h>
 #include <sys/wait.h>
@@ -8,15 +7,13 @@
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
-#include <iterator>
 #include <map>
-#include <sstream>
 #include <thread>
 
 #include "command.h"
 #include "for_each_id.h"
 #include "options.h"
+#include "processes.h"
 #include "result_text.h"
 #include "run_output.h"
 #include "runs.h"
@@ -38,59 +35,12 @@ using Clock = std::chrono::steady_clock;
 // The library leaves its process to itself. As the one that takes in orphans we become its parent,
 // learn of its end at once, and tell its row in the status database from those of other runs.
 
-struct ProcessStat {
-  pid_t parent = 0;
-  unsigned long long started = 0;
-};
-
-ProcessStat statOf(const std::string &pid) {
-  constexpr int kFieldsBetween = 17;  // between the parent and the start in /proc/PID/stat
-  std::ifstream file("/proc/" + pid + "/stat");
-  const std::string text(std::istreambuf_iterator<char>(file), {});
-  const size_t name = text.rfind(')');  // the name before it may hold anything
-  if (name == std::string::npos) return {};
-  std::istringstream fields(text.substr(name + 1));
-  ProcessStat stat;
-  std::string skipped;
-  fields >> skipped >> stat.parent;
-  for (int i = 0; i < kFieldsBetween; ++i) fields >> skipped;
-  fields >> stat.started;
-  return stat;
-}
-
-std::map<pid_t, ProcessStat> children() {
-  std::map<pid_t, ProcessStat> found;
-  DIR *directory = opendir("/proc");
-  if (directory == nullptr) return found;
-  while (const dirent *entry = readdir(directory)) {
-    const std::optional<long> pid = parseNumber(entry->d_name);
-    if (!pid) continue;
-    const ProcessStat stat = statOf(entry->d_name);
-    if (stat.parent == getpid()) found[static_cast<pid_t>(*pid)] = stat;
-  }
-  closedir(directory);
-  return found;
-}
-
-// What a command leaves behind becomes ours, and may be older than the next run's process. But it
-// cannot have root's saved user id, which a run's process keeps as its way back.
-bool isOfRoot(pid_t pid) {
-  std::ifstream status("/proc/" + std::to_string(pid) + "/status");
-  std::string word;
-  while (status >> word && word != "Uid:") {
-  }
-  long real = -1;
-  long effective = -1;
-  long saved = -1;
-  return status >> real >> effective >> saved && saved == 0;
-}
-
 // The run's own process is older than whatever its command has left to us by now.
 pid_t newChild(const std::map<pid_t, ProcessStat> &before) {
   pid_t oldest = 0;
   unsigned long long started = 0;
   for (const auto &[pid, stat] : children()) {
-    if (before.count(pid) != 0 || !isOfRoot(pid)) continue;
+    if (before.count(pid) != 0 || !isOfRoot(pid) || !isOfOurProgram(pid)) continue;
     if (oldest == 0 || stat.started < started) {
       oldest = pid;
       started = stat.started;

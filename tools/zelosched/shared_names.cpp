@@ -17,12 +17,14 @@
 #include <string_view>
 
 #include "failure.h"
+#include "text.h"
 
 namespace {
 
 constexpr mode_t kPermissions = 07777;
 constexpr char kDirectory[] = "/tmp";
 constexpr std::string_view kScratchPrefix = "scheduled_tasks.tmp.";
+constexpr std::string_view kAsidePrefix = "zeloscheduler.";
 
 // In the order in which they are taken: what is in the directory can be judged only behind it.
 constexpr const SchedSharedName *kNames[] = {&kSchedLockDirectory, &kSchedLockFile, &kSchedDatabase,
@@ -78,13 +80,14 @@ struct CloseDirectory {
   void operator()(DIR *directory) const { closedir(directory); }
 };
 
-void forEachScratchName(const std::function<void(int directory, const char *name)> &act) {
+using ActOnName = std::function<void(int directory, const char *name)>;
+
+void forEachName(std::string_view prefix, const ActOnName &act) {
   const std::unique_ptr<DIR, CloseDirectory> directory(opendir(kDirectory));
   if (directory == nullptr) throw cannot(std::string("read ") + kDirectory);
   while (const dirent *entry = readdir(directory.get())) {
-    if (std::string_view(entry->d_name).starts_with(kScratchPrefix)) {
+    if (std::string_view(entry->d_name).starts_with(prefix))
       act(dirfd(directory.get()), entry->d_name);
-    }
   }
 }
 
@@ -96,7 +99,7 @@ class AsideDirectory {
     if (path_.empty()) make();
     const std::string to = path_ + "/" + std::to_string(++count_);
     if (renameat(directory, name, AT_FDCWD, to.c_str()) != 0 && errno != ENOENT) {
-      throw cannot(std::string("move ") + name + " away");
+      throw cannot("move " + printable(name) + " away");
     }
   }
   const std::string &path() const { return path_; }
@@ -149,7 +152,7 @@ int takeSharedNames() {
 
 size_t foreignScratchNames() {
   size_t count = 0;
-  forEachScratchName([&](int directory, const char *name) {
+  forEachName(kScratchPrefix, [&](int directory, const char *name) {
     struct stat info {};
     const bool isThere = fstatat(directory, name, &info, AT_SYMLINK_NOFOLLOW) == 0;
     if (isThere && schedWhyForeign(kSchedStore, info) != nullptr) ++count;
@@ -157,9 +160,20 @@ size_t foreignScratchNames() {
   return count;
 }
 
+std::vector<std::string> movedAway() {
+  std::vector<std::string> directories;
+  forEachName(kAsidePrefix, [&](int directory, const char *name) {
+    struct stat info {};
+    const bool isRoots = fstatat(directory, name, &info, AT_SYMLINK_NOFOLLOW) == 0 &&
+                         S_ISDIR(info.st_mode) && info.st_uid == 0;
+    if (isRoots) directories.push_back(std::string(kDirectory) + "/" + name);
+  });
+  return directories;
+}
+
 void clearScratchNames() {
   AsideDirectory aside;
-  forEachScratchName([&](int directory, const char *name) {
+  forEachName(kScratchPrefix, [&](int directory, const char *name) {
     if (unlinkat(directory, name, 0) == 0 || unlinkat(directory, name, AT_REMOVEDIR) == 0) return;
     if (errno != ENOENT) aside.receive(directory, name);
   });

@@ -17,5 +17,8 @@ int takeSharedNames();
 // What stands under names of scratch copies of the store that are another user's.
 size_t foreignScratchNames();
 
+// The directories of root's with what was in the way of ours, for the administrator to look at.
+std::vector<std::string> movedAway();
+
 // Takes away every scratch copy. Nobody may be changing the store meanwhile. Throws Failure.
 void clearScratchNames();

@@ -14,6 +14,7 @@
 #include <iterator>
 
 #include "alarm_check.h"
+#include "change_lock.h"
 #include "coming_runs.h"
 #include "command.h"
 #include "crontab_check.h"
@@ -103,23 +104,36 @@ Findings namesAreOurs() {
                              "'zelosched restore' takes them away"));
   }
   if (findings.empty()) findings.push_back(well("no other user is in the way of a run"));
+  for (const std::string &directory : movedAway()) {
+    findings.push_back(well("what was in the way of ours in /tmp was moved to " + directory +
+                            ": look at it and delete it"));
+  }
   return findings;
 }
 
 // One that has it for a moment is no fault.
-Findings changesHaveTheirTurn() {
-  if (geteuid() != 0) return {well("whether changes of tasks have their turn, only root may see")};
+pid_t lastingHolder(const char *lockFile) {
   constexpr int kTries = 100;
   constexpr useconds_t kPause = 20000;
-  pid_t holder = schedStoreLockHolder();
+  const pid_t holder = schedLockHolder(lockFile);
   for (int i = 0; i < kTries && holder != 0; ++i) {
     usleep(kPause);
-    if (schedStoreLockHolder() != holder) holder = 0;
+    if (schedLockHolder(lockFile) != holder) return 0;
   }
-  if (holder == 0) return {well("changes of tasks have their turn")};
-  return {wrong("process " + std::to_string(holder) + " (" +
-                firstLine("/proc/" + std::to_string(holder) + "/comm") +
-                ") keeps every change of tasks waiting")};
+  return holder;
+}
+
+Findings changesHaveTheirTurn() {
+  if (geteuid() != 0) return {well("whether changes of tasks have their turn, only root may see")};
+  Findings findings;
+  for (const char *lockFile : {kSchedStoreLockFile, kChangeLockFile}) {
+    const pid_t holder = lastingHolder(lockFile);
+    if (holder == 0) continue;
+    findings.push_back(
+        wrong(processText(holder) + " keeps changes of tasks waiting: it holds " + lockFile));
+  }
+  if (findings.empty()) findings.push_back(well("changes of tasks have their turn"));
+  return findings;
 }
 
 bool exists(const char *path) {
@@ -136,10 +150,24 @@ bool isWhole(const char *path, int *sections) {
 
 constexpr char kPutTasksBack[] = ": 'zelosched restore' puts the tasks back";
 
+// What the next restore falls back on.
+Findings lastGoodAgrees() {
+  if (!exists(kPersistentCopy)) return {};
+  const char *const remedy = ": 'zelosched restore' writes it anew";
+  if (!exists(kLastGoodCopy)) return {wrong(std::string(kLastGoodCopy) + " is missing" + remedy)};
+  if (contents(kLastGoodCopy) == contents(kPersistentCopy)) return {};
+  return {wrong(std::string(kLastGoodCopy) + " is not as " + kPersistentCopy + " is" + remedy)};
+}
+
 Findings copiesAgree() {
+  const char *why = nullptr;
+  if (schedLookAt(kSchedStore, &why) == SchedNameState::kForeign) {
+    return {wrong(std::string(kWorkingCopy) + " " + why + kPutTasksBack)};
+  }
   int working = 0;
   const bool isNothing = !exists(kWorkingCopy) || (isWhole(kWorkingCopy, &working) && working == 0);
-  if (isNothing && !exists(kPersistentCopy)) return {well("no task was ever saved")};
+  const bool isNoneKept = !exists(kPersistentCopy) && !exists(kLastGoodCopy);
+  if (isNothing && isNoneKept) return {well("no task was ever saved")};
   for (const char *path : {kWorkingCopy, kPersistentCopy}) {
     int sections = 0;
     if (!exists(path)) {
@@ -277,7 +305,7 @@ int runStatus(int argc, char **argv) {
     }
   };
   for (const auto check : {cronRuns, programIsThere, namesAreOurs, changesHaveTheirTurn,
-                           copiesAgree, crontabIsShortEnough}) {
+                           copiesAgree, lastGoodAgrees, crontabIsShortEnough}) {
     add(check);
   }
   add([&] {

@@ -1,5 +1,6 @@
 #include "task_list.h"
 
+#include <sched_shared_names.h>
 #include <zelocore.h>
 #include <zelosdk.h>
 
@@ -38,6 +39,21 @@ bool hasBackendFailed() {
   return !isPowerListReadable(ZELO_AUTOPOWER_ON) || !isPowerListReadable(ZELO_AUTOPOWER_OFF);
 }
 
+// Which file it is, and what is to be done, where it is the store.
+Failure cannotList() {
+  const Failure failure = failedTo("list the tasks");
+  const char *why = nullptr;
+  if (schedLookAt(kSchedStore, &why) != SchedNameState::kForeign) {
+    PSZLIST names = QLIBCSzListAlloc(1);
+    const int sections = QLIBCFileEnumSection(kSchedStore.path, &names);
+    QLIBCSzListFree(names);
+    if (sections > 0 || (sections == 0 && !schedAreTasksKept())) return failure;
+    why = sections < 0 ? "cannot be read" : "has no tasks, though some are kept";
+  }
+  return Failure(std::string(failure.what()) + "; " + kSchedStore.path + " " + why +
+                 ": 'zelosched restore' puts the tasks back");
+}
+
 }  // namespace
 
 Task newTask(int32_t backend) {
@@ -72,10 +88,10 @@ Task loadTask(long id) {
 
 TaskList::TaskList(Unreadable backend) {
   forgetError();
-  if (ZELOSchedTaskListGet(&head_, nullptr) < 0) throw failedTo("list the tasks");
+  if (ZELOSchedTaskListGet(&head_, nullptr) < 0) throw cannotList();
   if (backend == Unreadable::kIsFailure && hasBackendFailed()) {
     ZELOSchedTaskListFree(&head_);
-    throw failedTo("list the tasks");
+    throw cannotList();
   }
   for (const TaskRecord *task = head_; task != nullptr; task = task->next) tasks_.push_back(task);
   std::stable_sort(tasks_.begin(), tasks_.end(),

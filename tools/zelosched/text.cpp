@@ -7,61 +7,22 @@
 #include <clocale>
 #include <cstdint>
 #include <cstdio>
-#include <optional>
 
+#include "sched_utf8.h"
 #include "terminal.h"
 
 namespace {
-
-struct Character {
-  uint32_t code;
-  size_t bytes;
-};
-
-struct Lead {
-  unsigned char mask;
-  unsigned char bits;
-  uint32_t least;  // a longer form than needed could hide a control character
-};
-constexpr Lead kLeads[] = {
-    {0x80, 0x00, 0}, {0xE0, 0xC0, 0x80}, {0xF0, 0xE0, 0x800}, {0xF8, 0xF0, 0x10000}};
-constexpr unsigned char kTailMask = 0xC0;
-constexpr unsigned char kTail = 0x80;
-constexpr unsigned kTailBits = 6;
-constexpr uint32_t kLastCharacter = 0x10FFFF;
 
 struct Range {
   uint32_t first;
   uint32_t last;
 };
-// Control characters, surrogates, the marks that turn the direction of writing or break lines, and
+// Control characters, the marks that turn the direction of writing or break lines, and
 // what cannot be seen, by which two names that look alike differ.
-constexpr Range kUnsafe[] = {
-    {0x00, 0x1F},     {0x7F, 0x9F},     {0xAD, 0xAD},      {0x061C, 0x061C}, {0x200B, 0x200B},
-    {0x200E, 0x200F}, {0x2028, 0x202E}, {0x2060, 0x2064},  {0x2066, 0x2069}, {0xD800, 0xDFFF},
-    {0xFEFF, 0xFEFF}, {0xFFF9, 0xFFFB}, {0xE0000, 0xE007F}};
-
-unsigned char byteAt(std::string_view text, size_t index) {
-  return static_cast<unsigned char>(text[index]);
-}
-
-// The character that the text begins with; nothing when that is no UTF-8.
-std::optional<Character> firstCharacter(std::string_view text) {
-  const unsigned char first = byteAt(text, 0);
-  for (size_t tails = 0; tails < std::size(kLeads); ++tails) {
-    const Lead &lead = kLeads[tails];
-    if ((first & lead.mask) != lead.bits) continue;
-    if (text.size() <= tails) return std::nullopt;
-    uint32_t code = first & static_cast<unsigned char>(~lead.mask);
-    for (size_t i = 1; i <= tails; ++i) {
-      if ((byteAt(text, i) & kTailMask) != kTail) return std::nullopt;
-      code = code << kTailBits | (byteAt(text, i) & static_cast<unsigned char>(~kTailMask));
-    }
-    if (code < lead.least || code > kLastCharacter) return std::nullopt;
-    return Character{code, tails + 1};
-  }
-  return std::nullopt;
-}
+constexpr Range kUnsafe[] = {{0x00, 0x1F},     {0x7F, 0x9F},     {0xAD, 0xAD},
+                             {0x061C, 0x061C}, {0x200B, 0x200B}, {0x200E, 0x200F},
+                             {0x2028, 0x202E}, {0x2060, 0x2064}, {0x2066, 0x2069},
+                             {0xFEFF, 0xFEFF}, {0xFFF9, 0xFFFB}, {0xE0000, 0xE007F}};
 
 bool isUnsafe(uint32_t code) {
   return std::any_of(std::begin(kUnsafe), std::end(kUnsafe),
@@ -94,9 +55,9 @@ void appendEscaped(std::string *out, std::string_view bytes) {
 std::string escaped(std::string_view text, std::string_view kept) {
   std::string out;
   while (!text.empty()) {
-    const std::optional<Character> next = firstCharacter(text);
-    const size_t bytes = next ? next->bytes : 1;
-    if ((next && canBeShown(next->code)) || kept.find(text[0]) != std::string_view::npos) {
+    const SchedCharacter next = schedFirstCharacter(text);
+    const size_t bytes = std::max<size_t>(next.bytes, 1);
+    if ((next.bytes > 0 && canBeShown(next.code)) || kept.find(text[0]) != std::string_view::npos) {
       out += text.substr(0, bytes);
     } else {
       appendEscaped(&out, text.substr(0, bytes));
@@ -120,9 +81,10 @@ int columnsOf(uint32_t code) {
 template <class Take>
 void forEachCharacter(std::string_view text, Take take) {
   while (!text.empty()) {
-    const Character next = firstCharacter(text).value_or(Character{0, 1});
-    if (!take(text.substr(0, next.bytes), next.code)) return;
-    text.remove_prefix(next.bytes);
+    const SchedCharacter next = schedFirstCharacter(text);
+    const size_t bytes = std::max<size_t>(next.bytes, 1);
+    if (!take(text.substr(0, bytes), next.code)) return;
+    text.remove_prefix(bytes);
   }
 }
 
@@ -143,21 +105,15 @@ std::string printableLines(std::string_view text) {
 }
 
 size_t cutCharacterLength(std::string_view text) {
-  for (size_t bytes = 1; bytes < std::size(kLeads) && bytes <= text.size(); ++bytes) {
-    const unsigned char byte = byteAt(text, text.size() - bytes);
+  constexpr size_t kMostBytes = 4;
+  constexpr unsigned char kTailMask = 0xC0;
+  constexpr unsigned char kTail = 0x80;
+  for (size_t bytes = 1; bytes < kMostBytes && bytes <= text.size(); ++bytes) {
+    const auto byte = static_cast<unsigned char>(text[text.size() - bytes]);
     if ((byte & kTailMask) == kTail) continue;
-    for (size_t tails = bytes; tails < std::size(kLeads); ++tails) {
-      if ((byte & kLeads[tails].mask) == kLeads[tails].bits) return bytes;
-    }
-    return 0;
+    return schedBytesOfCharacter(byte) > bytes ? bytes : 0;
   }
   return 0;
-}
-
-size_t utf8Length(std::string_view text) {
-  const std::optional<Character> first = firstCharacter(text);
-  const bool isCharacter = first && (first->code < 0xD800 || first->code > 0xDFFF);
-  return isCharacter ? first->bytes : 0;
 }
 
 size_t widthOf(std::string_view printable) {

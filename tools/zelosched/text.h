@@ -16,9 +16,6 @@ std::string printableLines(std::string_view text);
 // none.
 size_t cutCharacterLength(std::string_view text);
 
-// The bytes of the character that a text begins with; 0 when that is no UTF-8.
-size_t utf8Length(std::string_view text);
-
 // Columns that a printable text takes.
 size_t widthOf(std::string_view printable);
 

@@ -127,12 +127,6 @@ int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList);
  * stay). 1 when the section was read, 0 when there is none, -1 on failure. Of
  * sections with the same name the first is meant. */
 int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHash);
-/* Between the two calls QLIBCFileGetSection reads of the file that was read last
- * what stood in it then, and does not look at the file again: many sections at the
- * cost of one look, and all of one moment. Holds nest. Changes are not seen meanwhile,
- * the caller's own neither, so no other code of the caller's belongs in between. */
-void QLIBCFileHoldBegin(void);
-void QLIBCFileHoldEnd(void);
 /* Replaces the whole content of an existing section by the hash, in place; the
  * other sections keep every byte, and so do comments and blank lines right before
  * the next one. 1 when replaced, 0 when there is no such section (nothing is

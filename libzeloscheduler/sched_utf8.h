@@ -1,0 +1,21 @@
+// Texts in UTF-8, character by character.
+#ifndef SCHED_UTF8_H
+#define SCHED_UTF8_H
+
+#include <cstddef>
+#include <cstdint>
+#include <string_view>
+
+struct SchedCharacter {
+  uint32_t code;
+  size_t bytes;  // 0: it is none
+};
+
+// The one that the text begins with. Nothing that Unicode does not allow is one: no longer form
+// than needed, which could hide a control character, no surrogate, no number beyond its last.
+SchedCharacter schedFirstCharacter(std::string_view text);
+
+// The bytes of a character that begins with this one; 0 when none does.
+size_t schedBytesOfCharacter(unsigned char first);
+
+#endif

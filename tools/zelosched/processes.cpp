@@ -1,0 +1,68 @@
+#include "processes.h"
+
+#include <dirent.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <fstream>
+#include <iterator>
+#include <optional>
+#include <sstream>
+#include <string>
+
+#include "options.h"
+
+namespace {
+
+ProcessStat statOf(const std::string &pid) {
+  constexpr int kFieldsBetween = 17;  // between the parent and the start in /proc/PID/stat
+  std::ifstream file("/proc/" + pid + "/stat");
+  const std::string text(std::istreambuf_iterator<char>(file), {});
+  const size_t name = text.rfind(')');  // the name before it may hold anything
+  if (name == std::string::npos) return {};
+  std::istringstream fields(text.substr(name + 1));
+  ProcessStat stat;
+  std::string skipped;
+  fields >> skipped >> stat.parent;
+  for (int i = 0; i < kFieldsBetween; ++i) fields >> skipped;
+  fields >> stat.started;
+  return stat;
+}
+
+}  // namespace
+
+std::map<pid_t, ProcessStat> children() {
+  std::map<pid_t, ProcessStat> found;
+  DIR *directory = opendir("/proc");
+  if (directory == nullptr) return found;
+  while (const dirent *entry = readdir(directory)) {
+    const std::optional<long> pid = parseNumber(entry->d_name);
+    if (!pid) continue;
+    const ProcessStat stat = statOf(entry->d_name);
+    if (stat.parent == getpid()) found[static_cast<pid_t>(*pid)] = stat;
+  }
+  closedir(directory);
+  return found;
+}
+
+bool isOfRoot(pid_t pid) {
+  std::ifstream status("/proc/" + std::to_string(pid) + "/status");
+  const std::string label = "Uid:";
+  std::string line;  // the first one has a name that the process chooses
+  while (std::getline(status, line) && !line.starts_with(label)) {
+  }
+  std::istringstream ids(line.substr(std::min(label.size(), line.size())));
+  long real = -1;
+  long effective = -1;
+  long saved = -1;
+  return ids >> real >> effective >> saved && saved == 0;
+}
+
+bool isOfOurProgram(pid_t pid) {
+  struct stat ours = {};
+  struct stat theirs = {};
+  const std::string directory = "/proc/" + std::to_string(pid);
+  return stat("/proc/self/exe", &ours) == 0 && stat((directory + "/exe").c_str(), &theirs) == 0 &&
+         ours.st_dev == theirs.st_dev && ours.st_ino == theirs.st_ino;
+}

@@ -1,0 +1,21 @@
+// What /proc tells of processes.
+#pragma once
+
+#include <sys/types.h>
+
+#include <map>
+
+struct ProcessStat {
+  pid_t parent = 0;
+  unsigned long long started = 0;
+};
+
+std::map<pid_t, ProcessStat> children();
+
+// What a command leaves behind becomes ours, and may be older than the next run's process. But it
+// cannot have root's saved user id, which a run's process keeps as its way back.
+bool isOfRoot(pid_t pid);
+
+// Whether it runs the program that we run, as a child does that was forked and has started no
+// other. A set-uid program that a command has started is of root too.
+bool isOfOurProgram(pid_t pid);
