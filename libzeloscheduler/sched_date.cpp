@@ -37,7 +37,7 @@ char *appendNumber(char *end, uint32_t number, int digits) {
 TriggerText written(const ZELO_SCHED_DATE &date) {
   constexpr int kYearDigits = 4;
   constexpr int kDigits = 2;
-  TriggerText result;
+  TriggerText result = {};
   char *end = appendNumber(result.text, date.year, kYearDigits);
   *end++ = '-';
   end = appendNumber(end, date.month, kDigits);
@@ -227,7 +227,7 @@ int SchedTriggerClock::normalize(ZELO_SCHED_DATE *pDate) {
 }
 
 int schedNextTriggerTime(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
-  TriggerText result;
+  TriggerText result = {};
   if (triggerText(*pTask, clock, &result) < 0) {
     SCHED_LOG_CALLEE("get trigger date failed. [%ld] ", static_cast<long>(pTask->ID));
     return -1;
