@@ -16,21 +16,39 @@
 namespace {
 
 constexpr uint32_t kFirstYear = 1900;  // of struct tm
-constexpr uint32_t kHundred = 100;     // a time of day is hour * 100 + minute
+constexpr uint32_t kTen = 10;
+constexpr uint32_t kHundred = 100;  // a time of day is hour * 100 + minute
 constexpr char kNever[] = "N/A";
 
-using TriggerText = BoundedText<64>;
+struct TriggerText {
+  char text[64];  // five numbers of up to ten digits, and four characters between them
+};
+
+// With that many digits at least, behind `end`; the new end. snprintf would take more than all else
+// that is not the C library's.
+char *appendNumber(char *end, uint32_t number, int digits) {
+  if (number >= kTen || digits > 1) {
+    end = appendNumber(end, number / kTen, digits - 1);
+  }
+  *end = static_cast<char>('0' + number % kTen);
+  return end + 1;
+}
 
 TriggerText written(const ZELO_SCHED_DATE &date) {
-  constexpr size_t kYearDigits = 4;
-  constexpr size_t kDigits = 2;
-  TriggerText text;
-  text.appendNumber(date.year, kYearDigits).appendText("-");
-  text.appendNumber(date.month, kDigits).appendText("-");
-  text.appendNumber(date.day, kDigits).appendText(" ");
-  text.appendNumber(date.hour, kDigits).appendText(":");
-  text.appendNumber(date.minute, kDigits);
-  return text;
+  constexpr int kYearDigits = 4;
+  constexpr int kDigits = 2;
+  TriggerText result = {};
+  char *end = appendNumber(result.text, date.year, kYearDigits);
+  *end++ = '-';
+  end = appendNumber(end, date.month, kDigits);
+  *end++ = '-';
+  end = appendNumber(end, date.day, kDigits);
+  *end++ = ' ';
+  end = appendNumber(end, date.hour, kDigits);
+  *end++ = ':';
+  end = appendNumber(end, date.minute, kDigits);
+  *end = '\0';
+  return result;
 }
 
 enum class Today { kFound, kOver, kFailed };
@@ -95,7 +113,7 @@ ZELO_SCHED_DATE nextDay(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now)
 int ZELOSchedNextRunEstimate(const ZELO_SCHED_TASK &task, SchedTriggerClock *clock,
                              TriggerText *result) {
   if (task.Type == ZELO_SCHED_TYPE_ONCE) {
-    result->appendText(kNever);
+    copyText(result->text, kNever);
     return 0;
   }
   ZELO_SCHED_DATE date = nextDay(task, clock->now());
@@ -209,12 +227,12 @@ int SchedTriggerClock::normalize(ZELO_SCHED_DATE *pDate) {
 }
 
 int schedNextTriggerTime(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
-  TriggerText result;
+  TriggerText result = {};
   if (triggerText(*pTask, clock, &result) < 0) {
     SCHED_LOG_CALLEE("get trigger date failed. [%ld] ", static_cast<long>(pTask->ID));
     return -1;
   }
-  copyText(pTask->NextTriggerTime, result.c_str());
+  copyText(pTask->NextTriggerTime, result.text);
   return 0;
 }
 

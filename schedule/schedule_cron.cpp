@@ -52,7 +52,7 @@ char *appendDays(char *end, const ZELO_SCHED_TASK &task) {
 }  // namespace
 
 SchedCronLine schedCronLineOf(const ZELO_SCHED_TASK &task) {
-  SchedCronLine line;
+  SchedCronLine line = {};
   char *end = append(line.text, task.RunMin);
   end = append(end, "\t");
   end = appendHours(end, task);
