@@ -13,8 +13,10 @@
 #include <cstring>
 #include <memory>
 
+#include "id_array.h"
 #include "sched_guards.h"
 #include "sched_hash.h"
+#include "sched_new_file.h"
 #include "sched_record.h"
 #include "sched_report.h"
 #include "sched_shared_names.h"
@@ -267,66 +269,6 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
 
 // ---- ids ----------------------------------------------------------------------------------------
 
-// The ids of the stored tasks, in plain memory: no exception may arise here. It goes on counting
-// when memory is short, for the report.
-class IdArray {
- public:
-  IdArray() = default;
-  ~IdArray() { free(ids_); }
-  IdArray(const IdArray &) = delete;
-  IdArray &operator=(const IdArray &) = delete;
-
-  // Ids are positive. One that is not was written by another program, and is nobody's neighbour.
-  void add(long id) {
-    if (id < 1) {
-      return;
-    }
-    if (count_ < capacity_ || grow()) {
-      ids_[count_] = id;
-    }
-    ++count_;
-  }
-  int count() const { return static_cast<int>(count_); }
-  bool isWhole() const { return count_ <= capacity_; }
-
-  long smallestFree() {
-    if (count_ == 0) {
-      return 1;
-    }
-    std::sort(ids_, ids_ + count_);
-    if (ids_[0] >= 2) {
-      return 1;
-    }
-    for (size_t i = 1; i < count_; ++i) {
-      if (ids_[i] - ids_[i - 1] >= 2) {
-        return ids_[i - 1] + 1;
-      }
-    }
-    return ids_[count_ - 1] + 1;
-  }
-
- private:
-  bool grow() {
-    if (count_ > capacity_) {
-      return false;
-    }
-    const size_t wanted = capacity_ == 0 ? kContainerCapacity : 2 * capacity_;
-    auto *grown = static_cast<long *>(calloc(wanted, sizeof(long)));
-    if (grown == nullptr) {
-      return false;
-    }
-    std::copy(ids_, ids_ + count_, grown);
-    free(ids_);
-    ids_ = grown;
-    capacity_ = wanted;
-    return true;
-  }
-
-  long *ids_ = nullptr;
-  size_t count_ = 0;
-  size_t capacity_ = 0;
-};
-
 // A section that does not convert is nobody's, and its id is free. One that cannot be read just now
 // may be somebody's: a new task in its place would destroy it.
 int next_id(long *pID) {
@@ -358,96 +300,10 @@ int next_id(long *pID) {
   return 0;
 }
 
-// ---- files that are replaced as a whole ---------------------------------------------------------
-
-bool syncFile(const char *szPath, int flags) {
-  const int descriptor = open(szPath, O_RDONLY | O_CLOEXEC | flags);
-  if (descriptor < 0) {
-    return false;
-  }
-  const bool isSynced = fsync(descriptor) == 0;
-  close(descriptor);
-  return isSynced;
-}
-
-struct FileCloser {
-  void operator()(FILE *stream) const { fclose(stream); }
-};
-using Stream = std::unique_ptr<FILE, FileCloser>;
-
 int fail(SchedPlace place, int code) {
   QLIBCErrSetEx(code, place.file, place.line);
   return -1;
 }
-
-// A file made beside another one, gone again unless it took the other one's place.
-class NewFile {
- public:
-  explicit NewFile(const char *szPath) : szPath_(szPath) {
-    snprintf(path_, sizeof(path_), "%s.XXXXXX", szPath);
-  }
-  ~NewFile() {
-    stream_.reset();
-    if (made_) {
-      unlink(path_);
-    }
-  }
-  NewFile(const NewFile &) = delete;
-  NewFile &operator=(const NewFile &) = delete;
-
-  int open() {
-    const int descriptor = mkstemp(path_);
-    if (descriptor < 0) {
-      return fail(SCHED_HERE, kErrOpen);
-    }
-    made_ = true;
-    stream_.reset(fdopen(descriptor, "w"));
-    if (stream_ == nullptr) {
-      close(descriptor);
-      return fail(SCHED_HERE, kErrOpen);
-    }
-    return 0;
-  }
-
-  int write(const char *bytes, size_t count) {
-    if (fwrite(bytes, 1, count, stream_.get()) != count) {
-      return fail(SCHED_HERE, kErrIo);
-    }
-    endsLine_ = bytes[count - 1] == '\n';
-    return 0;
-  }
-
-  // A line must not be joined to a last line that has no line feed.
-  int endLine() { return endsLine_ ? 0 : write("\n", 1); }
-
-  // Whole on the disk and the old file's in owner and mode before anyone can see it.
-  int finish(const struct stat &old) {
-    constexpr mode_t kModeBits = 0xFFF;
-    FILE *stream = stream_.get();
-    const int descriptor = fileno(stream);
-    if (fflush(stream) != 0 || fsync(descriptor) != 0 ||
-        fchown(descriptor, old.st_uid, old.st_gid) != 0 ||
-        fchmod(descriptor, old.st_mode & kModeBits) != 0 || fclose(stream_.release()) != 0) {
-      return fail(SCHED_HERE, kErrIo);
-    }
-    return 0;
-  }
-
-  int replaceOld() {
-    if (rename(path_, szPath_) != 0) {
-      return fail(SCHED_HERE, kErrRename);
-    }
-    made_ = false;
-    return 0;
-  }
-
- private:
-  const char *szPath_;
-  char path_[64];
-  bool made_ = false;
-  bool endsLine_ = true;
-  Stream stream_;
-};
 
 // ---- writing the store --------------------------------------------------------------------------
 
@@ -554,17 +410,6 @@ int removeSection(const ScratchFile &scratch, const SectionName &section) {
   return removed > 0 ? 1 : 0;
 }
 
-int fillNewFile(FILE *source, NewFile *file) {
-  char block[1 << 14];
-  size_t count = 0;
-  while ((count = fread(block, 1, sizeof(block), source)) > 0) {
-    if (file->write(block, count) < 0) {
-      return -1;
-    }
-  }
-  return ferror(source) == 0 ? 0 : fail(SCHED_HERE, kErrIo);
-}
-
 // What is to become the persistent copy, whole and on the disk before that is touched.
 int keepLastGood(const ScratchFile &scratch) {
   const Stream source(fopen(scratch.path(), "re"));
@@ -575,14 +420,14 @@ int keepLastGood(const ScratchFile &scratch) {
   like.st_uid = geteuid();
   like.st_gid = getegid();
   like.st_mode = kStoreMode;
-  NewFile file(kLastGoodCopy);
-  if (file.open() < 0 || fillNewFile(source.get(), &file) < 0 || file.finish(like) < 0) {
+  NewFile file(kLastGoodCopy, SCHED_HERE);
+  if (file.open() < 0 || file.writeAllOf(source.get()) < 0 || file.finish(like) < 0) {
     return -1;
   }
   if (file.replaceOld() < 0) {
     return -1;
   }
-  return syncFile(kPersistentDirectory, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
+  return schedSyncDirectory(kPersistentDirectory) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
 // A forced copy empties its target before it fills it. When the power goes in between, the tasks
@@ -594,27 +439,12 @@ int copyToPersistent(const ScratchFile &scratch) {
   if (copyFile(scratch.path(), kPersistentCopy) < 0) {
     return -1;
   }
-  if (!syncFile(kPersistentCopy, 0) || !syncFile(kPersistentDirectory, O_DIRECTORY)) {
+  if (!schedSyncFile(kPersistentCopy) || !schedSyncDirectory(kPersistentDirectory)) {
     SCHED_SET_ERROR(kErrIo);
     return reportCopy(scratch.path(), kPersistentCopy);
   }
   return 0;
 }
-
-// A file's length and when it was written, by which one that was written again is told.
-class FileState {
- public:
-  explicit FileState(const char *szPath) { stat(szPath, &info_); }
-  bool isThatOf(const char *szPath) const {
-    struct stat now = {};
-    return stat(szPath, &now) == 0 && now.st_size == info_.st_size &&
-           now.st_mtim.tv_sec == info_.st_mtim.tv_sec &&
-           now.st_mtim.tv_nsec == info_.st_mtim.tv_nsec;
-  }
-
- private:
-  struct stat info_ = {};
-};
 
 // The persistent copy goes first: a failure in between leaves the working copy, which every read
 // uses, as it was.
@@ -725,7 +555,7 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   }
   // Cron starts as root whatever stands under that name: where it cannot be had, no line may stand.
   const bool isProgramOurs = schedTakeName(kSchedTaskProgram);
-  NewFile crontab(kCrontab);
+  NewFile crontab(kCrontab, SCHED_HERE);
   if (crontab.open() < 0 || keepOtherLines(old.get(), &crontab) < 0 ||
       addTaskLines(isProgramOurs ? tasks : nullptr, &crontab) < 0 || crontab.finish(info) < 0 ||
       crontab.replaceOld() < 0) {
@@ -735,7 +565,7 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   if (!isProgramOurs) {
     return fail(SCHED_HERE, kErrOpen);
   }
-  return syncFile(kCrontabDirectory, O_DIRECTORY) ? 0 : fail(SCHED_HERE, kErrIo);
+  return schedSyncDirectory(kCrontabDirectory) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
 // What says when each task runs, as a list of records in one array. They lie there in the order of
@@ -753,7 +583,7 @@ class Schedules {
     tasks_.reset(static_cast<ZELO_SCHED_TASK *>(
         calloc(static_cast<size_t>(sections), sizeof(ZELO_SCHED_TASK))));
     ZELO_SCHED_TASK **end = &head_;
-    int count = 0;
+    size_t count = 0;
     TaskGuard task;
     while (walk.next()) {
       if (!walk.isRead()) {
@@ -768,7 +598,7 @@ class Schedules {
         end = &(*end)->next;
       }
     }
-    return count;
+    return static_cast<int>(count);
   }
 
   ZELO_SCHED_TASK **handle() { return &head_; }

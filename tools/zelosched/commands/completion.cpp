@@ -22,7 +22,7 @@ std::string optionsOf(const Command &command) {
     const size_t line = help.rfind('\n', at) + 1;
     const std::string before = help.substr(line, at - line);
     const bool beginsLine = before == "  " || (before.starts_with("  -") && before.ends_with(", "));
-    if (beginsLine && end > at + 2) options += " " + help.substr(at, end - at);
+    if (beginsLine && end > at + 2) options.append(" ").append(help, at, end - at);
     at = end;
   }
   return options;
