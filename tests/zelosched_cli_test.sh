@@ -586,7 +586,7 @@ nothing_but_what_was_shown_is_removed() {
   export ZELOSCHED
   answer_after bash -c replace_the_second -- remove 2 >"$SCRATCH/log"
   grep -q "stays: it has been changed meanwhile" "$SCRATCH/log" &&
-    same "$(z list --json | json '[t["name"] for t in tasks]')" "['first', 'precious']"
+    same "$(z list --sort id --json | json '[t["name"] for t in tasks]')" "['first', 'precious']"
 }
 
 # Which renames the ones after it.
