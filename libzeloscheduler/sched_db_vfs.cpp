@@ -11,8 +11,8 @@
 
 #include <dlfcn.h>
 #include <fcntl.h>
-#include <sys/stat.h>
 #include <sys/single_threaded.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <atomic>

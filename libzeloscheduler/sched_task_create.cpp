@@ -13,8 +13,8 @@ int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask) {
   if (create.served) {
     return create.result;
   }
-  // Plugins hear of a task that nobody took; of one that was created they do not. Why nobody took it
-  // stays in the error record, also when they cannot be told.
+  // Plugins hear of a task that nobody took; of one that was created they do not. Why nobody took
+  // it stays in the error record, also when they cannot be told.
   const SchedErrorRecord reason;
   SchedHook hook("task_create", nullptr, pTask);
   hook.after(-1, SCHED_HERE);

@@ -166,8 +166,7 @@ refuses_the_tasks_of_others() {
 }
 
 has_no_more_than_fifty() {
-  local number
-  for number in {2..50}; do
+  while [[ $(with_library "$BIN/tasks_of_owner" 65534 | tail -1) != "50 tasks" ]]; do
     with_library "$BIN/save_for_user" 65534 "${new_task[@]}" >/dev/null || return 1
   done
   refused 65534 "${new_task[@]}" &&

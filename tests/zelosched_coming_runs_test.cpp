@@ -6,8 +6,8 @@
 #include <map>
 #include <random>
 
-#include "runs/coming_runs.h"
 #include "fake_clock.h"
+#include "runs/coming_runs.h"
 #include "sandbox_fixture.h"
 #include "schedule_cases.h"
 #include "tasks.h"

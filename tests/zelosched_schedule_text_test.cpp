@@ -3,8 +3,8 @@
 
 #include "commands/options.h"
 #include "sandbox_fixture.h"
-#include "terminal/schedule_text.h"
 #include "tasks.h"
+#include "terminal/schedule_text.h"
 
 namespace support {
 namespace {

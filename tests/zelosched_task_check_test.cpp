@@ -4,10 +4,10 @@
 #include <functional>
 
 #include "check/crontab_check.h"
+#include "check/task_check.h"
 #include "fake_clock.h"
 #include "sandbox_fixture.h"
 #include "schedule_cases.h"
-#include "check/task_check.h"
 #include "tasks.h"
 
 namespace support {
@@ -39,10 +39,8 @@ void setDay(ZELO_SCHED_TASK &task, int32_t type, uint32_t year, uint32_t month, 
 
 TEST_F(ZeloschedTaskCheckTest, EachFaultIsSaidWithWhatToWriteInstead) {
   const Fault faults[] = {
-      {[](auto &task) { task.RunHour = 24; },
-       "invalid hour 24 (00 to 23)", true},
-      {[](auto &task) { task.RunMin = 60; },
-       "invalid minute 60 (00 to 59)", true},
+      {[](auto &task) { task.RunHour = 24; }, "invalid hour 24 (00 to 23)", true},
+      {[](auto &task) { task.RunMin = 60; }, "invalid minute 60 (00 to 59)", true},
       {[](auto &task) {
          task.RepeatHour = 1;
          task.LastWorkHour = 24;
@@ -53,8 +51,7 @@ TEST_F(ZeloschedTaskCheckTest, EachFaultIsSaidWithWhatToWriteInstead) {
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_MONTHLY, 0, 0, 32); },
        "invalid day 32 (1 to 31)", true},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_YEARLY, 0, 13, 1); },
-       "invalid month 13 (01 to 12)",
-       true},
+       "invalid month 13 (01 to 12)", true},
       {[](auto &task) { setDay(task, ZELO_SCHED_TYPE_ONCE, 2026, 0, 1); },
        "invalid month 0 (01 to 12)", true},
       {[](auto &task) {

@@ -44,8 +44,8 @@ SchedNameState schedLookAt(const SchedSharedName &name, const char **pszWhy);
 // which the log names; an empty directory is removed. It logs nothing else, and sets no error code.
 bool schedTakeName(const SchedSharedName &name);
 
-// Takes the room that a file of ours shall have, where it was made in another way. Nobody may hold a
-// POSIX lock on it yet: closing the file would drop it.
+// Takes the room that a file of ours shall have, where it was made in another way. Nobody may hold
+// a POSIX lock on it yet: closing the file would drop it.
 void schedReserve(const SchedSharedName &name);
 
 // Makes it anew, in one step, whatever stands there: for root alone. True when the name has it;

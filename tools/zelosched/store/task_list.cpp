@@ -41,7 +41,7 @@ bool hasBackendFailed() {
 
 // Which file it is, and what is to be done, where it is the store.
 Failure cannotList() {
-  const Failure failure = failedTo("list the tasks");
+  Failure failure = failedTo("list the tasks");
   const char *why = nullptr;
   if (schedLookAt(kSchedStore, &why) != SchedNameState::kForeign) {
     PSZLIST names = QLIBCSzListAlloc(1);
