@@ -104,6 +104,7 @@ static ZELO_SCHED_TASK *find(unsigned long uid, const char *id) {
     return task;
   }
   ZELOSchedTaskFree(task);
+  fprintf(stderr, "there is no such task of this user\n");
   return NULL;
 }
 
@@ -138,7 +139,6 @@ static int save(unsigned long uid, const char *values[COUNT]) {
   ZELO_SCHED_TASK *task = find(uid, values[ID]);
   int result = -1;
   if (task == NULL) {
-    fprintf(stderr, "no task of this user can be saved under that id\n");
     return -1;
   }
   if (fill(task, values) == 0) {

@@ -1045,6 +1045,7 @@ readonly -a DAMAGES=(
   '/usr/zelo/etc/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $PERSISTENT'
   '/tmp/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $STORE'
   'the working and the persistent copy of the tasks differ' 'echo "# edited" >>$PERSISTENT'
+  "/usr/zelo/etc/scheduled_tasks is cut off: 'zelosched restore' writes it anew from /tmp/scheduled_tasks" ': >$PERSISTENT'
   '/etc/crontab lacks the line: 30 8 * * * root /tmp/zeloschedtask --run id=1' 'cp $SCRATCH/crontab /etc/crontab'
   '/etc/crontab has a line that belongs to no task: 1 1 * * * root /tmp/zeloschedtask --run id=7' 'printf "1\t1\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=7\n" >>/etc/crontab'
   '/etc/crontab cannot be read: No such file' 'rm /etc/crontab'
@@ -1057,6 +1058,24 @@ readonly -a DAMAGES=(
   '/usr/zelo/etc/scheduled_tasks.last-good is missing' 'rm $PERSISTENT.last-good'
   '/usr/zelo/etc/scheduled_tasks.last-good is not as /usr/zelo/etc/scheduled_tasks is' 'truncate -s 100 $PERSISTENT.last-good'
 )
+
+# Whoever took the advice to save a task would write all copies anew without the others.
+nothing_is_changed_before_the_tasks_are_back() {
+  all_well
+  cp "$PERSISTENT" "$SCRATCH/kept"
+  rm "$STORE"
+  z list >/dev/null
+  local command
+  for command in 'add --daily 08:30 -- true' sync status; do
+    # shellcheck disable=SC2086
+    try z $command
+    [[ $status == 1 && $out$err == *"$STORE has no tasks, though some are kept: 'zelosched restore' puts the tasks back"* ]] ||
+      { echo "$command: $status $out $err"; return 1; }
+  done
+  rm "$STORE"
+  fails_saying 1 "has no tasks, though some are kept" z add --daily 08:30 -- true &&
+    cmp "$PERSISTENT" "$SCRATCH/kept" && cmp "$PERSISTENT.last-good" "$SCRATCH/kept"
+}
 
 status_shows_what_was_moved_away() {
   all_well
@@ -1492,6 +1511,7 @@ check "power times are exported and imported" exports_power_times
 check "a clock that cannot be armed is told" tells_of_a_clock_that_fails
 check "status is well when all is" status_is_well
 check "status shows what was moved away" status_shows_what_was_moved_away
+check "nothing is changed before the tasks are back" nothing_is_changed_before_the_tasks_are_back
 check "a list that fails says which file it is" a_list_that_fails_says_which_file_it_is
 for ((i = 0; i < ${#DAMAGES[@]}; i += 2)); do
   check "status finds: ${DAMAGES[i]} ($((i / 2 + 1)))" status_finds "${DAMAGES[i]}" "${DAMAGES[i + 1]}"

@@ -73,6 +73,17 @@ TEST(ZeloschedProcessesTest, AChildIsOfOurProgramUntilItStartsAnother) {
   EXPECT_FALSE(isOfOurProgram(other));
 }
 
+TEST(ZeloschedProcessesTest, AChildThatHasEndedIsOverAndStillOfRoot) {
+  const pid_t child = fork();
+  if (child == 0) _exit(0);
+  siginfo_t end = {};
+  ASSERT_EQ(waitid(P_PID, static_cast<id_t>(child), &end, WEXITED | WNOWAIT), 0);
+  EXPECT_TRUE(isOver(child));
+  EXPECT_TRUE(isOfRoot(child));
+  EXPECT_FALSE(isOver(getpid()));
+  EXPECT_EQ(waitpid(child, nullptr, 0), child);
+}
+
 TEST(ZeloschedProcessesTest, AProcessThatIsGoneIsNotOfRoot) {
   pid_t pid = 0;
   {

@@ -41,7 +41,8 @@ pid_t newChild(const std::map<pid_t, ProcessStat> &before) {
   pid_t oldest = 0;
   unsigned long long started = 0;
   for (const auto &[pid, stat] : children()) {
-    if (before.count(pid) != 0 || !isOfRoot(pid) || !isOfOurProgram(pid)) continue;
+    if (before.count(pid) != 0 || !isOfRoot(pid)) continue;
+    if (!isOfOurProgram(pid) && !isOver(pid)) continue;
     if (oldest == 0 || stat.started < started) {
       oldest = pid;
       started = stat.started;

@@ -24,6 +24,7 @@
 #include "runs/runs.h"
 #include "store/change_lock.h"
 #include "store/shared_names.h"
+#include "store/store_copy.h"
 #include "store/store_files.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
@@ -104,7 +105,10 @@ Findings namesAreOurs() {
                              " of scratch copies of the tasks in /tmp belong to other users: "
                              "'zelosched restore' takes them away"));
   }
-  if (findings.empty()) findings.push_back(well("no other user is in the way of a run"));
+  const bool isStoreOurs = schedLookAt(kSchedStore, nullptr) != SchedNameState::kForeign;
+  if (findings.empty() && isStoreOurs) {
+    findings.push_back(well("no other user is in the way of a run"));
+  }
   for (const std::string &directory : movedAway()) {
     findings.push_back(well("what was in the way of ours in /tmp was moved to " + directory +
                             ": look at it and delete it"));
@@ -130,8 +134,8 @@ Findings changesHaveTheirTurn() {
   for (const char *lockFile : {kSchedStoreLockFile, kChangeLockFile}) {
     const pid_t holder = lastingHolder(lockFile);
     if (holder == 0) continue;
-    findings.push_back(
-        wrong(processText(holder) + " keeps changes of tasks waiting: it holds " + lockFile));
+    findings.push_back(wrong(processText(holder) + " keeps changes of tasks waiting: it holds " +
+                             lockFile + ": end it, if it does not end by itself"));
   }
   if (findings.empty()) findings.push_back(well("changes of tasks have their turn"));
   return findings;
@@ -153,7 +157,7 @@ constexpr char kPutTasksBack[] = ": 'zelosched restore' puts the tasks back";
 
 // What the next restore falls back on.
 Findings lastGoodAgrees() {
-  if (!exists(kPersistentCopy)) return {};
+  if (!exists(kPersistentCopy) || !judgeStore(kPersistentCopy).isWhole()) return {};
   const char *const remedy = ": 'zelosched restore' writes it anew";
   if (!exists(kLastGoodCopy)) return {wrong(std::string(kLastGoodCopy) + " is missing" + remedy)};
   if (contents(kLastGoodCopy) == contents(kPersistentCopy)) return {};
@@ -169,20 +173,24 @@ Findings copiesAgree() {
   const bool isNothing = !exists(kWorkingCopy) || (isWhole(kWorkingCopy, &working) && working == 0);
   const bool isNoneKept = !exists(kPersistentCopy) && !exists(kLastGoodCopy);
   if (isNothing && isNoneKept) return {well("no task was ever saved")};
+  if (exists(kWorkingCopy) && doTasksWaitForRestore()) {
+    return {
+        wrong(std::string(kWorkingCopy) + " has no tasks, though some are kept" + kPutTasksBack)};
+  }
   for (const char *path : {kWorkingCopy, kPersistentCopy}) {
     int sections = 0;
     if (!exists(path)) {
       return {
           wrong(std::string(path) + " is missing" +
-                (path == kWorkingCopy ? kPutTasksBack : ": save a task, which writes it anew"))};
+                (path == kWorkingCopy ? kPutTasksBack : ": 'zelosched restore' writes it anew"))};
     }
     if (!isWhole(path, &sections)) {
       return {wrong(std::string(path) + " cannot be read: " + errorInWords())};
     }
   }
-  if (contents(kWorkingCopy).empty()) {
-    return {
-        wrong(std::string(kWorkingCopy) + " has no tasks, though some are kept" + kPutTasksBack)};
+  if (contents(kPersistentCopy).empty()) {
+    return {wrong(std::string(kPersistentCopy) +
+                  " is cut off: 'zelosched restore' writes it anew from " + kWorkingCopy)};
   }
   if (contents(kWorkingCopy) == contents(kPersistentCopy)) {
     return {well("the working and the persistent copy of the tasks agree")};

@@ -24,7 +24,7 @@ ProcessStat statOf(const std::string &pid) {
   std::istringstream fields(text.substr(name + 1));
   ProcessStat stat;
   std::string skipped;
-  fields >> skipped >> stat.parent;
+  fields >> stat.state >> stat.parent;
   for (int i = 0; i < kFieldsBetween; ++i) fields >> skipped;
   fields >> stat.started;
   return stat;
@@ -57,6 +57,10 @@ bool isOfRoot(pid_t pid) {
   long effective = -1;
   long saved = -1;
   return ids >> real >> effective >> saved && saved == 0;
+}
+
+bool isOver(pid_t pid) {
+  return statOf(std::to_string(pid)).state == 'Z';
 }
 
 bool isOfOurProgram(pid_t pid) {

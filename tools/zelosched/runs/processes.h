@@ -6,6 +6,7 @@
 #include <map>
 
 struct ProcessStat {
+  char state = '\0';  // as ps shows it
   pid_t parent = 0;
   unsigned long long started = 0;
 };
@@ -19,3 +20,6 @@ bool isOfRoot(pid_t pid);
 // Whether it runs the program that we run, as a child does that was forked and has started no
 // other. A set-uid program that a command has started is of root too.
 bool isOfOurProgram(pid_t pid);
+
+// Whether it has ended, and waits for its parent to ask how. It has no program any more.
+bool isOver(pid_t pid);

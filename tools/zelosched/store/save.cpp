@@ -6,6 +6,7 @@
 #include "check/task_check.h"
 #include "sched_cron_room.h"
 #include "store/power_room.h"
+#include "store/store_copy.h"
 #include "terminal/failure.h"
 #include "terminal/text.h"
 
@@ -62,6 +63,7 @@ std::string unreadableTask(const TaskList &list) {
 }
 
 void requireReadableTasks(std::optional<long> changedId) {
+  requireTasksAreBack();
   const TaskList list;
   // Of several, each is mended beside the others.
   const bool isMended = std::any_of(

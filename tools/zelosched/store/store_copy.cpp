@@ -10,6 +10,7 @@
 #include <sstream>
 
 #include "store/place_file.h"
+#include "store/store_files.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
 
@@ -148,4 +149,23 @@ StoreCopy judgeWorkingStore(const std::string &path) {
   StoreCopy copy = judgeStore(path);
   const bool isEmpty = copy.condition == StoreCopy::kDamaged && isFile && info.st_size == 0;
   return isEmpty ? StoreCopy{StoreCopy::kEmpty, ""} : copy;
+}
+
+bool doTasksWaitForRestore() {
+  const auto holdsTasks = [](const char *path) {
+    const List sections = sectionsOf(path);
+    return sections != nullptr && QLIBCSzListCount(sections.get()) > 0;
+  };
+  struct stat kept {};
+  if (stat(kPersistentCopy, &kept) != 0) return false;
+  const bool isThere = QLIBCFileExist(kWorkingCopy) != 0;
+  const List working = sectionsOf(kWorkingCopy);
+  if (isThere && (working == nullptr || QLIBCSzListCount(working.get()) > 0)) return false;
+  return holdsTasks(kept.st_size > 0 ? kPersistentCopy : kLastGoodCopy);
+}
+
+void requireTasksAreBack() {
+  if (!doTasksWaitForRestore()) return;
+  throw Failure(std::string(kWorkingCopy) +
+                " has no tasks, though some are kept: 'zelosched restore' puts the tasks back");
 }

@@ -21,6 +21,11 @@ struct StoreCopy {
   bool isUsable() const { return condition == kWhole || condition == kDoubtful; }
 };
 
+// There is no task in the working copy, and some are kept for the next boot. A change would write
+// all copies anew without them. Throws Failure then.
+void requireTasksAreBack();
+bool doTasksWaitForRestore();
+
 StoreCopy judgeStore(const std::string &path);
 
 // As judgeStore, for the copy in /tmp: the library refuses it when it has a second name, too, which

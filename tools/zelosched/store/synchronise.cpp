@@ -6,6 +6,7 @@
 #include <string>
 
 #include "store/save.h"
+#include "store/store_copy.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
 
@@ -13,6 +14,7 @@ namespace {
 
 // A power list that cannot be read is told in the end, but keeps no task out of the crontab.
 void writeTasksOut() {
+  requireTasksAreBack();
   const std::string fault = unreadableTask(TaskList(TaskList::Unreadable::kIsLeftOut));
   if (!fault.empty()) {
     throw Failure("the crontab was not written, as cron may then pass over all of it: " + fault);
