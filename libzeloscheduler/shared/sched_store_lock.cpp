@@ -1,6 +1,7 @@
 #include "sched_store_lock.h"
 
 #include <fcntl.h>
+#include <signal.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
@@ -60,7 +61,10 @@ pid_t whoHolds(int file) {
     }
   }
   fclose(locks);
-  return holder > 0 ? holder : kSchedUnknownHolder;
+  // It lists who took the lock, which may have handed it on and ended, as flock(1) does for a
+  // script.
+  const bool isThere = holder > 0 && (kill(holder, 0) == 0 || errno != ESRCH);
+  return isThere ? holder : kSchedUnknownHolder;
 }
 
 int openFile() {

@@ -224,9 +224,9 @@ const Command kRestoreCommand = {
     "does it at boot, before cron and before anybody can log in.\n"
     "\n"
     "A persistent copy that is cut off or cannot be read is not used; the last good one,\n"
-    "which each restore keeps, takes its place, and the exit status is 1. So it is with one\n"
-    "whose checksum does not fit, unless it has as many tasks. Tasks that are in /tmp,\n"
-    "root's and whole, stay: a restore by hand loses nothing.\n"
+    "which each change writes before it, takes its place. So it is with one whose checksum\n"
+    "does not fit, unless it has no fewer tasks; the exit status is 1 then. Tasks that are\n"
+    "in /tmp, root's and whole, stay: a restore by hand loses nothing.\n"
     "\n"
     "  --force                        replace them by the persistent copy all the same\n",
     runRestore};

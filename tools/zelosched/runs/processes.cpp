@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <fstream>
 #include <iterator>
 #include <optional>
@@ -67,6 +68,7 @@ bool isOfOurProgram(pid_t pid) {
   struct stat ours = {};
   struct stat theirs = {};
   const std::string directory = "/proc/" + std::to_string(pid);
-  return stat("/proc/self/exe", &ours) == 0 && stat((directory + "/exe").c_str(), &theirs) == 0 &&
-         ours.st_dev == theirs.st_dev && ours.st_ino == theirs.st_ino;
+  if (stat((directory + "/exe").c_str(), &theirs) != 0) return errno == EACCES || errno == EPERM;
+  return stat("/proc/self/exe", &ours) == 0 && ours.st_dev == theirs.st_dev &&
+         ours.st_ino == theirs.st_ino;
 }

@@ -18,7 +18,8 @@ std::map<pid_t, ProcessStat> children();
 bool isOfRoot(pid_t pid);
 
 // Whether it runs the program that we run, as a child does that was forked and has started no
-// other. A set-uid program that a command has started is of root too.
+// other. A set-uid program that a command has started is of root too. True also where we may not
+// look, as in a container without CAP_SYS_PTRACE.
 bool isOfOurProgram(pid_t pid);
 
 // Whether it has ended, and waits for its parent to ask how. It has no program any more.
