@@ -85,8 +85,8 @@ int unsignedFromText(void *private_data, const char *str) {
   return 0;
 }
 
-// Callers have long relied on a sort by a number leaving the records in the order of their
-// addresses, so the locations are compared and not what stands there.
+// The interface has a sort by a number leave the records in the order of their addresses, so the
+// locations are compared and not what stands there.
 template <class Word>
 int compareLocations(const void *field1, const void *field2) {
   const Word word1 = reinterpret_cast<Word>(field1);

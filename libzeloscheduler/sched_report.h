@@ -81,8 +81,8 @@ class SchedErrorRecord {
     SCHED_SET_ERROR(kErrBadArgument);                   \
   } while (0)
 
-// `text` is the condition as the log has always shown it; log readers match on it, so it is given
-// apart from the condition itself.
+// `text` is the condition as the interface has it in the log: readers of the log match on it, so it
+// is given apart from the condition itself.
 #define SCHED_CHECK_ARG(condition, text, result) \
   do {                                           \
     if (!(condition)) {                          \

@@ -287,7 +287,7 @@ sqlite3 *ZELOSchedDBInit(void) {
     return nullptr;
   }
   if (execute(db, kCreateTable, nullptr, nullptr) < 0) {
-    return nullptr;  // The handle stays open, as callers have always found it.
+    return nullptr;  // the interface leaves the handle open
   }
   keepJournal(db);
   return db;

@@ -93,7 +93,7 @@ std::set<std::string> temporaryFiles() {
 
 // ---- what is called
 
-// A database whose table cannot be made stays open: callers have always found it so.
+// A database whose table cannot be made stays open: the interface says so.
 enum class Memory { kGivenBack, kLost };
 
 enum class Plugins { kNone, kOne };

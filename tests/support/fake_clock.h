@@ -1,11 +1,12 @@
 // The clock that time() shows to the library, the platform and the test. Children that are forked
 // later see the same one. gettimeofday and clock_gettime stay real.
 //
-//   void setZone("Europe/Berlin");          TZ, at once
-//   void setClock("2013-05-07 08:30");      local time in that zone, seconds may follow; stands
-//   still void setClock(time_t); void realClock(); time_t localTime("2013-05-07 08:30");   what
-//   setClock would set unsigned clockReads();                  calls of time() in this process so
-//   far
+//   setZone("Europe/Berlin");        TZ, at once
+//   setClock("2013-05-07 08:30");    local time in that zone, seconds may follow; it stands still
+//   setClock(moment);                the same by a time_t
+//   realClock();                     it goes again
+//   localTime("2013-05-07 08:30")    what setClock would set
+//   clockReads()                     calls of time() in this process so far
 #pragma once
 
 #include <ctime>

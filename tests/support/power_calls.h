@@ -7,8 +7,8 @@
 //   failPowerCall("ConfGet 1", {.from = 2, .code = 0x0900});   what begins so; from and times count
 //                                                              these calls, result is -1 by default
 //   giveList(kOn, entries);   what a ConfGet gives from now on, also what the platform would refuse
-//   takeAnyList();            a ConfSet succeeds and stores nothing; lastList() is what it was
-//   given resetPowerCalls();
+//   takeAnyList();            a ConfSet succeeds and stores nothing; lastList() has what it got
+//   resetPowerCalls();        all is passed on again
 //
 // A test program that uses this names support/power_calls.cpp among its SOURCES.
 #pragma once

@@ -1,9 +1,9 @@
 // Task records for tests.
 //
-//   Task task = makeTask("backup", "/bin/true");  new, enabled, daily at 00:00 from 2012-01-01,
-//   root's setText(task->Week, "0111110");               bounded copy into a text field long id =
-//   saveTask(task);                     through the library; fails the test on failure Task copy =
-//   loadTask(id);                     through the library; State 2 when there is none
+//   Task task = makeTask("backup", "/bin/true");   new, enabled, root's, daily at 00:00 since 2012
+//   setText(task->Week, "0111110");                bounded copy into a text field
+//   long id = saveTask(task);                      through the library; fails the test on failure
+//   Task copy = loadTask(id);                      through the library; State 2 when there is none
 #pragma once
 
 #include <cstddef>

@@ -29,12 +29,12 @@ class Arguments {
   Arguments(int argc, char **argv, std::span<const Option> options);
 
   bool has(std::string_view option) const;
-  // The value last given; nothing when the option was not given.
+  // The value last given, or both with a blank between them of an option that has two; nothing when
+  // the option was not given.
   std::optional<std::string> value(std::string_view option) const;
   std::string value(std::string_view option, const char *otherwise) const;
   // A whole number from `least` to `most`.
   std::optional<long> number(std::string_view option, long least, long most) const;
-  // Both values of an option that has two, with a blank between them.
   const std::vector<std::string> &operands() const { return operands_; }
   // What stands after "--", when that is there.
   const std::optional<std::vector<std::string>> &afterDashes() const { return afterDashes_; }

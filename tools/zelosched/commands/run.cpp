@@ -182,7 +182,7 @@ int runRun(int argc, char **argv) {
 }  // namespace
 
 const Command kRunCommand = {
-    "run", "ID... [--wait] [--output]", "run tasks now",
+    "run", "ID... [--wait] [--output] [--force]", "run tasks now",
     "Runs the tasks now, whatever their times say and also when they are disabled. A run\n"
     "waits for others that must not overlap with it, as always.\n"
     "\n"

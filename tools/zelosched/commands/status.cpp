@@ -334,10 +334,10 @@ const Command kStatusCommand = {
     "status", "", "say whether all is well",
     "Prints a line for each check: whether cron is running, whether the program that it\n"
     "starts is there and root's, whether another user is in the way of runs in /tmp, whether\n"
-    "a process keeps changes waiting, whether both copies of the tasks agree, whether the\n"
-    "crontab is in step with them, whether an enabled task has a fault, whether the clock is\n"
-    "armed for the next power-on time, which tasks are running, and which were due while the\n"
-    "machine was off.\n"
+    "a process keeps changes waiting, whether the copies of the tasks agree, whether each\n"
+    "task can be read, whether the crontab is in step with them and short enough for cron,\n"
+    "whether an enabled task has a fault, whether the clock is armed for the next power-on\n"
+    "time, which tasks are running, and which were due while the machine was off.\n"
     "\n"
     "Exit status: 0 when all is well, 1 when something is wrong.\n",
     runStatus};
