@@ -31,6 +31,17 @@ passes_on_status() {
   same "$(status_of "$sandbox" bash -c "exit $1")" "$1"
 }
 
+# In a clone nothing else is built.
+demonstration_builds_what_it_uses() {
+  local targets name names
+  targets=" $(sed -n 's,^"$root/scripts/build" ,,p' "$here/../scripts/demo") "
+  names=$(grep -hoE 'BUILD_DIR/(bin|tests)/[a-z_]+' "$here/../scripts/demo" "$here/support/start_cron.sh")
+  for name in ${names//BUILD_DIR\//}; do
+    name=${name##*/}
+    [[ $targets == *" $name "* ]] || { echo "$name is missing:$targets"; return 1; }
+  done
+}
+
 leaves_machine_alone() {
   local before
   before=$(machine_state)
@@ -127,6 +138,7 @@ check "orphans are reaped" reaps_orphans
 check "processes are private" same "$(in_sandbox 'grep -h ^Name: /proc/1/status')" "$(printf 'Name:\tbash')"
 check "a checkout below /tmp stays reachable and writable" keeps_checkout_below_tmp
 check "it starts quickly" starts_quickly
+check "the demonstration builds what it uses" demonstration_builds_what_it_uses
 if unshare --mount --propagation shared true 2>/dev/null; then
   check "nothing is mounted outside where mounts are shared" works_in_shared_mounts
 else
