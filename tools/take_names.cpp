@@ -22,7 +22,6 @@ namespace {
 
 constexpr const SchedSharedName *kNames[] = {&kSchedTaskProgram, &kSchedLockDirectory,
                                              &kSchedLockFile, &kSchedDatabase, &kSchedJournal};
-constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
 
 std::string contentsOf(const char *path) {
   std::ifstream file(path, std::ios::binary);
@@ -39,7 +38,7 @@ bool replace(const SchedSharedName &name) {
 
 // The one that is kept for the next boot is written first, so a store of ours is never ahead of it.
 bool replaceStore() {
-  const std::string kept = contentsOf(kPersistentCopy);
+  const std::string kept = contentsOf(kSchedPersistentStore);
   if (!kept.empty() && schedLookAt(kSchedStore, nullptr) == SchedNameState::kOurs &&
       contentsOf(kSchedStore.path) == kept) {
     return true;

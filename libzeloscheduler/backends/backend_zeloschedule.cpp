@@ -34,9 +34,9 @@ constexpr char kName[] = "zeloschedule";
 // Every read uses the working copy; the persistent one is there for the next boot, and the last
 // good one for when the power goes while that is written.
 constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
-constexpr char kPersistentCopy[] = "/usr/zelo/etc/scheduled_tasks";
+constexpr const auto &kPersistentCopy = kSchedPersistentStore;
 constexpr char kPersistentDirectory[] = "/usr/zelo/etc";
-constexpr char kLastGoodCopy[] = "/usr/zelo/etc/scheduled_tasks.last-good";
+constexpr const auto &kLastGoodCopy = kSchedLastGoodStore;
 constexpr char kScratchPrefix[] = "/tmp/scheduled_tasks.tmp";
 constexpr char kCopyProgram[] = "/bin/cp";
 constexpr mode_t kStoreMode = 0644;

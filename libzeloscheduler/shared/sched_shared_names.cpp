@@ -17,8 +17,6 @@ constexpr mode_t kReadableByAll = 0644;
 constexpr mode_t kOwnersOnly = 0600;  // whoever can open it can keep every run waiting
 constexpr mode_t kOpenDirectory = 0755;
 constexpr char kStorePath[] = "/tmp/scheduled_tasks";
-constexpr char kPersistentStore[] = "/usr/zelo/etc/scheduled_tasks";
-constexpr char kLastGoodStore[] = "/usr/zelo/etc/scheduled_tasks.last-good";
 // A store of no bytes beside a persistent copy that has some is one that was cut off, and is
 // refused.
 constexpr char kNoTasks[] = "# The scheduler's tasks.\n";
@@ -269,8 +267,8 @@ bool schedMakeAnew(const SchedSharedName &name) {
 bool schedAreTasksKept() {
   struct stat kept = {};
   struct stat lastGood = {};
-  return stat(kPersistentStore, &kept) == 0 &&
-         (kept.st_size > 0 || (stat(kLastGoodStore, &lastGood) == 0 && lastGood.st_size > 0));
+  return stat(kSchedPersistentStore, &kept) == 0 &&
+         (kept.st_size > 0 || (stat(kSchedLastGoodStore, &lastGood) == 0 && lastGood.st_size > 0));
 }
 
 void schedTakeNames() {

@@ -61,6 +61,11 @@ bool schedMoveAside(const SchedSharedName &name, SchedMovedTo *pMovedTo);
 // moved away when it is a directory. True when a new file of this process has the name.
 bool schedMakeAnew(const SchedSharedName &name);
 
+// The tasks for the next boot, and the same with the last change, for when the power goes while the
+// first is written.
+inline constexpr char kSchedPersistentStore[] = "/usr/zelo/etc/scheduled_tasks";
+inline constexpr char kSchedLastGoodStore[] = "/usr/zelo/etc/scheduled_tasks.last-good";
+
 // Whether tasks are kept for the next boot. A persistent copy without bytes was cut off, by a loss
 // of power, when there is a last good one.
 bool schedAreTasksKept();
