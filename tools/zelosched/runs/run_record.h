@@ -1,0 +1,45 @@
+// A run as the history tells of it.
+#pragma once
+
+#include <optional>
+#include <string>
+
+enum class Trigger { kSchedule, kManual, kCatchUp, kOther };
+enum class RunState { kWaiting, kRunning, kEnded };
+enum class Outcome {
+  kNone,  // it has not ended
+  kFinished,
+  kFailed,      // the command exited with another code than 0
+  kKilled,      // a signal ended it
+  kNotStarted,  // the command could not be started
+  kTimeLimit,
+  kGaveUp,     // it waited for other runs for too long
+  kCancelled,  // by 'stop', while it waited
+  kStopped,    // by 'stop', while it ran
+  kLost,       // its process is gone, and nobody saw how it ended
+};
+
+struct RunRecord {
+  long run = 0;  // its number in the history, which no other run ever gets
+  long task = 0;
+  std::string taskName;  // as it was when the run was noted
+  std::string app;
+  std::string owner;  // his name, or his number when he has none
+  Trigger trigger = Trigger::kOther;
+  RunState state = RunState::kWaiting;
+  Outcome outcome = Outcome::kNone;
+  // Moments, in seconds since the epoch.
+  std::optional<long> due;
+  std::optional<long> queued;
+  std::optional<long> start;
+  std::optional<long> end;
+  std::optional<double> duration;  // seconds, by a clock that nobody sets
+  std::optional<int> exitCode;
+  std::optional<int> signal;
+  long outputBytes = 0;  // all that it printed, also what was not kept
+};
+
+// "time-limit" and the like: the words of every output.
+const char *nameOf(Trigger trigger);
+const char *nameOf(RunState state);
+const char *nameOf(Outcome outcome);
