@@ -33,17 +33,26 @@ ProcessStat statOf(const std::string &pid) {
 
 }  // namespace
 
-std::map<pid_t, ProcessStat> children() {
+ProcessStat statOf(pid_t pid) {
+  return statOf(std::to_string(pid));
+}
+
+std::map<pid_t, ProcessStat> processes() {
   std::map<pid_t, ProcessStat> found;
   DIR *directory = opendir("/proc");
   if (directory == nullptr) return found;
   while (const dirent *entry = readdir(directory)) {
     const std::optional<long> pid = parseNumber(entry->d_name);
     if (!pid) continue;
-    const ProcessStat stat = statOf(entry->d_name);
-    if (stat.parent == getpid()) found[static_cast<pid_t>(*pid)] = stat;
+    found[static_cast<pid_t>(*pid)] = statOf(entry->d_name);
   }
   closedir(directory);
+  return found;
+}
+
+std::map<pid_t, ProcessStat> children() {
+  std::map<pid_t, ProcessStat> found = processes();
+  std::erase_if(found, [](const auto &process) { return process.second.parent != getpid(); });
   return found;
 }
 

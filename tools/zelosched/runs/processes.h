@@ -11,6 +11,10 @@ struct ProcessStat {
   unsigned long long started = 0;
 };
 
+ProcessStat statOf(pid_t pid);
+std::map<pid_t, ProcessStat> processes();
+
+// Ours.
 std::map<pid_t, ProcessStat> children();
 
 // What a command leaves behind becomes ours, and may be older than the next run's process. But it
