@@ -6,8 +6,8 @@
 
 #include "sched_report.h"
 
-// A plugin cannot veto a change: what it answers is logged, under the source location of the change, and
-// goes no further.
+// A plugin cannot veto a change: what it answers is logged, under the source location of the
+// change, and goes no further.
 class SchedHook {
  public:
   SchedHook(const char *szAction, const ZELO_SCHED_TASK *pOrg, const ZELO_SCHED_TASK *pNew)
