@@ -215,6 +215,14 @@ std::vector<KeptRun> lastRuns(const KeptDatabase &kept) {
   return runs;
 }
 
+std::map<Outcome, long> countByOutcome(const KeptDatabase &kept) {
+  std::map<Outcome, long> counts;
+  if (!kept.isThere()) return counts;
+  Query query(kept, "SELECT outcome, count(*) FROM run WHERE state = 2 GROUP BY outcome");
+  while (query.next()) counts[enumOf(query.number(0), Outcome::kLost)] += query.number(1);
+  return counts;
+}
+
 std::vector<KeptRun> keptRuns(const RunFilter &filter) {
   return runsOf(KeptDatabase(KeptDatabase::kRead), filter);
 }

@@ -2,6 +2,7 @@
 // into /usr/zelo/var/history.sqlite, and what every output about runs is made of.
 #pragma once
 
+#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -48,6 +49,9 @@ std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter);
 
 // The last run of each task of today: one row a task, however many runs there are.
 std::vector<KeptRun> lastRuns(const KeptDatabase &kept);
+
+// How many runs ended in which way.
+std::map<Outcome, long> countByOutcome(const KeptDatabase &kept);
 
 // As runsOf, in a look of its own; none when there is no history yet.
 std::vector<KeptRun> keptRuns(const RunFilter &filter);

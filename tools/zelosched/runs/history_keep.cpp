@@ -15,6 +15,7 @@
 #include "runs/runs.h"
 #include "runs/status_row.h"
 #include "runs/task_notes.h"
+#include "store/owner.h"
 #include "store/task_list.h"
 #include "store/task_program.h"
 #include "terminal/failure.h"
@@ -232,6 +233,39 @@ void tellOfRuns() {
   for (size_t i = 0; i < untold.size(); ++i) tellOfEnd(untold[i], outputs[i], false);
 }
 
+// Each time once, also when nobody was to be told of it then.
+std::vector<RunRecord> takeUntoldMissed(const KeptDatabase &kept, const TaskList &list) {
+  std::vector<RunRecord> untold;
+  const std::map<long, TaskNote> notes = taskNotes(kept);
+  Transaction transaction(kept);
+  for (const MissedTask &missed : missedTasks(kept, list, 0)) {
+    const auto note = notes.find(missed.task->ID);
+    if (missed.times == 0 || note == notes.end()) continue;
+    if (!noteTold(kept, "missed", note->second.generation, missed.due)) continue;
+    RunRecord record;
+    record.task = missed.task->ID;
+    record.taskName = missed.task->Name;
+    record.app = missed.task->App;
+    record.owner = userName(missed.task->Owner);
+    record.trigger = Trigger::kSchedule;
+    record.due = missed.due;
+    untold.push_back(std::move(record));
+  }
+  transaction.commit();
+  return untold;
+}
+
+void tellOfMissedRuns() {
+  const TaskList list(TaskList::Unreadable::kIsLeftOut);
+  std::vector<RunRecord> untold;
+  {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    if (!kept.isThere()) return;
+    untold = takeUntoldMissed(kept, list);
+  }
+  for (const RunRecord &record : untold) tellOfMissed(record);
+}
+
 void dropOld() {
   const KeptDatabase kept(KeptDatabase::kChange);
   Transaction transaction(kept);
@@ -247,8 +281,8 @@ void sweepRuns() {
 }
 
 int keepHistory() {
-  const int results[] = {attempt(sweepAndSay), attempt(markMachineUp), attempt(dropOld),
-                         attempt(tellOfRuns)};
+  const int results[] = {attempt(sweepAndSay), attempt([] { markMachineUp(false); }),
+                         attempt(dropOld), attempt(tellOfRuns), attempt(tellOfMissedRuns)};
   return *std::max_element(std::begin(results), std::end(results));
 }
 
