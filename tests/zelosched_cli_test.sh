@@ -91,7 +91,8 @@ print(status, size, resource.getrusage(resource.RUSAGE_CHILDREN).ru_maxrss < 100
 }
 
 start_zelosched_tests
-transcripts zelosched_usage zelosched_save zelosched_import zelosched_look zelosched_run zelosched_power zelosched_status
+transcripts zelosched_usage.txt zelosched_save.txt zelosched_import.txt zelosched_look.txt \
+  zelosched_run.txt zelosched_power.txt zelosched_status.txt
 check "nothing but what was shown is removed" nothing_but_what_was_shown_is_removed
 check "and a power time that was shown, whatever its place" a_power_time_that_was_shown_is_removed
 check "a run goes on when nobody reads its output any more" goes_on_when_the_reader_is_gone

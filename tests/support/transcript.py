@@ -20,8 +20,6 @@ called first.
 
   transcript.py LIBRARY FILE...            a line for each test, as shell_test.sh prints
   transcript.py --update LIBRARY FILE...   writes what was printed into the files, where it differs
-
-FILE is given without ".txt".
 """
 
 import difflib
@@ -81,7 +79,7 @@ class Test:
 def parse(path):
     """The comments and tests of a file in their order. What stands before a "==" is about that test."""
     parts, pending = [], []
-    with open(path + ".txt", encoding="utf-8", errors="surrogateescape") as file:
+    with open(path, encoding="utf-8", errors="surrogateescape") as file:
         for line in file.read().split("\n"):
             if line.startswith("== "):
                 parts += [pending, Test(line[3:])]
@@ -136,7 +134,7 @@ def update(library, path):
         if isinstance(test, Test) and not test.rows:
             for step, got in zip(test.steps, run(library, test.steps)):
                 step[1] = step[1] if matches(step[1], got) else got
-    with open(path + ".txt", "w", encoding="utf-8", errors="surrogateescape") as file:
+    with open(path, "w", encoding="utf-8", errors="surrogateescape") as file:
         lines = []
         for part in parts:
             if isinstance(part, list):
