@@ -1,4 +1,6 @@
 // zelosched catch-up
+#include <unistd.h>
+
 #include <cstdio>
 #include <ctime>
 
@@ -45,6 +47,8 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
     request.due = missed.due;
     request.isDisabledSkipped = true;
     const StartedRun run(*missed.task, request);
+    // The run may have to wait for its turn, unrecorded so far.
+    acknowledge(KeptDatabase(KeptDatabase::kChange), missed.task->ID);
   }
   std::printf("%s was due at %s: %s\n", titleOf(*missed.task).c_str(),
               minuteText(localMinute(missed.due)).c_str(),
@@ -53,6 +57,7 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
 
 int catchUpAll(const std::string &span, bool isDryRun) {
   const time_t since = time(nullptr) - parseSpan(span);
+  if (geteuid() == 0) sweepRuns();  // what other programs have run was not missed
   const TaskList list;
   std::vector<MissedTask> all = missedTasks(KeptDatabase(KeptDatabase::kRead), list, since);
   std::erase_if(all, [](const MissedTask &missed) { return missed.times == 0; });
