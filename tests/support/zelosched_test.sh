@@ -201,16 +201,17 @@ is_unchanged() {
 }
 
 # A program that every user can run, wherever the checkout lies: below root's home, say, which is
-# closed to others.
+# closed to others. One that counts what is run of it finds a place for that.
 readonly FOR_OTHERS=/run/for_others/zelosched
 copy_for_others() {
   local directory=${FOR_OTHERS%/*}
   mkdir -p "$directory"
+  mkdir -m 0777 "$directory/counts"
   cp "$BUILD_DIR"/lib/*.so* "$directory"
   cp "$ZELOSCHED" "$directory/zelosched.program"
   cat >"$FOR_OTHERS" <<SCRIPT
 #!/bin/sh
-LD_LIBRARY_PATH=$directory exec $directory/zelosched.program "\$@"
+GCOV_PREFIX=$directory/counts LD_LIBRARY_PATH=$directory exec $directory/zelosched.program "\$@"
 SCRIPT
   chmod -R a+rX "$directory"
   chmod a+x "$FOR_OTHERS"
@@ -312,7 +313,7 @@ elsewhere_zelosched() {
 # What is named like the files that a killed writer leaves
 scratch_names() {
   find /tmp /run /usr/zelo/etc -name '*.??????' -not -name 'zeloscheduler.*' -not -name '*.sqlite' |
-    grep -v "^$BUILD_DIR"
+    grep -v -e "^$BUILD_DIR" -e "^${FOR_OTHERS%/*}"
 }
 
 names_in_tmp() {
