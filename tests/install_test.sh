@@ -126,9 +126,9 @@ readonly -a new_task=(owner=65534 name=n cmd=true 'run hour=1' 'run min=2')
 
 # Owner, name, command, hour and minute of a stored task.
 stored_fields() {
-  with_library "$PREFIX/sbin/zelosched" export "$1" | python3 -c 'import json, sys
-task = json.load(sys.stdin)[0]
-print(*(task[key] for key in ("owner", "name", "cmd", "run hour", "run min")))'
+  with_library "$PREFIX/sbin/zelosched" show "$1" --json | python3 -c 'import json, sys
+task = json.load(sys.stdin)["tasks"][0]
+print(*(task[key] for key in ("owner_uid", "name", "command")), *(int(part) for part in task["schedule"]["at"].split(":")))'
 }
 
 # refused UID PAIR...: with status 1, and nothing stored is another one than before

@@ -485,7 +485,7 @@ has_all_tasks() {
 }
 
 task_count() {
-  in_root zelosched export | grep -c '"id"' || true
+  in_root zelosched list --power --json | grep -c '"id"' || true
 }
 
 # ---- the tests ----------------------------------------------------------------------------------

@@ -89,7 +89,7 @@ add() {
 }
 
 names() {
-  z list | awk 'NR > 1 { print $NF }' | sort | tr '\n' ' '
+  z list | awk 'NR > 1 { print $2 }' | sort | tr '\n' ' '
 }
 
 owner_and_mode() {

@@ -124,17 +124,6 @@ void Arguments::requireNoCommand() const {
   if (afterDashes_) throw UsageError("this command takes nothing after '--'");
 }
 
-std::vector<long> parseIds(const std::vector<std::string> &operands) {
-  std::vector<long> ids;
-  for (const std::string &operand : operands) {
-    const std::optional<long> id = parseNumber(operand);
-    if (!id || *id < 0) throw UsageError("'" + printable(operand) + "' is no task id");
-    if (std::find(ids.begin(), ids.end(), *id) == ids.end()) ids.push_back(*id);
-  }
-  if (ids.empty()) throw UsageError("which task? Give its id");
-  return ids;
-}
-
 int runWithOptions(const Command &command, int argc, char **argv) {
   char **const end = std::find_if(
       argv + 1, argv + argc, [](const char *word) { return strcmp(word, kEndOfOptions) == 0; });

@@ -6,8 +6,9 @@ namespace {
 
 constexpr const char *kTriggers[] = {"schedule", "manual", "catch-up", "other"};
 constexpr const char *kStates[] = {"waiting", "running", "ended"};
-constexpr const char *kOutcomes[] = {"",           "finished", "failed",    "killed",  "not-started",
-                                     "time-limit", "gave-up",  "cancelled", "stopped", "lost"};
+constexpr const char *kOutcomes[] = {
+    "",           "finished", "failed",    "killed",  "not-started",
+    "time-limit", "gave-up",  "cancelled", "stopped", "lost"};
 static_assert(std::size(kOutcomes) == static_cast<size_t>(Outcome::kLost) + 1);
 
 }  // namespace
