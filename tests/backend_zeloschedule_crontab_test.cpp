@@ -419,7 +419,7 @@ TEST_F(CrontabTest, AListThatCannotBeSortedIsReportedButNotPassedOn) {
   EXPECT_EQ(logged(),
             Lines{backendLine("failed to sort task list. [0x0100 sched_task_list_sort.cpp:N]")});
   EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
-  EXPECT_EQ(callCount("mkstemp"), 0U);
+  EXPECT_EQ(callCount("mkostemp"), 0U);
   EXPECT_EQ(recordedSystemCommands(), Lines{});
 }
 
@@ -445,7 +445,7 @@ TEST_F(CrontabTest, ACrontabThatCannotBeOpenedSetsNoCode) {
   failCallFor("open", kCrontab, {.error = EACCES});
   EXPECT_EQ(backend_.sync(), 1);
   EXPECT_EQ(logged(), Lines{backendLine("sync task list failed. [0x0000 :N]")});
-  EXPECT_EQ(callCount("mkstemp"), 0U);
+  EXPECT_EQ(callCount("mkostemp"), 0U);
 }
 
 TEST_F(CrontabTest, ACrontabThatIsADirectoryIsRefused) {
@@ -458,7 +458,7 @@ TEST_F(CrontabTest, ACrontabThatIsADirectoryIsRefused) {
             Lines{backendLine("sync task list failed. [0x0900 backend_zeloschedule.cpp:N]")});
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x0900, "backend_zeloschedule.cpp"}));
   EXPECT_TRUE(std::filesystem::is_directory(kCrontab));
-  EXPECT_EQ(callCount("mkstemp"), 0U);
+  EXPECT_EQ(callCount("mkostemp"), 0U);
 }
 
 // Without a store, the crontab's is the only fstat.
@@ -469,7 +469,7 @@ TEST_F(CrontabTest, AnFstatThatFailsIsReported) {
             Lines{backendLine("sync task list failed. [0x2700 backend_zeloschedule.cpp:N]")});
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x2700, "backend_zeloschedule.cpp"}));
   EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
-  EXPECT_EQ(callCount("mkstemp"), 0U);
+  EXPECT_EQ(callCount("mkostemp"), 0U);
 }
 
 // In the order in which they are called.
@@ -480,7 +480,7 @@ struct CallCase {
 };
 
 const CallCase kCalls[] = {
-    {"mkstemp", "/etc/crontab.", 0x0900},
+    {"mkostemp", "/etc/crontab.", 0x0900},
     {"fdopen", "w", 0x0900},
     {"getline", "", 0x0B00},
     {"fwrite", "", 0x0B00},
@@ -534,7 +534,7 @@ TEST_F(CrontabTest, AWholeSyncMakesEachCallOnce) {
   create();
   forget();
   EXPECT_EQ(backend_.sync(), 0);
-  for (const char *call : {"mkstemp", "fflush", "fchown", "fchmod", "rename"}) {
+  for (const char *call : {"mkostemp", "fflush", "fchown", "fchmod", "rename"}) {
     EXPECT_EQ(callCount(call), 1U) << call;
   }
   EXPECT_EQ(callCount("fsync"), 2U);  // the file and, after the rename, its directory
@@ -634,7 +634,7 @@ TEST_F(CrontabTest, ATemporaryFileThatCannotBecomeAStreamLeavesNoDescriptor) {
 
 TEST_F(CrontabTest, ACrontabThatCannotBeReplacedDoesNotFailAChange) {
   const Task task = makeTask("task", "true");
-  failCallFor("mkstemp", "/etc/crontab.", {.times = kAlways, .error = EROFS});
+  failCallFor("mkostemp", "/etc/crontab.", {.times = kAlways, .error = EROFS});
   EXPECT_EQ(backend_.create(task.get()), 0);
   EXPECT_EQ(backend_.edit(task.get()), 0);
   EXPECT_EQ(backend_.remove(task->ID), 1);
@@ -645,7 +645,7 @@ TEST_F(CrontabTest, ACrontabThatCannotBeReplacedDoesNotFailAChange) {
 }
 
 TEST_F(CrontabTest, TheNextChangeWritesTheCrontabWhole) {
-  failCallFor("mkstemp", "/etc/crontab.", {.error = EROFS});
+  failCallFor("mkostemp", "/etc/crontab.", {.error = EROFS});
   create();
   EXPECT_EQ(crontabLines(), Lines{});
   create();

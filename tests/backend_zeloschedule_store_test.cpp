@@ -1235,14 +1235,14 @@ TEST_F(StoreTest, AStepThatFailsOnTheWayToTheDiskFailsTheChange) {
   }
   support::resetFailingCalls();
   const std::pair<const char *, int> steps[] = {
-      {"mkstemp", 0x0900}, {"fdopen", 0x0900}, {"fflush", 0x0B00},
-      {"fchown", 0x0B00},  {"fclose", 0x0B00}, {"rename", 0x2800},
+      {"mkostemp", 0x0900}, {"fdopen", 0x0900}, {"fflush", 0x0B00},
+      {"fchown", 0x0B00},   {"fclose", 0x0B00}, {"rename", 0x2800},
   };
   for (const auto &[call, code] : steps) {
     SCOPED_TRACE(call);
     const std::string persistent = readFile(kPersistentStore);
     support::failCallFor(call,
-                         call == std::string("rename") || call == std::string("mkstemp")
+                         call == std::string("rename") || call == std::string("mkostemp")
                              ? support::kLastGoodStore
                              : "",
                          {.error = EIO});

@@ -14,9 +14,9 @@
 #include <memory>
 
 #include "id_array.h"
+#include "new_file.h"
 #include "sched_guards.h"
 #include "sched_hash.h"
-#include "sched_new_file.h"
 #include "sched_record.h"
 #include "sched_report.h"
 #include "sched_shared_names.h"
@@ -26,6 +26,7 @@
 #include "sched_trigger_clock.h"
 #include "sched_wait_status.h"
 #include "schedule_cron.h"
+#include "store_state.h"
 
 namespace {
 
@@ -58,38 +59,6 @@ class SectionName {
  private:
   char text_[32];
 };
-
-off_t sizeOf(const char *szPath) {
-  struct stat info = {};
-  return stat(szPath, &info) == 0 ? info.st_size : 0;
-}
-
-// A store without bytes was cut off by a copy that was killed when tasks are kept. Nobody must
-// build on that, nor take it for a store without tasks.
-bool isCutToNothing(const char *szStore) {
-  return sizeOf(szStore) == 0 && schedAreTasksKept();
-}
-
-// What there is to be read or built on. A process of root's moves away what another user has put
-// there. The tasks that are kept for the next boot must then be put back before any is changed,
-// since the persistent copy is written as a whole: the store is made as one that is cut off.
-SchedNameState lookAtStore() {
-  const SchedNameState state = schedLookAt(kSchedStore, nullptr);
-  if (state != SchedNameState::kForeign || geteuid() != 0) {
-    return state;
-  }
-  return schedTakeName(schedAreTasksKept() ? kSchedStoreToRestore : kSchedStore)
-             ? SchedNameState::kOurs
-             : state;
-}
-
-// A process that only reads takes the name all the same: while it is free, another user can move a
-// file of root's there. There are no tasks then, before and after.
-void takeFreeStore() {
-  if (geteuid() == 0) {
-    schedTakeName(kSchedStore);
-  }
-}
 
 // ---- reading the store --------------------------------------------------------------------------
 
@@ -127,7 +96,7 @@ class StoreWalk {
  public:
   // The number of sections, 0 without a store; -1 when they cannot be listed or memory is short.
   int open() {
-    state_ = lookAtStore();
+    state_ = schedLookAtStore();
     if (state_ == SchedNameState::kFree) {
       return 0;
     }
@@ -141,7 +110,7 @@ class StoreWalk {
       return -1;
     }
     sections_ = QLIBCFileEnumSection(kWorkingCopy, names_.handle());
-    if (sections_ == 0 && isCutToNothing(kWorkingCopy)) {
+    if (sections_ == 0 && schedIsCutToNothing(kWorkingCopy)) {
       SCHED_SET_ERROR(kErrIo);
       return -1;
     }
@@ -209,7 +178,7 @@ int list_get(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter) {
     return -1;
   }
   if (!walk.isStored()) {
-    takeFreeStore();
+    schedTakeFreeStore();
     return 0;
   }
   SchedRecordSource records(sections);
@@ -243,9 +212,9 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
   }
   pTask->State = ZELO_SCHED_STATE_NOT_EXISTED;
   pTask->Backend = ZELO_SCHED_BACKEND_SCHEDULE;
-  const SchedNameState state = lookAtStore();
+  const SchedNameState state = schedLookAtStore();
   if (state == SchedNameState::kFree) {
-    takeFreeStore();
+    schedTakeFreeStore();
     return kNotFound;
   }
   const SectionName section(id);
@@ -255,7 +224,7 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
     return -1;
   }
   const int read = readSection(section.c_str(), &hash);
-  if (read == kNotFound && isCutToNothing(kWorkingCopy)) {
+  if (read == kNotFound && schedIsCutToNothing(kWorkingCopy)) {
     SCHED_SET_ERROR(kErrIo);
     SCHED_LOG_CALLEE("Get section [%s] from [%s] failed. ", section.c_str(), kWorkingCopy);
     return -1;
@@ -351,14 +320,14 @@ int copyWorkingCopy(const ScratchFile &scratch) {
     if (copyFile(kWorkingCopy, scratch.path()) < 0) {
       return -1;
     }
-    const off_t size = sizeOf(scratch.path());
+    const off_t size = schedSizeOf(scratch.path());
     const bool mayBeEmpty = !schedAreTasksKept();  // where only the name is taken
-    if (size == sizeOf(kWorkingCopy) && (size > 0 || mayBeEmpty)) {
+    if (size == schedSizeOf(kWorkingCopy) && (size > 0 || mayBeEmpty)) {
       return 0;
     }
     usleep(kPause);
   }
-  if (isCutToNothing(scratch.path())) {
+  if (schedIsCutToNothing(scratch.path())) {
     SCHED_SET_ERROR(kErrIo);
     return reportCopy(kWorkingCopy, scratch.path());
   }
@@ -472,7 +441,7 @@ int publish(const ScratchFile &scratch) {
 int write_store(long id, const ZELO_SCHED_TASK *pTask) {
   const ScratchFile scratch;
   const SectionName section(id);
-  const SchedNameState state = lookAtStore();
+  const SchedNameState state = schedLookAtStore();
   if (state == SchedNameState::kForeign) {
     SCHED_SET_ERROR(kErrOpen);
     return reportCopy(kWorkingCopy, scratch.path());
@@ -507,7 +476,7 @@ int keepOtherLines(FILE *old, NewFile *crontab) {
   while (result == 0 && (length = getline(&buffer, &capacity, old)) >= 0) {
     const auto count = static_cast<size_t>(length);
     if (memmem(buffer, count, kSchedCronProgram, strlen(kSchedCronProgram)) == nullptr) {
-      result = crontab->write(buffer, count);
+      result = crontab->write({buffer, count});
     }
   }
   free(buffer);
@@ -527,8 +496,7 @@ int addTaskLines(const ZELO_SCHED_TASK *pTask, NewFile *crontab) {
       SCHED_LOG_CALLEE("Failed to convert task [%ld] to cron line. ", static_cast<long>(pTask->ID));
       return -1;
     }
-    if (crontab->endLine() < 0 || crontab->write(line.text, strlen(line.text)) < 0 ||
-        crontab->write("\n", 1) < 0) {
+    if (crontab->writeLine(line.text) < 0) {
       return -1;
     }
   }

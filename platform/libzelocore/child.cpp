@@ -30,13 +30,13 @@ ChildStatusGuard::~ChildStatusGuard() {
 }
 
 Launch::Launch() noexcept {
-  Note(posix_spawnattr_init(&attributes_));
-  Note(posix_spawn_file_actions_init(&actions_));
+  note(posix_spawnattr_init(&attributes_));
+  note(posix_spawn_file_actions_init(&actions_));
   sigset_t signals;
   sigfillset(&signals);
-  Note(posix_spawnattr_setsigdefault(&attributes_, &signals));
+  note(posix_spawnattr_setsigdefault(&attributes_, &signals));
   sigemptyset(&signals);
-  Note(posix_spawnattr_setsigmask(&attributes_, &signals));
+  note(posix_spawnattr_setsigmask(&attributes_, &signals));
 }
 
 Launch::~Launch() {
@@ -44,25 +44,25 @@ Launch::~Launch() {
   posix_spawnattr_destroy(&attributes_);
 }
 
-void Launch::InOwnGroup() noexcept {
+void Launch::inOwnGroup() noexcept {
   flags_ |= POSIX_SPAWN_SETPGROUP;
-  Note(posix_spawnattr_setpgroup(&attributes_, 0));
+  note(posix_spawnattr_setpgroup(&attributes_, 0));
 }
 
-void Launch::Open(int fd, const char *path, int flags) noexcept {
-  Note(posix_spawn_file_actions_addopen(&actions_, fd, path, flags, 0));
+void Launch::open(int fd, const char *path, int flags) noexcept {
+  note(posix_spawn_file_actions_addopen(&actions_, fd, path, flags, 0));
 }
 
-void Launch::CloseFrom(int fd) noexcept {
-  Note(posix_spawn_file_actions_addclosefrom_np(&actions_, fd));
+void Launch::closeFrom(int fd) noexcept {
+  note(posix_spawn_file_actions_addclosefrom_np(&actions_, fd));
 }
 
-void Launch::ChangeDirectory(const char *path) noexcept {
-  Note(posix_spawn_file_actions_addchdir_np(&actions_, path));
+void Launch::changeDirectory(const char *path) noexcept {
+  note(posix_spawn_file_actions_addchdir_np(&actions_, path));
 }
 
-pid_t Launch::Start(const char *path, char *const *argv, char *const *envp) noexcept {
-  Note(posix_spawnattr_setflags(&attributes_, flags_));
+pid_t Launch::start(const char *path, char *const *argv, char *const *envp) noexcept {
+  note(posix_spawnattr_setflags(&attributes_, flags_));
   pid_t pid = -1;
   if (failed_ || posix_spawn(&pid, path, &actions_, &attributes_, argv, envp) != 0) {
     return -1;
@@ -70,7 +70,7 @@ pid_t Launch::Start(const char *path, char *const *argv, char *const *envp) noex
   return pid;
 }
 
-bool WaitForChild(pid_t pid, int *status) noexcept {
+bool waitForChild(pid_t pid, int *status) noexcept {
   pid_t waited;
   do {
     waited = waitpid(pid, status, 0);
@@ -78,7 +78,7 @@ bool WaitForChild(pid_t pid, int *status) noexcept {
   return waited == pid;
 }
 
-int ExitCode(int status) noexcept {
+int exitCode(int status) noexcept {
   constexpr int kSignalBase = 128;
   return WIFEXITED(status) ? WEXITSTATUS(status) : kSignalBase + WTERMSIG(status);
 }

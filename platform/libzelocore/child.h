@@ -1,7 +1,4 @@
-/*
- * Starting a program and learning how it ended, whatever the caller does with
- * its own signals.
- */
+// Starting a program and learning how it ended, whatever the caller does with its own signals.
 #ifndef ZELOCORE_CHILD_H
 #define ZELOCORE_CHILD_H
 
@@ -11,12 +8,11 @@
 
 namespace zelo {
 
-/* While it lives, a child that ends waits for us to take its status. A process
- * that ignores SIGCHLD, or has children reaped unseen, would lose it, so the
- * default action stands in for that long; and the signal is held back from this
- * thread, lest the caller's handler takes the status first. Children of the
- * caller that end meanwhile are the price: one that it would have ignored stays
- * a zombie until the caller ends. */
+// While it lives, a child that ends waits for us to take its status. A process that ignores
+// SIGCHLD, or has children reaped unseen, would lose it, so the default action stands in for that
+// long; and the signal is held back from this thread, lest the caller's handler takes the status
+// first. Children of the caller that end meanwhile are the price: one that it would have ignored
+// stays a zombie until the caller ends.
 class ChildStatusGuard {
  public:
   ChildStatusGuard() noexcept;
@@ -30,9 +26,9 @@ class ChildStatusGuard {
   sigset_t mask_{};
 };
 
-/* How a program starts: default actions for every signal and none blocked, as
- * if from a shell. posix_spawn shares the caller's memory until the program
- * runs, so a large caller starts one as fast as a small one. */
+// How a program starts: default actions for every signal and none blocked, as if from a shell.
+// posix_spawn shares the caller's memory until the program runs, so a large caller starts one as
+// fast as a small one.
 class Launch {
  public:
   Launch() noexcept;
@@ -40,17 +36,17 @@ class Launch {
   Launch &operator=(const Launch &) = delete;
   ~Launch();
 
-  void InOwnGroup() noexcept;
-  /* The start fails when one of these does. */
-  void Open(int fd, const char *path, int flags) noexcept;
-  void CloseFrom(int fd) noexcept;
-  void ChangeDirectory(const char *path) noexcept;
+  void inOwnGroup() noexcept;
+  // The start fails when one of these does.
+  void open(int fd, const char *path, int flags) noexcept;
+  void closeFrom(int fd) noexcept;
+  void changeDirectory(const char *path) noexcept;
 
-  /* The child, or -1 when nothing was started. */
-  pid_t Start(const char *path, char *const *argv, char *const *envp) noexcept;
+  // The child, or -1 when nothing was started.
+  pid_t start(const char *path, char *const *argv, char *const *envp) noexcept;
 
  private:
-  void Note(int error) noexcept { failed_ = failed_ || error != 0; }
+  void note(int error) noexcept { failed_ = failed_ || error != 0; }
 
   posix_spawnattr_t attributes_;
   posix_spawn_file_actions_t actions_;
@@ -58,11 +54,11 @@ class Launch {
   bool failed_ = false;
 };
 
-/* Waits for the child. False when its status went to someone else. */
-bool WaitForChild(pid_t pid, int *status) noexcept;
+// Waits for the child. False when its status went to someone else.
+bool waitForChild(pid_t pid, int *status) noexcept;
 
-/* As a shell gives it: the exit status, or 128 and the signal's number. */
-int ExitCode(int status) noexcept;
+// As a shell gives it: the exit status, or 128 and the signal's number.
+int exitCode(int status) noexcept;
 
 }  // namespace zelo
 

@@ -1,6 +1,4 @@
-/*
- * The process-wide error record.
- */
+// The process-wide error record.
 #include <algorithm>
 #include <cstring>
 
@@ -8,8 +6,8 @@
 
 namespace {
 
-/* Base names of source files; a longer text is cut, since setting the record
- * must work when memory is short. */
+// Base names of source files; a longer text is cut, since setting the record must work when memory
+// is short.
 constexpr size_t kFileRoom = 256;
 
 struct ErrorRecord {
@@ -18,7 +16,7 @@ struct ErrorRecord {
   char file[kFileRoom];
 };
 
-ErrorRecord g_record;
+ErrorRecord gRecord;
 
 }  // namespace
 
@@ -26,21 +24,21 @@ void QLIBCErrSetEx(int code, const char *szFile, int line) {
   const char *file = szFile != nullptr ? szFile : "";
   const size_t size = std::min(std::strlen(file), kFileRoom - 1);
 
-  g_record.code = code;
-  g_record.line = line;
-  /* A caller may hand the record's own text back. */
-  std::memmove(g_record.file, file, size);
-  g_record.file[size] = '\0';
+  gRecord.code = code;
+  gRecord.line = line;
+  // A caller may hand the record's own text back.
+  std::memmove(gRecord.file, file, size);
+  gRecord.file[size] = '\0';
 }
 
 int QLIBCErrGet(void) {
-  return g_record.code;
+  return gRecord.code;
 }
 
 const char *QLIBCErrorGetFile(void) {
-  return g_record.file;
+  return gRecord.file;
 }
 
 int QLIBCErrorGetLine(void) {
-  return g_record.line;
+  return gRecord.line;
 }

@@ -1,6 +1,4 @@
-/*
- * Files as a whole: whether one is there, and making an empty one.
- */
+// Files as a whole: whether one is there, and making an empty one.
 #include <fcntl.h>
 #include <sys/stat.h>
 
@@ -10,23 +8,22 @@
 
 namespace {
 
-/* Never writable by others, whatever the caller's mask says: what is kept in
- * these files is run with its owner's rights. */
+// Never writable by others, whatever the caller's mask says: what is kept in these files is run
+// with its owner's rights.
 constexpr mode_t kNewFileMode = 0644;
-/* A FIFO or a device under the name must neither hang nor become the terminal. */
+// A FIFO or a device under the name must neither hang nor become the terminal.
 constexpr int kOpenFlags = O_WRONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
 
-/* Creating and opening are two steps because the kernel refuses O_CREAT on
- * someone else's file in a sticky directory, even where it may be written. */
-int OpenOrCreate(const char *path) {
+// Creating and opening are two steps because the kernel refuses O_CREAT on someone else's file in
+// a sticky directory, even where it may be written.
+int openOrCreate(const char *path) {
   const int fd = open(path, kOpenFlags | O_CREAT | O_EXCL, kNewFileMode);
   return fd < 0 && errno == EEXIST ? open(path, kOpenFlags) : fd;
 }
 
 }  // namespace
 
-/* A look that failed says nothing: what may be there must not be taken for missing
- * and made anew. */
+// A look that failed says nothing: what may be there must not be taken for missing and made anew.
 int QLIBCFileExist(const char *szPath) {
   struct stat status;
   if (szPath == nullptr) {
@@ -37,13 +34,13 @@ int QLIBCFileExist(const char *szPath) {
 
 int QLIBCFileTouch(const char *szPath) {
   if (szPath == nullptr) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  const zelo::Descriptor file(OpenOrCreate(szPath));
+  const zelo::Descriptor file(openOrCreate(szPath));
   struct stat status;
   if (!file.valid() || fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode) ||
       futimens(file.get(), nullptr) != 0) {
-    return zelo::Fail(QLIBC_ERR_OPEN);
+    return zelo::fail(QLIBC_ERR_OPEN);
   }
   return 0;
 }

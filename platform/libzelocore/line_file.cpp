@@ -6,15 +6,15 @@
 
 namespace zelo {
 
-int ReadLineFile(const std::string &path, FileContents *file) {
-  return ReadFile(path, O_NOFOLLOW, file);
+int readLineFile(const std::string &path, FileContents *file) {
+  return readFile(path, O_NOFOLLOW, file);
 }
 
-int WriteLineFile(const std::string &path, const FileContents &file) {
-  return ReplaceFile(path, file.text, &file.status, Durability::kSynced);
+int writeLineFile(const std::string &path, const FileContents &file) {
+  return replaceFile(path, file.text, &file.status, Durability::kSynced);
 }
 
-LineRange FindLine(const std::string &text, std::string_view key) noexcept {
+LineRange findLine(const std::string &text, std::string_view key) noexcept {
   const size_t at = text.find(key);
   if (at == std::string::npos) {
     return {0, 0, false};
@@ -25,7 +25,7 @@ LineRange FindLine(const std::string &text, std::string_view key) noexcept {
           after == std::string::npos ? text.size() : after + 1, true};
 }
 
-void AppendLine(std::string *text, std::string_view line) {
+void appendLine(std::string *text, std::string_view line) {
   if (!text->empty() && text->back() != '\n') {
     text->push_back('\n');
   }

@@ -1,6 +1,4 @@
-/*
- * Text files of lines, which are changed one line at a time.
- */
+// Text files of lines, which are changed one line at a time.
 #ifndef ZELOCORE_LINE_FILE_H
 #define ZELOCORE_LINE_FILE_H
 
@@ -11,25 +9,24 @@
 
 namespace zelo {
 
-/* Reads a regular file; a link is refused, for a change would replace the link
- * and not the file. 0, or -1 (0x0900, 0x0B00). */
-int ReadLineFile(const std::string &path, FileContents *file);
+// Reads a regular file; a link is refused, for a change would replace the link and not the file.
+// 0, or -1 (0x0900, 0x0B00).
+int readLineFile(const std::string &path, FileContents *file);
 
-/* Writes it back as a whole, on the disk when the call returns. 0, or -1
- * (0x0900, 0x0B00, 0x2800). */
-int WriteLineFile(const std::string &path, const FileContents &file);
+// Writes it back as a whole, on the disk when the call returns. 0, or -1 (0x0900, 0x0B00, 0x2800).
+int writeLineFile(const std::string &path, const FileContents &file);
 
 struct LineRange {
   size_t begin;
-  size_t end; /* past the line feed, if it has one */
+  size_t end;  // past the line feed, if it has one
   bool found;
 };
 
-/* The first line that holds the key, which must not be empty. */
-LineRange FindLine(const std::string &text, std::string_view key) noexcept;
+// The first line that holds the key, which must not be empty.
+LineRange findLine(const std::string &text, std::string_view key) noexcept;
 
-/* Appends a line, also to a text whose last line has no line feed. */
-void AppendLine(std::string *text, std::string_view line);
+// Appends a line, also to a text whose last line has no line feed.
+void appendLine(std::string *text, std::string_view line);
 
 }  // namespace zelo
 

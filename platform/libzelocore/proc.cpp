@@ -1,7 +1,4 @@
-/*
- * Processes: running a program, leaving a child to itself, and telling whether
- * a process lives.
- */
+// Processes: running a program, leaving a child to itself, and telling whether a process lives.
 #include <fcntl.h>
 #include <signal.h>
 #include <sys/types.h>
@@ -18,35 +15,35 @@
 
 namespace {
 
-/* With the program itself; more is a list whose end was forgotten. */
+// With the program itself; more is a list whose end was forgotten.
 constexpr size_t kMostArguments = 256;
 
-int RunAndWait(const char *program, char *const *argv) noexcept {
+int runAndWait(const char *program, char *const *argv) noexcept {
   const zelo::ChildStatusGuard guard;
   zelo::Launch launch;
-  const pid_t pid = launch.Start(program, argv, environ);
+  const pid_t pid = launch.start(program, argv, environ);
   int status = 0;
-  if (pid < 0 || !zelo::WaitForChild(pid, &status)) {
-    return zelo::Fail(QLIBC_ERR_SYSTEM);
+  if (pid < 0 || !zelo::waitForChild(pid, &status)) {
+    return zelo::fail(QLIBC_ERR_SYSTEM);
   }
-  return zelo::ExitCode(status);
+  return zelo::exitCode(status);
 }
 
-/* In the process between: forks the one that stays and tells the caller how it
- * went, through the pipe because an exit status is lost on a caller that
- * ignores SIGCHLD. Returns in the process that stays only. */
-void ForkAndLeave(int report) noexcept {
+// In the process between: forks the one that stays and tells the caller how it went, through the
+// pipe because an exit status is lost on a caller that ignores SIGCHLD. Returns in the process
+// that stays only.
+void forkAndLeave(int report) noexcept {
   const pid_t pid = fork();
   if (pid == 0) {
     return;
   }
   const char forked = pid > 0 ? 1 : 0;
   const ssize_t written = write(report, &forked, sizeof forked);
-  /* Not exit: the buffers and exit handlers are the caller's. */
+  // Not exit: the buffers and exit handlers are the caller's.
   _exit(written == sizeof forked ? EXIT_SUCCESS : EXIT_FAILURE);
 }
 
-bool ReportsSuccess(int report) noexcept {
+bool reportsSuccess(int report) noexcept {
   char forked = 0;
   ssize_t count;
   do {
@@ -55,16 +52,16 @@ bool ReportsSuccess(int report) noexcept {
   return count == sizeof forked && forked != 0;
 }
 
-bool Exists(pid_t pid) noexcept {
+bool exists(pid_t pid) noexcept {
   return kill(pid, 0) == 0 || errno == EPERM;
 }
 
 enum class Life { kUnknown, kAlive, kDead };
 
-/* As the kernel's status page of the process tells it: the letter of its state,
- * and whether the number is that of a process and not of one of its threads. */
-Life LifeOnStatusPage(pid_t pid) noexcept {
-  constexpr size_t kRoom = 512; /* both lines are among the first */
+// As the kernel's status page of the process tells it: the letter of its state, and whether the
+// number is that of a process and not of one of its threads.
+Life lifeOnStatusPage(pid_t pid) noexcept {
+  constexpr size_t kRoom = 512;  // both lines are among the first
   char path[sizeof "/proc//status" + 3 * sizeof pid];
   std::snprintf(path, sizeof path, "/proc/%ld/status", static_cast<long>(pid));
   const zelo::Descriptor file(open(path, O_RDONLY | O_CLOEXEC));
@@ -89,7 +86,7 @@ Life LifeOnStatusPage(pid_t pid) noexcept {
 
 int QLIBCExec(const char *szProgram, ...) {
   if (szProgram == nullptr) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
   char *argv[kMostArguments + 1] = {const_cast<char *>(szProgram)};
   size_t count = 1;
@@ -100,11 +97,11 @@ int QLIBCExec(const char *szProgram, ...) {
   }
   va_end(arguments);
   if (count > kMostArguments) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  const int status = RunAndWait(szProgram, argv);
+  const int status = runAndWait(szProgram, argv);
   if (status > 0) {
-    zelo::Fail(QLIBC_ERR_SYSTEM);
+    zelo::fail(QLIBC_ERR_SYSTEM);
   }
   return status;
 }
@@ -112,33 +109,33 @@ int QLIBCExec(const char *szProgram, ...) {
 int QLIBCProcForkChildNoWait(void) {
   int report[2];
   if (pipe2(report, O_CLOEXEC) != 0) {
-    return zelo::Fail(QLIBC_ERR_SYSTEM);
+    return zelo::fail(QLIBC_ERR_SYSTEM);
   }
   zelo::Descriptor reading(report[0]);
   zelo::Descriptor writing(report[1]);
   const pid_t between = fork();
   if (between == 0) {
-    ForkAndLeave(writing.get());
+    forkAndLeave(writing.get());
     return 0;
   }
-  /* Or the end of the pipe would never be seen. */
-  writing.Close();
-  if (between < 0 || !ReportsSuccess(reading.get())) {
+  // Or the end of the pipe would never be seen.
+  writing.close();
+  if (between < 0 || !reportsSuccess(reading.get())) {
     if (between > 0) {
-      zelo::WaitForChild(between, nullptr);
+      zelo::waitForChild(between, nullptr);
     }
-    return zelo::Fail(QLIBC_ERR_SYSTEM);
+    return zelo::fail(QLIBC_ERR_SYSTEM);
   }
-  /* Fails where the caller's settings had it reaped already, which serves too. */
-  zelo::WaitForChild(between, nullptr);
+  // Fails where the caller's settings had it reaped already, which serves too.
+  zelo::waitForChild(between, nullptr);
   return 1;
 }
 
 int QLIBCProcAlive(pid_t pid) {
-  if (pid <= 0 || !Exists(pid)) {
+  if (pid <= 0 || !exists(pid)) {
     return 0;
   }
-  const Life life = LifeOnStatusPage(pid);
-  /* Without a page it has just ended, or it is hidden from us. */
-  return life == Life::kAlive || (life == Life::kUnknown && Exists(pid)) ? 1 : 0;
+  const Life life = lifeOnStatusPage(pid);
+  // Without a page it has just ended, or it is hidden from us.
+  return life == Life::kAlive || (life == Life::kUnknown && exists(pid)) ? 1 : 0;
 }

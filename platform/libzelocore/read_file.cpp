@@ -8,18 +8,18 @@
 namespace zelo {
 namespace {
 
-/* Far above any file of the platform, and below what would exhaust the machine. */
+// Far above any file of the platform, and below what would exhaust the machine.
 constexpr off_t kMostFileBytes = off_t{1} << 30;
 
-bool SameTime(const timespec &a, const timespec &b) noexcept {
+bool sameTime(const timespec &a, const timespec &b) noexcept {
   return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec;
 }
 
 }  // namespace
 
-bool ReadAll(int fd, size_t expected, std::string *contents) {
+bool readAll(int fd, size_t expected, std::string *contents) {
   constexpr size_t kLeastStep = 4096;
-  contents->resize(expected + 1); /* the one more sees the end without another step */
+  contents->resize(expected + 1);  // the one more sees the end without another step
   for (size_t size = 0;;) {
     if (size == contents->size()) {
       contents->resize(size + size / 2 + kLeastStep);
@@ -39,30 +39,30 @@ bool ReadAll(int fd, size_t expected, std::string *contents) {
   }
 }
 
-bool SameContents(const struct stat &a, const struct stat &b) noexcept {
+bool sameContents(const struct stat &a, const struct stat &b) noexcept {
   return a.st_dev == b.st_dev && a.st_ino == b.st_ino && a.st_size == b.st_size &&
-         SameTime(a.st_mtim, b.st_mtim) && SameTime(a.st_ctim, b.st_ctim);
+         sameTime(a.st_mtim, b.st_mtim) && sameTime(a.st_ctim, b.st_ctim);
 }
 
-int ReadFile(const std::string &path, int flags, FileContents *file, Place where) {
-  /* Not blocking, for a FIFO would hang the open. */
+int readFile(const std::string &path, int flags, FileContents *file, Place where) {
+  // Not blocking, for a FIFO would hang the open.
   const Descriptor opened(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
   if (!opened.valid()) {
-    return Fail(QLIBC_ERR_OPEN, where);
+    return fail(QLIBC_ERR_OPEN, where);
   }
   if (fstat(opened.get(), &file->status) != 0) {
-    return Fail(QLIBC_ERR_IO, where);
+    return fail(QLIBC_ERR_IO, where);
   }
   if (!S_ISREG(file->status.st_mode)) {
-    return Fail(QLIBC_ERR_OPEN, where);
+    return fail(QLIBC_ERR_OPEN, where);
   }
   struct stat after;
   if (file->status.st_size > kMostFileBytes ||
-      !ReadAll(opened.get(), static_cast<size_t>(file->status.st_size), &file->text) ||
+      !readAll(opened.get(), static_cast<size_t>(file->status.st_size), &file->text) ||
       fstat(opened.get(), &after) != 0) {
-    return Fail(QLIBC_ERR_IO, where);
+    return fail(QLIBC_ERR_IO, where);
   }
-  file->steady = SameContents(file->status, after);
+  file->steady = sameContents(file->status, after);
   return 0;
 }
 

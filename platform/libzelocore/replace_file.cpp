@@ -14,7 +14,7 @@ namespace {
 constexpr mode_t kNewFileMode = 0644;
 constexpr mode_t kModeBits = 07777;
 
-/* The file being written; removed unless it took its final name. */
+// The file being written; removed unless it took its final name.
 class Temporary {
  public:
   explicit Temporary(const std::string &beside)
@@ -32,7 +32,7 @@ class Temporary {
   bool exists() const noexcept { return exists_; }
   Descriptor &file() noexcept { return file_; }
 
-  bool RenameTo(const std::string &path) noexcept {
+  bool renameTo(const std::string &path) noexcept {
     if (std::rename(name_.c_str(), path.c_str()) != 0) {
       return false;
     }
@@ -46,7 +46,7 @@ class Temporary {
   bool exists_ = false;
 };
 
-bool WriteAll(int fd, std::string_view contents) noexcept {
+bool writeAll(int fd, std::string_view contents) noexcept {
   while (!contents.empty()) {
     const ssize_t written = write(fd, contents.data(), contents.size());
     if (written < 0 && errno == EINTR) {
@@ -60,30 +60,29 @@ bool WriteAll(int fd, std::string_view contents) noexcept {
   return true;
 }
 
-/* The mask can only be read by setting it; the stricter one stands for the
- * moment in between. */
-mode_t CurrentMask() noexcept {
+// The mask can only be read by setting it; the stricter one stands for the moment in between.
+mode_t currentMask() noexcept {
   constexpr mode_t kStrict = 0077;
   const mode_t mask = umask(kStrict);
   umask(mask);
   return mask;
 }
 
-/* The owner goes first: changing it clears mode bits. */
-bool TakeOver(int fd, const struct stat *old) noexcept {
+// The owner goes first: changing it clears mode bits.
+bool takeOver(int fd, const struct stat *old) noexcept {
   if (old == nullptr) {
-    return fchmod(fd, kNewFileMode & ~CurrentMask()) == 0;
+    return fchmod(fd, kNewFileMode & ~currentMask()) == 0;
   }
   struct stat made;
   if (fstat(fd, &made) != 0) {
     return false;
   }
-  const bool same_owner = made.st_uid == old->st_uid && made.st_gid == old->st_gid;
-  return (same_owner || fchown(fd, old->st_uid, old->st_gid) == 0) &&
+  const bool sameOwner = made.st_uid == old->st_uid && made.st_gid == old->st_gid;
+  return (sameOwner || fchown(fd, old->st_uid, old->st_gid) == 0) &&
          fchmod(fd, old->st_mode & kModeBits) == 0;
 }
 
-std::string DirectoryOf(const std::string &path) {
+std::string directoryOf(const std::string &path) {
   const size_t slash = path.rfind('/');
   if (slash == std::string::npos) {
     return ".";
@@ -91,30 +90,30 @@ std::string DirectoryOf(const std::string &path) {
   return slash == 0 ? "/" : path.substr(0, slash);
 }
 
-bool SyncDirectoryOf(const std::string &path) {
-  const Descriptor directory(open(DirectoryOf(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+bool syncDirectoryOf(const std::string &path) {
+  const Descriptor directory(open(directoryOf(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
   return directory.valid() && fsync(directory.get()) == 0;
 }
 
 }  // namespace
 
-int ReplaceFile(const std::string &path, std::string_view contents, const struct stat *old,
+int replaceFile(const std::string &path, std::string_view contents, const struct stat *old,
                 Durability durability) {
   const bool synced = durability == Durability::kSynced;
   Temporary temporary(path);
   if (!temporary.exists()) {
-    return Fail(QLIBC_ERR_OPEN);
+    return fail(QLIBC_ERR_OPEN);
   }
   const int fd = temporary.file().get();
-  if (!TakeOver(fd, old) || !WriteAll(fd, contents) || (synced && fsync(fd) != 0) ||
-      !temporary.file().Close()) {
-    return Fail(QLIBC_ERR_IO);
+  if (!takeOver(fd, old) || !writeAll(fd, contents) || (synced && fsync(fd) != 0) ||
+      !temporary.file().close()) {
+    return fail(QLIBC_ERR_IO);
   }
-  if (!temporary.RenameTo(path)) {
-    return Fail(QLIBC_ERR_RENAME);
+  if (!temporary.renameTo(path)) {
+    return fail(QLIBC_ERR_RENAME);
   }
-  if (synced && !SyncDirectoryOf(path)) {
-    return Fail(QLIBC_ERR_IO);
+  if (synced && !syncDirectoryOf(path)) {
+    return fail(QLIBC_ERR_IO);
   }
   return 0;
 }

@@ -8,27 +8,27 @@
 namespace zelo {
 namespace {
 
-constexpr bool IsCommentMark(char c) noexcept {
+constexpr bool isCommentMark(char c) noexcept {
   return c == '#' || c == ';';
 }
 
-constexpr bool IsControl(char c) noexcept {
+constexpr bool isControl(char c) noexcept {
   constexpr unsigned char kFirstPrintable = 0x20;
   constexpr unsigned char kDelete = 0x7f;
   const auto byte = static_cast<unsigned char>(c);
   return byte < kFirstPrintable || byte == kDelete;
 }
 
-bool HasBlankEdge(std::string_view text) noexcept {
-  return IsBlank(text.front()) || IsBlank(text.back());
+bool hasBlankEdge(std::string_view text) noexcept {
+  return isBlank(text.front()) || isBlank(text.back());
 }
 
-/* A line with a bracket in front that names no section is no key either. */
-bool IsNoKeyLine(std::string_view trimmed) noexcept {
-  return IsCommentOrEmpty(trimmed) || trimmed.front() == '[';
+// A line with a bracket in front that names no section is no key either.
+bool isNoKeyLine(std::string_view trimmed) noexcept {
+  return isCommentOrEmpty(trimmed) || trimmed.front() == '[';
 }
 
-/* ---- escapes ---- */
+// ---- escapes ----
 
 struct Escape {
   char letter;
@@ -39,11 +39,11 @@ constexpr Escape kEscapes[] = {
     {'"', '"'}, {'\\', '\\'}, {'n', '\n'}, {'t', '\t'}, {'r', '\r'},
 };
 
-void AppendQuoted(std::string &out, std::string_view value) {
+void appendQuoted(std::string &out, std::string_view value) {
   constexpr char kDigits[] = "0123456789abcdef";
   out.push_back('"');
   for (const char c : value) {
-    if (!IsControl(c) && c != '"' && c != '\\') {
+    if (!isControl(c) && c != '"' && c != '\\') {
       out.push_back(c);
       continue;
     }
@@ -62,11 +62,11 @@ void AppendQuoted(std::string &out, std::string_view value) {
   out.push_back('"');
 }
 
-/* The byte that the escape at the front of `text` stands for, which is removed.
- * False, with nothing removed, for anything that is not an escape: it stands as
- * it is then, and so does an escaped zero, which no text can hold. */
-bool TakeEscape(std::string_view &text, char *byte) noexcept {
-  constexpr size_t kHexSize = 4; /* \xNN */
+// The byte that the escape at the front of `text` stands for, which is removed. False, with
+// nothing removed, for anything that is not an escape: it stands as it is then, and so does an
+// escaped zero, which no text can hold.
+bool takeEscape(std::string_view &text, char *byte) noexcept {
+  constexpr size_t kHexSize = 4;  // \xNN
   if (text.size() < 2) {
     return false;
   }
@@ -91,12 +91,12 @@ bool TakeEscape(std::string_view &text, char *byte) noexcept {
   return true;
 }
 
-/* Reads on past the opening quote. False when the closing one is missing. */
-bool Unquote(std::string_view text, std::string &value) {
+// Reads on past the opening quote. False when the closing one is missing.
+bool unquote(std::string_view text, std::string &value) {
   value.clear();
   while (!text.empty() && text.front() != '"') {
     char byte = text.front();
-    if (byte != '\\' || !TakeEscape(text, &byte)) {
+    if (byte != '\\' || !takeEscape(text, &byte)) {
       text.remove_prefix(1);
     }
     value.push_back(byte);
@@ -104,110 +104,110 @@ bool Unquote(std::string_view text, std::string &value) {
   return !text.empty();
 }
 
-/* A text for C ends at its first zero byte. */
-std::string_view UpToZero(std::string_view text) noexcept {
+// A text for C ends at its first zero byte.
+std::string_view upToZero(std::string_view text) noexcept {
   return text.substr(0, text.find('\0'));
 }
 
 struct KeyLine {
   std::string_view key;
-  std::string_view value; /* as it stands there */
+  std::string_view value;  // as it stands there
 };
 
-/* No key for a line that gives none. */
-KeyLine ParseKeyLine(std::string_view line) noexcept {
-  const std::string_view trimmed = Trim(line);
+// No key for a line that gives none.
+KeyLine parseKeyLine(std::string_view line) noexcept {
+  const std::string_view trimmed = trim(line);
   const size_t equals = trimmed.find('=');
-  if (IsNoKeyLine(trimmed) || equals == std::string_view::npos) {
+  if (isNoKeyLine(trimmed) || equals == std::string_view::npos) {
     return {};
   }
-  return {Trim(trimmed.substr(0, equals)), TrimLeft(trimmed.substr(equals + 1))};
+  return {trim(trimmed.substr(0, equals)), trimLeft(trimmed.substr(equals + 1))};
 }
 
-/* As in a section with neither escapes nor zero bytes. */
-void ReadPlainLine(const KeyLine &line, QLIBC_SZHASH &hash) {
+// As in a section with neither escapes nor zero bytes.
+void readPlainLine(const KeyLine &line, QLIBC_SZHASH &hash) {
   const bool quoted = line.value.starts_with('"');
   const size_t quote = quoted ? line.value.find('"', 1) : line.value.size();
   if (!line.key.empty() && quote != std::string_view::npos) {
-    hash.Set(line.key, line.value.substr(quoted ? 1 : 0, quote - (quoted ? 1 : 0)));
+    hash.set(line.key, line.value.substr(quoted ? 1 : 0, quote - (quoted ? 1 : 0)));
   }
 }
 
-void ReadAnyLine(const KeyLine &line, QLIBC_SZHASH &hash, std::string &scratch) {
-  const std::string_view key = Trim(UpToZero(line.key));
+void readAnyLine(const KeyLine &line, QLIBC_SZHASH &hash, std::string &scratch) {
+  const std::string_view key = trim(upToZero(line.key));
   std::string_view value = line.value;
   if (value.starts_with('"')) {
-    if (!Unquote(value.substr(1), scratch)) {
+    if (!unquote(value.substr(1), scratch)) {
       return;
     }
     value = scratch;
   }
   if (!key.empty()) {
-    hash.Set(key, UpToZero(value));
+    hash.set(key, upToZero(value));
   }
 }
 
 }  // namespace
 
-size_t LineEnd(std::string_view text, size_t from) noexcept {
+size_t lineEnd(std::string_view text, size_t from) noexcept {
   const size_t feed = text.find('\n', from);
   return feed == std::string_view::npos ? text.size() : feed + 1;
 }
 
-std::string_view LineAt(std::string_view text, size_t begin, size_t end) noexcept {
+std::string_view lineAt(std::string_view text, size_t begin, size_t end) noexcept {
   const size_t feed = end > begin && text[end - 1] == '\n' ? 1 : 0;
   return text.substr(begin, end - begin - feed);
 }
 
-bool IsSectionName(std::string_view name) noexcept {
-  return !name.empty() && !HasBlankEdge(name) && name.find(']') == std::string_view::npos &&
-         std::none_of(name.begin(), name.end(), IsControl);
+bool isSectionName(std::string_view name) noexcept {
+  return !name.empty() && !hasBlankEdge(name) && name.find(']') == std::string_view::npos &&
+         std::none_of(name.begin(), name.end(), isControl);
 }
 
-bool IsSectionKey(std::string_view key) noexcept {
-  return !key.empty() && !HasBlankEdge(key) && !IsNoKeyLine(key) &&
-         key.find('=') == std::string_view::npos && std::none_of(key.begin(), key.end(), IsControl);
+bool isSectionKey(std::string_view key) noexcept {
+  return !key.empty() && !hasBlankEdge(key) && !isNoKeyLine(key) &&
+         key.find('=') == std::string_view::npos && std::none_of(key.begin(), key.end(), isControl);
 }
 
-bool IsCommentOrEmpty(std::string_view trimmed) noexcept {
-  return trimmed.empty() || IsCommentMark(trimmed.front());
+bool isCommentOrEmpty(std::string_view trimmed) noexcept {
+  return trimmed.empty() || isCommentMark(trimmed.front());
 }
 
-bool ParseSectionLine(std::string_view trimmed, std::string_view *name) noexcept {
+bool parseSectionLine(std::string_view trimmed, std::string_view *name) noexcept {
   const size_t close = trimmed.find(']');
   if (trimmed.empty() || trimmed.front() != '[' || close == std::string_view::npos ||
-      !IsCommentOrEmpty(TrimLeft(trimmed.substr(close + 1)))) {
+      !isCommentOrEmpty(trimLeft(trimmed.substr(close + 1)))) {
     return false;
   }
-  *name = Trim(UpToZero(trimmed.substr(1, close - 1)));
+  *name = trim(upToZero(trimmed.substr(1, close - 1)));
   return !name->empty();
 }
 
-/* One look over the section spares two at each of its lines. */
-void ReadKeys(std::string_view body, QLIBC_SZHASH &hash) {
+// One look over the section spares two at each of its lines.
+void readKeys(std::string_view body, QLIBC_SZHASH &hash) {
   const bool plain =
       body.find('\\') == std::string_view::npos && body.find('\0') == std::string_view::npos;
   std::string scratch;
   for (size_t at = 0; at < body.size();) {
-    const size_t next = LineEnd(body, at);
-    const KeyLine line = ParseKeyLine(LineAt(body, at, next));
+    const size_t next = lineEnd(body, at);
+    const KeyLine line = parseKeyLine(lineAt(body, at, next));
     if (plain) {
-      ReadPlainLine(line, hash);
+      readPlainLine(line, hash);
     } else {
-      ReadAnyLine(line, hash, scratch);
+      readAnyLine(line, hash, scratch);
     }
     at = next;
   }
 }
 
-std::string SectionOf(std::string_view name, const QLIBC_SZHASH &hash) {
+std::string sectionOf(std::string_view name, const QLIBC_SZHASH &hash) {
   const std::map<std::string_view, std::string_view> sorted(hash.entries().begin(),
                                                             hash.entries().end());
   std::string out("[");
   out.append(name).append("]\n");
   for (const auto &[key, value] : sorted) {
     out.append(key).push_back('=');
-    AppendQuoted(out, value);
+    appendQuoted(out, value);
     out.push_back('\n');
   }
   return out;

@@ -1,6 +1,4 @@
-/*
- * The lines of a section file: what they say, and how a section is written.
- */
+// The lines of a section file: what they say, and how a section is written.
 #ifndef ZELOCORE_SECTION_LINE_H
 #define ZELOCORE_SECTION_LINE_H
 
@@ -12,45 +10,44 @@
 
 namespace zelo {
 
-/* The carriage return is blank so that files edited elsewhere read the same. */
-constexpr bool IsBlank(char c) noexcept {
+// The carriage return is blank so that files edited elsewhere read the same.
+constexpr bool isBlank(char c) noexcept {
   return c == ' ' || c == '\t' || c == '\r';
 }
 
-constexpr std::string_view TrimLeft(std::string_view text) noexcept {
-  while (!text.empty() && IsBlank(text.front())) {
+constexpr std::string_view trimLeft(std::string_view text) noexcept {
+  while (!text.empty() && isBlank(text.front())) {
     text.remove_prefix(1);
   }
   return text;
 }
 
-constexpr std::string_view Trim(std::string_view text) noexcept {
-  text = TrimLeft(text);
-  while (!text.empty() && IsBlank(text.back())) {
+constexpr std::string_view trim(std::string_view text) noexcept {
+  text = trimLeft(text);
+  while (!text.empty() && isBlank(text.back())) {
     text.remove_suffix(1);
   }
   return text;
 }
 
-/* Up to and with the line feed, or to the end of the text. */
-size_t LineEnd(std::string_view text, size_t from) noexcept;
-/* The line that lies from `begin` to `end`, without its line feed. */
-std::string_view LineAt(std::string_view text, size_t begin, size_t end) noexcept;
+// Up to and with the line feed, or to the end of the text.
+size_t lineEnd(std::string_view text, size_t from) noexcept;
+// The line that lies from `begin` to `end`, without its line feed.
+std::string_view lineAt(std::string_view text, size_t begin, size_t end) noexcept;
 
-/* Can stand between the brackets and be read back. */
-bool IsSectionName(std::string_view name) noexcept;
-/* Can stand before the equals sign and be read back. */
-bool IsSectionKey(std::string_view key) noexcept;
+// Can stand between the brackets and be read back.
+bool isSectionName(std::string_view name) noexcept;
+// Can stand before the equals sign and be read back.
+bool isSectionKey(std::string_view key) noexcept;
 
-bool IsCommentOrEmpty(std::string_view trimmed) noexcept;
-/* False for a line that gives no name: it is an ordinary line then. */
-bool ParseSectionLine(std::string_view trimmed, std::string_view *name) noexcept;
-/* Sets every key of the lines behind the section's name. A line that gives none is
- * passed over. */
-void ReadKeys(std::string_view body, QLIBC_SZHASH &hash);
+bool isCommentOrEmpty(std::string_view trimmed) noexcept;
+// False for a line that gives no name: it is an ordinary line then.
+bool parseSectionLine(std::string_view trimmed, std::string_view *name) noexcept;
+// Sets every key of the lines behind the section's name. A line that gives none is passed over.
+void readKeys(std::string_view body, QLIBC_SZHASH &hash);
 
-/* The lines of a section: its name, and all keys in the order of the alphabet. */
-std::string SectionOf(std::string_view name, const QLIBC_SZHASH &hash);
+// The lines of a section: its name, and all keys in the order of the alphabet.
+std::string sectionOf(std::string_view name, const QLIBC_SZHASH &hash);
 
 }  // namespace zelo
 

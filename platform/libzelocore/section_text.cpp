@@ -8,22 +8,22 @@
 namespace zelo {
 
 SectionText::SectionText(std::string contents) : contents_(std::move(contents)) {
-  form_ = Judge();
+  form_ = judge();
 }
 
-/* Brackets are rare beside bytes, so the search is for them, and whether one
- * begins its line is looked up backwards. */
-void SectionText::IndexSections() {
+// Brackets are rare beside bytes, so the search is for them, and whether one begins its line is
+// looked up backwards.
+void SectionText::indexSections() {
   const std::string_view text = contents_;
   for (size_t at = text.find('[', start_); at != std::string_view::npos;) {
     size_t begin = at;
-    while (begin > start_ && IsBlank(text[begin - 1])) {
+    while (begin > start_ && isBlank(text[begin - 1])) {
       --begin;
     }
-    const size_t end = LineEnd(text, at);
-    const bool begins_line = begin == start_ || text[begin - 1] == '\n';
+    const size_t end = lineEnd(text, at);
+    const bool beginsLine = begin == start_ || text[begin - 1] == '\n';
     std::string_view name;
-    if (begins_line && ParseSectionLine(Trim(LineAt(text, at, end)), &name)) {
+    if (beginsLine && parseSectionLine(trim(lineAt(text, at, end)), &name)) {
       if (!sections_.empty()) {
         sections_.back().end = begin;
       }
@@ -31,13 +31,13 @@ void SectionText::IndexSections() {
     }
     at = text.find('[', end);
   }
-  first_of_name_.reserve(sections_.size());
+  firstOfName_.reserve(sections_.size());
   for (size_t i = 0; i < sections_.size(); ++i) {
-    first_of_name_.emplace(sections_[i].name, i);
+    firstOfName_.emplace(sections_[i].name, i);
   }
 }
 
-SectionForm SectionText::Judge() {
+SectionForm SectionText::judge() {
   const std::string_view text = contents_;
   if (text.empty()) {
     return SectionForm::kEmpty;
@@ -45,41 +45,41 @@ SectionForm SectionText::Judge() {
   if (text.size() < kHeader.size() && kHeader.starts_with(text)) {
     return SectionForm::kCutOff;
   }
-  const size_t first_line = LineEnd(text, 0);
-  const bool headed = Trim(LineAt(text, 0, first_line)) == LineAt(kHeader, 0, kHeader.size());
-  start_ = headed ? first_line : 0;
-  IndexSections();
+  const size_t firstLine = lineEnd(text, 0);
+  const bool headed = trim(lineAt(text, 0, firstLine)) == lineAt(kHeader, 0, kHeader.size());
+  start_ = headed ? firstLine : 0;
+  indexSections();
 
-  trailer_ = FindTrailer(text, start_);
+  trailer_ = findTrailer(text, start_);
   if (!headed) {
     return SectionForm::kPlain;
   }
   return trailer_ ? SectionForm::kSealed : SectionForm::kCutOff;
 }
 
-SectionForm SectionText::Form() const noexcept {
-  return form_ == SectionForm::kSealed && !TrailerAgrees(*trailer_, contents_, sections_.size())
+SectionForm SectionText::form() const noexcept {
+  return form_ == SectionForm::kSealed && !trailerAgrees(*trailer_, contents_, sections_.size())
              ? SectionForm::kEdited
              : form_;
 }
 
-const Section *SectionText::Find(std::string_view name) const {
-  const auto found = first_of_name_.find(name);
-  return found == first_of_name_.end() ? nullptr : &sections_[found->second];
+const Section *SectionText::find(std::string_view name) const {
+  const auto found = firstOfName_.find(name);
+  return found == firstOfName_.end() ? nullptr : &sections_[found->second];
 }
 
-void SectionText::Read(const Section &section, QLIBC_SZHASH &hash) const {
-  ReadKeys(std::string_view(contents_).substr(section.body, section.end - section.body), hash);
+void SectionText::read(const Section &section, QLIBC_SZHASH &hash) const {
+  readKeys(std::string_view(contents_).substr(section.body, section.end - section.body), hash);
 }
 
-/* Comments and blank lines that stand right before the next section are about
- * that one, and stay when this one is replaced or removed. */
-size_t SectionText::EndOfReplaced(const Section &section) const noexcept {
+// Comments and blank lines that stand right before the next section are about that one, and stay
+// when this one is replaced or removed.
+size_t SectionText::endOfReplaced(const Section &section) const noexcept {
   const std::string_view text = contents_;
   size_t end = section.body;
   for (size_t at = section.body; at < section.end;) {
-    const size_t next = LineEnd(text, at);
-    if (!IsCommentOrEmpty(Trim(LineAt(text, at, next)))) {
+    const size_t next = lineEnd(text, at);
+    if (!isCommentOrEmpty(trim(lineAt(text, at, next)))) {
       end = next;
     }
     at = next;
@@ -87,43 +87,42 @@ size_t SectionText::EndOfReplaced(const Section &section) const noexcept {
   return end;
 }
 
-/* The old trailer is the one line that is never kept. A last line without a line feed
- * gets one. */
-void SectionText::Keep(std::string *changed, size_t begin, size_t end) const {
+// The old trailer is the one line that is never kept. A last line without a line feed gets one.
+void SectionText::keep(std::string *changed, size_t begin, size_t end) const {
   const std::string_view text = contents_;
-  const size_t trailer_begin = std::clamp(trailer_ ? trailer_->begin : end, begin, end);
-  const size_t trailer_end = std::clamp(trailer_ ? trailer_->end : end, begin, end);
-  changed->append(text.substr(begin, trailer_begin - begin));
-  changed->append(text.substr(trailer_end, end - trailer_end));
+  const size_t trailerBegin = std::clamp(trailer_ ? trailer_->begin : end, begin, end);
+  const size_t trailerEnd = std::clamp(trailer_ ? trailer_->end : end, begin, end);
+  changed->append(text.substr(begin, trailerBegin - begin));
+  changed->append(text.substr(trailerEnd, end - trailerEnd));
   if (changed->back() != '\n') {
     changed->push_back('\n');
   }
 }
 
-/* The text with other lines between `begin` and `end`, of so many sections. */
-std::string SectionText::Replaced(size_t begin, size_t end, std::string_view made,
+// The text with other lines between `begin` and `end`, of so many sections.
+std::string SectionText::replaced(size_t begin, size_t end, std::string_view made,
                                   size_t sections) const {
   std::string changed;
   changed.reserve(contents_.size() + made.size() + 2 * kHeader.size());
   changed += kHeader;
-  Keep(&changed, start_, begin);
+  keep(&changed, start_, begin);
   changed += made;
-  Keep(&changed, end, contents_.size());
-  changed += TrailerOf(changed, sections);
+  keep(&changed, end, contents_.size());
+  changed += trailerOf(changed, sections);
   return changed;
 }
 
-std::string SectionText::WithSet(const Section &section, const QLIBC_SZHASH &hash) const {
-  return Replaced(section.begin, EndOfReplaced(section), SectionOf(section.name, hash),
+std::string SectionText::withSet(const Section &section, const QLIBC_SZHASH &hash) const {
+  return replaced(section.begin, endOfReplaced(section), sectionOf(section.name, hash),
                   sections_.size());
 }
 
-std::string SectionText::WithAdded(std::string_view name, const QLIBC_SZHASH &hash) const {
-  return Replaced(contents_.size(), contents_.size(), SectionOf(name, hash), sections_.size() + 1);
+std::string SectionText::withAdded(std::string_view name, const QLIBC_SZHASH &hash) const {
+  return replaced(contents_.size(), contents_.size(), sectionOf(name, hash), sections_.size() + 1);
 }
 
-std::string SectionText::WithRemoved(const Section &section) const {
-  return Replaced(section.begin, EndOfReplaced(section), "", sections_.size() - 1);
+std::string SectionText::withRemoved(const Section &section) const {
+  return replaced(section.begin, endOfReplaced(section), "", sections_.size() - 1);
 }
 
 }  // namespace zelo

@@ -17,7 +17,7 @@ constexpr size_t kChecksumDigits = 16;
 constexpr size_t kRoom = 96;
 
 template <typename Number>
-bool TakeNumber(std::string_view &text, Number *number, int base) noexcept {
+bool takeNumber(std::string_view &text, Number *number, int base) noexcept {
   const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), *number, base);
   if (error != std::errc()) {
     return false;
@@ -26,7 +26,7 @@ bool TakeNumber(std::string_view &text, Number *number, int base) noexcept {
   return true;
 }
 
-bool TakeText(std::string_view &text, std::string_view expected) noexcept {
+bool takeText(std::string_view &text, std::string_view expected) noexcept {
   if (!text.starts_with(expected)) {
     return false;
   }
@@ -34,24 +34,24 @@ bool TakeText(std::string_view &text, std::string_view expected) noexcept {
   return true;
 }
 
-bool ParseTrailer(std::string_view line, Trailer *trailer) noexcept {
-  return TakeText(line, kStart) && TakeNumber(line, &trailer->sections, 10) &&
-         TakeText(line, kMiddle) && Trim(line).size() == kChecksumDigits &&
-         TakeNumber(line, &trailer->checksum, 16) && Trim(line).empty();
+bool parseTrailer(std::string_view line, Trailer *trailer) noexcept {
+  return takeText(line, kStart) && takeNumber(line, &trailer->sections, 10) &&
+         takeText(line, kMiddle) && trim(line).size() == kChecksumDigits &&
+         takeNumber(line, &trailer->checksum, 16) && trim(line).empty();
 }
 
-uint64_t Checksum(std::string_view text) noexcept {
+uint64_t checksum(std::string_view text) noexcept {
   return XXH3_64bits(text.data(), text.size());
 }
 
 }  // namespace
 
-std::optional<Trailer> FindTrailer(std::string_view text, size_t from) noexcept {
+std::optional<Trailer> findTrailer(std::string_view text, size_t from) noexcept {
   size_t at = text.rfind(kStart);
   while (at != std::string_view::npos && at >= from) {
-    Trailer trailer{.begin = at, .end = LineEnd(text, at), .sections = 0, .checksum = 0};
-    const bool begins_line = at == 0 || text[at - 1] == '\n';
-    if (begins_line && ParseTrailer(LineAt(text, at, trailer.end), &trailer)) {
+    Trailer trailer{.begin = at, .end = lineEnd(text, at), .sections = 0, .checksum = 0};
+    const bool beginsLine = at == 0 || text[at - 1] == '\n';
+    if (beginsLine && parseTrailer(lineAt(text, at, trailer.end), &trailer)) {
       return trailer;
     }
     at = at == 0 ? std::string_view::npos : text.rfind(kStart, at - 1);
@@ -59,15 +59,15 @@ std::optional<Trailer> FindTrailer(std::string_view text, size_t from) noexcept 
   return std::nullopt;
 }
 
-bool TrailerAgrees(const Trailer &trailer, std::string_view text, size_t sections) noexcept {
+bool trailerAgrees(const Trailer &trailer, std::string_view text, size_t sections) noexcept {
   return trailer.end == text.size() && trailer.sections == sections &&
-         trailer.checksum == Checksum(text.substr(0, trailer.begin));
+         trailer.checksum == checksum(text.substr(0, trailer.begin));
 }
 
-std::string TrailerOf(std::string_view text, size_t sections) {
+std::string trailerOf(std::string_view text, size_t sections) {
   char line[kRoom];
   const int size = std::snprintf(line, sizeof line, kFormat, sections,
-                                 static_cast<unsigned long long>(Checksum(text)));
+                                 static_cast<unsigned long long>(checksum(text)));
   return {line, static_cast<size_t>(size)};
 }
 

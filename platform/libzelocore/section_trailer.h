@@ -1,7 +1,5 @@
-/*
- * The header and the trailer of a section file, two comments by which a reader
- * tells a whole file from one that was cut off or edited by hand.
- */
+// The header and the trailer of a section file, two comments by which a reader tells a whole file
+// from one that was cut off or edited by hand.
 #ifndef ZELOCORE_SECTION_TRAILER_H
 #define ZELOCORE_SECTION_TRAILER_H
 
@@ -16,20 +14,20 @@ namespace zelo {
 inline constexpr std::string_view kHeader = "# zelo section file\n";
 
 struct Trailer {
-  size_t begin; /* of its line */
+  size_t begin;  // of its line
   size_t end;
   size_t sections;
-  uint64_t checksum; /* of all that stands before it */
+  uint64_t checksum;  // of all that stands before it
 };
 
-/* The last one that begins at `from` or behind it. What a hand appended may follow,
- * so any line can be it. */
-std::optional<Trailer> FindTrailer(std::string_view text, size_t from) noexcept;
+// The last one that begins at `from` or behind it. What a hand appended may follow, so any line
+// can be it.
+std::optional<Trailer> findTrailer(std::string_view text, size_t from) noexcept;
 
-/* Whether the text, of so many sections, is the one that the trailer was made for. */
-bool TrailerAgrees(const Trailer &trailer, std::string_view text, size_t sections) noexcept;
+// Whether the text, of so many sections, is the one that the trailer was made for.
+bool trailerAgrees(const Trailer &trailer, std::string_view text, size_t sections) noexcept;
 
-std::string TrailerOf(std::string_view text, size_t sections);
+std::string trailerOf(std::string_view text, size_t sections);
 
 }  // namespace zelo
 

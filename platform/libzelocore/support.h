@@ -1,7 +1,5 @@
-/*
- * What every unit of the library shares: reporting a failure, stopping
- * exceptions at the C boundary, and the guard of a file descriptor.
- */
+// What every unit of the library shares: reporting a failure, stopping exceptions at the C
+// boundary, and the guard of a file descriptor.
 #ifndef ZELOCORE_SUPPORT_H
 #define ZELOCORE_SUPPORT_H
 
@@ -15,34 +13,33 @@
 
 namespace zelo {
 
-/* A line of the source: that of the outermost caller, where it is a default
- * argument. */
+// A line of the source: that of the outermost caller, where it is a default argument.
 struct Place {
   const char *file;
   int line;
 
-  static constexpr Place Here(const char *file = __builtin_FILE(),
+  static constexpr Place here(const char *file = __builtin_FILE(),
                               int line = __builtin_LINE()) noexcept {
     return {file, line};
   }
 };
 
-/* Sets the error record to the caller's own file and line; always -1, so that
- * a failing function can return the call. */
-inline int Fail(int code, Place where = Place::Here()) noexcept {
+// Sets the error record to the caller's own file and line; always -1, so that a failing function
+// can return the call.
+inline int fail(int code, Place where = Place::here()) noexcept {
   const char *slash = std::strrchr(where.file, '/');
   QLIBCErrSetEx(code, slash != nullptr ? slash + 1 : where.file, where.line);
   return -1;
 }
 
-/* Runs the body of an exported function. The containers throw only for want of
- * memory (bad_alloc, length_error), hence the one code. */
+// Runs the body of an exported function. The containers throw only for want of memory (bad_alloc,
+// length_error), hence the one code.
 template <typename Result, typename Body>
-Result AtBoundary(Result failed, Body &&body, Place where = Place::Here()) noexcept {
+Result atBoundary(Result failed, Body &&body, Place where = Place::here()) noexcept {
   try {
     return std::forward<Body>(body)();
   } catch (const std::exception &) {
-    Fail(QLIBC_ERR_OUT_OF_MEMORY, where);
+    fail(QLIBC_ERR_OUT_OF_MEMORY, where);
     return failed;
   }
 }
@@ -52,13 +49,13 @@ class Descriptor {
   explicit Descriptor(int fd) noexcept : fd_(fd) {}
   Descriptor(const Descriptor &) = delete;
   Descriptor &operator=(const Descriptor &) = delete;
-  ~Descriptor() { Close(); }
+  ~Descriptor() { close(); }
 
   bool valid() const noexcept { return fd_ >= 0; }
   int get() const noexcept { return fd_; }
 
-  /* For writers: some file systems report a full disk only here. */
-  bool Close() noexcept { return fd_ < 0 || close(std::exchange(fd_, -1)) == 0; }
+  // For writers: some file systems report a full disk only here.
+  bool close() noexcept { return fd_ < 0 || ::close(std::exchange(fd_, -1)) == 0; }
 
  private:
   int fd_;

@@ -1,7 +1,5 @@
-/*
- * The inside of a text hash, for the units that fill one or write one out
- * without going through zero-terminated texts.
- */
+// The inside of a text hash, for the units that fill one or write one out without going through
+// zero-terminated texts.
 #ifndef ZELOCORE_SZHASH_H
 #define ZELOCORE_SZHASH_H
 
@@ -13,7 +11,7 @@
 
 #include "zelocore.h"
 
-/* Most keys differ in their length, and need no comparison of texts then. */
+// Most keys differ in their length, and need no comparison of texts then.
 struct ShorterFirst {
   using is_transparent = void;
   bool operator()(std::string_view a, std::string_view b) const noexcept {
@@ -21,15 +19,15 @@ struct ShorterFirst {
   }
 };
 
-/* Ordered: keys come from outside (members of a JSON text, say), and nobody can
- * choose any that take longer to find than others. One block of memory serves for all
- * entries of a task, and is given back when the hash is emptied. */
+// Ordered: keys come from outside (members of a JSON text, say), and nobody can choose any that
+// take longer to find than others. One block of memory serves for all entries of a task, and is
+// given back when the hash is emptied.
 struct QLIBC_SZHASH {
  public:
-  /* The texts may lie in this very hash. Throws std::bad_alloc, and leaves the hash
-   * as it was then. */
-  void Set(std::string_view key, std::string_view value);
-  void Clear() noexcept;
+  // The texts may lie in this very hash. Throws std::bad_alloc, and leaves the hash as it was
+  // then.
+  void set(std::string_view key, std::string_view value);
+  void clear() noexcept;
 
   const auto &entries() const noexcept { return entries_; }
 

@@ -1,6 +1,4 @@
-/*
- * Text lists: one arena of texts and where each begins.
- */
+// Text lists: one arena of texts and where each begins.
 #include "szlist.h"
 
 #include <algorithm>
@@ -9,7 +7,7 @@
 
 namespace {
 
-/* A caller's guess at the capacity reserves no more than this. */
+// A caller's guess at the capacity reserves no more than this.
 constexpr size_t kMostReserved = 64;
 constexpr size_t kExpectedTextSize = 16;
 
@@ -21,7 +19,7 @@ QLIBC_SZLIST::QLIBC_SZLIST(size_t capacity) {
   arena_.reserve(kExpectedTextSize * reserved);
 }
 
-void QLIBC_SZLIST::Push(std::string_view text) {
+void QLIBC_SZLIST::push(std::string_view text) {
   const size_t start = arena_.size();
   starts_.push_back(start);
   try {
@@ -34,7 +32,7 @@ void QLIBC_SZLIST::Push(std::string_view text) {
   }
 }
 
-void QLIBC_SZLIST::Truncate(size_t count) noexcept {
+void QLIBC_SZLIST::truncate(size_t count) noexcept {
   if (count < starts_.size()) {
     arena_.resize(starts_[count]);
     starts_.resize(count);
@@ -42,16 +40,16 @@ void QLIBC_SZLIST::Truncate(size_t count) noexcept {
 }
 
 PSZLIST QLIBCSzListAlloc(int capacity) {
-  return zelo::AtBoundary<PSZLIST>(
+  return zelo::atBoundary<PSZLIST>(
       nullptr, [&] { return new QLIBC_SZLIST(capacity > 0 ? static_cast<size_t>(capacity) : 1); });
 }
 
 int QLIBCSzListPush(PSZLIST *ppList, const char *szText) {
   if (ppList == nullptr || *ppList == nullptr || szText == nullptr) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return zelo::AtBoundary(-1, [&] {
-    (*ppList)->Push(szText);
+  return zelo::atBoundary(-1, [&] {
+    (*ppList)->push(szText);
     return static_cast<int>((*ppList)->count());
   });
 }
@@ -60,7 +58,7 @@ const char *QLIBCSzListGet(PSZLIST pList, int index) {
   if (pList == nullptr || index < 0 || static_cast<size_t>(index) >= pList->count()) {
     return nullptr;
   }
-  return pList->At(static_cast<size_t>(index));
+  return pList->at(static_cast<size_t>(index));
 }
 
 int QLIBCSzListCount(PSZLIST pList) {
@@ -73,23 +71,23 @@ void QLIBCSzListFree(PSZLIST pList) {
 
 int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList) {
   if (szText == nullptr || szSep == nullptr || ppList == nullptr || *ppList == nullptr) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
   QLIBC_SZLIST &list = **ppList;
   const size_t before = list.count();
-  const int pieces = zelo::AtBoundary(-1, [&] {
-    /* A copy, since the text may be one of the list's own, which moves. */
+  const int pieces = zelo::atBoundary(-1, [&] {
+    // A copy, since the text may be one of the list's own, which moves.
     const std::string text(szText);
     size_t start = text.find_first_not_of(szSep);
     while (start != std::string::npos) {
       const size_t end = std::min(text.find_first_of(szSep, start), text.size());
-      list.Push(std::string_view(text).substr(start, end - start));
+      list.push(std::string_view(text).substr(start, end - start));
       start = text.find_first_not_of(szSep, end);
     }
     return static_cast<int>(list.count() - before);
   });
   if (pieces < 0) {
-    list.Truncate(before);
+    list.truncate(before);
   }
   return pieces;
 }

@@ -1,7 +1,4 @@
-/*
- * The inside of a text list, for the units that append texts without a
- * terminating zero.
- */
+// The inside of a text list, for the units that append texts without a terminating zero.
 #ifndef ZELOCORE_SZLIST_H
 #define ZELOCORE_SZLIST_H
 
@@ -16,14 +13,14 @@ struct QLIBC_SZLIST {
  public:
   explicit QLIBC_SZLIST(size_t capacity);
 
-  /* The text may lie in this very list. Throws when memory is short, and leaves
-   * the list as it was then. */
-  void Push(std::string_view text);
-  /* Takes back what was pushed since the list had `count` texts. */
-  void Truncate(size_t count) noexcept;
+  // The text may lie in this very list. Throws when memory is short, and leaves the list as it was
+  // then.
+  void push(std::string_view text);
+  // Takes back what was pushed since the list had `count` texts.
+  void truncate(size_t count) noexcept;
 
   size_t count() const noexcept { return starts_.size(); }
-  const char *At(size_t index) const noexcept { return arena_.c_str() + starts_[index]; }
+  const char *at(size_t index) const noexcept { return arena_.c_str() + starts_[index]; }
 
  private:
   std::string arena_;

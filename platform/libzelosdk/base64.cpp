@@ -1,6 +1,4 @@
-/*
- * Base64, over nettle.
- */
+// Base64, over nettle.
 #include <nettle/base64.h>
 
 #include <algorithm>
@@ -13,17 +11,17 @@
 
 namespace {
 
-/* nettle asks for room for the longest text that a run of characters could
- * decode to, white space and all. Decoding in steps needs that room only here. */
+// nettle asks for room for the longest text that a run of characters could decode to, white space
+// and all. Decoding in steps needs that room only here.
 constexpr size_t kStepCharacters = 256;
 constexpr size_t kStepBytes = BASE64_DECODE_LENGTH(kStepCharacters);
 
-bool Fits(size_t source_size, size_t room) noexcept {
-  return source_size < std::numeric_limits<size_t>::max() / 2 &&
-         BASE64_ENCODE_RAW_LENGTH(source_size) < room;
+bool fits(size_t sourceSize, size_t room) noexcept {
+  return sourceSize < std::numeric_limits<size_t>::max() / 2 &&
+         BASE64_ENCODE_RAW_LENGTH(sourceSize) < room;
 }
 
-bool Decode(const char *text, size_t size, char *out, size_t room, size_t *decoded) noexcept {
+bool decode(const char *text, size_t size, char *out, size_t room, size_t *decoded) noexcept {
   base64_decode_ctx context;
   base64_decode_init(&context);
   *decoded = 0;
@@ -45,8 +43,8 @@ bool Decode(const char *text, size_t size, char *out, size_t room, size_t *decod
 }  // namespace
 
 int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, int /*reserved*/) {
-  if (src == nullptr || dst == nullptr || !Fits(cbSrc, cbDst)) {
-    zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  if (src == nullptr || dst == nullptr || !fits(cbSrc, cbDst)) {
+    zelo::fail(QLIBC_ERR_BAD_PARAMETER);
     return 0;
   }
   base64_encode_raw(dst, cbSrc, reinterpret_cast<const uint8_t *>(src));
@@ -57,8 +55,8 @@ int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, i
 int ZELOEncodingBase64Decode(const char *src, size_t cbSrc, char *dst, size_t *pcbDst) {
   size_t decoded = 0;
   if (src == nullptr || dst == nullptr || pcbDst == nullptr ||
-      !Decode(src, cbSrc, dst, *pcbDst, &decoded)) {
-    zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+      !decode(src, cbSrc, dst, *pcbDst, &decoded)) {
+    zelo::fail(QLIBC_ERR_BAD_PARAMETER);
     return 0;
   }
   *pcbDst = decoded;

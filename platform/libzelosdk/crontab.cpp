@@ -1,6 +1,4 @@
-/*
- * Lines of the system crontab, and the daemon that reads it.
- */
+// Lines of the system crontab, and the daemon that reads it.
 #include <signal.h>
 
 #include <algorithm>
@@ -24,14 +22,14 @@ constexpr int32_t kEveryDay = 127;
 constexpr int32_t kLastHour = 23;
 constexpr int32_t kLastMinute = 59;
 
-/* ---- a line ---- */
+// ---- a line ----
 
-bool IsBetween(int32_t value, int32_t most) noexcept {
+bool isBetween(int32_t value, int32_t most) noexcept {
   return value >= 0 && value <= most;
 }
 
-/* Cron would cut the command at a '%' and feed it the rest. */
-bool IsCommand(const char (&command)[1024]) noexcept {
+// Cron would cut the command at a '%' and feed it the rest.
+bool isCommand(const char (&command)[1024]) noexcept {
   const size_t length = strnlen(command, sizeof command);
   return length > 0 && length < sizeof command &&
          std::none_of(command, command + length, [](char c) {
@@ -39,14 +37,14 @@ bool IsCommand(const char (&command)[1024]) noexcept {
          });
 }
 
-bool IsValid(const ZELO_SCHEDULE &schedule) noexcept {
-  return IsBetween(schedule.weekdays, kEveryDay) && IsBetween(schedule.hour, kLastHour) &&
-         schedule.repeat == 0 && IsBetween(schedule.lastHour, kLastHour) &&
-         IsBetween(schedule.minute, kLastMinute) && schedule.reserved == 0 &&
-         IsCommand(schedule.szCommand);
+bool isValid(const ZELO_SCHEDULE &schedule) noexcept {
+  return isBetween(schedule.weekdays, kEveryDay) && isBetween(schedule.hour, kLastHour) &&
+         schedule.repeat == 0 && isBetween(schedule.lastHour, kLastHour) &&
+         isBetween(schedule.minute, kLastMinute) && schedule.reserved == 0 &&
+         isCommand(schedule.szCommand);
 }
 
-std::string Weekdays(int32_t mask) {
+std::string weekdays(int32_t mask) {
   if (mask == kEveryDay) {
     return "*";
   }
@@ -60,44 +58,43 @@ std::string Weekdays(int32_t mask) {
   return list;
 }
 
-std::string Line(const ZELO_SCHEDULE &schedule) {
+std::string line(const ZELO_SCHEDULE &schedule) {
   return std::to_string(schedule.minute) + '\t' + std::to_string(schedule.hour) + "\t*\t*\t" +
-         Weekdays(schedule.weekdays) + "\troot\t" + schedule.szCommand;
+         weekdays(schedule.weekdays) + "\troot\t" + schedule.szCommand;
 }
 
-int AddLine(const ZELO_SCHEDULE &schedule) {
+int addLine(const ZELO_SCHEDULE &schedule) {
   FileContents crontab;
-  if (ReadLineFile(kCrontab, &crontab) < 0) {
+  if (readLineFile(kCrontab, &crontab) < 0) {
     return -1;
   }
-  AppendLine(&crontab.text, Line(schedule));
-  return WriteLineFile(kCrontab, crontab);
+  appendLine(&crontab.text, line(schedule));
+  return writeLineFile(kCrontab, crontab);
 }
 
-/* ---- the daemon ---- */
+// ---- the daemon ----
 
-/* The daemon's process, 0 when there is none. A number that stands for a group of
- * processes, for all of them or for the first must not be signalled, whoever
- * wrote it there. */
-pid_t ProcessOf(const std::string &pid_file) noexcept {
+// The daemon's process, 0 when there is none. A number that stands for a group of processes, for
+// all of them or for the first must not be signalled, whoever wrote it there.
+pid_t processOf(const std::string &pidFile) noexcept {
   constexpr int kDecimal = 10;
   constexpr long kFirstProcess = 1;
-  constexpr long kMostProcesses = 1L << 22; /* the kernel's own limit */
-  const long pid = std::strtol(pid_file.c_str(), nullptr, kDecimal);
+  constexpr long kMostProcesses = 1L << 22;  // the kernel's own limit
+  const long pid = std::strtol(pidFile.c_str(), nullptr, kDecimal);
   return pid > kFirstProcess && pid <= kMostProcesses ? static_cast<pid_t>(pid) : 0;
 }
 
-int Reload() {
+int reload() {
   if (QLIBCFileExist(kCronPidFile) == 0) {
     return 0;
   }
   FileContents file;
-  if (ReadLineFile(kCronPidFile, &file) < 0) {
+  if (readLineFile(kCronPidFile, &file) < 0) {
     return -1;
   }
-  const pid_t daemon = ProcessOf(file.text);
+  const pid_t daemon = processOf(file.text);
   if (daemon != 0 && kill(daemon, SIGHUP) != 0 && errno != ESRCH) {
-    return Fail(QLIBC_ERR_SYSTEM);
+    return fail(QLIBC_ERR_SYSTEM);
   }
   return 0;
 }
@@ -106,18 +103,18 @@ int Reload() {
 }  // namespace zelo
 
 int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
-  if (pSchedule == nullptr || (enabled != 0 && enabled != 1) || !zelo::IsValid(*pSchedule)) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  if (pSchedule == nullptr || (enabled != 0 && enabled != 1) || !zelo::isValid(*pSchedule)) {
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
   if (enabled == 0 || pSchedule->weekdays == 0) {
     return 0;
   }
-  return zelo::AtBoundary(-1, [&] { return zelo::AddLine(*pSchedule); });
+  return zelo::atBoundary(-1, [&] { return zelo::addLine(*pSchedule); });
 }
 
 int ZELOUpdateCrontab(const char *szCommand, int stop, int reload) {
   if (szCommand == nullptr || stop != 0 || (reload != 0 && reload != 1)) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return reload == 0 ? 0 : zelo::AtBoundary(-1, [] { return zelo::Reload(); });
+  return reload == 0 ? 0 : zelo::atBoundary(-1, [] { return zelo::reload(); });
 }

@@ -1,6 +1,4 @@
-/*
- * Switching the machine on: the alarm of its real-time clock.
- */
+// Switching the machine on: the alarm of its real-time clock.
 #include <fcntl.h>
 
 #include <algorithm>
@@ -23,76 +21,76 @@ constexpr char kDisarmed[] = "0\n";
 constexpr size_t kMostAlarmBytes = 32;
 constexpr int kDecimal = 10;
 
-/* A week, and another one for a weekday that the calendar of a place skips. */
+// A week, and another one for a weekday that the calendar of a place skips.
 constexpr int kDaysAhead = 14;
-/* A time that summer time skips at the end of a day comes after midnight. */
+// A time that summer time skips at the end of a day comes after midnight.
 constexpr int kDaysBefore = 1;
 constexpr int kNoon = 12;
 constexpr int kUnknownSummerTime = -1;
 
-bool LocalTime(time_t moment, tm *local) noexcept {
+bool localTime(time_t moment, tm *local) noexcept {
   return localtime_r(&moment, local) != nullptr;
 }
 
-bool Shows(time_t moment, const tm &day, const ZELO_AUTOPOWER &entry) noexcept {
+bool shows(time_t moment, const tm &day, const ZELO_AUTOPOWER &entry) noexcept {
   tm local{};
-  return LocalTime(moment, &local) && local.tm_mday == day.tm_mday && local.tm_hour == entry.hour &&
+  return localTime(moment, &local) && local.tm_mday == day.tm_mday && local.tm_hour == entry.hour &&
          local.tm_min == entry.minute;
 }
 
-time_t Moment(const tm &day, const ZELO_AUTOPOWER &entry, int summer_time) noexcept {
+time_t moment(const tm &day, const ZELO_AUTOPOWER &entry, int summerTime) noexcept {
   tm fields{};
   fields.tm_year = day.tm_year;
   fields.tm_mon = day.tm_mon;
   fields.tm_mday = day.tm_mday;
   fields.tm_hour = entry.hour;
   fields.tm_min = entry.minute;
-  fields.tm_isdst = summer_time;
+  fields.tm_isdst = summerTime;
   return mktime(&fields);
 }
 
-/* Read as summer time and as standard time, at most one of the two is right on
- * most days, both where the clocks go back, none where they go forward. */
-time_t MomentOf(const tm &day, const ZELO_AUTOPOWER &entry) noexcept {
-  const time_t summer = Moment(day, entry, 1);
-  const time_t standard = Moment(day, entry, 0);
-  const bool summer_fits = Shows(summer, day, entry);
-  const bool standard_fits = Shows(standard, day, entry);
-  if (summer_fits == standard_fits) {
-    return summer_fits ? std::min(summer, standard) : std::max(summer, standard);
+// Read as summer time and as standard time, at most one of the two is right on most days, both
+// where the clocks go back, none where they go forward.
+time_t momentOf(const tm &day, const ZELO_AUTOPOWER &entry) noexcept {
+  const time_t summer = moment(day, entry, 1);
+  const time_t standard = moment(day, entry, 0);
+  const bool summerFits = shows(summer, day, entry);
+  const bool standardFits = shows(standard, day, entry);
+  if (summerFits == standardFits) {
+    return summerFits ? std::min(summer, standard) : std::max(summer, standard);
   }
-  return summer_fits ? summer : standard;
+  return summerFits ? summer : standard;
 }
 
-/* The date that lies so many days after the other; noon is on every clock. */
-bool DayAfter(const tm &today, int days, tm *day) noexcept {
+// The date that lies so many days after the other; noon is on every clock.
+bool dayAfter(const tm &today, int days, tm *day) noexcept {
   tm fields{};
   fields.tm_year = today.tm_year;
   fields.tm_mon = today.tm_mon;
   fields.tm_mday = today.tm_mday + days;
   fields.tm_hour = kNoon;
   fields.tm_isdst = kUnknownSummerTime;
-  return LocalTime(mktime(&fields), day);
+  return localTime(mktime(&fields), day);
 }
 
-/* 0, with the first moment after now or without one, or -1. */
-int NextMoment(const std::vector<ZELO_AUTOPOWER> &entries, std::optional<time_t> *next) {
-  tzset(); /* the appliance's zone may have been changed since the process began */
+// 0, with the first moment after now or without one, or -1.
+int nextMoment(const std::vector<ZELO_AUTOPOWER> &entries, std::optional<time_t> *next) {
+  tzset();  // the appliance's zone may have been changed since the process began
   const time_t now = time(nullptr);
   tm today{};
-  if (!LocalTime(now, &today)) {
-    return Fail(QLIBC_ERR_SYSTEM);
+  if (!localTime(now, &today)) {
+    return fail(QLIBC_ERR_SYSTEM);
   }
   for (int days = -kDaysBefore; days <= kDaysAhead; ++days) {
     tm day{};
-    if (!DayAfter(today, days, &day)) {
-      return Fail(QLIBC_ERR_SYSTEM);
+    if (!dayAfter(today, days, &day)) {
+      return fail(QLIBC_ERR_SYSTEM);
     }
     for (const ZELO_AUTOPOWER &entry : entries) {
       if (entry.enabled == 0 || (entry.weekdays >> day.tm_wday & 1) == 0) {
         continue;
       }
-      const time_t moment = MomentOf(day, entry);
+      const time_t moment = momentOf(day, entry);
       if (moment > now && (!*next || moment < **next)) {
         *next = moment;
       }
@@ -101,51 +99,50 @@ int NextMoment(const std::vector<ZELO_AUTOPOWER> &entries, std::optional<time_t>
   return 0;
 }
 
-/* The kernel takes each write as a whole. */
-int WriteAlarm(const std::string &text) {
+// The kernel takes each write as a whole.
+int writeAlarm(const std::string &text) {
   Descriptor file(open(kWakeAlarm, O_WRONLY | O_TRUNC | O_CLOEXEC));
   if (!file.valid()) {
-    return Fail(QLIBC_ERR_OPEN);
+    return fail(QLIBC_ERR_OPEN);
   }
   if (write(file.get(), text.data(), text.size()) != static_cast<ssize_t>(text.size()) ||
-      !file.Close()) {
-    return Fail(QLIBC_ERR_IO);
+      !file.close()) {
+    return fail(QLIBC_ERR_IO);
   }
   return 0;
 }
 
-/* The kernel shows no number when no alarm is armed. One that cannot be read is
- * taken for armed. */
-bool IsArmed() {
+// The kernel shows no number when no alarm is armed. One that cannot be read is taken for armed.
+bool isArmed() {
   const Descriptor file(open(kWakeAlarm, O_RDONLY | O_CLOEXEC));
   std::string contents;
-  return !file.valid() || !ReadAll(file.get(), kMostAlarmBytes, &contents) ||
+  return !file.valid() || !readAll(file.get(), kMostAlarmBytes, &contents) ||
          std::strtoll(contents.c_str(), nullptr, kDecimal) != 0;
 }
 
-/* Only an alarm that is armed is written to: a machine that cannot be woken at
- * all, with its clock read-only, has nothing to disarm. */
-int Disarm() {
-  return QLIBCFileExist(kWakeAlarm) == 0 || !IsArmed() ? 0 : WriteAlarm(kDisarmed);
+// Only an alarm that is armed is written to: a machine that cannot be woken at all, with its clock
+// read-only, has nothing to disarm.
+int disarm() {
+  return QLIBCFileExist(kWakeAlarm) == 0 || !isArmed() ? 0 : writeAlarm(kDisarmed);
 }
 
-/* The kernel refuses a time while another one is armed. */
-int Arm(time_t moment) {
-  return WriteAlarm(kDisarmed) < 0 ? -1 : WriteAlarm(std::to_string(moment) + '\n');
+// The kernel refuses a time while another one is armed.
+int arm(time_t moment) {
+  return writeAlarm(kDisarmed) < 0 ? -1 : writeAlarm(std::to_string(moment) + '\n');
 }
 
-int SetPowerOn() {
+int setPowerOn() {
   std::vector<ZELO_AUTOPOWER> entries;
   std::optional<time_t> next;
-  if (ReadPowerList(ZELO_AUTOPOWER_ON, &entries) < 0 || NextMoment(entries, &next) < 0) {
+  if (readPowerList(ZELO_AUTOPOWER_ON, &entries) < 0 || nextMoment(entries, &next) < 0) {
     return -1;
   }
-  return next ? Arm(*next) : Disarm();
+  return next ? arm(*next) : disarm();
 }
 
 }  // namespace
 }  // namespace zelo
 
 int ZELOAutoPoweronSet(void) {
-  return zelo::AtBoundary(-1, [] { return zelo::SetPowerOn(); });
+  return zelo::atBoundary(-1, [] { return zelo::setPowerOn(); });
 }

@@ -1,6 +1,4 @@
-/*
- * The two lists of power times, in a section file of their own.
- */
+// The two lists of power times, in a section file of their own.
 #include "power_schedule.h"
 
 #include <algorithm>
@@ -15,7 +13,7 @@ namespace {
 
 constexpr char kFile[] = "/usr/zelo/etc/power_sched.conf";
 constexpr char kTimesKey[] = "times";
-/* By the number of the list. */
+// By the number of the list.
 constexpr const char *kSections[] = {"poweron", "poweroff"};
 constexpr int kMalformed = 0x4000;
 
@@ -34,11 +32,11 @@ class Hash {
   PSZHASH hash_;
 };
 
-const char *SectionOf(int list) noexcept {
+const char *sectionOf(int list) noexcept {
   return list == ZELO_AUTOPOWER_ON || list == ZELO_AUTOPOWER_OFF ? kSections[list] : nullptr;
 }
 
-/* One byte of an entry: where it lies, and the largest value that it may have. */
+// One byte of an entry: where it lies, and the largest value that it may have.
 struct Field {
   unsigned char ZELO_AUTOPOWER::*at;
   unsigned char most;
@@ -50,21 +48,21 @@ constexpr Field kFields[] = {
     {&ZELO_AUTOPOWER::minute, 59},
 };
 
-bool IsInRange(const ZELO_AUTOPOWER &entry) noexcept {
+bool isInRange(const ZELO_AUTOPOWER &entry) noexcept {
   return std::all_of(std::begin(kFields), std::end(kFields),
                      [&](const Field &field) { return entry.*field.at <= field.most; });
 }
 
-/* ---- the text of a list ---- */
+// ---- the text of a list ----
 
-void SkipBlanks(std::string_view *text) noexcept {
+void skipBlanks(std::string_view *text) noexcept {
   while (!text->empty() && (text->front() == ' ' || text->front() == '\t')) {
     text->remove_prefix(1);
   }
 }
 
-bool TakeByte(std::string_view *text, unsigned char *byte) noexcept {
-  SkipBlanks(text);
+bool takeByte(std::string_view *text, unsigned char *byte) noexcept {
+  skipBlanks(text);
   const auto [end, error] = std::from_chars(text->data(), text->data() + text->size(), *byte);
   if (error != std::errc()) {
     return false;
@@ -73,36 +71,36 @@ bool TakeByte(std::string_view *text, unsigned char *byte) noexcept {
   return text->empty() || text->front() == ' ' || text->front() == '\t' || text->front() == ';';
 }
 
-bool TakeEntry(std::string_view *text, ZELO_AUTOPOWER *entry) noexcept {
+bool takeEntry(std::string_view *text, ZELO_AUTOPOWER *entry) noexcept {
   for (const Field &field : kFields) {
-    if (!TakeByte(text, &(entry->*field.at))) {
+    if (!takeByte(text, &(entry->*field.at))) {
       return false;
     }
   }
-  return IsInRange(*entry);
+  return isInRange(*entry);
 }
 
-bool Parse(std::string_view text, std::vector<ZELO_AUTOPOWER> *entries) {
-  SkipBlanks(&text);
+bool parse(std::string_view text, std::vector<ZELO_AUTOPOWER> *entries) {
+  skipBlanks(&text);
   while (!text.empty()) {
     ZELO_AUTOPOWER entry{};
-    if (!TakeEntry(&text, &entry)) {
+    if (!takeEntry(&text, &entry)) {
       return false;
     }
     entries->push_back(entry);
-    SkipBlanks(&text);
+    skipBlanks(&text);
     if (!text.empty()) {
       if (text.front() != ';') {
         return false;
       }
       text.remove_prefix(1);
-      SkipBlanks(&text);
+      skipBlanks(&text);
     }
   }
   return true;
 }
 
-std::string Written(const ZELO_AUTOPOWER *entries, int count) {
+std::string written(const ZELO_AUTOPOWER *entries, int count) {
   std::string text;
   for (int i = 0; i < count; ++i) {
     text += i == 0 ? "" : "; ";
@@ -114,9 +112,9 @@ std::string Written(const ZELO_AUTOPOWER *entries, int count) {
   return text;
 }
 
-/* ---- the file ---- */
+// ---- the file ----
 
-int WritePowerList(const char *section, const std::string &times) {
+int writePowerList(const char *section, const std::string &times) {
   Hash hash;
   if (!hash.valid() || QLIBCSzHashSetValue(hash.address(), kTimesKey, times.c_str()) < 0) {
     return -1;
@@ -132,7 +130,7 @@ int WritePowerList(const char *section, const std::string &times) {
 
 }  // namespace
 
-int ReadPowerList(int list, std::vector<ZELO_AUTOPOWER> *entries) {
+int readPowerList(int list, std::vector<ZELO_AUTOPOWER> *entries) {
   if (QLIBCFileExist(kFile) == 0) {
     return 0;
   }
@@ -140,28 +138,28 @@ int ReadPowerList(int list, std::vector<ZELO_AUTOPOWER> *entries) {
   if (!hash.valid()) {
     return -1;
   }
-  const int read = QLIBCFileGetSection(kFile, SectionOf(list), hash.address());
+  const int read = QLIBCFileGetSection(kFile, sectionOf(list), hash.address());
   if (read < 0) {
     return -1;
   }
   if (read == 0) {
     return 0;
   }
-  /* Every list that is written has its times, if none. Without them the line was
-   * damaged, and what it held must not be written over by a list without it. */
+  // Every list that is written has its times, if none. Without them the line was damaged, and what
+  // it held must not be written over by a list without it.
   const char *times = QLIBCSzHashGetValue(hash.get(), kTimesKey);
-  return times != nullptr && Parse(times, entries) ? 0 : Fail(kMalformed);
+  return times != nullptr && parse(times, entries) ? 0 : fail(kMalformed);
 }
 
 }  // namespace zelo
 
 int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries) {
-  if (zelo::SectionOf(list) == nullptr || capacity < 0 || pEntries == nullptr) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+  if (zelo::sectionOf(list) == nullptr || capacity < 0 || pEntries == nullptr) {
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return zelo::AtBoundary(-1, [&] {
+  return zelo::atBoundary(-1, [&] {
     std::vector<ZELO_AUTOPOWER> entries;
-    if (zelo::ReadPowerList(list, &entries) < 0) {
+    if (zelo::readPowerList(list, &entries) < 0) {
       return -1;
     }
     const int count = static_cast<int>(std::min(entries.size(), static_cast<size_t>(capacity)));
@@ -170,16 +168,16 @@ int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries) {
   });
 }
 
-/* Who reads a list has room for as many: one more would be stored, and never come. */
+// Who reads a list has room for as many: one more would be stored, and never come.
 constexpr int kMostEntries = 100;
 
 int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries) {
-  if (zelo::SectionOf(list) == nullptr || count < 0 || count > kMostEntries ||
+  if (zelo::sectionOf(list) == nullptr || count < 0 || count > kMostEntries ||
       (pEntries == nullptr && count > 0) ||
-      !std::all_of(pEntries, pEntries + count, zelo::IsInRange)) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+      !std::all_of(pEntries, pEntries + count, zelo::isInRange)) {
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
-  return zelo::AtBoundary(-1, [&] {
-    return zelo::WritePowerList(zelo::SectionOf(list), zelo::Written(pEntries, count));
+  return zelo::atBoundary(-1, [&] {
+    return zelo::writePowerList(zelo::sectionOf(list), zelo::written(pEntries, count));
   });
 }

@@ -1,6 +1,4 @@
-/*
- * Users, over the C library's user database.
- */
+// Users, over the C library's user database.
 #include <pwd.h>
 
 #include <cerrno>
@@ -14,7 +12,7 @@
 namespace {
 
 constexpr size_t kFirstRoom = 1024;
-/* No honest entry comes near; a broken directory service may ask for ever. */
+// No honest entry comes near; a broken directory service may ask for ever.
 constexpr size_t kMostRoom = size_t{1} << 20;
 
 struct Freer {
@@ -23,40 +21,40 @@ struct Freer {
 template <typename T>
 using Owned = std::unique_ptr<T, Freer>;
 
-/* The database says "no such user" in as many ways as it has sources. */
-bool MeansNoSuchUser(int error) noexcept {
+// The database says "no such user" in as many ways as it has sources.
+bool meansNoSuchUser(int error) noexcept {
   return error == 0 || error == ENOENT || error == ESRCH || error == EBADF || error == EPERM;
 }
 
-const char *TextOf(const char *text) noexcept {
+const char *textOf(const char *text) noexcept {
   return text != nullptr ? text : "";
 }
 
-/* Copies the text to `*at` and moves that behind it. */
-char *Append(char **at, const char *text) noexcept {
+// Copies the text to `*at` and moves that behind it.
+char *append(char **at, const char *text) noexcept {
   char *copy = *at;
-  *at = stpcpy(copy, TextOf(text)) + 1;
+  *at = stpcpy(copy, textOf(text)) + 1;
   return copy;
 }
 
-/* One block holds the record and its texts. */
-Owned<ZELOUSER> MakeUser(const passwd &entry) noexcept {
-  const size_t texts = std::strlen(TextOf(entry.pw_name)) + std::strlen(TextOf(entry.pw_dir)) +
-                       std::strlen(TextOf(entry.pw_shell)) + 3;
+// One block holds the record and its texts.
+Owned<ZELOUSER> makeUser(const passwd &entry) noexcept {
+  const size_t texts = std::strlen(textOf(entry.pw_name)) + std::strlen(textOf(entry.pw_dir)) +
+                       std::strlen(textOf(entry.pw_shell)) + 3;
   Owned<ZELOUSER> user(static_cast<ZELOUSER *>(std::malloc(sizeof(ZELOUSER) + texts)));
   if (user != nullptr) {
     char *at = reinterpret_cast<char *>(user.get() + 1);
     user->uid = entry.pw_uid;
     user->gid = entry.pw_gid;
-    user->szName = Append(&at, entry.pw_name);
-    user->szHome = Append(&at, entry.pw_dir);
-    user->szShell = Append(&at, entry.pw_shell);
+    user->szName = append(&at, entry.pw_name);
+    user->szHome = append(&at, entry.pw_dir);
+    user->szShell = append(&at, entry.pw_shell);
   }
   return user;
 }
 
-/* 0 with the user, or the code of the failure. */
-int LookUp(uid_t uid, Owned<ZELOUSER> *user) noexcept {
+// 0 with the user, or the code of the failure.
+int lookUp(uid_t uid, Owned<ZELOUSER> *user) noexcept {
   int error = ERANGE;
   for (size_t room = kFirstRoom; error == ERANGE && room <= kMostRoom; room *= 2) {
     const Owned<char> texts(static_cast<char *>(std::malloc(room)));
@@ -69,26 +67,26 @@ int LookUp(uid_t uid, Owned<ZELOUSER> *user) noexcept {
       error = getpwuid_r(uid, &entry, texts.get(), room, &found);
     } while (error == EINTR);
     if (found != nullptr) {
-      *user = MakeUser(entry);
+      *user = makeUser(entry);
       return *user != nullptr ? 0 : QLIBC_ERR_OUT_OF_MEMORY;
     }
   }
   if (error == ENOMEM) {
     return QLIBC_ERR_OUT_OF_MEMORY;
   }
-  return MeansNoSuchUser(error) ? QLIBC_ERR_NOT_FOUND : QLIBC_ERR_SYSTEM;
+  return meansNoSuchUser(error) ? QLIBC_ERR_NOT_FOUND : QLIBC_ERR_SYSTEM;
 }
 
 }  // namespace
 
 int ZELOUserGetByUID(uid_t uid, PZELOUSER *ppUser) {
   if (ppUser == nullptr) {
-    return zelo::Fail(QLIBC_ERR_BAD_PARAMETER);
+    return zelo::fail(QLIBC_ERR_BAD_PARAMETER);
   }
   Owned<ZELOUSER> user;
-  const int code = LookUp(uid, &user);
+  const int code = lookUp(uid, &user);
   if (code != 0) {
-    return zelo::Fail(code);
+    return zelo::fail(code);
   }
   *ppUser = user.release();
   return 0;

@@ -5,8 +5,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdio>
-#include <cstdlib>
 #include <cstring>
 
 #include "terminal/failure.h"
@@ -36,12 +34,6 @@ class Descriptor {
   int file_;
 };
 
-void syncDirectoryOf(const std::string &path) {
-  const std::string directory = path.substr(0, path.rfind('/'));
-  const Descriptor file(open(directory.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  if (file.get() < 0 || fsync(file.get()) != 0) throw cannot("write", directory);
-}
-
 void requireFile(int file, const std::string &path) {
   struct stat info {};
   if (fstat(file, &info) != 0) throw cannot("examine", path);
@@ -49,34 +41,6 @@ void requireFile(int file, const std::string &path) {
 }
 
 }  // namespace
-
-ScratchFile::ScratchFile(const std::string &path)
-    : path_(path + ".XXXXXX"), file_(mkostemp(path_.data(), O_CLOEXEC)) {
-  if (file_ < 0) throw cannot("make a file beside", path);
-}
-
-ScratchFile::~ScratchFile() {
-  close(file_);
-  if (!isPlaced_) unlink(path_.c_str());
-}
-
-void ScratchFile::fill(const std::string &contents, mode_t mode) {
-  size_t done = 0;
-  while (done < contents.size()) {
-    const ssize_t written = write(file_, contents.data() + done, contents.size() - done);
-    if (written < 0 && errno == EINTR) continue;
-    if (written <= 0) throw cannot("write", path_);
-    done += static_cast<size_t>(written);
-  }
-  if (fchown(file_, kRoot, kRootsGroup) != 0 || fchmod(file_, mode) != 0 || fsync(file_) != 0) {
-    throw cannot("write", path_);
-  }
-}
-
-void ScratchFile::moveTo(const std::string &path) {
-  if (rename(path_.c_str(), path.c_str()) != 0) throw cannot("replace", path);
-  isPlaced_ = true;
-}
 
 std::string contentsOf(const std::string &path) {
   // Not blocking, for a FIFO would hang the open.
@@ -95,9 +59,19 @@ std::string contentsOf(const std::string &path) {
   }
 }
 
+void fill(SchedNewFile *file, const std::string &contents, mode_t mode) {
+  if (!file->open()) throw cannot("make", file->path());
+  struct stat like {};
+  like.st_uid = kRoot;
+  like.st_gid = kRootsGroup;
+  like.st_mode = mode;
+  if (!file->write(contents) || !file->finish(like)) throw cannot("write", file->path());
+}
+
 void placeFile(const std::string &path, const std::string &contents, mode_t mode) {
-  ScratchFile scratch(path);
-  scratch.fill(contents, mode);
-  scratch.moveTo(path);
-  syncDirectoryOf(path);
+  SchedNewFile file(path.c_str());
+  fill(&file, contents, mode);
+  if (!file.rename(path.c_str())) throw cannot("replace", path);
+  const std::string directory = path.substr(0, path.rfind('/'));
+  if (!schedSyncDirectory(directory.c_str())) throw cannot("write", directory);
 }

@@ -2,33 +2,18 @@
 // under the name is neither followed nor taken over.
 #pragma once
 
+#include <sched_new_file.h>
 #include <sys/types.h>
 
 #include <string>
-
-// In the same directory as `path`, under a name that nobody can know; gone with the object, unless
-// it was moved. Each call throws Failure.
-class ScratchFile {
- public:
-  explicit ScratchFile(const std::string &path);
-  ~ScratchFile();
-  ScratchFile(const ScratchFile &) = delete;
-  ScratchFile &operator=(const ScratchFile &) = delete;
-
-  const std::string &path() const { return path_; }
-  void fill(const std::string &contents, mode_t mode);
-  void moveTo(const std::string &path);
-
- private:
-  std::string path_;
-  int file_;
-  bool isPlaced_ = false;
-};
 
 // Each throws Failure.
 
 // Of a regular file, or of one that a link leads to.
 std::string contentsOf(const std::string &path);
+
+// Makes the file whole and on the disk, root's and with that mode.
+void fill(SchedNewFile *file, const std::string &contents, mode_t mode);
 
 // The file, root's and with that mode, on the disk when the call returns. It replaces a file or a
 // link of that name, but no directory.

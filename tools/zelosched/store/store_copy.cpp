@@ -71,14 +71,14 @@ std::string writtenAnew(const std::string &contents) {
   constexpr char kScratch[] = "/run/zelosched.store";  // no memory that wears, and root's alone
   constexpr char kSection[] = "zelosched looks whether this is whole";
   constexpr mode_t kMode = 0600;
-  ScratchFile scratch(kScratch);
-  scratch.fill(contents, kMode);
+  SchedNewFile scratch(kScratch);
+  fill(&scratch, contents, kMode);
   PSZHASH raw = QLIBCSzHashAlloc(1);
   if (raw == nullptr) throw Failure("out of memory");
   const std::unique_ptr<QLIBC_SZHASH, FreeHash> nothing(raw);
   forgetError();
-  if (QLIBCFileAddSection(scratch.path().c_str(), kSection, nothing.get(), 0) < 0 ||
-      QLIBCFileRemoveSection(scratch.path().c_str(), kSection) < 0) {
+  if (QLIBCFileAddSection(scratch.path(), kSection, nothing.get(), 0) < 0 ||
+      QLIBCFileRemoveSection(scratch.path(), kSection) < 0) {
     throw failedTo("examine a store");
   }
   return contentsOf(scratch.path());

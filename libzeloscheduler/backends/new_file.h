@@ -1,0 +1,77 @@
+// Files that the store's backend replaces or watches, with what fails in the error record.
+#ifndef NEW_FILE_H
+#define NEW_FILE_H
+
+#include <sys/stat.h>
+#include <zelocore.h>
+
+#include <string_view>
+
+#include "sched_new_file.h"
+#include "sched_report.h"
+
+// A file that is replaced line by line. Each call gives 0, or -1 with its code at the place in the
+// error record.
+class NewFile {
+ public:
+  NewFile(const char *szPath, SchedPlace place) : file_(szPath), szPath_(szPath), place_(place) {}
+
+  int open() { return file_.open() ? 0 : fail(kErrOpen); }
+
+  int write(std::string_view bytes) {
+    endsLine_ = bytes.ends_with('\n');
+    return file_.write(bytes) ? 0 : fail(kErrIo);
+  }
+
+  // All that is left to be read.
+  int writeAllOf(FILE *source) {
+    char block[1 << 14];
+    size_t count = 0;
+    while ((count = fread(block, 1, sizeof(block), source)) > 0) {
+      if (write({block, count}) < 0) {
+        return -1;
+      }
+    }
+    return ferror(source) == 0 ? 0 : fail(kErrIo);
+  }
+
+  // A line must not be joined to a last line that has no line feed.
+  int writeLine(const char *szLine) {
+    if (!endsLine_ && write("\n") < 0) {
+      return -1;
+    }
+    return write(szLine) < 0 ? -1 : write("\n");
+  }
+
+  int finish(const struct stat &like) { return file_.finish(like) ? 0 : fail(kErrIo); }
+  int replaceOld() { return file_.rename(szPath_) ? 0 : fail(kErrRename); }
+
+ private:
+  int fail(int code) const {
+    QLIBCErrSetEx(code, place_.file, place_.line);
+    return -1;
+  }
+
+  SchedNewFile file_;
+  const char *szPath_;
+  SchedPlace place_;
+  bool endsLine_ = true;
+};
+
+// A file's length and when it was written, by which one that was written again is told.
+class FileState {
+ public:
+  explicit FileState(const char *szPath) { stat(szPath, &info_); }
+
+  bool isThatOf(const char *szPath) const {
+    struct stat now = {};
+    return stat(szPath, &now) == 0 && now.st_size == info_.st_size &&
+           now.st_mtim.tv_sec == info_.st_mtim.tv_sec &&
+           now.st_mtim.tv_nsec == info_.st_mtim.tv_nsec;
+  }
+
+ private:
+  struct stat info_ = {};
+};
+
+#endif
