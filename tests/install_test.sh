@@ -52,8 +52,11 @@ libexec/zelosched/zelo_poweroff_feasible_check
 sbin/zelosched
 sbin/zeloschedtask
 share/bash-completion/completions/zelosched
+share/fish/vendor_completions.d/zelosched.fish
+share/zelosched/zelosched-1.schema.json
 share/zeloscheduler/take_lines_out
 share/zeloscheduler/zeloschedtask.stand-in
+share/zsh/vendor-completions/_zelosched
 FILES
 }
 

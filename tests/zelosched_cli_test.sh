@@ -95,7 +95,7 @@ every_command_has_help() {
   local name bad=0
   for name in $(z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'); do
     try z "$name" --help
-    [[ $status == 0 && $out == "usage: zelosched $name "* && -z $err ]] || { echo "$name"; bad=1; }
+    [[ $status == 0 && $out == "usage: zelosched $name"[$' \n']* && -z $err ]] || { echo "$name"; bad=1; }
   done
   return "$bad"
 }
@@ -103,7 +103,7 @@ every_command_has_help() {
 help_fits_the_terminal() {
   local name
   for name in $(z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'); do z "$name" --help; done |
-    awk 'length > 90 && !/^usage/ { print; bad = 1 } END { exit bad }'
+    awk 'length > 90 && !/^usage/ || / $/ { print; bad = 1 } END { exit bad }'
 }
 
 wrong_arguments_are_usage_errors() {
