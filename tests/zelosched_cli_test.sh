@@ -550,10 +550,10 @@ tells_of_a_clock_that_is_not_armed() {
   z power add on --daily 07:00 >/dev/null && try z status && [[ $out != *"not armed for"* ]] || return 1
   : >"$alarm"
   try z status
-  [[ $out == *"WRONG  the machine's clock is not armed for the next power-on time"* ]] || result=1
+  [[ $out == *"warning   the machine's clock is not armed for the next power-on time"* ]] || result=1
   rm "$alarm"
   try z status
-  [[ $out == *"WRONG  the machine has no clock that could be armed"* ]] || result=1
+  [[ $out == *"warning   the machine has no clock that could be armed"* ]] || result=1
   fails_saying_of_all "the machine has no clock" z sync || result=1
   touch "$alarm"
   gives 0 "the crontab is in step with the tasks" sync && return "$result"
@@ -937,7 +937,7 @@ shows_how_long_a_run_goes_on() {
   same "$(at '2026-11-20 09:01:05' history | tail -1)" \
     "2026-11-20 08:00:00   1:01:05   1  running  Task 1" &&
     same "$(z status | grep running | tail -1)" \
-      "ok     task 1 (Task 1) is running since 2026-11-20 08:00 as process $$"
+      "ok        task 1 (Task 1) is running since 2026-11-20 08:00 as process $$"
 }
 
 # ---- power ----------------------------------------------------------------------------------
@@ -1023,16 +1023,17 @@ all_well() {
 status_is_well() {
   all_well
   rm -rf /tmp/zeloscheduler.*
-  gives 0 "ok     cron is running (process $(cat /var/run/crond.pid))
-ok     /tmp/zeloschedtask is there, and root's
-ok     no other user is in the way of a run
-ok     changes of tasks have their turn
-ok     the working and the persistent copy of the tasks agree
-ok     the crontab is in step with the tasks
-ok     no enabled task has a fault
-ok     no power-on time waits for a clock that is not armed
-ok     no task is running
-ok     no run was missed" status
+  gives 0 "ok        cron is running (process $(cat /var/run/crond.pid))
+ok        /tmp/zeloschedtask is there, and root's
+ok        the working and the persistent copy of the tasks agree
+ok        /tmp is root's, and sticky
+ok        no other user is in the way of a run
+ok        changes of tasks have their turn
+ok        the crontab is in step with the tasks
+ok        no enabled task has a fault
+ok        no run was missed
+ok        no power-on time waits for a clock that is not armed
+ok        no task is running" status
 }
 
 # What to do to a machine on which all is well, and what status then says.
@@ -1045,35 +1046,37 @@ status_finds() {
   try z status
   echo "$pid" >/var/run/crond.pid
   rm -rf /tmp/zeloschedtask
-  [[ $status == 1 && $out == *"WRONG  $part"* ]] || { echo "$damage: $status $out $err"; return 1; }
+  local worst=1
+  [[ $out != *"critical  "* ]] || worst=4
+  [[ $status == "$worst" && $out == *"$part"* ]] || { echo "$damage: $status $out $err"; return 1; }
 }
 
 readonly -a DAMAGES=(
-  'cron is not running' 'rm /var/run/crond.pid'
-  'cron is not running' 'echo $$ >/var/run/crond.pid'
-  'cron is not running' 'echo 99999999 >/var/run/crond.pid'
-  'cron is not running' 'echo nonsense >/var/run/crond.pid'
-  '/tmp/zeloschedtask, which cron starts, cannot be examined: No such file' 'rm /tmp/zeloschedtask'
-  '/tmp/zeloschedtask is no program' 'ln -sf /bin/true /tmp/zeloschedtask'
-  '/tmp/zeloschedtask is no program' 'chmod 0644 /tmp/zeloschedtask'
-  "/tmp/zeloschedtask is not root's alone" 'chmod 0775 /tmp/zeloschedtask'
-  '/tmp/scheduled_tasks is missing' 'rm $STORE'
-  '/usr/zelo/etc/scheduled_tasks is missing' 'rm $PERSISTENT'
-  '/usr/zelo/etc/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $PERSISTENT'
-  '/tmp/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $STORE'
-  'the working and the persistent copy of the tasks differ' 'echo "# edited" >>$PERSISTENT'
-  "/usr/zelo/etc/scheduled_tasks is cut off: 'zelosched restore' writes it anew from /tmp/scheduled_tasks" ': >$PERSISTENT'
-  '/etc/crontab lacks the line: 30 8 * * * root /tmp/zeloschedtask --run id=1' 'cp $SCRATCH/crontab /etc/crontab'
-  '/etc/crontab has a line that belongs to no task: 1 1 * * * root /tmp/zeloschedtask --run id=7' 'printf "1\t1\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=7\n" >>/etc/crontab'
-  '/etc/crontab cannot be read: No such file' 'rm /etc/crontab'
-  '/etc/crontab has 10001 lines, and cron ignores all of it when there are more than 10000' 'fill_crontab 10001'
-  'task 1 (Task 1): invalid hour 25 (00 to 23)' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
-  'cron may pass over all of /etc/crontab' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
-  'task 1 (Task 1): there is no user 77777' 'sed -i "s/^owner=.*/owner=\"77777\"/" $STORE'
-  '1 stored task cannot be read' 'sed -i "/^name=/d" $STORE'
-  '/tmp/scheduled_tasks can be written by others' 'chmod 0666 $STORE'
-  '/usr/zelo/etc/scheduled_tasks.last-good is missing' 'rm $PERSISTENT.last-good'
-  '/usr/zelo/etc/scheduled_tasks.last-good is not as /usr/zelo/etc/scheduled_tasks is' 'truncate -s 100 $PERSISTENT.last-good'
+  'critical  cron is not running' 'rm /var/run/crond.pid'
+  'critical  cron is not running' 'echo $$ >/var/run/crond.pid'
+  'critical  cron is not running' 'echo 99999999 >/var/run/crond.pid'
+  'critical  cron is not running' 'echo nonsense >/var/run/crond.pid'
+  'critical  /tmp/zeloschedtask, which cron starts, cannot be examined: No such file' 'rm /tmp/zeloschedtask'
+  'critical  /tmp/zeloschedtask is no program' 'ln -sf /bin/true /tmp/zeloschedtask'
+  'critical  /tmp/zeloschedtask is no program' 'chmod 0644 /tmp/zeloschedtask'
+  "critical  /tmp/zeloschedtask is not root's alone" 'chmod 0775 /tmp/zeloschedtask'
+  'critical  /tmp/scheduled_tasks is missing' 'rm $STORE'
+  'warning   /usr/zelo/etc/scheduled_tasks is missing' 'rm $PERSISTENT'
+  'warning   /usr/zelo/etc/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $PERSISTENT'
+  'critical  /tmp/scheduled_tasks cannot be read: reading or writing failed' 'truncate -s 100 $STORE'
+  'warning   the working and the persistent copy of the tasks differ' 'echo "# edited" >>$PERSISTENT'
+  "warning   /usr/zelo/etc/scheduled_tasks is cut off: 'zelosched restore' writes it anew from /tmp/scheduled_tasks" ': >$PERSISTENT'
+  'warning   /etc/crontab lacks the line: 30 8 * * * root /tmp/zeloschedtask --run id=1' 'cp $SCRATCH/crontab /etc/crontab'
+  'warning   /etc/crontab has a line that belongs to no task: 1 1 * * * root /tmp/zeloschedtask --run id=7' 'printf "1\t1\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=7\n" >>/etc/crontab'
+  'warning   /etc/crontab cannot be read: No such file' 'rm /etc/crontab'
+  'critical  /etc/crontab has 10001 lines, and cron ignores all of it when there are more than 10000' 'fill_crontab 10001'
+  'warning   task 1 (Task 1): invalid hour 25 (00 to 23)' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
+  'critical  cron may pass over all of /etc/crontab' 'sed -i "s/^run hour=.*/run hour=\"25\"/" $STORE'
+  'warning   task 1 (Task 1): there is no user 77777' 'sed -i "s/^owner=.*/owner=\"77777\"/" $STORE'
+  'warning   1 stored task cannot be read' 'sed -i "/^name=/d" $STORE'
+  'critical  /tmp/scheduled_tasks can be written by others' 'chmod 0666 $STORE'
+  'warning   /usr/zelo/etc/scheduled_tasks.last-good is missing' 'rm $PERSISTENT.last-good'
+  'warning   /usr/zelo/etc/scheduled_tasks.last-good is not as /usr/zelo/etc/scheduled_tasks is' 'truncate -s 100 $PERSISTENT.last-good'
 )
 
 # Whoever took the advice to save a task would write all copies anew without the others.
@@ -1086,7 +1089,7 @@ nothing_is_changed_before_the_tasks_are_back() {
   for command in 'add --daily 08:30 -- true' sync status; do
     # shellcheck disable=SC2086
     try z $command
-    [[ $status == 1 && $out$err == *"$STORE has no tasks, though some are kept: 'zelosched restore' puts the tasks back"* ]] ||
+    [[ $status == [14] && $out$err == *"$STORE has no tasks, though some are kept: 'zelosched restore' puts the tasks back"* ]] ||
       { echo "$command: $status $out $err"; return 1; }
   done
   rm "$STORE"
@@ -1320,7 +1323,7 @@ who_holds_the_librarys_lock_is_named() {
   kill "$held"
   [[ $result == 0 &&
     $said == *"waiting for process $held (sleep), which holds /run/zeloscheduler.lock"* &&
-    $out == *"WRONG  process $held (sleep) keeps changes of tasks waiting: it holds /run/zeloscheduler.lock"* ]]
+    $out == *"warning   process $held (sleep) keeps changes of tasks waiting: it holds /run/zeloscheduler.lock"* ]]
 }
 
 import_tells_what_it_cannot_read() {

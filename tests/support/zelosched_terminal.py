@@ -120,7 +120,7 @@ for variables in ({"NO_COLOR": "1"}, {"TERM": "dumb"}, {"TERM": ""}):
 text, _ = on_terminal(["list"], NO_COLOR="")
 check("an empty NO_COLOR is none", ESCAPE in text, text)
 text, status = on_terminal(["status"])
-check("what is wrong is red", ESCAPE + "[31mWRONG" in text and status == 1, text)
+check("what is wrong is red", ESCAPE + "[1;31mcritical" in text and status == 4, text)
 
 for variables in ({"LC_ALL": "C"}, {"LC_ALL": "no_SUCH"}):
     text, _ = on_terminal(["list"], **variables)

@@ -40,6 +40,10 @@ void requireFile(int file, const std::string &path) {
   if (!S_ISREG(info.st_mode)) throw Failure(path + " is no regular file");
 }
 
+std::string withoutSuffix(const std::string &path) {
+  return path.substr(0, path.rfind('.'));
+}
+
 }  // namespace
 
 std::string contentsOf(const std::string &path) {
@@ -60,7 +64,7 @@ std::string contentsOf(const std::string &path) {
 }
 
 void fill(SchedNewFile *file, const std::string &contents, mode_t mode) {
-  if (!file->open()) throw cannot("make", file->path());
+  if (!file->open()) throw cannot("make a file beside", withoutSuffix(file->path()));
   struct stat like {};
   like.st_uid = kRoot;
   like.st_gid = kRootsGroup;

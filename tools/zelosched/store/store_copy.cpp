@@ -169,3 +169,9 @@ void requireTasksAreBack() {
   throw Failure(std::string(kWorkingCopy) +
                 " has no tasks, though some are kept: 'zelosched restore' puts the tasks back");
 }
+
+std::optional<int> countSections(const char *path) {
+  const List sections = sectionsOf(path);
+  if (sections == nullptr) return std::nullopt;
+  return QLIBCSzListCount(sections.get());
+}

@@ -1,6 +1,7 @@
 // Whether a copy of the tasks is fit to be used.
 #pragma once
 
+#include <optional>
 #include <string>
 
 struct StoreCopy {
@@ -31,3 +32,6 @@ StoreCopy judgeStore(const std::string &path);
 // As judgeStore, for the copy in /tmp: the library refuses it when it has a second name, too, which
 // anybody can give it where the kernel lets him. There a file of no bytes is no damaged copy.
 StoreCopy judgeWorkingStore(const std::string &path);
+
+// How many sections the file has; nothing, with the error record set, when it cannot be read.
+std::optional<int> countSections(const char *path);

@@ -4,3 +4,6 @@
 inline constexpr int kDone = 0;
 inline constexpr int kFailed = 1;
 inline constexpr int kUsage = 2;
+// Of 'status' alone.
+inline constexpr int kUnknown = 3;
+inline constexpr int kCritical = 4;

@@ -1,0 +1,88 @@
+#include "check/copies_check.h"
+
+#include <sched_shared_names.h>
+#include <zelocore.h>
+
+#include <cstdint>
+#include <fstream>
+#include <iterator>
+
+#include "store/store_copy.h"
+#include "store/store_files.h"
+#include "terminal/failure.h"
+
+namespace {
+
+constexpr char kKind[] = "copies";
+constexpr char kPutTasksBack[] = ": 'zelosched restore' puts the tasks back";
+constexpr char kWriteAnew[] = ": 'zelosched restore' writes it anew";
+
+Findings critical(const std::string &text) {
+  return {{Severity::kCritical, kKind, text}};
+}
+
+Findings warning(const std::string &text) {
+  return {{Severity::kWarning, kKind, text}};
+}
+
+Findings ok(const std::string &text) {
+  return {{Severity::kOk, kKind, text}};
+}
+
+std::string contents(const std::string &path) {
+  std::ifstream file(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
+
+bool exists(const char *path) {
+  return QLIBCFileExist(path) != 0;
+}
+
+bool isNothingSaved() {
+  const bool isNothing = !exists(kWorkingCopy) || countSections(kWorkingCopy) == 0;
+  return isNothing && !exists(kPersistentCopy) && !exists(kLastGoodCopy);
+}
+
+}  // namespace
+
+Findings checkLastGoodCopy() {
+  if (!exists(kPersistentCopy) || !judgeStore(kPersistentCopy).isWhole()) return {};
+  if (!exists(kLastGoodCopy))
+    return warning(std::string(kLastGoodCopy) + " is missing" + kWriteAnew);
+  if (contents(kLastGoodCopy) == contents(kPersistentCopy)) return {};
+  return warning(std::string(kLastGoodCopy) + " is not as " + kPersistentCopy + " is" + kWriteAnew);
+}
+
+Findings checkCopies() {
+  const char *why = nullptr;
+  if (schedLookAt(kSchedStore, &why) == SchedNameState::kForeign) {
+    return critical(std::string(kWorkingCopy) + " " + why + kPutTasksBack);
+  }
+  if (isNothingSaved()) return ok("no task was ever saved");
+  if (!exists(kWorkingCopy)) {
+    return critical(std::string(kWorkingCopy) + " is missing" + kPutTasksBack);
+  }
+  if (doTasksWaitForRestore()) {
+    return critical(std::string(kWorkingCopy) + " has no tasks, though some are kept" +
+                    kPutTasksBack);
+  }
+  if (!countSections(kWorkingCopy)) {
+    return critical(std::string(kWorkingCopy) + " cannot be read: " + errorInWords());
+  }
+  if (!exists(kPersistentCopy)) {
+    return warning(std::string(kPersistentCopy) + " is missing" + kWriteAnew);
+  }
+  if (!countSections(kPersistentCopy)) {
+    return warning(std::string(kPersistentCopy) + " cannot be read: " + errorInWords());
+  }
+  if (contents(kPersistentCopy).empty()) {
+    return warning(std::string(kPersistentCopy) +
+                   " is cut off: 'zelosched restore' writes it anew from " + kWorkingCopy);
+  }
+  if (contents(kWorkingCopy) == contents(kPersistentCopy)) {
+    return ok("the working and the persistent copy of the tasks agree");
+  }
+  return warning(
+      "the working and the persistent copy of the tasks differ: save a task again, or what was "
+      "changed last is lost at the next boot");
+}

@@ -1,0 +1,27 @@
+// What a look at the machine found.
+#pragma once
+
+#include <string>
+#include <vector>
+
+enum class Severity {
+  kOk,
+  kUnknown,   // this user may not see it
+  kWarning,   // something is wrong, and other tasks run all the same
+  kCritical,  // tasks do not run at all
+};
+
+struct Finding {
+  Severity severity;
+  const char *kind;  // a word by which programs tell it from others
+  std::string text;  // a sentence, with what helps against it
+  long task = 0;     // whose it is, when it is one task's
+  std::string taskName = {};
+};
+using Findings = std::vector<Finding>;
+
+// "ok", "unknown", "warning" or "critical".
+const char *nameOf(Severity severity);
+
+// The worst of them; kUnknown only where nothing is known to be wrong.
+Severity worstOf(const Findings &findings);

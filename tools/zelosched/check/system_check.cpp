@@ -1,0 +1,145 @@
+#include "check/system_check.h"
+
+#include <sched_shared_names.h>
+#include <sched_store_lock.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <zelocore.h>
+
+#include <cerrno>
+#include <cstring>
+#include <fstream>
+#include <iterator>
+#include <optional>
+
+#include "store/change_lock.h"
+#include "store/shared_names.h"
+#include "store/store_files.h"
+#include "terminal/number.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr char kCronPidFile[] = "/var/run/crond.pid";
+constexpr char kTmp[] = "/tmp";
+constexpr int kAlive = 1;
+
+std::string contents(const std::string &path) {
+  std::ifstream file(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
+
+std::string firstWord(const std::string &path) {
+  const std::string text = contents(path);
+  return text.substr(0, text.find_first_of(" \n"));
+}
+
+// A number that another program has got since must not pass for cron's.
+bool isCron(long pid) {
+  return firstWord("/proc/" + std::to_string(pid) + "/comm").find("cron") != std::string::npos;
+}
+
+// One that has it for a moment is no fault.
+pid_t lastingHolder(const char *lockFile) {
+  constexpr int kTries = 100;
+  constexpr useconds_t kPause = 20000;
+  const pid_t holder = schedLockHolder(lockFile);
+  for (int i = 0; i < kTries && holder != 0; ++i) {
+    usleep(kPause);
+    if (schedLockHolder(lockFile) != holder) return 0;
+  }
+  return holder;
+}
+
+}  // namespace
+
+Findings checkCron() {
+  const std::string text = firstWord(kCronPidFile);
+  const std::optional<long> pid = parseNumber(text);
+  const bool isRunning = pid && *pid > 0 && *pid <= INT32_MAX &&
+                         QLIBCProcAlive(static_cast<pid_t>(*pid)) == kAlive && isCron(*pid);
+  if (isRunning) return {{Severity::kOk, "cron", "cron is running (process " + text + ")"}};
+  return {{Severity::kCritical, "cron", "cron is not running: no task will start by itself"}};
+}
+
+Findings checkProgram() {
+  const auto critical = [](const std::string &what) {
+    return Findings{{Severity::kCritical, "program", kTaskProgram + what}};
+  };
+  struct stat info {};
+  if (lstat(kTaskProgram, &info) != 0) {
+    return critical(std::string(", which cron starts, cannot be examined: ") +
+                    std::strerror(errno));
+  }
+  const bool isProgram = S_ISREG(info.st_mode) && (info.st_mode & S_IXUSR) != 0;
+  if (!isProgram) return critical(" is no program");
+  if (info.st_uid != 0 || schedWhyForeign(kSchedTaskProgram, info) != nullptr) {
+    return critical(" is not root's alone: whoever can write it runs commands as root");
+  }
+  if (contents(kTaskProgram) == kSchedTaskProgram.contents) {
+    return critical(
+        " only stands in for the program that starts tasks: 'zelosched restore' puts that there");
+  }
+  return {{Severity::kOk, "program", std::string(kTaskProgram) + " is there, and root's"}};
+}
+
+Findings checkTmp() {
+  struct stat info {};
+  if (stat(kTmp, &info) != 0) {
+    return {{Severity::kCritical, "tmp",
+             std::string(kTmp) + " cannot be examined: " + std::strerror(errno)}};
+  }
+  const bool isForOthers = (info.st_mode & (S_IWGRP | S_IWOTH)) != 0;
+  if (info.st_uid == 0 && (!isForOthers || (info.st_mode & S_ISVTX) != 0)) {
+    return {{Severity::kOk, "tmp", std::string(kTmp) + " is root's, and sticky"}};
+  }
+  const char *const remedy = "'chown root /tmp' and 'chmod 1777 /tmp' set that right";
+  return {{Severity::kWarning, "tmp",
+           std::string(kTmp) + (info.st_uid != 0 ? " is not root's" : " is not sticky") +
+               ", so another user can put his own program in the place of the one that cron starts "
+               "as root: " +
+               remedy}};
+}
+
+Findings checkSharedNames() {
+  Findings findings;
+  for (const std::string &fault : sharedNameFaults()) {
+    findings.push_back({Severity::kWarning, "names", fault});
+  }
+  const size_t scratch = foreignScratchNames();
+  if (scratch > 0) {
+    findings.push_back({Severity::kWarning, "names",
+                        counted(scratch, "name") +
+                            " of scratch copies of the tasks in /tmp belong to other users: "
+                            "'zelosched restore' takes them away"});
+  }
+  const bool isStoreOurs = schedLookAt(kSchedStore, nullptr) != SchedNameState::kForeign;
+  if (findings.empty() && isStoreOurs) {
+    findings.push_back({Severity::kOk, "names", "no other user is in the way of a run"});
+  }
+  for (const std::string &directory : movedAway()) {
+    findings.push_back({Severity::kOk, "names",
+                        "what was in the way of ours in /tmp was moved to " + directory +
+                            ": look at it and delete it"});
+  }
+  return findings;
+}
+
+Findings checkTurns() {
+  if (geteuid() != 0) {
+    return {{Severity::kUnknown, "turns",
+             "whether changes of tasks have their turn, only root may see"}};
+  }
+  Findings findings;
+  for (const char *lockFile : {kSchedStoreLockFile, kChangeLockFile}) {
+    const pid_t holder = lastingHolder(lockFile);
+    if (holder == 0) continue;
+    findings.push_back({Severity::kWarning, "turns",
+                        processText(holder) + " keeps changes of tasks waiting: it holds " +
+                            lockFile + ": end it, if it does not end by itself"});
+  }
+  if (findings.empty()) {
+    findings.push_back({Severity::kOk, "turns", "changes of tasks have their turn"});
+  }
+  return findings;
+}
