@@ -130,6 +130,11 @@ export_is_valid() {
     same "$(z export | of '[k for t in top["tasks"] for k in ("id", "owner_uid", "next_run", "last_run", "problems") if k in t]')" "[]"
 }
 
+status_is_valid() {
+  all_kinds
+  { z status --json || true; } | is_valid status
+}
+
 nothing_is_valid() {
   clean
   z list --json | is_valid tasks && z list --power --json | is_valid tasks && z next --json | is_valid coming_runs &&
@@ -437,6 +442,7 @@ check "and of a run that goes on" a_run_that_goes_on_is_valid
 check "what 'next' tells, too" next_is_valid
 check "what 'power list' tells, too" power_list_is_valid
 check "what 'export' writes, too" export_is_valid
+check "what 'status' tells, too" status_is_valid
 check "and where there is nothing to tell" nothing_is_valid
 check "tasks that other programs have saved are told by it" what_others_saved_is_valid
 check "what is wrong with a task is told" tells_problems

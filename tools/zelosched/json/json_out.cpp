@@ -16,12 +16,14 @@ constexpr char kReplacement[] = "\xEF\xBF\xBD";
 
 // The order in which people read them; others come behind, by their names.
 constexpr const char *kOrder[] = {
-    "version",     "id",         "run",     "task",    "name",       "task_name", "app",
-    "app_name",    "app_args",   "action",  "owner",   "owner_uid",  "power",     "enabled",
-    "schedule",    "type",       "date",    "days",    "month",      "day",       "at",
-    "every_hours", "until_hour", "from",    "command", "time_limit", "overlap",   "trigger",
-    "due",         "queued",     "start",   "end",     "state",      "outcome",   "ui",
-    "next_run",    "last_run",   "running", "problems"};
+    "version",     "severity",   "kind",      "text",    "id",           "run",
+    "task",        "name",       "task_name", "app",     "app_name",     "app_args",
+    "action",      "owner",      "owner_uid", "power",   "enabled",      "schedule",
+    "type",        "date",       "days",      "month",   "day",          "at",
+    "every_hours", "until_hour", "from",      "command", "time_limit",   "overlap",
+    "trigger",     "due",        "queued",    "start",   "end",          "duration_seconds",
+    "state",       "outcome",    "exit_code", "signal",  "output_bytes", "ui",
+    "next_run",    "last_run",   "running",   "problems"};
 
 size_t rankOf(const std::string &name) {
   static const auto ranks = [] {
