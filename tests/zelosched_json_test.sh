@@ -283,7 +283,8 @@ exec(sys.argv[1])
 print(json.dumps(top))
 PY
     try z import "$SCRATCH/file"
-    says 1 "zelosched: $wanted" "zelosched: nothing was imported, because of 1 fault" && [[ -z $out ]] || { echo "$member"; bad=1; }
+    says 1 "zelosched: $wanted" "zelosched: nothing was imported, because of 1 fault" || { echo "$member"; bad=1; }
+    same "$out" "" || bad=1
     same "$(state_of_files)" "$before" || { echo "changed by $member"; bad=1; }
   done <<'FAULTS'
 del top["version"]|version: is missing
@@ -336,9 +337,9 @@ task["schedule"]["at"] = "08:300"|tasks[1].schedule.at: '08:300' is no time of d
 task["schedule"]["at"] = 8|tasks[1].schedule.at: 8 is no time of day: write it as "08:30"
 task["schedule"]["days"] = ["mon"]|tasks[1].schedule.days: is not for a schedule of type daily
 task["schedule"]["on"] = 1|tasks[1].schedule.on: there is no such member
-task["schedule"]["every_hours"] = 24|tasks[1].schedule.every_hours: must be a number from 1 to 23, not 24
-task["schedule"]["every_hours"] = 0|tasks[1].schedule.every_hours: must be a number from 1 to 23, not 0
-task["schedule"]["every_hours"] = 1.5|tasks[1].schedule.every_hours: must be a number from 1 to 23, not 1.5
+task["schedule"]["every_hours"] = 4294967296|tasks[1].schedule.every_hours: must be a number from 1 to 4294967295, not 4294967296
+task["schedule"]["every_hours"] = 0|tasks[1].schedule.every_hours: must be a number from 1 to 4294967295, not 0
+task["schedule"]["every_hours"] = 1.5|tasks[1].schedule.every_hours: must be a number from 1 to 4294967295, not 1.5
 task["schedule"]["until_hour"] = 18|tasks[1].schedule.until_hour: is for a task that repeats: add every_hours
 task["schedule"].update(every_hours=2, until_hour=24)|tasks[1].schedule.until_hour: must be a number from 0 to 23, not 24
 task["schedule"].update(every_hours=2, until_hour=7)|tasks[1].schedule.until_hour: is before the hour of "at"
@@ -420,8 +421,9 @@ an_import_that_does_not_fit_saves_nothing() {
   add --daily 08:30 --name one -- true
   add --daily 08:30 --name two -- true
   z export >"$SCRATCH/file"
-  yes '#' | head -n "$((9799 - $(wc -l </etc/crontab)))" >>/etc/crontab
-  local before
+  local before present
+  present=$(wc -l </etc/crontab)
+  yes '#' | head -n "$((9799 - present))" >>/etc/crontab
   before=$(state_of_files)
   try z import "$SCRATCH/file"
   [[ $status == 1 && $err == *"more than 9800 lines"* ]] && same "$(state_of_files)" "$before"

@@ -397,7 +397,8 @@ void readRepetition(Members *members, ZELO_SCHED_TASK *task) {
     task->LastWorkHour = 0;
   } else if (every != nullptr) {
     if (task->RepeatHour == 0) task->LastWorkHour = kLastHourOfDay;
-    const auto hours = readNumber(*every, "every_hours", 1, kLastHourOfDay, members);
+    // More than a day is one run a day, as another program may have saved it.
+    const auto hours = readNumber(*every, "every_hours", 1, UINT32_MAX, members);
     task->RepeatHour = hours.value_or(1);  // which is told, and nothing else is to be because of it
   }
   if (until == nullptr) return;
