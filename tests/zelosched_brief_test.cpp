@@ -109,14 +109,14 @@ TEST(ZeloschedRunInBriefTest, ARunThatGoesOn) {
   run.state = RunState::kRunning;
   run.start = 200;
   EXPECT_EQ(runInBrief(run, 200 + 17 * 60), "running for 17 min");
-  EXPECT_FALSE(isBad(run));
+  EXPECT_FALSE(endedBadly(run));
 }
 
 TEST(ZeloschedRunInBriefTest, WhatEndedOtherwiseThanWellIsBad) {
-  EXPECT_FALSE(isBad(ended(Outcome::kFinished, 0)));
+  EXPECT_FALSE(endedBadly(ended(Outcome::kFinished, 0)));
   for (const Outcome outcome : {Outcome::kFailed, Outcome::kKilled, Outcome::kNotStarted,
                                 Outcome::kTimeLimit, Outcome::kGaveUp, Outcome::kLost}) {
-    EXPECT_TRUE(isBad(ended(outcome, 0)));
+    EXPECT_TRUE(endedBadly(ended(outcome, 0)));
   }
 }
 

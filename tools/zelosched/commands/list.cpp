@@ -98,7 +98,7 @@ class Choice {
  private:
   bool hasFailed(const ZELO_SCHED_TASK &task) const {
     const RunRecord *last = runs_.of(task.ID);
-    return last != nullptr && isBad(*last);
+    return last != nullptr && endedBadly(*last);
   }
 
   const Arguments &arguments_;
@@ -151,7 +151,7 @@ void printTable(const std::vector<Row> &rows, time_t now) {
                {"LAST RUN", Column::kLeft, true, true}});
   for (const Row &row : rows) {
     const Emphasis dim = isEnabled(*row.task) ? Emphasis::kNone : Emphasis::kDim;
-    const bool failed = row.last != nullptr && isBad(*row.last);
+    const bool failed = row.last != nullptr && endedBadly(*row.last);
     table.add({{std::to_string(row.task->ID)},
                {row.task->Name},
                {row.owner},

@@ -112,12 +112,12 @@ std::string outcomeInBrief(const RunRecord &run) {
 
 std::string runInBrief(const RunRecord &run, long now) {
   const std::optional<long> moment = run.end ? run.end : run.start ? run.start : run.queued;
-  const std::string outcome = outcomeInBrief(run);
+  std::string outcome = outcomeInBrief(run);
   if (!moment) return outcome;
   const std::string span = spanText(now - *moment);
   return run.state == RunState::kEnded ? outcome + ", " + span + " ago" : outcome + " for " + span;
 }
 
-bool isBad(const RunRecord &run) {
+bool endedBadly(const RunRecord &run) {
   return run.state == RunState::kEnded && run.outcome != Outcome::kFinished;
 }

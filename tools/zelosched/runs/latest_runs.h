@@ -25,4 +25,4 @@ std::string outcomeInBrief(const RunRecord &run);
 std::string runInBrief(const RunRecord &run, long now);
 
 // The run is over and did not end well.
-bool isBad(const RunRecord &run);
+bool endedBadly(const RunRecord &run);
