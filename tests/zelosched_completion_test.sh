@@ -13,16 +13,12 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 
-readonly SCRATCH=/tmp/zelosched_completion_test
-export TZ=UTC PATH=$BUILD_DIR/bin:$PATH HOME=$SCRATCH LC_ALL=C.UTF-8
-mkdir -p "$SCRATCH"
-cp /etc/crontab "$SCRATCH/crontab"
+export PATH=$BUILD_DIR/bin:$PATH HOME=$SCRATCH LC_ALL=C.UTF-8
 
 two_tasks() {
-  rm -rf /tmp/scheduled_tasks /usr/zelo/etc/scheduled_tasks* /usr/zelo/etc/power_sched.conf
-  cp "$SCRATCH/crontab" /etc/crontab
-  z add --quiet --daily 08:30 --name 'Nightly backup' -- true >/dev/null
-  z add --quiet --daily 08:30 --name 'Mirror: all' -- true >/dev/null
+  clean
+  add --daily 08:30 --name 'Nightly backup' -- true
+  add --daily 08:30 --name 'Mirror: all' -- true
   z power add off --daily 23:00 >/dev/null
 }
 
@@ -150,6 +146,7 @@ the_scripts_are_well_formed() {
     { ! command -v fish >/dev/null || fish --no-execute "$SCRATCH/fish"; }
 }
 
+start_zelosched_tests
 check "bash completes" bash_completes
 for shell in zsh fish; do
   if command -v "$shell" >/dev/null; then

@@ -12,30 +12,10 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 
-readonly SCRATCH=/tmp/zelosched_json_test
-readonly STORE=/tmp/scheduled_tasks
-readonly PERSISTENT=/usr/zelo/etc/scheduled_tasks
 readonly PYTHON=/usr/bin/python3 # which has Debian's jsonschema
-unset LC_ALL LANG
 export TZ=Europe/Berlin
-mkdir -p "$SCRATCH"
-cp /etc/crontab "$SCRATCH/crontab"
-# A machine whose clock can be armed.
-mount -t tmpfs sys /sys
-mkdir -p /sys/class/rtc/rtc0
-touch /sys/class/rtc/rtc0/wakealarm
 
 # ---- helpers --------------------------------------------------------------------------------
-
-clean() {
-  rm -rf "$STORE" "$PERSISTENT"* /tmp/sched_status.sqlite* /tmp/lock /usr/zelo/etc/power_sched.conf \
-    /usr/zelo/var/history.sqlite*
-  cp "$SCRATCH/crontab" /etc/crontab
-}
-
-add() {
-  z add --quiet "$@" >/dev/null
-}
 
 is_valid() {
   "$PYTHON" "$here/support/json_schema.py" "$@"
@@ -51,10 +31,6 @@ says() {
   local wanted=$1
   shift
   same "$status: $err" "$wanted: $(printf '%s\n' "$@")"
-}
-
-state_of_files() {
-  cat "$STORE" "$PERSISTENT" /etc/crontab 2>&1 | sha256sum
 }
 
 # Of every kind: types, states, texts, runs that ended in all ways, and what other programs save.
@@ -272,7 +248,7 @@ imports_of_lists_can_be_pretty() {
 tells_every_fault() {
   local bad=0 member wanted before
   all_kinds
-  before=$(state_of_files)
+  before=$(state)
   while IFS='|' read -r member wanted; do
     [[ -n $member ]] || continue
     "$PYTHON" - "$member" >"$SCRATCH/file" <<'PY'
@@ -285,7 +261,7 @@ PY
     try z import "$SCRATCH/file"
     says 1 "zelosched: $wanted" "zelosched: nothing was imported, because of 1 fault" || { echo "$member"; bad=1; }
     same "$out" "" || bad=1
-    same "$(state_of_files)" "$before" || { echo "changed by $member"; bad=1; }
+    same "$(state)" "$before" || { echo "changed by $member"; bad=1; }
   done <<'FAULTS'
 del top["version"]|version: is missing
 top["version"] = 2|version: is 2, and this zelosched reads 1
@@ -424,9 +400,9 @@ an_import_that_does_not_fit_saves_nothing() {
   local before present
   present=$(wc -l </etc/crontab)
   yes '#' | head -n "$((9799 - present))" >>/etc/crontab
-  before=$(state_of_files)
+  before=$(state)
   try z import "$SCRATCH/file"
-  [[ $status == 1 && $err == *"more than 9800 lines"* ]] && same "$(state_of_files)" "$before"
+  [[ $status == 1 && $err == *"more than 9800 lines"* ]] && same "$(state)" "$before"
 }
 
 times_have_the_distance_of_their_day() {
@@ -438,6 +414,7 @@ times_have_the_distance_of_their_day() {
       "2026-03-02T08:30:00-03:30"
 }
 
+start_zelosched_tests
 check "what 'list' tells is what the schema says" list_is_valid
 check "what 'show' tells, too" show_is_valid
 check "and of a run that goes on" a_run_that_goes_on_is_valid
@@ -468,5 +445,4 @@ check "too many tasks are refused" a_file_that_is_too_large_is_refused
 check "--new stands with --wire alone" new_is_for_wire
 check "an import whose lines do not fit saves nothing" an_import_that_does_not_fit_saves_nothing
 check "times are told with the distance from UTC of their day" times_have_the_distance_of_their_day
-clean
 finish

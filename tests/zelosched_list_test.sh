@@ -13,25 +13,10 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 
-readonly SCRATCH=/tmp/zelosched_list_test
-readonly STORE=/tmp/scheduled_tasks
 readonly USAGE=2
-unset LC_ALL LANG NO_COLOR COLUMNS
-export TZ=UTC
-mkdir -p "$SCRATCH"
-cp /etc/crontab "$SCRATCH/crontab"
+unset COLUMNS
 
 # ---- helpers --------------------------------------------------------------------------------
-
-clean() {
-  rm -rf "$STORE" /usr/zelo/etc/scheduled_tasks* /tmp/sched_status.sqlite* /tmp/lock \
-    /usr/zelo/etc/power_sched.conf /usr/zelo/var/history.sqlite*
-  cp "$SCRATCH/crontab" /etc/crontab
-}
-
-add() {
-  z add --quiet "$@" >/dev/null
-}
 
 gives() {
   local wanted_status=$1 wanted=$2
@@ -60,7 +45,7 @@ print(seen.decode().replace("\r\n", "\n"), end="")
 PTY
 }
 
-names() {
+chosen() {
   z list --sort id --json "$@" | python3 -c 'import json, sys
 print(*(task["name"] for task in json.load(sys.stdin)["tasks"]), sep=",")'
 }
@@ -128,9 +113,9 @@ chooses() {
   common_tasks
   add --daily 08:30 --name other --app backup --owner nobody -- 'sleep 100'
   z run 6 >/dev/null
-  until [[ -n $(names --running) ]]; do sleep 0.01; done
-  same "$(names --failed)|$(names --owner nobody)|$(names --owner 65534)|$(names --app backup)|$(names --running)|$(
-    names --owner root --failed)|$(names --owner nobody --failed)" \
+  until [[ -n $(chosen --running) ]]; do sleep 0.01; done
+  same "$(chosen --failed)|$(chosen --owner nobody)|$(chosen --owner 65534)|$(chosen --app backup)|$(chosen --running)|$(
+    chosen --owner root --failed)|$(chosen --owner nobody --failed)" \
     "Nightly backup|other|other|other|other|Nightly backup|" &&
     gives 1 "zelosched: there is no user 'nix'" list --owner nix
 }
@@ -181,13 +166,13 @@ a_name_of_several_is_refused() {
     gives 1 "zelosched: 'same' is the name of tasks 1, 3 and 4: give the id of one" $command same || return 1
   done
   gives 1 "zelosched: 'same' is the name of tasks 1, 3 and 4: give the id of one" edit same --daily 09:00 &&
-    same "$(names)" "same,other,same,same"
+    same "$(chosen)" "same,other,same,same"
 }
 
 an_unknown_name_changes_nothing() {
   clean
   add --daily 08:30 --name one -- true
-  gives 1 "zelosched: there is no task of the name 'two'" remove --yes one two && same "$(names)" one &&
+  gives 1 "zelosched: there is no task of the name 'two'" remove --yes one two && same "$(chosen)" one &&
     gives 1 "zelosched: there is no task of the name 'One'" show One &&
     gives 1 "zelosched: there is no task of the name 'a\\x1b'" show $'a\e' &&
     gives 1 "zelosched: there is no task of the name ''" show ''
@@ -272,6 +257,7 @@ a_command_that_grows_too_long_is_refused() {
   [[ $status == 1 && $err == *"with its time limit the command is"* ]] && same "$(stored_command 1 | wc -c)" "$most"
 }
 
+start_zelosched_tests
 check "the list tells at a glance what runs when, and how it went" tells_at_a_glance
 check "it is whole at 80 columns" is_whole_at_80_columns
 check "and loses nothing at 60" nothing_is_lost_at_60_columns
@@ -290,5 +276,4 @@ check "a command of another form is shown as it is" other_commands_are_shown_as_
 check "what is no limit is refused" wrong_limits_are_usage_errors
 check "a power time has none" a_limit_is_not_for_power_times
 check "a command that is too long with its limit is refused" a_command_that_grows_too_long_is_refused
-clean
 finish
