@@ -44,6 +44,7 @@ fails_saying() {
 clean() {
   rm -rf "$STORE" "$PERSISTENT" /tmp/sched_status.sqlite* /tmp/lock /usr/zelo/etc/power_sched.conf
   cp "$SCRATCH/crontab" /etc/crontab
+  rm -rf /usr/zelo/var
 }
 
 state_of_files() {
@@ -875,8 +876,7 @@ tells_that_a_run_gave_up() {
 with sqlite3.connect("/tmp/sched_status.sqlite") as database:
     database.execute("UPDATE task_status SET status_code=2, pid=?", [int(sys.argv[1])])' $$
   FAKE_PATIENCE=1 LD_PRELOAD=$FAKE try z run --wait 1
-  same "$status: ${err%% (the*}" "1: zelosched: task 1 (Task 1) did not run: it could not be\
- recorded, or other runs were in its way for too long"
+  same "$status: $err" "1: zelosched: task 1 (Task 1) gave up waiting"
 }
 
 has_its_turn_whatever_is_in_the_way() {
@@ -892,7 +892,7 @@ tells_that_a_run_died() {
   clean
   add --daily 08:30 -- 'kill -9 $PPID' >/dev/null
   gives 1 "zelosched: task 1 (Task 1) was running but its process is gone" run --wait 1 &&
-    same "$(z history --json | json 'tasks[0]["result"]')" "was running but its process is gone"
+    same "$(z history --json | json 'tasks["runs"][0]["outcome"]')" "lost"
 }
 
 keeps_history() {
@@ -902,12 +902,13 @@ keeps_history() {
   z run --wait 1 2>/dev/null || true
   z run --wait 2 >/dev/null
   z remove --yes 2 >/dev/null
+  rm -r /usr/zelo/var
   sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET timestamp = 1795161600 + status_id"
-  same "$(z history)" "START                DURATION  ID  RESULT                   NAME
-2026-11-20 08:00:02         -   2  finished                 -
-2026-11-20 08:00:01         -   1  failed with exit code 3  one" &&
-    same "$(z history 1 --json | json '[(t["id"], t["status code"], t["comment"], t["timestamp"])
-      for t in tasks]')" "[(1, 7, '3', 1795161601)]" &&
+  same "$(z history)" "START                DURATION  RUN  TASK  OUTCOME                  NAME
+2026-11-20 08:00:02         -    2     2  finished                 -
+2026-11-20 08:00:01         -    1     1  failed with exit code 3  one" &&
+    same "$(z history 1 --json | json '[(r["task"], r["outcome"], r["exit_code"], r["start"][:19])
+      for r in tasks["runs"]]')" "[(1, 'failed', 3, '2026-11-20T08:00:01')]" &&
     same "$(z history --limit 1 | wc -l)" 2 &&
     same "$(z list | awk '/one/ { print $7, $8, $9, $10, $11 }')" "failed with exit code 3"
 }
@@ -916,9 +917,10 @@ shows_how_long_a_run_goes_on() {
   clean
   add --daily 08:30 -- true >/dev/null
   z run --wait 1 >/dev/null
+  rm -r /usr/zelo/var
   sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET status_code = 2, pid = $$, timestamp = 1795161600"
   same "$(at '2026-11-20 09:01:05' history | tail -1)" \
-    "2026-11-20 08:00:00   1:01:05   1  running  Task 1" &&
+    "2026-11-20 08:00:00   1:01:05    1     1  running  Task 1" &&
     same "$(z status | grep running | tail -1)" \
       "ok        task 1 (Task 1) is running since 2026-11-20 08:00 as process $$"
 }
@@ -1230,20 +1232,22 @@ every_result_is_told_in_words() {
   local code bad=0
   while IFS='|' read -r code comment words; do
     sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET status_code=$code, comment='$comment', pid=${pid:-$$}"
+    rm -r /usr/zelo/var
     [[ $(z history 1 | tail -1) == *"$words"* ]] || { echo "$code: $(z history 1)"; bad=1; }
   done <<'RESULTS'
-0||ended without a result
+0||could not start
 3||finished
 4||could not start
-5|19|stopped by signal SIGSTOP (19)
+5|19|killed by signal SIGSTOP (19)
 6|9|killed by signal SIGKILL (9)
 6|77|killed by signal 77
 7|3|failed with exit code 3
-9||ended with the unknown status 9
+9||was running but its process is gone
 2||running
 RESULTS
   for pid in -1 0 4294967297; do
     sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET status_code=2, pid=$pid"
+    rm -r /usr/zelo/var
     [[ $(z history 1 | tail -1) == *"was running but its process is gone"* ]] || { echo "$pid"; bad=1; }
   done
   return "$bad"

@@ -322,6 +322,7 @@ bool Keeper::adopt(long number) {
     lastStatusId_ = *run_.statusId - 1;
     started_.reset();
   }
+  run_.outputBytes = output_.total();
   began_ = seconds();
   isDirty_ = false;
   task_ = findTask(run_.task);

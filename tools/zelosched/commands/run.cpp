@@ -127,7 +127,6 @@ RunRecord waitWithoutKeeper(const RunEvents &events) {
 
 RunRecord waitForEnd(StartedRun *run, const std::string &title, RunOutput *output) {
   Progress progress(title);
-  catchInterrupts();
   bool isOutputOpen = output != nullptr;
   while (!run->isSilent()) {
     if (interruptedBy != 0) endInterrupted(*run, title, &progress);
@@ -149,6 +148,7 @@ RunRecord waitForEnd(StartedRun *run, const std::string &title, RunOutput *outpu
 void runAndWait(const ZELO_SCHED_TASK &task, bool showsOutput) {
   RunRequest request;
   request.wantsOutput = showsOutput;
+  catchInterrupts();
   StartedRun run(task, request);
   std::optional<RunOutput> output;
   if (showsOutput) output.emplace(run.output());

@@ -34,7 +34,9 @@ class Sweep {
   void takeOver(const KeptDatabase &kept);
   void takeOver(const KeptDatabase &kept, const Run &row);
   void lookAfter(const KeptDatabase &kept, KeptRun run);
-  void endByRow(KeptRun *run);
+  std::optional<Run> rowOf(const KeptRun &run) const;
+  bool isOverByItsRow(const KeptRun &run) const;
+  void endByRow(KeptRun *run) const;
   const TaskRecord *taskOf(const KeptRun &run) const;
   void describe(KeptRun *run) const;
   void save(const KeptDatabase &kept, KeptRun *run);
@@ -133,14 +135,25 @@ void Sweep::takeOver(const KeptDatabase &kept) {
       .run();
 }
 
-// Its process is gone, and no keeper is there to say how it ended.
-void Sweep::endByRow(KeptRun *run) {
-  const std::optional<Run> row =
-      run->statusId ? status_.runOfId(*run->statusId) : status_.runOfProcess(run->process.pid, 0);
+// In the status database.
+std::optional<Run> Sweep::rowOf(const KeptRun &run) const {
+  std::optional<Run> row =
+      run.statusId ? status_.runOfId(*run.statusId) : status_.runOfProcess(run.process.pid, 0);
+  if (!row || row->pid != run.process.pid || row->taskId != run.task) return std::nullopt;
   const bool isItsTime =
-      row && (run->start ? row->start == *run->start : run->queued && row->start >= *run->queued);
-  const bool isSame = isItsTime && row->pid == run->process.pid && row->taskId == run->task;
-  if (isSame) {
+      run.start ? row->start == *run.start : run.queued && row->start >= *run.queued;
+  return isItsTime ? row : std::nullopt;
+}
+
+// Written by the process last of all.
+bool Sweep::isOverByItsRow(const KeptRun &run) const {
+  const std::optional<Run> row = rowOf(run);
+  return row && row->statusCode != ZELO_SCHED_STATUS_RUNNING;
+}
+
+// Its process is gone, and no keeper is there to say how it ended.
+void Sweep::endByRow(KeptRun *run) const {
+  if (const std::optional<Run> row = rowOf(*run)) {
     takeStatus(*row, run);
   } else {
     run->outcome = run->stopAsked && !run->start ? Outcome::kCancelled : Outcome::kLost;
@@ -155,8 +168,11 @@ void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
   const bool isOfThisBoot = run.boot == boot_;
   if (isOfThisBoot && isAlive(run.keeper)) return;
   if (isOfThisBoot && isProcessAlive(run)) {
-    if (run.keeper.pid != 0) withoutKeeper_.push_back(run.run);
-    return;
+    if (run.keeper.pid != 0) {
+      withoutKeeper_.push_back(run.run);
+      return;
+    }
+    if (!isOverByItsRow(run)) return;
   }
   if (isOfThisBoot) {
     endByRow(&run);
