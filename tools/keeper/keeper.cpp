@@ -165,10 +165,18 @@ std::vector<pid_t> ownChildren() {
   return found;
 }
 
-// What the command leaves behind becomes ours too, behind it.
+// What the command leaves behind becomes ours too, behind it. One that is about to end has no program
+// any more, and is not over yet.
 pid_t runsProcess() {
-  for (const pid_t pid : ownChildren()) {
-    if (isOver(pid) || (isOfRoot(pid) && isOfOurProgram(pid))) return pid;
+  constexpr int kLooks = 1000;
+  constexpr useconds_t kPause = 1000;
+  for (int i = 0; i < kLooks; ++i) {
+    const std::vector<pid_t> all = ownChildren();
+    if (all.empty()) return 0;
+    for (const pid_t pid : all) {
+      if (isOver(pid) || (isOfRoot(pid) && isOfOurProgram(pid))) return pid;
+    }
+    usleep(kPause);
   }
   return 0;
 }
