@@ -140,8 +140,9 @@ std::optional<Run> Sweep::rowOf(const KeptRun &run) const {
   std::optional<Run> row =
       run.statusId ? status_.runOfId(*run.statusId) : status_.runOfProcess(run.process.pid, 0);
   if (!row || row->pid != run.process.pid || row->taskId != run.task) return std::nullopt;
+  // Before its row was read, a start is when a keeper saw it.
   const bool isItsTime =
-      run.start ? row->start == *run.start : run.queued && row->start >= *run.queued;
+      run.statusId ? row->start == run.start : run.queued && row->start >= *run.queued;
   return isItsTime ? row : std::nullopt;
 }
 
