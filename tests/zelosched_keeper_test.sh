@@ -3,13 +3,18 @@
 # what becomes of it when its keeper is killed or nothing can be written, and how it is stopped.
 #
 # Runs wait for a line in a named pipe, so that each is where the test wants it to be.
+#
+# Functions are called by check:
+# shellcheck disable=SC2016,SC2317
 set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
-. "$(dirname "$0")/support/shell_test.sh"
+. "$here/support/shell_test.sh"
 
 readonly SCRATCH=/tmp/keeper_test
 # shellcheck source=tests/support/zelosched_test.sh
-. "$(dirname "$0")/support/zelosched_test.sh"
+. "$here/support/zelosched_test.sh"
 
 readonly STATUS=/tmp/sched_status.sqlite KEPT=/usr/zelo/var/history.sqlite
 readonly PROGRAM=$BUILD_DIR/bin/zeloschedtask
@@ -106,7 +111,7 @@ writes_how_a_run_of_crons_went() {
   clean
   add 'echo said; echo complained >&2; exit 7' --name backup
   as_cron --run id=1 || return 1
-  ended_as $FAILED &&
+  ended_as "$FAILED" &&
     run_is "1 backup root 0 7 16 1" "task, task_name, owner, started_by, exit_code, output_bytes, duration < 60" &&
     run_is "2026-11-20 08:30:00" "datetime(due, 'unixepoch')" &&
     same "$(z log 1)" $'said\ncomplained'
@@ -149,7 +154,7 @@ tells_that_a_run_gave_up() {
   add "$HOLD"
   start 1
   FAKE_PATIENCE=1 LD_PRELOAD=$FAKE try z run --wait 1
-  same "$status $err" "1 zelosched: task 1 (Task 1) gave up waiting" && ended_as $GAVE_UP && go
+  same "$status $err" "1 zelosched: task 1 (Task 1) gave up waiting" && ended_as "$GAVE_UP" && go
 }
 
 an_interrupt_cancels_what_waits() {
@@ -168,9 +173,10 @@ while not waiting():
     time.sleep(0.02)
 run.send_signal(signal.SIGINT)
 said = run.communicate(timeout=60)[0]
-sys.exit(said != "task 1 (Task 1) will not run: it was waiting for its turn\n" or run.returncode != -signal.SIGINT)
+if said != "task 1 (Task 1) will not run: it was waiting for its turn\n" or run.returncode != -signal.SIGINT:
+    sys.exit(f"{said!r} {run.returncode}")
 INTERRUPT
-  ended_as $CANCELLED && run_is 1 "(SELECT count(*) FROM run WHERE state = 1)" && go
+  ended_as "$CANCELLED" && run_is 1 "(SELECT count(*) FROM run WHERE state = 1)" && go
 }
 
 says_how_each_run_ended() {
@@ -195,7 +201,7 @@ an_owner_who_is_gone_is_told_as_not_started() {
   add true
   sed -i 's/^owner=.*/owner="54321"/' /tmp/scheduled_tasks
   try z run --wait 1
-  same "$status $err" "1 zelosched: task 1 (Task 1) could not start" && ended_as $NOT_STARTED &&
+  same "$status $err" "1 zelosched: task 1 (Task 1) could not start" && ended_as "$NOT_STARTED" &&
     run_is 54321 owner
 }
 
@@ -204,7 +210,7 @@ ends_what_is_left_past_the_limit() {
   clean
   add "timeout --kill-after=30s 1s sh -c 'setsid sh -c \"echo \\\$\\\$ >$SCRATCH/ran; exec sleep 1000\" & sleep 1000'"
   try z run --wait 1
-  same "$status $err" "1 zelosched: task 1 (Task 1) ended by its time limit" && ended_as $TIME_LIMIT &&
+  same "$status $err" "1 zelosched: task 1 (Task 1) ended by its time limit" && ended_as "$TIME_LIMIT" &&
     is_gone "$(cat "$SCRATCH/ran")"
 }
 
@@ -212,7 +218,7 @@ its_own_exit_code_before_the_limit_is_a_failure() {
   clean
   add "timeout --kill-after=30s 2h sh -c 'exit 124'"
   try z run --wait 1
-  ended_as $FAILED
+  ended_as "$FAILED"
 }
 
 measures_by_a_clock_that_nobody_sets() {
@@ -222,7 +228,7 @@ measures_by_a_clock_that_nobody_sets() {
   # Its row says that it began tomorrow.
   sqlite3 "$STATUS" ".timeout 10000" "UPDATE task_status SET timestamp = timestamp + 86400"
   go
-  ended_as $FINISHED && run_is "1 1" "duration >= 0, duration < 60"
+  ended_as "$FINISHED" && run_is "1 1" "duration >= 0, duration < 60"
 }
 
 check "how a run of cron's went is written, with what it printed" writes_how_a_run_of_crons_went
@@ -261,7 +267,7 @@ a_run_may_close_its_output() {
   add "exec >&- 2>&-; $HOLD"
   start 1
   go
-  ended_as $FINISHED && run_is 0 output_bytes
+  ended_as "$FINISHED" && run_is 0 output_bytes
 }
 
 an_owner_writes_to_stderr_by_name() {
@@ -273,7 +279,7 @@ an_owner_writes_to_stderr_by_name() {
 a_daemon_does_not_keep_a_run_from_ending() {
   clean
   add "setsid sh -c 'echo \$\$ >$SCRATCH/ran; read -r line <$SCRATCH/go; head -c 1000000 /dev/zero; echo wrote >$SCRATCH/ran2' & until test -s $SCRATCH/ran; do :; done; echo said"
-  z run --wait 1 >/dev/null && same "$(z log 1)" said && ended_as $FINISHED || return 1
+  z run --wait 1 >/dev/null && same "$(z log 1)" said && ended_as "$FINISHED" || return 1
   # It is read on, and is not the run's any more.
   fails_saying "is not running" z stop 1 && go && until_is wrote cat "$SCRATCH/ran2" && is_gone_by_name
 }
@@ -302,7 +308,7 @@ keeps_none_on_a_disk_that_is_nearly_full() {
   clean
   echo 'output-free = 100%' >/etc/zelosched.conf
   add 'echo said'
-  z run --wait 1 >/dev/null && ended_as $FINISHED && same "$(sql "SELECT count(*) FROM output")" 0
+  z run --wait 1 >/dev/null && ended_as "$FINISHED" && same "$(sql "SELECT count(*) FROM output")" 0
 }
 
 tells_of_a_setting_that_is_wrong() {
@@ -338,7 +344,7 @@ a_killed_keeper_ends_no_run() {
   kill -9 "$killed"
   is_gone "$killed"
   z history >/dev/null # has another one look after it
-  until_is 0 sql "SELECT keeper = $killed FROM run" && go && ended_as $FINISHED &&
+  until_is 0 sql "SELECT keeper = $killed FROM run" && go && ended_as "$FINISHED" &&
     same "$(cat "$SCRATCH/ran")" ran && run_is 1000006 output_bytes && same "$(z log 1 | head -c 5)" first
 }
 
@@ -351,7 +357,7 @@ a_killed_keeper_leaves_the_end_to_the_sweep() {
   go
   is_gone "$run_process"
   z history >/dev/null
-  ended_as $FAILED && run_is "1 4" "count(*), exit_code" && same "$(z log 1)" first
+  ended_as "$FAILED" && run_is "1 4" "count(*), exit_code" && same "$(z log 1)" first
 }
 
 # As the parent of the run it is seen by the caller, which starts the run where there is none.
@@ -412,7 +418,7 @@ while not os.path.exists(sys.argv[3] + "/ran"):
     time.sleep(0.02)
 held.execute("COMMIT")
 HOLD
-  ended_as $FINISHED && run_is 1000000 output_bytes
+  ended_as "$FINISHED" && run_is 1000000 output_bytes
 }
 
 the_history_can_be_unmounted_while_a_command_runs() {
@@ -424,7 +430,7 @@ the_history_can_be_unmounted_while_a_command_runs() {
   until_is 1 sql "SELECT state FROM run"
   local i
   for ((i = 0; i < 600; i++)); do umount -n /usr/zelo/var 2>/dev/null && break; sleep 0.05; done
-  ! mountpoint -q /usr/zelo/var && go && is_gone "$run_process" && ended_as $FINISHED
+  ! mountpoint -q /usr/zelo/var && go && is_gone "$run_process" && ended_as "$FINISHED"
 }
 
 two_hundred_runs_at_once_are_all_written() {
@@ -457,21 +463,21 @@ stops_all_of_a_run() {
   add "sleep 1000 & setsid sleep 1000 & setsid sh -c 'sleep 1000 & exit' ; (trap : TERM; echo \$PPID >$SCRATCH/begun; while :; do sleep 1000; done)"
   start 1
   same "$(z stop 1 --grace 1)" "task 1 (Task 1) stopped; something of it had to be killed" &&
-    ended_as $STOPPED && until_is "" pgrep -x sleep && same "$(sqlite3 "$STATUS" "SELECT status_code IN (6, 7) FROM task_status")" 1
+    ended_as "$STOPPED" && until_is "" pgrep -x sleep && same "$(sqlite3 "$STATUS" "SELECT status_code IN (6, 7) FROM task_status")" 1
 }
 
 stops_what_forks_all_the_time() {
   clean
   add "trap : TERM; echo \$PPID >$SCRATCH/begun; while :; do setsid sh -c 'trap : TERM; sleep 1000' & sleep 0.01; done"
   start 1
-  z stop 1 --grace 0 >/dev/null && ended_as $STOPPED && until_is "" pgrep -x sleep
+  z stop 1 --grace 0 >/dev/null && ended_as "$STOPPED" && until_is "" pgrep -x sleep
 }
 
 one_that_finishes_all_the_same_has_finished() {
   clean
   add "trap 'exit 0' TERM; $HOLD; exit 0"
   start 1
-  z stop 1 >/dev/null && ended_as $FINISHED && run_is 1 "stop_asked IS NOT NULL"
+  z stop 1 >/dev/null && ended_as "$FINISHED" && run_is 1 "stop_asked IS NOT NULL"
 }
 
 stops_a_run_without_keeper() {
@@ -481,7 +487,7 @@ stops_a_run_without_keeper() {
   until_is 1 sql "SELECT state FROM run"
   kill -9 "$(keeper_of)"
   is_gone "$(keeper_of)"
-  [[ $(z stop 1) == "task 1 (Task 1) stopped"* ]] && is_gone "$run_process" && z history >/dev/null && ended_as $STOPPED
+  [[ $(z stop 1) == "task 1 (Task 1) stopped"* ]] && is_gone "$run_process" && z history >/dev/null && ended_as "$STOPPED"
 }
 
 a_removed_task_starts_no_more() {
@@ -512,7 +518,7 @@ a_disabled_task_goes_on_and_is_told() {
 a run of it is under way, and goes on: 'zelosched stop 1' ends it" &&
     same "$(z enable 1; z disable --stop 1)" "task 1 (Task 1) enabled
 task 1 (Task 1) disabled
-a run of it stopped" && ended_as $STOPPED
+a run of it stopped" && ended_as "$STOPPED"
 }
 
 stop_races_the_end() {

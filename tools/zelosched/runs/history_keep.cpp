@@ -59,8 +59,8 @@ bool isKnown(const KeptDatabase &kept, const Run &row) {
   return isThere;
 }
 
-// Its keeper has noted that it waits.
-std::vector<KeptRun> waitingOf(const KeptDatabase &kept, const Run &row, const std::string &boot) {
+// Noted by its keeper, which reads the row at the end alone.
+std::vector<KeptRun> underWayOf(const KeptDatabase &kept, const Run &row, const std::string &boot) {
   RunFilter filter;
   filter.underWay = true;
   std::vector<KeptRun> found = runsOf(kept, filter);
@@ -97,22 +97,25 @@ void Sweep::save(const KeptDatabase &kept, KeptRun *run) {
 
 void Sweep::takeOver(const KeptDatabase &kept, const Run &row) {
   if (isKnown(kept, row)) return;
-  std::vector<KeptRun> waiting = waitingOf(kept, row, boot_);
-  KeptRun run = waiting.empty() ? KeptRun() : waiting.front();
+  std::vector<KeptRun> underWay = underWayOf(kept, row, boot_);
+  if (!underWay.empty()) {
+    KeptRun &run = underWay.front();
+    if (isAlive(run.keeper)) return;  // which writes it at the end
+    run.start = row.start;
+    run.statusId = row.statusId;
+    run.state = RunState::kRunning;  // until somebody has looked after it
+    save(kept, &run);
+    return;
+  }
+  KeptRun run;
   run.task = row.taskId;
   run.app = row.app;
   run.boot = boot_;
+  run.trigger = Trigger::kOther;
   takeStatus(row, &run);
-  if (waiting.empty()) {
-    run.trigger = Trigger::kOther;
-    describe(&run);
-    if (run.state == RunState::kRunning) run.process = processNamed(row.pid);
-    run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
-  } else if (isAlive(run.keeper)) {
-    return;  // which is about to write it
-  } else if (run.state == RunState::kEnded) {
-    run.outputBytes = std::max(run.outputBytes, OutputFile::open(run.process).total());
-  }
+  describe(&run);
+  if (run.state == RunState::kRunning) run.process = processNamed(row.pid);
+  run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
   save(kept, &run);
 }
 
@@ -208,7 +211,7 @@ long sweep() {
   Sweep sweep(status, list);
   const long changed = sweep.run(kept);
   for (const long run : sweep.runsWithoutKeeper()) {
-    startDetached({"--keep", "run=" + std::to_string(run)});
+    startDetached(installedTaskProgram(), {"--keep", "run=" + std::to_string(run)});
   }
   return changed;
 }
@@ -235,6 +238,26 @@ std::vector<KeptRun> takeUntold(const KeptDatabase &kept) {
   return untold;
 }
 
+// What an administrator's programs need, such as a mailer, the unit of the sweep does not have.
+void haveRunsToldOf() {
+  if (!isAnybodyToBeTold()) return;
+  if (isUnit()) {
+    startDetached(ownProgram(), {"history", "--tell"});
+  } else {
+    tellOfRuns();
+  }
+}
+
+void dropOld() {
+  const KeptDatabase kept(KeptDatabase::kChange);
+  Transaction transaction(kept);
+  SettingsFaults faults;
+  dropOldRuns(kept, readSettings(&faults));
+  transaction.commit();
+}
+
+}  // namespace
+
 void tellOfRuns() {
   std::vector<KeptRun> untold;
   std::vector<Output> outputs;
@@ -249,23 +272,13 @@ void tellOfRuns() {
   for (size_t i = 0; i < untold.size(); ++i) tellOfEnd(untold[i], outputs[i], false);
 }
 
-void dropOld() {
-  const KeptDatabase kept(KeptDatabase::kChange);
-  Transaction transaction(kept);
-  SettingsFaults faults;
-  dropOldRuns(kept, readSettings(&faults));
-  transaction.commit();
-}
-
-}  // namespace
-
 void sweepRuns() {
   sweep();
 }
 
 int keepHistory() {
   const int results[] = {attempt(sweepAndSay), attempt(markMachineUp), attempt(dropOld),
-                         attempt(tellOfRuns)};
+                         attempt(haveRunsToldOf)};
   return *std::max_element(std::begin(results), std::end(results));
 }
 
