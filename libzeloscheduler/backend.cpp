@@ -42,17 +42,17 @@ int registerBackend(const Registration &registration) {
 }  // namespace
 
 SchedDispatched schedDispatch(ZELO_SCHED_TASK *pTask, SchedTaskOperation ZELO_SCHED_BACKEND::*slot,
-                              const char *szWord, SchedPlace place) {
+                              const char *szWord, SchedSourceLocation location) {
   const int index = schedFindBackend(pTask->Backend, slot);
   if (index < 0) {
-    SCHED_LOG_AT(place, "No %s backend (%ld) is found for task [%ld] ", szWord,
+    SCHED_LOG_AT(location, "No %s backend (%ld) is found for task [%ld] ", szWord,
                  static_cast<long>(pTask->Backend), static_cast<long>(pTask->ID));
-    QLIBCErrSetEx(kErrNotFound, place.file, place.line);
+    QLIBCErrSetEx(kErrNotFound, location.file, location.line);
     return {false, -1};
   }
   const int result = (SchedBackends[index].*slot)(pTask);
   if (result < 0) {
-    SCHED_LOG_CALLEE_AT(place, "Failed to %s for backend [%ld] id:[%ld] ", szWord,
+    SCHED_LOG_CALLEE_AT(location, "Failed to %s for backend [%ld] id:[%ld] ", szWord,
                         static_cast<long>(index), static_cast<long>(pTask->ID));
   }
   return {true, result};

@@ -34,9 +34,9 @@ struct SchedDispatched {
 
 using SchedTaskOperation = int (*)(ZELO_SCHED_TASK *);
 
-// Hands the task to the backend that its Backend field names. Failures are reported under `place`,
-// with `szWord` as the operation's name.
+// Hands the task to the backend that its Backend field names. Failures are reported under
+// `location`, with `szWord` as the operation's name.
 SchedDispatched schedDispatch(ZELO_SCHED_TASK *pTask, SchedTaskOperation ZELO_SCHED_BACKEND::*slot,
-                              const char *szWord, SchedPlace place);
+                              const char *szWord, SchedSourceLocation location);
 
 #endif

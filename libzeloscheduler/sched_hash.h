@@ -7,6 +7,6 @@
 
 #include "sched_report.h"
 
-int schedFillTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash, SchedPlace place);
+int schedFillTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash, SchedSourceLocation location);
 
 #endif

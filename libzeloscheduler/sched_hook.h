@@ -6,8 +6,8 @@
 
 #include "sched_report.h"
 
-// A plugin cannot veto a change: what it answers is logged, under the place of the change, and
-// goes no further.
+// A plugin cannot veto a change: what it answers is logged, under the source location of the
+// change, and goes no further.
 class SchedHook {
  public:
   SchedHook(const char *szAction, const ZELO_SCHED_TASK *pOrg, const ZELO_SCHED_TASK *pNew)
@@ -17,19 +17,19 @@ class SchedHook {
 
   bool live() const { return live_; }
 
-  void before(SchedPlace place) {
+  void before(SchedSourceLocation location) {
     if (ZELOSchedTaskPlugin(ZELO_SCHED_PLUGIN_PRE, &plugin_) < 0) {
-      SCHED_LOG_AT(place, "Fail to execute task plugin (PRE)");
+      SCHED_LOG_AT(location, "Fail to execute task plugin (PRE)");
     }
   }
 
   // Also for a hook that is not live: that the plugins could not be told is logged too. Why the
   // change failed stays in the error record, whatever the plugins do.
-  void after(int result, SchedPlace place) {
+  void after(int result, SchedSourceLocation location) {
     const SchedErrorRecord reason;
     plugin_.result = result;
     if (ZELOSchedTaskPlugin(ZELO_SCHED_PLUGIN_POST, &plugin_) < 0) {
-      SCHED_LOG_AT(place, "Fail to execute task plugin (POST)");
+      SCHED_LOG_AT(location, "Fail to execute task plugin (POST)");
     }
     ZELOSchedTaskPluginExit(&plugin_);
     if (result < 0) {

@@ -26,17 +26,18 @@ enum SchedError : int {
   kErrMalformed = 0x4000,
 };
 
-// A place in the source, for a shared routine that reports under its caller's name.
-struct SchedPlace {
-  constexpr SchedPlace(const char *szFile, int lineNumber) : file(szFile), line(lineNumber) {}
+// A location in the source, for a shared routine that reports under its caller's name.
+struct SchedSourceLocation {
+  constexpr SchedSourceLocation(const char *szFile, int lineNumber)
+      : file(szFile), line(lineNumber) {}
   const char *file;
   int line;
 };
 
-#define SCHED_HERE SchedPlace(__FILE_NAME__, __LINE__)
+#define SCHED_HERE SchedSourceLocation(__FILE_NAME__, __LINE__)
 
-#define SCHED_LOG_AT(place, format, ...) \
-  syslog(LOG_ERR, "%s:%d " format, (place).file, (place).line __VA_OPT__(, ) __VA_ARGS__)
+#define SCHED_LOG_AT(location, format, ...) \
+  syslog(LOG_ERR, "%s:%d " format, (location).file, (location).line __VA_OPT__(, ) __VA_ARGS__)
 
 #define SCHED_LOG(format, ...) SCHED_LOG_AT(SCHED_HERE, format __VA_OPT__(, ) __VA_ARGS__)
 
@@ -52,8 +53,8 @@ inline const char *schedErrorFile() {
 
 // For a failure passed up from a callee: its error record is appended to the line and stays as it
 // is. `format` ends with whatever stands before the bracket.
-#define SCHED_LOG_CALLEE_AT(place, format, ...)                           \
-  SCHED_LOG_AT(place, format "[0x%04X %s:%d]" __VA_OPT__(, ) __VA_ARGS__, \
+#define SCHED_LOG_CALLEE_AT(location, format, ...)                           \
+  SCHED_LOG_AT(location, format "[0x%04X %s:%d]" __VA_OPT__(, ) __VA_ARGS__, \
                static_cast<unsigned>(QLIBCErrGet()), schedErrorFile(), QLIBCErrorGetLine())
 
 #define SCHED_LOG_CALLEE(format, ...) \

@@ -100,7 +100,7 @@ int replaceLineFeeds(PSZHASH *ppHash) {
   return 0;
 }
 
-int fillRow(int row, ZELO_SCHED_TASK *pTask, const char *szValue, SchedPlace place) {
+int fillRow(int row, ZELO_SCHED_TASK *pTask, const char *szValue, SchedSourceLocation location) {
   const SchedParm &parm = parm_table[row];
   void *field = parm.fieldOf(pTask);
   if (parm.enumList != nullptr) {
@@ -115,18 +115,18 @@ int fillRow(int row, ZELO_SCHED_TASK *pTask, const char *szValue, SchedPlace pla
     return 0;
   }
   if (parm.fnFromHashStr(field, szValue) < 0) {
-    SCHED_LOG_AT(place, "parm_table[%d].fnFromHashStr failed.", row);
+    SCHED_LOG_AT(location, "parm_table[%d].fnFromHashStr failed.", row);
     return -1;
   }
   return 0;
 }
 
-int decodeCommand(ZELO_SCHED_TASK *pTask, SchedPlace place) {
+int decodeCommand(ZELO_SCHED_TASK *pTask, SchedSourceLocation location) {
   char szEncoded[kCommandCapacity];
   copyText(szEncoded, pTask->Command);
   size_t cbDecoded = kCommandCapacity;
   if (ZELOEncodingBase64Decode(szEncoded, strlen(szEncoded), pTask->Command, &cbDecoded) == 0) {
-    SCHED_LOG_CALLEE_AT(place, "Base64 decoding failed. [%s] ", szEncoded);
+    SCHED_LOG_CALLEE_AT(location, "Base64 decoding failed. [%s] ", szEncoded);
     return -1;
   }
   pTask->Command[std::min(cbDecoded, kCommandCapacity - 1)] = '\0';
@@ -135,7 +135,7 @@ int decodeCommand(ZELO_SCHED_TASK *pTask, SchedPlace place) {
 
 }  // namespace
 
-int schedFillTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash, SchedPlace place) {
+int schedFillTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash, SchedSourceLocation location) {
   for (int row = 0; parm_table[row].szKey != nullptr; ++row) {
     const SchedParm &parm = parm_table[row];
     if (!parm.inHash) {
@@ -143,14 +143,14 @@ int schedFillTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash, SchedPlace plac
     }
     const char *szValue = QLIBCSzHashGetValue(pHash, parm.szKey);
     if (szValue == nullptr && parm.required) {
-      SCHED_LOG_CALLEE_AT(place, "Get hash value failed. key:[%s]. ", parm.szKey);
+      SCHED_LOG_CALLEE_AT(location, "Get hash value failed. key:[%s]. ", parm.szKey);
       return -1;
     }
-    if (fillRow(row, pTask, szValue != nullptr ? szValue : parm.szDefault, place) < 0) {
+    if (fillRow(row, pTask, szValue != nullptr ? szValue : parm.szDefault, location) < 0) {
       return -1;
     }
   }
-  return decodeCommand(pTask, place);
+  return decodeCommand(pTask, location);
 }
 
 int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_TASK *pTask) {

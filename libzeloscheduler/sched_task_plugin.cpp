@@ -12,7 +12,7 @@
 namespace {
 
 constexpr char kPluginName[] = "task_scheduler";
-constexpr size_t kValueCapacity = 32;  // plugins have always been given texts cut to this
+constexpr size_t kValueCapacity = 32;  // the interface cuts longer values to this
 
 enum class Form { kId, kUnsigned, kSigned, kText };
 

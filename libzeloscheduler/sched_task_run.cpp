@@ -14,8 +14,8 @@
 #include "sched_db_guard.h"
 #include "sched_leave_caller.h"
 #include "sched_report.h"
+#include "sched_run_environment.h"
 #include "sched_shared_names.h"
-#include "sched_surroundings.h"
 #include "sched_user.h"
 #include "schedule_due.h"
 
@@ -283,7 +283,7 @@ int enterOwnersContext(uid_t owner) {
   if (setUserContext(owner) < 0) {
     return -1;
   }
-  if (schedSetSurroundings(owner) < 0) {
+  if (schedSetRunEnvironment(owner) < 0) {
     SCHED_LOG_CALLEE("Failed to set user context. uid:[%u] ", owner);
     return -1;
   }

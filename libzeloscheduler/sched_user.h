@@ -13,11 +13,11 @@ struct UserDeleter {
 };
 using UserGuard = std::unique_ptr<ZELOUSER, UserDeleter>;
 
-// Null, with the reason logged under `place`, when there is no such user.
-inline UserGuard schedLookUpUser(uid_t uid, SchedPlace place) {
+// Null, with the reason logged under `location`, when there is no such user.
+inline UserGuard schedLookUpUser(uid_t uid, SchedSourceLocation location) {
   PZELOUSER user = nullptr;
   if (ZELOUserGetByUID(uid, &user) < 0) {
-    SCHED_LOG_CALLEE_AT(place, "Get uid [%u] failed. ", uid);
+    SCHED_LOG_CALLEE_AT(location, "Get uid [%u] failed. ", uid);
     return nullptr;
   }
   return UserGuard(user);

@@ -324,10 +324,10 @@ TEST_F(OwnersRightsTest, RealIdsThatCannotBeSetAreReported) {
     clearLog();
     failCall(call, {.error = EAGAIN});
     EXPECT_EQ(runSaved(id), ZELO_SCHED_STATUS_RUNNING);
-    EXPECT_EQ(logged(), (Lines{"sched_surroundings.cpp:N Failed to set real ids: [4242:4343] "
+    EXPECT_EQ(logged(), (Lines{"sched_run_environment.cpp:N Failed to set real ids: [4242:4343] "
                                "Resource temporarily unavailable",
                                "sched_task_run.cpp:N Failed to run for backend [0] id:[1] [0x2A00 "
-                               "sched_surroundings.cpp:N]"}));
+                               "sched_run_environment.cpp:N]"}));
   }
 }
 
@@ -341,7 +341,7 @@ TEST_F(OwnersRightsTest, RealIdsThatCannotBeRestoredAreReportedAndTheRunIsRecord
     clearLog();
     failCall(call, {.from = 2, .error = EAGAIN});
     EXPECT_EQ(runSaved(id), ZELO_SCHED_STATUS_FINISHED);
-    EXPECT_EQ(logged(), Lines{"sched_surroundings.cpp:N Failed to restore real ids: [0:0] Resource "
+    EXPECT_EQ(logged(), Lines{"sched_run_environment.cpp:N Failed to restore real ids: [0:0] Resource "
                               "temporarily unavailable"});
   }
 }

@@ -762,7 +762,7 @@ TEST_F(TaskRunTest, ALockThatCannotBeReleasedLeavesItsCodeAndTheRunGoesOn) {
     useBackendRun([](ZELO_SCHED_TASK *, int *, char *, size_t) { return 0; });
     runToEnd(id);
     EXPECT_EQ(logged(),
-              Lines{"sched_surroundings.cpp:N Get uid [0] failed. [0x0500 sched_task_run.cpp:N]"});
+              Lines{"sched_run_environment.cpp:N Get uid [0] failed. [0x0500 sched_task_run.cpp:N]"});
   }
 }
 
@@ -1164,14 +1164,14 @@ TEST_F(UserContextTest, AUserLookUpThatFailsMakesNoSwitch) {
 }
 
 // The rights are given up by then; what is missing is only where to start.
-TEST_F(UserContextTest, ALookUpForTheSurroundingsThatFailsLeavesThemBare) {
+TEST_F(UserContextTest, ALookUpForTheEnvironmentThatFailsLeavesThemBare) {
   REQUIRE_OTHER_USERS();
   Task task = makeTask("task", "env > /tmp/bare; pwd >> /tmp/bare");
   task->Owner = kOwner;
   const long id = save(task);
   failCallFor("ZELOUserGetByUID", std::to_string(kOwner), {.from = 2, .code = kInjectedCode});
   runToEnd(id);
-  EXPECT_EQ(logged(), Lines{"sched_surroundings.cpp:N Get uid [4242] failed. " + kInjected});
+  EXPECT_EQ(logged(), Lines{"sched_run_environment.cpp:N Get uid [4242] failed. " + kInjected});
   EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
   const std::string bare = readFile("/tmp/bare");
   EXPECT_NE(bare.find("HOME=/\n"), std::string::npos) << bare;

@@ -19,9 +19,9 @@
 #include "sched_hash.h"
 #include "sched_record.h"
 #include "sched_report.h"
+#include "sched_run_environment.h"
 #include "sched_shared_names.h"
 #include "sched_store_lock.h"
-#include "sched_surroundings.h"
 #include "sched_text.h"
 #include "sched_trigger_clock.h"
 #include "sched_wait_status.h"
@@ -269,8 +269,8 @@ int next_id(long *pID) {
   return 0;
 }
 
-int fail(SchedPlace place, int code) {
-  QLIBCErrSetEx(code, place.file, place.line);
+int fail(SchedSourceLocation location, int code) {
+  QLIBCErrSetEx(code, location.file, location.line);
   return -1;
 }
 

@@ -10,11 +10,12 @@
 #include "sched_new_file.h"
 #include "sched_report.h"
 
-// A file that is replaced line by line. Each call gives 0, or -1 with its code at the place in the
-// error record.
+// A file that is replaced line by line. Each call gives 0, or -1 with its code at the location in
+// the error record.
 class NewFile {
  public:
-  NewFile(const char *szPath, SchedPlace place) : file_(szPath), szPath_(szPath), place_(place) {}
+  NewFile(const char *szPath, SchedSourceLocation location)
+      : file_(szPath), szPath_(szPath), location_(location) {}
 
   int open() { return file_.open() ? 0 : fail(kErrOpen); }
 
@@ -48,13 +49,13 @@ class NewFile {
 
  private:
   int fail(int code) const {
-    QLIBCErrSetEx(code, place_.file, place_.line);
+    QLIBCErrSetEx(code, location_.file, location_.line);
     return -1;
   }
 
   SchedNewFile file_;
   const char *szPath_;
-  SchedPlace place_;
+  SchedSourceLocation location_;
   bool endsLine_ = true;
 };
 

@@ -54,7 +54,8 @@ void *markOf(const void *context) noexcept {
 }
 
 // The live context, or null with 0x0D00.
-Context *contextOf(void **words, zelo::Place where = zelo::Place::here()) noexcept {
+Context *contextOf(void **words,
+                   zelo::SourceLocation where = zelo::SourceLocation::here()) noexcept {
   if (words == nullptr || words[kWordContext] == nullptr ||
       words[kWordMark] != markOf(words[kWordContext])) {
     zelo::fail(QLIBC_ERR_BAD_PARAMETER, where);

@@ -44,7 +44,7 @@ bool sameContents(const struct stat &a, const struct stat &b) noexcept {
          sameTime(a.st_mtim, b.st_mtim) && sameTime(a.st_ctim, b.st_ctim);
 }
 
-int readFile(const std::string &path, int flags, FileContents *file, Place where) {
+int readFile(const std::string &path, int flags, FileContents *file, SourceLocation where) {
   // Not blocking, for a FIFO would hang the open.
   const Descriptor opened(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
   if (!opened.valid()) {

@@ -26,7 +26,8 @@ bool sameContents(const struct stat &a, const struct stat &b) noexcept;
 
 // Reads a regular file, opened with these flags too. 0, or -1 (0x0900, 0x0B00). Throws when memory
 // is short.
-int readFile(const std::string &path, int flags, FileContents *file, Place where = Place::here());
+int readFile(const std::string &path, int flags, FileContents *file,
+             SourceLocation where = SourceLocation::here());
 
 }  // namespace zelo
 

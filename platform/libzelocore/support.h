@@ -14,19 +14,19 @@
 namespace zelo {
 
 // A line of the source: that of the outermost caller, where it is a default argument.
-struct Place {
+struct SourceLocation {
   const char *file;
   int line;
 
-  static constexpr Place here(const char *file = __builtin_FILE(),
-                              int line = __builtin_LINE()) noexcept {
+  static constexpr SourceLocation here(const char *file = __builtin_FILE(),
+                                       int line = __builtin_LINE()) noexcept {
     return {file, line};
   }
 };
 
 // Sets the error record to the caller's own file and line; always -1, so that a failing function
 // can return the call.
-inline int fail(int code, Place where = Place::here()) noexcept {
+inline int fail(int code, SourceLocation where = SourceLocation::here()) noexcept {
   const char *slash = std::strrchr(where.file, '/');
   QLIBCErrSetEx(code, slash != nullptr ? slash + 1 : where.file, where.line);
   return -1;
@@ -35,7 +35,8 @@ inline int fail(int code, Place where = Place::here()) noexcept {
 // Runs the body of an exported function. The containers throw only for want of memory (bad_alloc,
 // length_error), hence the one code.
 template <typename Result, typename Body>
-Result atBoundary(Result failed, Body &&body, Place where = Place::here()) noexcept {
+Result atBoundary(Result failed, Body &&body,
+                  SourceLocation where = SourceLocation::here()) noexcept {
   try {
     return std::forward<Body>(body)();
   } catch (const std::exception &) {

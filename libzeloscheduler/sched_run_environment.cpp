@@ -1,5 +1,5 @@
 // What a command starts with: environment, directory, file mode mask and ids.
-#include "sched_surroundings.h"
+#include "sched_run_environment.h"
 
 #include <sys/stat.h>
 #include <syslog.h>
@@ -92,7 +92,7 @@ bool enterHome(const ZELOUSER *user) {
 
 }  // namespace
 
-int schedSetSurroundings(uid_t uid) {
+int schedSetRunEnvironment(uid_t uid) {
   const UserGuard user = schedLookUpUser(uid, SCHED_HERE);
   if (!installEnvironment(user.get())) {
     SCHED_LOG_ERRNO("Failed to set environment: [%u] ", uid);

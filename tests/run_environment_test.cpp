@@ -42,12 +42,12 @@ constexpr int kDiskClassShift = 13;
 constexpr long kIdleDiskClass = 3;
 constexpr long kIdleDiskPriority = kIdleDiskClass << kDiskClassShift;
 
-constexpr char kOutput[] = "/tmp/surroundings_test.out";
-constexpr char kHome[] = "/tmp/surroundings_test.home";
-constexpr char kCallersLock[] = "/tmp/surroundings_test.lock";
+constexpr char kOutput[] = "/tmp/run_environment_test.out";
+constexpr char kHome[] = "/tmp/run_environment_test.home";
+constexpr char kCallersLock[] = "/tmp/run_environment_test.lock";
 constexpr char kNoContext[] =
-    "sched_task_run.cpp:N Failed to set user context. uid:[0] [0x2A00 sched_surroundings.cpp:N]";
-const std::string kTo = "exec > /tmp/surroundings_test.out 2>&1; ";
+    "sched_task_run.cpp:N Failed to set user context. uid:[0] [0x2A00 sched_run_environment.cpp:N]";
+const std::string kTo = "exec > /tmp/run_environment_test.out 2>&1; ";
 
 // Opens nothing itself, unlike a listing of /proc/PID/fd.
 const std::string kListDescriptors =
@@ -57,7 +57,7 @@ const std::string kListDescriptors =
 // Gathered first: the shell redirects itself for as long as it runs a program.
 const std::string kListLinks =
     "for i in 0 1 2; do links=\"$links $(readlink /proc/$$/fd/$i)\"; done; "
-    "echo \"$links\" > /tmp/surroundings_test.out";
+    "echo \"$links\" > /tmp/run_environment_test.out";
 constexpr char kAllNothing[] = " /dev/null /dev/null /dev/null\n";
 const std::string kListEnvironment = kTo + "tr '\\0' '\\n' < /proc/$$/environ";
 
@@ -66,7 +66,7 @@ void lendOutput(int descriptor) {
   for (const int output : {1, 2}) dup2(descriptor, output);
 }
 
-class SurroundingsTest : public UsersTest {
+class RunEnvironmentTest : public UsersTest {
  protected:
   void SetUp() override {
     UsersTest::SetUp();
@@ -137,7 +137,7 @@ class SurroundingsTest : public UsersTest {
 
 // ---- descriptors
 
-TEST_F(SurroundingsTest, TheCommandHasTheThreeStandardDescriptorsOnly) {
+TEST_F(RunEnvironmentTest, TheCommandHasTheThreeStandardDescriptorsOnly) {
   std::vector<int> opened;
   for (int i = 0; i < 100; ++i) opened.push_back(open("/etc/passwd", O_RDONLY));
   int sockets[2];
@@ -151,7 +151,7 @@ TEST_F(SurroundingsTest, TheCommandHasTheThreeStandardDescriptorsOnly) {
   for (const int descriptor : opened) close(descriptor);
 }
 
-TEST_F(SurroundingsTest, ASocketOfTheCallerIsClosedWhileTheCommandRuns) {
+TEST_F(RunEnvironmentTest, ASocketOfTheCallerIsClosedWhileTheCommandRuns) {
   makeFifos();
   const long id = save(0, kWaitingCommand);
   int sockets[2];
@@ -167,7 +167,7 @@ TEST_F(SurroundingsTest, ASocketOfTheCallerIsClosedWhileTheCommandRuns) {
   close(sockets[0]);
 }
 
-TEST_F(SurroundingsTest, ALockOfTheCallerIsNotKeptByTheCommand) {
+TEST_F(RunEnvironmentTest, ALockOfTheCallerIsNotKeptByTheCommand) {
   makeFifos();
   const long id = save(0, kWaitingCommand);
   writeFile(kCallersLock, "");
@@ -183,7 +183,7 @@ TEST_F(SurroundingsTest, ALockOfTheCallerIsNotKeptByTheCommand) {
   close(again);
 }
 
-TEST_F(SurroundingsTest, ARunLockThatTheCallerHoldsDoesNotReachTheCommand) {
+TEST_F(RunEnvironmentTest, ARunLockThatTheCallerHoldsDoesNotReachTheCommand) {
   const long id = save(0, kListDescriptors);
   writeFile("/tmp/lock/lock_sched_run", "");
   pfLock = fopen("/tmp/lock/lock_sched_run", "r");
@@ -199,7 +199,7 @@ TEST_F(SurroundingsTest, ARunLockThatTheCallerHoldsDoesNotReachTheCommand) {
   pfLock = nullptr;
 }
 
-TEST_F(SurroundingsTest, ACallerWithoutStandardDescriptorsLeavesThemToNothing) {
+TEST_F(RunEnvironmentTest, ACallerWithoutStandardDescriptorsLeavesThemToNothing) {
   const long id = save(0, "echo lost; echo lost >&2; " + kListLinks);
   const std::string links = outputAfter(
       [] {
@@ -212,19 +212,19 @@ TEST_F(SurroundingsTest, ACallerWithoutStandardDescriptorsLeavesThemToNothing) {
   EXPECT_EQ(rows[0].statusCode, ZELO_SCHED_STATUS_FINISHED);
 }
 
-TEST_F(SurroundingsTest, ACallerWithoutStandardInputOnlyKeepsTheOthers) {
+TEST_F(RunEnvironmentTest, ACallerWithoutStandardInputOnlyKeepsTheOthers) {
   const std::string links = outputAfter(
       [] {
-        const int output = open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT, 0644);
+        const int output = open("/tmp/run_environment_test.stdout", O_WRONLY | O_CREAT, 0644);
         lendOutput(output);
         close(0);
       },
       save(0, kListLinks));
-  EXPECT_EQ(links, " /dev/null /tmp/surroundings_test.stdout /tmp/surroundings_test.stdout\n");
+  EXPECT_EQ(links, " /dev/null /tmp/run_environment_test.stdout /tmp/run_environment_test.stdout\n");
 }
 
 // As a shell's loop that reads what it works on, line by line.
-TEST_F(SurroundingsTest, ARunLeavesItsCallersInputAlone) {
+TEST_F(RunEnvironmentTest, ARunLeavesItsCallersInputAlone) {
   const long id = save(0, kTo + "cat; echo end");
   int input[2];
   ASSERT_EQ(pipe(input), 0);
@@ -237,7 +237,7 @@ TEST_F(SurroundingsTest, ARunLeavesItsCallersInputAlone) {
   close(input[0]);
 }
 
-TEST_F(SurroundingsTest, APipeOfTheCallersGetsWhatTheCommandPrints) {
+TEST_F(RunEnvironmentTest, APipeOfTheCallersGetsWhatTheCommandPrints) {
   const long id = save(0, "echo said; echo complained >&2");
   int output[2];
   ASSERT_EQ(pipe(output), 0);
@@ -249,29 +249,29 @@ TEST_F(SurroundingsTest, APipeOfTheCallersGetsWhatTheCommandPrints) {
   close(output[0]);
 }
 
-TEST_F(SurroundingsTest, AFileOfTheCallersGetsWhatTheCommandPrints) {
+TEST_F(RunEnvironmentTest, AFileOfTheCallersGetsWhatTheCommandPrints) {
   outputAfter(
-      [] { lendOutput(open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT | O_TRUNC, 0644)); },
+      [] { lendOutput(open("/tmp/run_environment_test.stdout", O_WRONLY | O_CREAT | O_TRUNC, 0644)); },
       save(0, "echo said; echo complained >&2"));
-  EXPECT_EQ(readFile("/tmp/surroundings_test.stdout"), "said\ncomplained\n");
+  EXPECT_EQ(readFile("/tmp/run_environment_test.stdout"), "said\ncomplained\n");
 }
 
-TEST_F(SurroundingsTest, OneOutputOfTheTwoIsReplacedAlone) {
+TEST_F(RunEnvironmentTest, OneOutputOfTheTwoIsReplacedAlone) {
   const auto lend = [](int kept) {
     lendOutput(open("/dev/zero", O_RDWR));
-    dup2(open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT, 0644), kept);
+    dup2(open("/tmp/run_environment_test.stdout", O_WRONLY | O_CREAT, 0644), kept);
   };
   const long id = save(0, kListLinks);
   EXPECT_EQ(outputAfter([&] { lend(1); }, id),
-            " /dev/null /tmp/surroundings_test.stdout /dev/null\n");
+            " /dev/null /tmp/run_environment_test.stdout /dev/null\n");
   EXPECT_EQ(outputAfter([&] { lend(2); }, id),
-            " /dev/null /dev/null /tmp/surroundings_test.stdout\n");
+            " /dev/null /dev/null /tmp/run_environment_test.stdout\n");
 }
 
 // What could be read as well, or is more than a place to write to.
-TEST_F(SurroundingsTest, NoOtherOutputOfTheCallersReachesTheCommand) {
+TEST_F(RunEnvironmentTest, NoOtherOutputOfTheCallersReachesTheCommand) {
   const long id = save(0, "echo lost; echo lost >&2; " + kListLinks);
-  ASSERT_EQ(mkfifo("/tmp/surroundings_test.fifo", 0600), 0);
+  ASSERT_EQ(mkfifo("/tmp/run_environment_test.fifo", 0600), 0);
   const std::pair<const char *, std::function<int()>> kinds[] = {
       {"a socket",
        [] {
@@ -283,9 +283,9 @@ TEST_F(SurroundingsTest, NoOtherOutputOfTheCallersReachesTheCommand) {
          int ends[2];
          return pipe(ends) == 0 ? ends[0] : -1;
        }},
-      {"a pipe open both ways", [] { return open("/tmp/surroundings_test.fifo", O_RDWR); }},
+      {"a pipe open both ways", [] { return open("/tmp/run_environment_test.fifo", O_RDWR); }},
       {"a file open both ways",
-       [] { return open("/tmp/surroundings_test.both", O_RDWR | O_CREAT, 0600); }},
+       [] { return open("/tmp/run_environment_test.both", O_RDWR | O_CREAT, 0600); }},
       {"a file open for reading", [] { return open("/etc/passwd", O_RDONLY); }},
       {"a file that is only named", [] { return open("/etc/passwd", O_PATH); }},
       {"a directory", [] { return open("/etc", O_RDONLY); }},
@@ -296,13 +296,13 @@ TEST_F(SurroundingsTest, NoOtherOutputOfTheCallersReachesTheCommand) {
     std::filesystem::remove(kOutput);
     EXPECT_EQ(outputAfter([&] { lendOutput(make()); }, id), kAllNothing);
   }
-  std::filesystem::remove("/tmp/surroundings_test.fifo");
+  std::filesystem::remove("/tmp/run_environment_test.fifo");
 }
 
-TEST_F(SurroundingsTest, AnOutputThatIsToBeClosedOnAnExecDoesNotReachTheCommand) {
+TEST_F(RunEnvironmentTest, AnOutputThatIsToBeClosedOnAnExecDoesNotReachTheCommand) {
   const std::string links = outputAfter(
       [] {
-        lendOutput(open("/tmp/surroundings_test.stdout", O_WRONLY | O_CREAT, 0644));
+        lendOutput(open("/tmp/run_environment_test.stdout", O_WRONLY | O_CREAT, 0644));
         fcntl(1, F_SETFD, FD_CLOEXEC);
         fcntl(2, F_SETFD, FD_CLOEXEC);
       },
@@ -310,7 +310,7 @@ TEST_F(SurroundingsTest, AnOutputThatIsToBeClosedOnAnExecDoesNotReachTheCommand)
   EXPECT_EQ(links, kAllNothing);
 }
 
-TEST_F(SurroundingsTest, ARunLockOnAStandardDescriptorMakesRoom) {
+TEST_F(RunEnvironmentTest, ARunLockOnAStandardDescriptorMakesRoom) {
   const long id = save(0, kListLinks);
   const Task task = loadTask(id);
   task->CanRunTaskSameTime = 0;
@@ -325,7 +325,7 @@ TEST_F(SurroundingsTest, ARunLockOnAStandardDescriptorMakesRoom) {
   EXPECT_EQ(links.substr(0, links.find(' ', 1)), " /dev/null");
 }
 
-TEST_F(SurroundingsTest, ARunLockThatCannotMakeRoomRunsNothing) {
+TEST_F(RunEnvironmentTest, ARunLockThatCannotMakeRoomRunsNothing) {
   const long id = save(0, kListLinks);
   const Task task = loadTask(id);
   task->CanRunTaskSameTime = 0;
@@ -348,7 +348,7 @@ TEST_F(SurroundingsTest, ARunLockThatCannotMakeRoomRunsNothing) {
   }
 }
 
-TEST_F(SurroundingsTest, StandardDescriptorsThatCannotBeReplacedRunNothing) {
+TEST_F(RunEnvironmentTest, StandardDescriptorsThatCannotBeReplacedRunNothing) {
   const long id = save(0, kListEnvironment);
   failCallFor("open", "/dev/null", {.error = ENOENT});
   expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to replace standard descriptors. "
@@ -361,7 +361,7 @@ TEST_F(SurroundingsTest, StandardDescriptorsThatCannotBeReplacedRunNothing) {
 
 // ---- session
 
-TEST_F(SurroundingsTest, TheRunIsASessionOfItsOwn) {
+TEST_F(RunEnvironmentTest, TheRunIsASessionOfItsOwn) {
   const std::string line = outputOf(0, kTo + "read -r line < /proc/$$/stat; echo \"$line\"");
   std::istringstream fields(line.substr(std::min(line.find(") "), line.size())));
   std::string end;
@@ -378,7 +378,7 @@ TEST_F(SurroundingsTest, TheRunIsASessionOfItsOwn) {
 }
 
 // As a platform's fork may have done.
-TEST_F(SurroundingsTest, ASessionThatHasBegunAlreadyIsTheRuns) {
+TEST_F(RunEnvironmentTest, ASessionThatHasBegunAlreadyIsTheRuns) {
   const long id = save(0, kTo + "echo ran");
   support::beforeEachCall([](const std::string &call) {
     if (call == "setsid") syscall(SYS_setsid);
@@ -387,7 +387,7 @@ TEST_F(SurroundingsTest, ASessionThatHasBegunAlreadyIsTheRuns) {
   EXPECT_EQ(logged(), Lines{});
 }
 
-TEST_F(SurroundingsTest, WithoutASessionOfItsOwnNothingIsRun) {
+TEST_F(RunEnvironmentTest, WithoutASessionOfItsOwnNothingIsRun) {
   const long id = save(0, kListEnvironment);
   failCall("setsid", {.error = EPERM});
   expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to begin a session. Operation not "
@@ -396,7 +396,7 @@ TEST_F(SurroundingsTest, WithoutASessionOfItsOwnNothingIsRun) {
 
 // ---- keys
 
-constexpr char kKey[] = "surroundings_test";
+constexpr char kKey[] = "run_environment_test";
 
 // In place of the command: the user's rights are the owner's by then, and an exec changes neither
 // of what is looked at here.
@@ -422,7 +422,7 @@ std::string findKey() {
 }
 
 // A kernel without keyrings keeps the caller from having any.
-TEST_F(SurroundingsTest, NoKeyOfTheCallersSessionReachesTheCommand) {
+TEST_F(RunEnvironmentTest, NoKeyOfTheCallersSessionReachesTheCommand) {
   const long id = save(0, "true");
   const ForCommand search([](ZELO_SCHED_TASK *, int *, char *, size_t) {
     writeFile(kOutput, findKey());
@@ -440,7 +440,7 @@ TEST_F(SurroundingsTest, NoKeyOfTheCallersSessionReachesTheCommand) {
   EXPECT_EQ(statusRows().size(), 1U);
 }
 
-TEST_F(SurroundingsTest, AKernelWithoutKeyringsKeepsNothingFromRunning) {
+TEST_F(RunEnvironmentTest, AKernelWithoutKeyringsKeepsNothingFromRunning) {
   const long id = save(0, kTo + "echo ran");
   for (const int error : {ENOSYS, EPERM}) {
     resetFailingCalls();
@@ -451,7 +451,7 @@ TEST_F(SurroundingsTest, AKernelWithoutKeyringsKeepsNothingFromRunning) {
   }
 }
 
-TEST_F(SurroundingsTest, WithoutASessionKeyringOfItsOwnNothingIsRun) {
+TEST_F(RunEnvironmentTest, WithoutASessionKeyringOfItsOwnNothingIsRun) {
   const long id = save(0, kListEnvironment);
   failCall("keyctl", {.times = kAlways, .error = EDQUOT});
   expectNothingRuns(id, (Lines{"sched_leave_caller.cpp:N Failed to begin a session keyring. Disk "
@@ -464,7 +464,7 @@ TEST_F(SurroundingsTest, WithoutASessionKeyringOfItsOwnNothingIsRun) {
 constexpr size_t kNice = 16;
 constexpr size_t kPolicy = 38;
 
-TEST_F(SurroundingsTest, PriorityAndSchedulingAreTheUsualOnesWhateverTheCallersAre) {
+TEST_F(RunEnvironmentTest, PriorityAndSchedulingAreTheUsualOnesWhateverTheCallersAre) {
   const long id = save(0, kTo +
                               "read -r line < /proc/$$/stat; echo \"$line\"; "
                               "read -r score < /proc/$$/oom_score_adj; echo $score");
@@ -491,7 +491,7 @@ TEST_F(SurroundingsTest, PriorityAndSchedulingAreTheUsualOnesWhateverTheCallersA
   EXPECT_EQ(lines[1], "0");
 }
 
-TEST_F(SurroundingsTest, TheDiskPriorityIsTheUsualOneWhateverTheCallersIs) {
+TEST_F(RunEnvironmentTest, TheDiskPriorityIsTheUsualOneWhateverTheCallersIs) {
   const long id = save(0, "true");
   const ForCommand look([](ZELO_SCHED_TASK *, int *, char *, size_t) {
     writeFile(kOutput, std::to_string(syscall(SYS_ioprio_get, kWhoProcess, 0L) >> kDiskClassShift));
@@ -503,7 +503,7 @@ TEST_F(SurroundingsTest, TheDiskPriorityIsTheUsualOneWhateverTheCallersIs) {
 }
 
 // A kernel without /proc, say.
-TEST_F(SurroundingsTest, AScoreThatCannotBeWrittenKeepsNothingFromRunning) {
+TEST_F(RunEnvironmentTest, AScoreThatCannotBeWrittenKeepsNothingFromRunning) {
   const long id = save(0, kTo + "echo ran");
   failCallFor("open", "/proc/self/oom_score_adj", {.times = kAlways, .error = ENOENT});
   EXPECT_EQ(outputOf(id), "ran\n");
@@ -511,7 +511,7 @@ TEST_F(SurroundingsTest, AScoreThatCannotBeWrittenKeepsNothingFromRunning) {
 }
 
 // sudo and its like go on working in a command.
-TEST_F(SurroundingsTest, ACommandMayStillGainRightsAndOutlivesTheCallersDeathSignal) {
+TEST_F(RunEnvironmentTest, ACommandMayStillGainRightsAndOutlivesTheCallersDeathSignal) {
   const long id = save(0, "true");
   const ForCommand look([](ZELO_SCHED_TASK *, int *, char *, size_t) {
     int signal = -1;
@@ -554,7 +554,7 @@ class DeafToSignals {
 };
 
 // Read without starting a program: a shell blocks every signal while it does that.
-TEST_F(SurroundingsTest, SignalsThatTheCallerIgnoresOrBlocksReachTheCommand) {
+TEST_F(RunEnvironmentTest, SignalsThatTheCallerIgnoresOrBlocksReachTheCommand) {
   const long id = save(0, kTo +
                               "while read -r key value; do "
                               "case $key in SigBlk: | SigIgn:) echo $value ;; esac; "
@@ -578,7 +578,7 @@ TEST_F(SurroundingsTest, SignalsThatTheCallerIgnoresOrBlocksReachTheCommand) {
 }
 
 // A shell may take the mask back by itself; not every command is one.
-TEST_F(SurroundingsTest, SignalsThatTheCallerIgnoresOrBlocksReachTheRun) {
+TEST_F(RunEnvironmentTest, SignalsThatTheCallerIgnoresOrBlocksReachTheRun) {
   const long id = save(0, "true");
   const auto run = SchedBackends[0].run;
   SchedBackends[0].run = [](ZELO_SCHED_TASK *, int *, char *, size_t) {
@@ -597,9 +597,9 @@ TEST_F(SurroundingsTest, SignalsThatTheCallerIgnoresOrBlocksReachTheRun) {
 
 // ---- environment
 
-TEST_F(SurroundingsTest, TheEnvironmentIsTheOwnersAndNothingOfTheCallersButLocaleAndZone) {
+TEST_F(RunEnvironmentTest, TheEnvironmentIsTheOwnersAndNothingOfTheCallersButLocaleAndZone) {
   REQUIRE_OTHER_USERS();
-  addOwner("/tmp/surroundings_test.home", "/bin/bash");
+  addOwner("/tmp/run_environment_test.home", "/bin/bash");
   const long id = save(kOwner, kListEnvironment);
   clearenv();
   for (const char *entry : {"LD_PRELOAD=/tmp/evil.so",
@@ -635,13 +635,13 @@ TEST_F(SurroundingsTest, TheEnvironmentIsTheOwnersAndNothingOfTheCallersButLocal
   }
   const std::string output = outputOf(id);
   EXPECT_EQ(sortedLines(output),
-            (Lines{"HOME=/tmp/surroundings_test.home", "LANG=de_DE.UTF-8", "LANGUAGE=de:en",
+            (Lines{"HOME=/tmp/run_environment_test.home", "LANG=de_DE.UTF-8", "LANGUAGE=de:en",
                    "LC_ALL=C.UTF-8", "LC_MESSAGES=C", "LC_TIME=C", "LOGNAME=zeloowner",
                    "PATH=/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin",
                    "SHELL=/bin/bash", "TZ=Europe/Berlin", "USER=zeloowner"}));
 }
 
-TEST_F(SurroundingsTest, RootsTaskGetsRootsEnvironmentToo) {
+TEST_F(RunEnvironmentTest, RootsTaskGetsRootsEnvironmentToo) {
   const long id = save(0, kListEnvironment);
   clearenv();
   putenv(const_cast<char *>("SECRET=password"));
@@ -651,41 +651,41 @@ TEST_F(SurroundingsTest, RootsTaskGetsRootsEnvironmentToo) {
                    "SHELL=/bin/bash", "USER=root"}));
 }
 
-TEST_F(SurroundingsTest, AnOwnerWithoutAShellGetsTheStandardOne) {
+TEST_F(RunEnvironmentTest, AnOwnerWithoutAShellGetsTheStandardOne) {
   REQUIRE_OTHER_USERS();
   addOwner("/nonexistent", "");
   const Lines lines = sortedLines(outputOf(kOwner, kListEnvironment));
   EXPECT_NE(std::find(lines.begin(), lines.end(), "SHELL=/bin/sh"), lines.end());
 }
 
-TEST_F(SurroundingsTest, TheCallersEnvironmentStaysAsItIs) {
+TEST_F(RunEnvironmentTest, TheCallersEnvironmentStaysAsItIs) {
   const long id = save(0, "true");
   setenv("SECRET", "password", 1);
   outputOf(id);
   EXPECT_STREQ(getenv("SECRET"), "password");
 }
 
-TEST_F(SurroundingsTest, AVariableThatCannotBeAllocatedRunsNothing) {
+TEST_F(RunEnvironmentTest, AVariableThatCannotBeAllocatedRunsNothing) {
   if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer allocates itself";
   const std::string zone(100000, 'x');
   const long id = save(0, kListEnvironment);
   setenv("LANG", zone.c_str(), 1);
   const FailingAllocation malloc("malloc", {.times = kAlways, .minSize = zone.size()});
   const FailingAllocation realloc("realloc", {.times = kAlways, .minSize = zone.size()});
-  expectNothingRuns(id, (Lines{"sched_surroundings.cpp:N Failed to set environment: [0] Cannot "
+  expectNothingRuns(id, (Lines{"sched_run_environment.cpp:N Failed to set environment: [0] Cannot "
                                "allocate memory",
                                kNoContext}));
 }
 
-TEST_F(SurroundingsTest, WithoutADirectoryToBeInNothingIsRun) {
+TEST_F(RunEnvironmentTest, WithoutADirectoryToBeInNothingIsRun) {
   const long id = save(0, kListEnvironment);
   failCall("chdir", {.times = kAlways, .error = EIO});
-  expectNothingRuns(id, (Lines{"sched_surroundings.cpp:N Failed to change directory: [0] "
+  expectNothingRuns(id, (Lines{"sched_run_environment.cpp:N Failed to change directory: [0] "
                                "Input/output error",
                                kNoContext}));
 }
 
-TEST_F(SurroundingsTest, ACallersDescriptorsThatCannotBeClosedRunNothing) {
+TEST_F(RunEnvironmentTest, ACallersDescriptorsThatCannotBeClosedRunNothing) {
   const long id = save(0, kListEnvironment);
   failCall("close_range", {.times = kAlways, .error = ENOSYS});
   failCall("sysconf", {.times = kAlways, .error = EINVAL});
@@ -695,20 +695,20 @@ TEST_F(SurroundingsTest, ACallersDescriptorsThatCannotBeClosedRunNothing) {
 
 // ---- directory and mask
 
-TEST_F(SurroundingsTest, TheCommandStartsInTheOwnersHome) {
+TEST_F(RunEnvironmentTest, TheCommandStartsInTheOwnersHome) {
   REQUIRE_OTHER_USERS();
   addOwner(kHome);
   std::filesystem::create_directory(kHome);
   EXPECT_EQ(outputOf(kOwner, kTo + "readlink /proc/$$/cwd"), std::string(kHome) + "\n");
 }
 
-TEST_F(SurroundingsTest, WithoutAHomeTheCommandStartsInTheRootDirectory) {
+TEST_F(RunEnvironmentTest, WithoutAHomeTheCommandStartsInTheRootDirectory) {
   REQUIRE_OTHER_USERS();
   addOwner(kHome);
   EXPECT_EQ(outputOf(kOwner, kTo + "readlink /proc/$$/cwd"), "/\n");
 }
 
-TEST_F(SurroundingsTest, AHomeThatTheOwnerMayNotEnterIsNotEntered) {
+TEST_F(RunEnvironmentTest, AHomeThatTheOwnerMayNotEnterIsNotEntered) {
   REQUIRE_OTHER_USERS();
   addOwner(kHome);
   std::filesystem::create_directory(kHome);
@@ -716,7 +716,7 @@ TEST_F(SurroundingsTest, AHomeThatTheOwnerMayNotEnterIsNotEntered) {
   EXPECT_EQ(outputOf(kOwner, kTo + "readlink /proc/$$/cwd"), "/\n");
 }
 
-TEST_F(SurroundingsTest, TheFileModeMaskIs022WhateverTheCallersIs) {
+TEST_F(RunEnvironmentTest, TheFileModeMaskIs022WhateverTheCallersIs) {
   const long id = save(0, kTo + "umask");
   for (const mode_t callers : {0U, 077U}) {
     const mode_t mask = umask(callers);
