@@ -60,7 +60,8 @@ add() {
 json() {
   python3 -c "import json, sys
 tasks = json.load(sys.stdin)
-if 'version' in tasks: tasks = sum((list for name, list in tasks.items() if name != 'version'), [])
+if 'version' in tasks and 'state' not in tasks:
+    tasks = sum((list for name, list in tasks.items() if name != 'version'), [])
 print($1)"
 }
 
