@@ -10,21 +10,16 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
 
-readonly SCRATCH=/tmp/history_test
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 
-readonly KEPT=/usr/zelo/var/history.sqlite STATUS=/tmp/sched_status.sqlite
-unset LC_ALL LANG NO_COLOR
-export TZ=UTC
-mkdir -p "$SCRATCH"
 
 clean() {
   rm -rf /tmp/scheduled_tasks* /usr/zelo/etc/scheduled_tasks* "$STATUS"* /tmp/lock /usr/zelo/var
 }
 
-sql() {
-  sqlite3 -separator ' ' "$KEPT" "$@"
+kept() {
+  sql "$KEPT" "$@"
 }
 
 # With the statements of that version, and a row of each kind.
@@ -32,7 +27,7 @@ first_version() {
   clean
   mkdir -p /usr/zelo/var
   install -m 0600 /dev/null "$KEPT"
-  sql <<'FIRST'
+  kept <<'FIRST'
 CREATE TABLE run(timestamp INTEGER NOT NULL, status_id INTEGER NOT NULL,
  pid INTEGER NOT NULL, task_id INTEGER NOT NULL, app TEXT NOT NULL,
  status_code INTEGER NOT NULL, comment TEXT NOT NULL, boot TEXT NOT NULL,
@@ -66,7 +61,7 @@ carries_every_run_over() {
   first_version
   z history >/dev/null
   same "$(sqlite3 "$KEPT" "SELECT run, task, app, state, outcome, exit_code, signal FROM run ORDER BY run")" "$CARRIED_OVER" &&
-    same "$(sql "PRAGMA user_version; SELECT count(*), sum(told) FROM run; SELECT * FROM up; SELECT * FROM missed; SELECT count(*) FROM sqlite_master WHERE name = 'run_of_first'")" \
+    same "$(kept "PRAGMA user_version; SELECT count(*), sum(told) FROM run; SELECT * FROM up; SELECT * FROM missed; SELECT count(*) FROM sqlite_master WHERE name = 'run_of_first'")" \
       $'2\n10 10\nb2 1795161609\n1 a 1795161500\n0'
 }
 
@@ -83,8 +78,8 @@ a_migration_that_is_killed_leaves_one_of_both() {
   for i in 1 2 3 5 8 13 21 34; do
     first_version
     timeout -s KILL "0.0$i" "$ZELOSCHED" history >/dev/null 2>&1 || true
-    version=$(sql "PRAGMA user_version") || bad=1
-    [[ $version == [12] && $(sql "SELECT count(*) FROM run") == 10 ]] || { echo "$i: $version"; bad=1; }
+    version=$(kept "PRAGMA user_version") || bad=1
+    [[ $version == [12] && $(kept "SELECT count(*) FROM run") == 10 ]] || { echo "$i: $version"; bad=1; }
   done
   return "$bad"
 }
@@ -103,9 +98,9 @@ no_number_comes_again() {
   z add --quiet --daily 08:30 -- true >/dev/null
   z run --wait 1 >/dev/null
   z run --wait 1 >/dev/null
-  sql "DELETE FROM run"
+  kept "DELETE FROM run"
   z run --wait 1 >/dev/null
-  same "$(sql "SELECT run FROM run")" 3
+  same "$(kept "SELECT run FROM run")" 3
 }
 
 check "a history of the first version is carried over whole" carries_every_run_over

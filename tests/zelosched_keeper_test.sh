@@ -12,15 +12,10 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
 
-readonly SCRATCH=/tmp/keeper_test
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 
-readonly STATUS=/tmp/sched_status.sqlite KEPT=/usr/zelo/var/history.sqlite
-readonly PROGRAM=$BUILD_DIR/bin/zeloschedtask
-unset LC_ALL LANG NO_COLOR
-export TZ=UTC
-mkdir -p "$SCRATCH"
+readonly STARTER=$BUILD_DIR/bin/zeloschedtask
 chmod 0755 "$SCRATCH"
 cp /etc/crontab "$SCRATCH/crontab"
 
@@ -59,8 +54,8 @@ go() {
   echo go >"$SCRATCH/go"
 }
 
-sql() {
-  sqlite3 -separator ' ' "$KEPT" "$@"
+kept() {
+  sql "$KEPT" "$@"
 }
 
 # until_is WANTED COMMAND...: it says so within half a minute.
@@ -77,7 +72,7 @@ until_is() {
 
 # run_is WANTED COLUMNS: of the newest run.
 run_is() {
-  until_is "$1" sql "SELECT $2 FROM run ORDER BY run DESC LIMIT 1"
+  until_is "$1" kept "SELECT $2 FROM run ORDER BY run DESC LIMIT 1"
 }
 
 # As run_record.h numbers them.
@@ -88,7 +83,7 @@ ended_as() {
 }
 
 keeper_of() {
-  sql "SELECT keeper FROM run ORDER BY run DESC LIMIT 1"
+  kept "SELECT keeper FROM run ORDER BY run DESC LIMIT 1"
 }
 
 is_gone() {
@@ -102,7 +97,7 @@ living() {
 
 # The program as cron starts it, at the minute for which the task is due.
 as_cron() {
-  FAKE_TIME=$(date -u -d "2026-11-20 08:30:20" +%s) LD_PRELOAD=$FAKE timeout 60 "$PROGRAM" "$@"
+  FAKE_TIME=$(date -u -d "2026-11-20 08:30:20" +%s) LD_PRELOAD=$FAKE timeout 60 "$STARTER" "$@"
 }
 
 # ---- what is written ------------------------------------------------------------------------
@@ -121,7 +116,7 @@ writes_nothing_when_nothing_is_due() {
   clean
   add "echo ran >$SCRATCH/ran"
   rm -rf /usr/zelo/var
-  FAKE_TIME=$(date -u -d "2026-11-20 09:31" +%s) LD_PRELOAD=$FAKE "$PROGRAM" --run id=1 || return 1
+  FAKE_TIME=$(date -u -d "2026-11-20 09:31" +%s) LD_PRELOAD=$FAKE "$STARTER" --run id=1 || return 1
   is_gone_by_name && [[ ! -e $SCRATCH/ran && ! -e $KEPT && ! -e /run/zelosched ]]
 }
 
@@ -132,7 +127,7 @@ is_gone_by_name() {
 tells_the_caller_what_failed() {
   clean
   add true
-  try "$PROGRAM" --run id=9
+  try "$STARTER" --run id=9
   [[ $status == 1 && $err == "zeloschedtask: cannot run task 9: 0x2000 "* ]] || { echo "$status $err"; return 1; }
 }
 
@@ -143,10 +138,10 @@ shows_a_run_that_waits_and_for_whom() {
   same "$(z run 1)" "task 1 (long) waits for task 1 (long) to end" || return 1
   run_is "0 0" "state, outcome" && [[ $(z history | sed -n 2p) == *"waits for its turn"*long ]] || return 1
   local process
-  process=$(sql "SELECT pid FROM run WHERE state = 0")
+  process=$(kept "SELECT pid FROM run WHERE state = 0")
   z stop 1 >/dev/null
   is_gone "$process" && run_is "2 $CANCELLED" "state, outcome" &&
-    until_is "2 $STOPPED" sql "SELECT state, outcome FROM run WHERE run = 1"
+    until_is "2 $STOPPED" kept "SELECT state, outcome FROM run WHERE run = 1"
 }
 
 tells_that_a_run_gave_up() {
@@ -185,7 +180,7 @@ says_how_each_run_ended() {
   local id wanted bad=0
   while read -r id wanted; do
     z run --wait "$id" >/dev/null 2>&1 || true
-    same "$(sql "SELECT rtrim(printf('%d exit %s signal %s', outcome, exit_code, signal)) FROM run ORDER BY run DESC LIMIT 1")" \
+    same "$(kept "SELECT rtrim(printf('%d exit %s signal %s', outcome, exit_code, signal)) FROM run ORDER BY run DESC LIMIT 1")" \
       "$wanted" || bad=1
   done <<ENDS
 1 $FINISHED exit 0 signal
@@ -298,9 +293,9 @@ keeps_no_more_than_is_set() {
   add 'seq 1000'
   local i
   for i in 1 2 3 4 5; do z run --wait 1 >/dev/null; done
-  same "$(sql "SELECT group_concat(run), max(size) FROM output")" "4,5 1034" || return 1
-  sql "UPDATE run SET moment = moment - 10"
-  z history --keep && same "$(sql "SELECT group_concat(run) FROM run")" 3,4,5 &&
+  same "$(kept "SELECT group_concat(run), max(size) FROM output")" "4,5 1034" || return 1
+  kept "UPDATE run SET moment = moment - 10"
+  z history --keep && same "$(kept "SELECT group_concat(run) FROM run")" 3,4,5 &&
     fails_saying "3893 bytes that run 3 printed are not kept any more" z log 1 --run 3
 }
 
@@ -308,7 +303,7 @@ keeps_none_on_a_disk_that_is_nearly_full() {
   clean
   echo 'output-free = 100%' >/etc/zelosched.conf
   add 'echo said'
-  z run --wait 1 >/dev/null && ended_as "$FINISHED" && same "$(sql "SELECT count(*) FROM output")" 0
+  z run --wait 1 >/dev/null && ended_as "$FINISHED" && same "$(kept "SELECT count(*) FROM output")" 0
 }
 
 tells_of_a_setting_that_is_wrong() {
@@ -339,12 +334,12 @@ a_killed_keeper_ends_no_run() {
   add "echo first; $HOLD; head -c 1000000 /dev/zero && echo ran >$SCRATCH/ran"
   start 1
   local killed
-  until_is 1 sql "SELECT state FROM run"
+  until_is 1 kept "SELECT state FROM run"
   killed=$(keeper_of)
   kill -9 "$killed"
   is_gone "$killed"
   z history >/dev/null # has another one look after it
-  until_is 0 sql "SELECT keeper = $killed FROM run" && go && ended_as "$FINISHED" &&
+  until_is 0 kept "SELECT keeper = $killed FROM run" && go && ended_as "$FINISHED" &&
     same "$(cat "$SCRATCH/ran")" ran && run_is 1000006 output_bytes && same "$(z log 1 | head -c 5)" first
 }
 
@@ -352,7 +347,7 @@ a_killed_keeper_leaves_the_end_to_the_sweep() {
   clean
   add "echo first; $HOLD; exit 4"
   start 1
-  until_is 1 sql "SELECT state FROM run"
+  until_is 1 kept "SELECT state FROM run"
   kill -9 "$(keeper_of)"
   go
   is_gone "$run_process"
@@ -383,9 +378,9 @@ int ZELOSchedTaskRun(long id, int check, int skip) {
 }
 KILLER
   cc -w -shared -fPIC -o "$SCRATCH/killer.so" "$SCRATCH/killer.c" -ldl || return 1
-  LD_PRELOAD=$SCRATCH/killer.so setsid --wait sh -c "'$PROGRAM' --run id=1 --now" || return 1
+  LD_PRELOAD=$SCRATCH/killer.so setsid --wait sh -c "'$STARTER' --run id=1 --now" || return 1
   until_is ran cat "$SCRATCH/ran" || return 1
-  LD_PRELOAD=$SCRATCH/killer.so KILL_AFTER=1 setsid --wait sh -c "'$PROGRAM' --run id=1 --now" || return 1
+  LD_PRELOAD=$SCRATCH/killer.so KILL_AFTER=1 setsid --wait sh -c "'$STARTER' --run id=1 --now" || return 1
   until_is $'ran\nran' cat "$SCRATCH/ran" && is_gone_by_name && same "$(z history | wc -l)" 3
 }
 
@@ -395,19 +390,19 @@ runs_without_its_record() {
   clean
   add "echo ran >$SCRATCH/ran"
   "$fault"
-  timeout 60 "$PROGRAM" --run id=1 --now || return 1
+  timeout 60 "$STARTER" --run id=1 --now || return 1
   until_is ran cat "$SCRATCH/ran" && until_is 3 sqlite3 "$STATUS" "SELECT status_code FROM task_status"
 }
 
 no_directory() { rm -rf /usr/zelo/var && touch /usr/zelo/var; }
 no_database() { head -c 9000 /dev/zero | tr '\0' x >"$KEPT"; }
-later_version() { sql "PRAGMA user_version = 99"; }
+later_version() { kept "PRAGMA user_version = 99"; }
 no_room() { mount -n -t tmpfs -o mode=0755,size=4k var /usr/zelo/var; }
 
 a_run_does_not_wait_for_a_locked_history() {
   clean
   add "$HOLD; head -c 1000000 /dev/zero; echo ran >$SCRATCH/ran"
-  python3 - "$KEPT" "$PROGRAM" "$SCRATCH" <<'HOLD' || return 1
+  python3 - "$KEPT" "$STARTER" "$SCRATCH" <<'HOLD' || return 1
 import os, sqlite3, subprocess, sys, time
 held = sqlite3.connect(sys.argv[1], isolation_level=None)
 held.execute("BEGIN EXCLUSIVE")
@@ -427,7 +422,7 @@ the_history_can_be_unmounted_while_a_command_runs() {
   mount -n -t tmpfs -o mode=0755 var /usr/zelo/var
   add "$HOLD"
   start 1
-  until_is 1 sql "SELECT state FROM run"
+  until_is 1 kept "SELECT state FROM run"
   local i
   for ((i = 0; i < 600; i++)); do umount -n /usr/zelo/var 2>/dev/null && break; sleep 0.05; done
   ! mountpoint -q /usr/zelo/var && go && is_gone "$run_process" && ended_as "$FINISHED"
@@ -437,10 +432,10 @@ two_hundred_runs_at_once_are_all_written() {
   clean
   add true --overlap yes
   local i
-  for ((i = 0; i < 200; i++)); do "$PROGRAM" --run id=1 --now & done
+  for ((i = 0; i < 200; i++)); do "$STARTER" --run id=1 --now & done
   wait
-  until_is "200 200 200" sql "SELECT count(*), count(DISTINCT status_id), sum(outcome = 1) FROM run"
-  z history >/dev/null && same "$(sql "SELECT count(*) FROM run")" 200
+  until_is "200 200 200" kept "SELECT count(*), count(DISTINCT status_id), sum(outcome = 1) FROM run"
+  z history >/dev/null && same "$(kept "SELECT count(*) FROM run")" 200
 }
 
 check "a killed keeper ends no run, and another one reads on" a_killed_keeper_ends_no_run
@@ -484,7 +479,7 @@ stops_a_run_without_keeper() {
   clean
   add "$HOLD"
   start 1
-  until_is 1 sql "SELECT state FROM run"
+  until_is 1 kept "SELECT state FROM run"
   kill -9 "$(keeper_of)"
   is_gone "$(keeper_of)"
   [[ $(z stop 1) == "task 1 (Task 1) stopped"* ]] && is_gone "$run_process" && z history >/dev/null && ended_as "$STOPPED"
@@ -529,7 +524,7 @@ stop_races_the_end() {
     z run 1 >/dev/null
     z stop 1 >/dev/null 2>&1 || true
   done
-  is_gone_by_name && same "$(sql "SELECT count(*), sum(outcome IN ($FINISHED, $STOPPED, $CANCELLED)) FROM run")" "20 20"
+  is_gone_by_name && same "$(kept "SELECT count(*), sum(outcome IN ($FINISHED, $STOPPED, $CANCELLED)) FROM run")" "20 20"
 }
 
 check "every process of a run is stopped, wherever it went" stops_all_of_a_run
@@ -561,7 +556,7 @@ notes_what_others_changed() {
   sed -i 's/^name=.*/name="renamed"/' /tmp/scheduled_tasks
   same "$(z history 1 | wc -l)" 2 || return 1
   sed -i 's/^name=.*/name="other"/;s/^cmd base64=.*/cmd base64="dHJ1ZQ=="/;s/^cmd=.*/cmd="dHJ1ZQ=="/' /tmp/scheduled_tasks
-  same "$(z history 1 | wc -l)" 1 && same "$(sql "SELECT count(*), count(removed) FROM task")" "2 1"
+  same "$(z history 1 | wc -l)" 1 && same "$(kept "SELECT count(*), count(removed) FROM task")" "2 1"
 }
 
 filters_the_history() {
@@ -569,7 +564,7 @@ filters_the_history() {
   add 'exit 3' --name bad
   add true --name good
   z run --wait 1 2 >/dev/null 2>&1 || true
-  sql "UPDATE run SET moment = 1000 WHERE run = 1"
+  kept "UPDATE run SET moment = 1000 WHERE run = 1"
   same "$(z history --failed | tail -n +2 | awk '{ print $NF }')" bad &&
     same "$(z history --since 1h | tail -n +2 | awk '{ print $NF }')" good &&
     same "$(z history --task 1 | tail -n +2 | awk '{ print $NF }')" bad &&

@@ -9,15 +9,11 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
 
-readonly SCRATCH=/tmp/notices_test
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 
-readonly TOLD=/etc/zelosched/run-ended.d STATUS=/tmp/sched_status.sqlite
+readonly TOLD=/etc/zelosched/run-ended.d
 MAILER=$here/../packaging/mail-on-failure
-unset LC_ALL LANG NO_COLOR
-export TZ=UTC
-mkdir -p "$SCRATCH"
 cp /etc/crontab "$SCRATCH/crontab"
 
 clean() {

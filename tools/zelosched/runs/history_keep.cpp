@@ -277,9 +277,10 @@ void sweepRuns() {
 }
 
 int keepHistory() {
-  const int results[] = {attempt(sweepAndSay), attempt(markMachineUp), attempt(dropOld),
-                         attempt(haveRunsToldOf)};
-  return *std::max_element(std::begin(results), std::end(results));
+  const int swept = attempt(sweepAndSay);
+  const int noted = attempt(markMachineUp);
+  if (swept != kDone || noted != kDone) return std::max(swept, noted);
+  return std::max(attempt(dropOld), attempt(haveRunsToldOf));
 }
 
 bool mayReadAllRuns() {
