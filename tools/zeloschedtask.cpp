@@ -24,8 +24,9 @@ constexpr char kProgram[] = "zeloschedtask";
 constexpr int kExitUsage = 2;
 
 constexpr char kUsage[] =
-    "usage: zeloschedtask --run id=ID [--now [--trigger=manual|catch-up] [--due=SECONDS]\n"
-    "                     [--skip-disabled] [--tell=FD] [--copy=FD]]\n"
+    "usage: zeloschedtask --run id=ID\n"
+    "       zeloschedtask --run id=ID --now [--trigger=manual|catch-up] [--due=SECONDS]\n"
+    "                     [--skip-disabled] [--tell=FD] [--copy=FD]\n"
     "       zeloschedtask --keep run=RUN\n"
     "       zeloschedtask --help | --version\n";
 

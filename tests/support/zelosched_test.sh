@@ -56,17 +56,38 @@ add() {
   z add --quiet "$@" >/dev/null
 }
 
-# json EXPRESSION: of what zelosched printed, `tasks`
+# json EXPRESSION: of what zelosched printed, `tasks`; what stands in its lists
 json() {
-  python3 -c "import json, sys; tasks = json.load(sys.stdin); print($1)"
+  python3 -c "import json, sys
+tasks = json.load(sys.stdin)
+if 'version' in tasks and 'state' not in tasks:
+    tasks = sum((list for name, list in tasks.items() if name != 'version'), [])
+print($1)"
+}
+
+# The library's form of tasks with its members decoded, an array of an object a line.
+plain() {
+  z export --wire "$@" | python3 -c 'import base64, json, re, sys
+objects = [{k: json.loads(v) for k, v in json.loads(line).items()} for line in sys.stdin]
+for task in objects:
+    command = base64.b64decode(task.pop("cmd"))
+    try:
+        task["cmd"] = command.decode()
+    except UnicodeDecodeError:
+        task["cmd base64"] = base64.b64encode(command).decode()
+    for key, text in task.items():
+        if re.fullmatch("id|owner|simple edit form|listable|can .*|start .*|run .*|repeat hour|last work hour", key):
+            task[key] = int(text)
+lines = [json.dumps(task, separators=(",", ":"), sort_keys=True) for task in objects]
+print("[\n" + ",\n".join(lines) + "\n]")'
 }
 
 ids() {
-  z list --json "$@" | json '[t["id"] for t in tasks]'
+  z list --power --json "$@" | json '[t["id"] for t in tasks]'
 }
 
 names() {
-  z list | awk 'NR > 1 { print $NF }' | sort | paste -sd ' '
+  z list --power | awk 'NR > 1 { print $2 }' | sort | paste -sd ' '
 }
 
 task_lines() {
@@ -138,8 +159,15 @@ forget_tmp() {
   rm -rf "$STORE"* "$PROGRAM"* "$STATUS"* /tmp/lock* /tmp/zeloscheduler.*
 }
 
+# Those of earlier tests would write into the history of the next.
+end_keepers() {
+  local keeper
+  for keeper in $(pgrep -x zeloschedtask || true); do kill -9 "$keeper" 2>/dev/null || true; done
+}
+
 # No task, and nothing of earlier tests.
 clean() {
+  end_keepers
   forget_tmp
   rm -rf "$PERSISTENT" "$LAST_GOOD" /usr/zelo/var /usr/zelo/etc/power_sched.conf /etc/crontab
   cp "$SCRATCH/crontab" /etc/crontab
@@ -322,7 +350,7 @@ names_in_tmp() {
 
 # record ID START STATUS [COMMENT [STATUS_ID [PID]]]: a run, as the library does
 record() {
-  if [[ ! -e $STATUS ]]; then
+  if [[ ! -s $STATUS ]]; then
     install -m 0600 /dev/null "$STATUS"
     sql "$STATUS" "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);"
   fi
@@ -336,8 +364,10 @@ keep() {
 }
 
 history() {
-  z history "$@" --json |
-    json '"\n".join(", ".join(str(run[key]) for key in ("id", "start", "result")) for run in tasks)'
+  z history --json "$@" | python3 -c 'import json, sys
+for run in json.load(sys.stdin)["runs"]:
+    words = [run["outcome"] or run["state"], run["exit_code"] or run["signal"] or ""]
+    print(run["task"], run["start"][:19].replace("T", " "), " ".join(map(str, words)).strip(), sep=", ")'
 }
 
 # Off from one to eight o'clock on a Friday.

@@ -41,7 +41,6 @@
 
 namespace {
 
-constexpr char kStatusDatabase[] = "/tmp/sched_status.sqlite";
 constexpr long kMinute = 60;  // seconds
 
 // The owner may open it for writing by the names of the standard streams.
@@ -51,6 +50,8 @@ constexpr size_t kMostAtOnce = size_t{64} << 10;  // what a pipe holds
 // Milliseconds between two looks at what others write.
 constexpr int kFirstLook = 5;
 constexpr int kLook = 200;
+constexpr double kWaitsAfter = 0.1;  // seconds after which a run without a command waits, perhaps
+constexpr double kTurnPause = 2;     // seconds between two looks at who is in its way
 constexpr int kStatusPatience = 50;  // milliseconds: the pipe must not fill up meanwhile
 constexpr int kLastPatience = 10000;
 constexpr std::chrono::milliseconds kHistoryPatience(50);
@@ -165,10 +166,18 @@ std::vector<pid_t> ownChildren() {
   return found;
 }
 
-// What the command leaves behind becomes ours too, behind it.
+// What the command leaves behind becomes ours too, behind it. One that is about to end has no
+// program any more, and is not over yet.
 pid_t runsProcess() {
-  for (const pid_t pid : ownChildren()) {
-    if (isOver(pid) || (isOfRoot(pid) && isOfOurProgram(pid))) return pid;
+  constexpr int kLooks = 1000;
+  constexpr useconds_t kPause = 1000;
+  for (int i = 0; i < kLooks; ++i) {
+    const std::vector<pid_t> all = ownChildren();
+    if (all.empty()) return 0;
+    for (const pid_t pid : all) {
+      if (isOver(pid) || (isOfRoot(pid) && isOfOurProgram(pid))) return pid;
+    }
+    usleep(kPause);
   }
   return 0;
 }
@@ -200,13 +209,13 @@ class Keeper {
   void passOn(std::string_view bytes);
   void tell(const std::string &line);
   void reap();
-  void lookAtStatus(int patience);
-  void lookForTurn(const RunDatabase &database);
-  bool mayStatusHaveChanged();
+  void lookWhetherItRuns();
+  void lookForTurn();
+  void readStatus();
+  void measure();
   bool save(bool isEnd);
   void saveWhenDue();
   void saveEnd();
-  void judge();
   void logEnd() const;
   void tellPrograms();
   void endWhatIsLeft();
@@ -220,17 +229,16 @@ class Keeper {
   int pipe_ = -1;
   int signals_ = -1;
   int processFile_ = -1;  // of one that is no child
-  long lastStatusId_ = 0;
   double began_ = 0;
   double ended_ = 0;
   std::optional<double> started_;
-  timespec statusChanged_ = {};
   bool isOver_ = false;
   std::optional<int> waitStatus_;
   bool hasWaited_ = false;
   std::optional<long> toldOf_;
   bool isDirty_ = true;
   int pause_ = kFirstLook;
+  double nextTurnLook_ = 0;
   double nextSave_ = 0;
   bool isGivenUp_ = false;
   bool isRecovered_ = false;
@@ -242,11 +250,6 @@ void Keeper::start(int report) {
   leaveCaller({report, order_.tellTo, order_.copyTo});
   prctl(PR_SET_CHILD_SUBREAPER, 1);
   openlog("zeloschedtask", LOG_PID, LOG_CRON);
-  try {
-    lastStatusId_ = RunDatabase(kStatusPatience).lastStatusId();
-  } catch (const Failure &) {
-    lastStatusId_ = 0;  // then the run cannot record itself either
-  }
   forgetError();
   pipe_ = makePipe();
   began_ = seconds();
@@ -318,10 +321,7 @@ bool Keeper::adopt(long number) {
   if (!output_.isOpen()) {
     output_ = OutputFile::make(run_.process, settings_.outputFirst, settings_.outputLast);
   }
-  if (run_.statusId) {
-    lastStatusId_ = *run_.statusId - 1;
-    started_.reset();
-  }
+  run_.outputBytes = output_.total();
   began_ = seconds();
   isDirty_ = false;
   task_ = findTask(run_.task);
@@ -346,7 +346,7 @@ void Keeper::learnOfTask() {
 
 void Keeper::keep() {
   while (!isOver_) {
-    if (run_.state == RunState::kWaiting && mayStatusHaveChanged()) lookAtStatus(kStatusPatience);
+    if (run_.state == RunState::kWaiting) lookWhetherItRuns();
     saveWhenDue();
     malloc_trim(0);
     const bool isSettled = run_.state != RunState::kWaiting && (!isDirty_ || isGivenUp_);
@@ -356,8 +356,7 @@ void Keeper::keep() {
   ended_ = seconds();
   run_.end = time(nullptr);
   passRest();
-  lookAtStatus(kLastPatience);
-  judge();
+  readStatus();
   saveEnd();
   logEnd();
   tell(endLine(run_));
@@ -445,59 +444,32 @@ void Keeper::reap() {
   }
 }
 
-bool Keeper::mayStatusHaveChanged() {
-  struct stat info {};
-  if (stat(kStatusDatabase, &info) != 0) return false;
-  timespec now{};
-  clock_gettime(CLOCK_REALTIME, &now);
-  // Within the resolution of its time stamp it may change once more, unseen.
-  constexpr time_t kRecent = 1;
-  const bool isSame = info.st_mtim.tv_sec == statusChanged_.tv_sec &&
-                      info.st_mtim.tv_nsec == statusChanged_.tv_nsec &&
-                      now.tv_sec - info.st_mtim.tv_sec > kRecent;
-  statusChanged_ = info.st_mtim;
-  return !isSame;
-}
-
-void Keeper::lookAtStatus(int patience) {
-  try {
-    const RunDatabase database(patience);
-    std::optional<Run> row = run_.statusId && processFile_ >= 0
-                                 ? database.runOfId(*run_.statusId)
-                                 : database.runOfProcess(run_.process.pid, lastStatusId_);
-    if (row && row->taskId != run_.task) row.reset();
-    if (!row) {
-      lookForTurn(database);
-      return;
-    }
-    const bool isNew = run_.state == RunState::kWaiting;
-    const bool isGoingOn = !isOver_ && row->statusCode != ZELO_SCHED_STATUS_GONE;
-    if (isNew && !started_ && processFile_ < 0) started_ = hasWaited_ ? seconds() : began_;
-    if (isOver_ || isNew) takeStatus(*row, &run_);
-    if (!isOver_) {  // what a process tells last is told at its end
-      run_.state = RunState::kRunning;
-      run_.outcome = Outcome::kNone;
-    }
-    if (isNew && isGoingOn) {
-      isDirty_ = true;
-      tell("running");
-    }
-  } catch (const Failure &failure) {
-    if (isOver_) syslog(LOG_WARNING, "%s", failure.what());
-    if (isOver_ && run_.state == RunState::kRunning) {
-      run_.state = RunState::kEnded;
-      run_.outcome = Outcome::kLost;
-    }
+// The command has begun when the run's process has a child. Its row would say so too; but whoever
+// reads the status database just when the run writes it delays the run by up to a second.
+void Keeper::lookWhetherItRuns() {
+  if (!hasChild(static_cast<pid_t>(run_.process.pid))) {
+    if (seconds() - began_ > kWaitsAfter && seconds() >= nextTurnLook_) lookForTurn();
+    return;
   }
+  if (processFile_ < 0) started_ = hasWaited_ ? seconds() : began_;
+  run_.state = RunState::kRunning;
+  run_.start = time(nullptr);  // until its row is read
+  isDirty_ = true;
+  tell("running");
 }
 
-void Keeper::lookForTurn(const RunDatabase &database) {
+void Keeper::lookForTurn() {
+  nextTurnLook_ = seconds() + kTurnPause;
   if (!task_) return;
   const auto taskId =
       task_->CanRunTaskSameTime == 0 ? std::optional<long>(run_.task) : std::nullopt;
   const auto app =
       task_->CanRunAppSameTime == 0 ? std::optional<std::string>(task_->App) : std::nullopt;
-  const std::optional<Run> other = database.inTheWayOf(taskId, app, run_.process.pid);
+  std::optional<Run> other;
+  try {
+    other = RunDatabase(kStatusPatience).inTheWayOf(taskId, app, run_.process.pid);
+  } catch (const Failure &) {  // it is for the eye alone
+  }
   if (!other && seconds() - began_ < kFirstWait) return;
   hasWaited_ = true;
   const long whose = other ? other->taskId : 0;
@@ -506,24 +478,58 @@ void Keeper::lookForTurn(const RunDatabase &database) {
   tell("waiting " + std::to_string(whose));
 }
 
-// When the run's process is over, by its row and by how it ended.
-void Keeper::judge() {
+// The row of a process that had the same number before is in the history, as another keeper's.
+bool isOfAnother(const Run &row, const KeptRun &run) {
+  try {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    if (!kept.isThere()) return false;
+    Query query(kept,
+                "SELECT 1 FROM run WHERE start = ? AND status_id = ? AND pid = ? AND"
+                " task = ? AND app = ? AND run <> ? AND keeper <> 0");
+    query.with(row.start).with(row.statusId).with(row.pid).with(row.taskId).with(row.app);
+    return query.with(run.run).next();
+  } catch (const Failure &) {
+    return false;
+  }
+}
+
+// When the run's process is over: its row, and how it ended itself, tell what happened.
+void Keeper::readStatus() {
   const bool isKilled = waitStatus_ && WIFSIGNALED(*waitStatus_);
   const bool isSeen = waitStatus_.has_value();
-  if (run_.state == RunState::kWaiting) {  // no row
+  const bool hasBegun = run_.state == RunState::kRunning;
+  std::optional<Run> row;
+  try {
+    row = RunDatabase(kLastPatience).runOfProcess(run_.process.pid, 0);
+  } catch (const Failure &failure) {
+    syslog(LOG_WARNING, "%s", failure.what());
+  }
+  if (row && (row->taskId != run_.task || isOfAnother(*row, run_))) row.reset();
+  if (row) {
+    takeStatus(*row, &run_);
+    // It leaves its row as it was when it cannot become the owner, for one.
+    if (run_.outcome == Outcome::kNone || run_.outcome == Outcome::kLost) {
+      run_.outcome = isKilled || !isSeen ? Outcome::kLost : Outcome::kNotStarted;
+    }
+  } else if (hasBegun) {
+    run_.outcome = Outcome::kLost;
+  } else {
+    if (!isKilled && !hasWaited_) lookForTurn();
     run_.outcome = isKilled     ? Outcome::kCancelled
                    : hasWaited_ ? Outcome::kGaveUp
                                 : Outcome::kNotStarted;
-  } else if (run_.outcome == Outcome::kNone || run_.outcome == Outcome::kLost) {
-    // It leaves its row as it was when it cannot become the owner, for one.
-    run_.outcome = isKilled || !isSeen ? Outcome::kLost : Outcome::kNotStarted;
   }
   run_.state = RunState::kEnded;
+  if (row || hasBegun) measure();
+}
+
+void Keeper::measure() {
   constexpr double kMilli = 1000;
-  if (started_) run_.duration = std::round((ended_ - *started_) * kMilli) / kMilli;
-  // By the wall clock alone, for a keeper that came later.
-  if (!started_ && run_.start && *run_.end >= *run_.start && processFile_ >= 0) {
-    run_.duration = static_cast<double>(*run_.end - *run_.start);
+  if (!started_ && !hasWaited_ && processFile_ < 0) started_ = began_;
+  if (started_) {
+    run_.duration = std::round((ended_ - *started_) * kMilli) / kMilli;
+  } else if (run_.start && *run_.end >= *run_.start) {
+    run_.duration = static_cast<double>(*run_.end - *run_.start);  // nobody saw it begin
   }
 }
 

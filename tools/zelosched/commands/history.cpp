@@ -23,7 +23,7 @@ namespace {
 
 constexpr Option kOptions[] = {
     {"limit", Option::kValue, 'n'}, {"json"}, {"failed"}, {"since", Option::kValue},
-    {"task", Option::kValue},       {"keep"}};
+    {"task", Option::kValue},       {"keep"}, {"tell"}};
 constexpr long kUsualLimit = 50;
 constexpr long kMostRuns = 100000000;
 constexpr char kNothing[] = "-";
@@ -108,6 +108,8 @@ int runHistory(int argc, char **argv) {
     if (argc > 2) throw UsageError("'--keep' stands alone");
     return keepHistory();
   }
+  // For the sweep, which cannot do it itself in its unit.
+  if (arguments.has("tell")) return attempt(tellOfRuns);
   RunFilter filter;
   filter.task = taskOf(arguments);
   filter.failed = arguments.has("failed");

@@ -1,6 +1,5 @@
 #include "commands/remove_tasks.h"
 
-#include <json/json.h>
 #include <unistd.h>
 
 #include <cstdio>
@@ -8,7 +7,8 @@
 
 #include "commands/for_each_id.h"
 #include "commands/options.h"
-#include "json/json_out.h"
+#include "commands/stop_task.h"
+#include "json/wire_json.h"
 #include "store/change_lock.h"
 #include "store/save.h"
 #include "store/task_list.h"
@@ -31,12 +31,14 @@ bool isConfirmed(const ZELO_SCHED_TASK &task) {
 // The id may have been given to another task since. The name of a power time is its place in the
 // list, which is another one as soon as one before it is removed.
 bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
-  Json::Value members[] = {jsonOf(one), jsonOf(other)};
-  for (Json::Value &object : members) {
-    object.removeMember("next trigger time");
-    if (isPower(one)) object.removeMember("name");
-  }
-  return members[0] == members[1];
+  const auto membersOf = [](const ZELO_SCHED_TASK &task) {
+    std::vector<StoredMember> members = storedMembersOf(task);
+    if (isPower(task)) {
+      std::erase_if(members, [](const StoredMember &member) { return member.key == "name"; });
+    }
+    return members;
+  };
+  return membersOf(one) == membersOf(other);
 }
 
 Task loadRemovable(long id, const RemoveRules &rules) {
@@ -46,9 +48,19 @@ Task loadRemovable(long id, const RemoveRules &rules) {
   return task;
 }
 
-void removeAndTell(const ZELO_SCHED_TASK &task) {
+// A run that waits for its turn must not begin when the task is gone: neither one from before, nor
+// one that read the task just then.
+void removeAndTell(const ZELO_SCHED_TASK &task, const RemoveRules &rules) {
+  const std::string title = titleOf(task);
+  cancelWaitingOf(task);
   removeTask(task);
-  std::printf("%s removed\n", titleOf(task).c_str());
+  std::printf("%s removed\n", title.c_str());
+  cancelWaitingOf(task);
+  if (rules.stops) {
+    stopTask(task.ID, "a run of it");
+  } else {
+    tellOfRunsOf(task);
+  }
 }
 
 // The lock is not held while an answer is waited for.
@@ -59,13 +71,13 @@ void askAndRemove(long id, const RemoveRules &rules) {
   if (!isSame(*task, *loadTask(id))) {
     throw Failure(titleOf(*task) + " stays: it has been changed meanwhile");
   }
-  removeAndTell(*task);
+  removeAndTell(*task, rules);
 }
 
 void removeOne(long id, const RemoveRules &rules) {
   if (!rules.isSure) return askAndRemove(id, rules);
   const ChangeLock lock;
-  removeAndTell(*loadRemovable(id, rules));
+  removeAndTell(*loadRemovable(id, rules), rules);
 }
 
 }  // namespace

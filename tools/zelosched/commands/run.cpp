@@ -24,6 +24,7 @@ namespace {
 
 constexpr Option kOptions[] = {{"wait", Option::kNone, 'w'}, {"output"}, {"force"}};
 constexpr std::chrono::milliseconds kPause(50);
+constexpr std::chrono::seconds kPatience(2);  // with a keeper that has just been started
 constexpr char kClearLine[] = "\r\033[K";
 
 using Clock = std::chrono::steady_clock;
@@ -98,10 +99,11 @@ std::string whatItDoes(const RunEvents &events) {
                               : "waits for " + titleOfTask(events.waitsFor) + " to end";
 }
 
-[[noreturn]] void endInterrupted(const StartedRun &run, const std::string &title,
-                                 Progress *progress) {
+[[noreturn]] void endInterrupted(StartedRun *run, const std::string &title, Progress *progress) {
   progress->clear();
-  const RunEvents &events = run.events();
+  const RunEvents &events = run->events();
+  const Clock::time_point until = Clock::now() + kPatience;
+  while (!events.isKnown && !run->isSilent() && Clock::now() < until) run->listen(kPause);
   if (events.isKnown && !events.isRunning && cancelWaiting(events.run.process)) {
     std::printf("%s will not run: it was waiting for its turn\n", title.c_str());
     std::fflush(stdout);
@@ -127,10 +129,9 @@ RunRecord waitWithoutKeeper(const RunEvents &events) {
 
 RunRecord waitForEnd(StartedRun *run, const std::string &title, RunOutput *output) {
   Progress progress(title);
-  catchInterrupts();
   bool isOutputOpen = output != nullptr;
   while (!run->isSilent()) {
-    if (interruptedBy != 0) endInterrupted(*run, title, &progress);
+    if (interruptedBy != 0) endInterrupted(run, title, &progress);
     if (isOutputOpen) {
       isOutputOpen = output->pass(kPause);
       run->listen(std::chrono::milliseconds(0));
@@ -141,7 +142,7 @@ RunRecord waitForEnd(StartedRun *run, const std::string &title, RunOutput *outpu
   }
   while (isOutputOpen && interruptedBy == 0) isOutputOpen = output->pass(kPause);
   if (output != nullptr) output->finish();
-  if (interruptedBy != 0) endInterrupted(*run, title, &progress);
+  if (interruptedBy != 0) endInterrupted(run, title, &progress);
   if (run->events().isEnded) return run->events().run;
   return waitWithoutKeeper(run->events());
 }
@@ -149,6 +150,7 @@ RunRecord waitForEnd(StartedRun *run, const std::string &title, RunOutput *outpu
 void runAndWait(const ZELO_SCHED_TASK &task, bool showsOutput) {
   RunRequest request;
   request.wantsOutput = showsOutput;
+  catchInterrupts();
   StartedRun run(task, request);
   std::optional<RunOutput> output;
   if (showsOutput) output.emplace(run.output());
@@ -164,7 +166,7 @@ void runAndWait(const ZELO_SCHED_TASK &task, bool showsOutput) {
 // Whether it waits is known at once, or it does not.
 void runUnseen(const ZELO_SCHED_TASK &task) {
   StartedRun run(task, {});
-  const Clock::time_point until = Clock::now() + std::chrono::seconds(2);
+  const Clock::time_point until = Clock::now() + kPatience;
   const RunEvents &events = run.events();
   while (!events.isWaiting && !events.isRunning && !events.isEnded && Clock::now() < until) {
     if (!run.listen(kPause)) break;

@@ -3,12 +3,9 @@
 #include <sys/statvfs.h>
 
 #include <algorithm>
-#include <cerrno>
-#include <cstdio>
 #include <ctime>
-#include <fstream>
-#include <iterator>
-#include <sstream>
+
+#include "runs/processes.h"
 
 namespace {
 
@@ -155,36 +152,17 @@ void dropOutputs(const KeptDatabase &kept, long task, const Settings &settings) 
   }
 }
 
-struct Stat {
-  char state = '\0';
-  long born = 0;
-};
-
-Stat statOf(long pid) {
-  constexpr int kFieldsBetween = 18;  // between the state and the start in /proc/PID/stat
-  std::ifstream file("/proc/" + std::to_string(pid) + "/stat");
-  const std::string text(std::istreambuf_iterator<char>(file), {});
-  const size_t name = text.rfind(')');  // the name before it may hold anything
-  Stat stat;
-  if (name == std::string::npos) return stat;
-  std::istringstream fields(text.substr(name + 1));
-  std::string skipped;
-  fields >> stat.state;
-  for (int i = 0; i < kFieldsBetween; ++i) fields >> skipped;
-  fields >> stat.born;
-  return stat;
-}
-
 }  // namespace
 
 ProcessName processNamed(long pid) {
-  return {pid, statOf(pid).born};
+  return {pid, static_cast<long>(statOf(static_cast<pid_t>(pid)).started)};
 }
 
 bool isAlive(const ProcessName &process) {
   if (process.pid <= 0 || process.born == 0) return false;
-  const Stat stat = statOf(process.pid);
-  return stat.born == process.born && stat.state != 'Z' && stat.state != 'X';
+  const ProcessStat stat = statOf(static_cast<pid_t>(process.pid));
+  return stat.started == static_cast<unsigned long long>(process.born) && stat.state != 'Z' &&
+         stat.state != 'X';
 }
 
 bool isBad(const RunRecord &run) {

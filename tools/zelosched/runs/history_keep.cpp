@@ -35,7 +35,9 @@ class Sweep {
   void takeOver(const KeptDatabase &kept);
   void takeOver(const KeptDatabase &kept, const Run &row);
   void lookAfter(const KeptDatabase &kept, KeptRun run);
-  void endByRow(KeptRun *run);
+  std::optional<Run> rowOf(const KeptRun &run) const;
+  bool isOverByItsRow(const KeptRun &run) const;
+  void endByRow(KeptRun *run) const;
   const TaskRecord *taskOf(const KeptRun &run) const;
   void describe(KeptRun *run) const;
   void save(const KeptDatabase &kept, KeptRun *run);
@@ -58,8 +60,8 @@ bool isKnown(const KeptDatabase &kept, const Run &row) {
   return isThere;
 }
 
-// Its keeper has noted that it waits.
-std::vector<KeptRun> waitingOf(const KeptDatabase &kept, const Run &row, const std::string &boot) {
+// Noted by its keeper, which reads the row at the end alone.
+std::vector<KeptRun> underWayOf(const KeptDatabase &kept, const Run &row, const std::string &boot) {
   RunFilter filter;
   filter.underWay = true;
   std::vector<KeptRun> found = runsOf(kept, filter);
@@ -96,22 +98,25 @@ void Sweep::save(const KeptDatabase &kept, KeptRun *run) {
 
 void Sweep::takeOver(const KeptDatabase &kept, const Run &row) {
   if (isKnown(kept, row)) return;
-  std::vector<KeptRun> waiting = waitingOf(kept, row, boot_);
-  KeptRun run = waiting.empty() ? KeptRun() : waiting.front();
+  std::vector<KeptRun> underWay = underWayOf(kept, row, boot_);
+  if (!underWay.empty()) {
+    KeptRun &run = underWay.front();
+    if (isAlive(run.keeper)) return;  // which writes it at the end
+    run.start = row.start;
+    run.statusId = row.statusId;
+    run.state = RunState::kRunning;  // until somebody has looked after it
+    save(kept, &run);
+    return;
+  }
+  KeptRun run;
   run.task = row.taskId;
   run.app = row.app;
   run.boot = boot_;
+  run.trigger = Trigger::kOther;
   takeStatus(row, &run);
-  if (waiting.empty()) {
-    run.trigger = Trigger::kOther;
-    describe(&run);
-    if (run.state == RunState::kRunning) run.process = processNamed(row.pid);
-    run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
-  } else if (isAlive(run.keeper)) {
-    return;  // which is about to write it
-  } else if (run.state == RunState::kEnded) {
-    run.outputBytes = std::max(run.outputBytes, OutputFile::open(run.process).total());
-  }
+  describe(&run);
+  if (run.state == RunState::kRunning) run.process = processNamed(row.pid);
+  run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
   save(kept, &run);
 }
 
@@ -134,14 +139,26 @@ void Sweep::takeOver(const KeptDatabase &kept) {
       .run();
 }
 
-// Its process is gone, and no keeper is there to say how it ended.
-void Sweep::endByRow(KeptRun *run) {
-  const std::optional<Run> row =
-      run->statusId ? status_.runOfId(*run->statusId) : status_.runOfProcess(run->process.pid, 0);
+// In the status database.
+std::optional<Run> Sweep::rowOf(const KeptRun &run) const {
+  std::optional<Run> row =
+      run.statusId ? status_.runOfId(*run.statusId) : status_.runOfProcess(run.process.pid, 0);
+  if (!row || row->pid != run.process.pid || row->taskId != run.task) return std::nullopt;
+  // Before its row was read, a start is when a keeper saw it.
   const bool isItsTime =
-      row && (run->start ? row->start == *run->start : run->queued && row->start >= *run->queued);
-  const bool isSame = isItsTime && row->pid == run->process.pid && row->taskId == run->task;
-  if (isSame) {
+      run.statusId ? row->start == run.start : run.queued && row->start >= *run.queued;
+  return isItsTime ? row : std::nullopt;
+}
+
+// Written by the process last of all.
+bool Sweep::isOverByItsRow(const KeptRun &run) const {
+  const std::optional<Run> row = rowOf(run);
+  return row && row->statusCode != ZELO_SCHED_STATUS_RUNNING;
+}
+
+// Its process is gone, and no keeper is there to say how it ended.
+void Sweep::endByRow(KeptRun *run) const {
+  if (const std::optional<Run> row = rowOf(*run)) {
     takeStatus(*row, run);
   } else {
     run->outcome = run->stopAsked && !run->start ? Outcome::kCancelled : Outcome::kLost;
@@ -156,8 +173,11 @@ void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
   const bool isOfThisBoot = run.boot == boot_;
   if (isOfThisBoot && isAlive(run.keeper)) return;
   if (isOfThisBoot && isProcessAlive(run)) {
-    if (run.keeper.pid != 0) withoutKeeper_.push_back(run.run);
-    return;
+    if (run.keeper.pid != 0) {
+      withoutKeeper_.push_back(run.run);
+      return;
+    }
+    if (!isOverByItsRow(run)) return;
   }
   if (isOfThisBoot) {
     endByRow(&run);
@@ -192,7 +212,7 @@ long sweep() {
   Sweep sweep(status, list);
   const long changed = sweep.run(kept);
   for (const long run : sweep.runsWithoutKeeper()) {
-    startDetached({"--keep", "run=" + std::to_string(run)});
+    startDetached(installedTaskProgram(), {"--keep", "run=" + std::to_string(run)});
   }
   return changed;
 }
@@ -217,20 +237,6 @@ std::vector<KeptRun> takeUntold(const KeptDatabase &kept) {
   for (const KeptRun &run : untold) note.with(run.run).run();
   transaction.commit();
   return untold;
-}
-
-void tellOfRuns() {
-  std::vector<KeptRun> untold;
-  std::vector<Output> outputs;
-  {
-    const KeptDatabase kept(KeptDatabase::kRead);
-    if (!kept.isThere()) return;
-    untold = takeUntold(kept);
-    for (const KeptRun &run : untold) {
-      outputs.push_back(outputOf(kept, run.run).value_or(Output()));
-    }
-  }
-  for (size_t i = 0; i < untold.size(); ++i) tellOfEnd(untold[i], outputs[i], false);
 }
 
 // Each time once, also when nobody was to be told of it then.
@@ -266,6 +272,16 @@ void tellOfMissedRuns() {
   for (const RunRecord &record : untold) tellOfMissed(record);
 }
 
+// What an administrator's programs need, such as a mailer, the unit of the sweep does not have.
+void haveRunsToldOf() {
+  if (!isAnybodyToBeTold()) return;
+  if (isUnit()) {
+    startDetached(ownProgram(), {"history", "--tell"});
+  } else {
+    tellOfRuns();
+  }
+}
+
 void dropOld() {
   const KeptDatabase kept(KeptDatabase::kChange);
   Transaction transaction(kept);
@@ -276,14 +292,30 @@ void dropOld() {
 
 }  // namespace
 
+void tellOfRuns() {
+  std::vector<KeptRun> untold;
+  std::vector<Output> outputs;
+  {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    if (!kept.isThere()) return;
+    untold = takeUntold(kept);
+    for (const KeptRun &run : untold) {
+      outputs.push_back(outputOf(kept, run.run).value_or(Output()));
+    }
+  }
+  for (size_t i = 0; i < untold.size(); ++i) tellOfEnd(untold[i], outputs[i], false);
+  tellOfMissedRuns();
+}
+
 void sweepRuns() {
   sweep();
 }
 
 int keepHistory() {
-  const int results[] = {attempt(sweepAndSay), attempt([] { markMachineUp(false); }),
-                         attempt(dropOld), attempt(tellOfRuns), attempt(tellOfMissedRuns)};
-  return *std::max_element(std::begin(results), std::end(results));
+  const int swept = attempt(sweepAndSay);
+  const int noted = attempt([] { markMachineUp(false); });
+  if (swept != kDone || noted != kDone) return std::max(swept, noted);
+  return std::max(attempt(dropOld), attempt(haveRunsToldOf));
 }
 
 bool mayReadAllRuns() {

@@ -11,5 +11,9 @@ void sweepRuns();
 // status.
 int keepHistory();
 
+// Tells of the runs that have ended and that nobody has told of: those that the sweep found. Throws
+// Failure.
+void tellOfRuns();
+
 // This user has the rights to read the status database and the history.
 bool mayReadAllRuns();

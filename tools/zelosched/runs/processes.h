@@ -17,6 +17,8 @@ std::map<pid_t, ProcessStat> processes();
 // Ours.
 std::map<pid_t, ProcessStat> children();
 
+bool hasChild(pid_t pid);
+
 // What a command leaves behind becomes ours, and may be older than the next run's process. But it
 // cannot have root's saved user id, which a run's process keeps as its way back.
 bool isOfRoot(pid_t pid);

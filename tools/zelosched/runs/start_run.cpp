@@ -105,7 +105,9 @@ StartedRun::StartedRun(const ZELO_SCHED_TASK &task, const RunRequest &request) {
   const int reason = errno;
   close(tell.writing);
   if (copy.writing >= 0) close(copy.writing);
-  if (pid < 0) throw Failure(std::string("cannot fork: ") + std::strerror(reason));
+  if (pid < 0) {
+    throw Failure("cannot run " + titleOf(task) + ": " + std::strerror(reason));
+  }
   const int status = waitFor(pid);
   if (status == kNoProgram) throw Failure("cannot start " + words.front());
   if (status == 0) return;

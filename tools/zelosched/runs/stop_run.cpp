@@ -61,12 +61,6 @@ bool hasStopped(pid_t pid) {
   return false;
 }
 
-bool hasChild(pid_t pid) {
-  const std::map<pid_t, ProcessStat> all = processes();
-  return std::any_of(all.begin(), all.end(),
-                     [&](const auto &process) { return process.second.parent == pid; });
-}
-
 bool hasRow(pid_t pid) {
   const std::vector<Run> running = RunDatabase(kStatusPatience).running();
   return std::any_of(running.begin(), running.end(),
@@ -114,7 +108,7 @@ bool cancelWaiting(const ProcessName &process) {
 }
 
 Stopped stopRun(const KeptRun &run, std::chrono::milliseconds grace) {
-  if (!run.statusId && cancelWaiting(run.process)) return Stopped::kCancelled;
+  if (run.state == RunState::kWaiting && cancelWaiting(run.process)) return Stopped::kCancelled;
   const Held own(run.process);
   if (!own.isThere()) return Stopped::kWasOver;
   const auto pid = static_cast<pid_t>(run.process.pid);

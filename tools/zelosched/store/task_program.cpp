@@ -19,31 +19,30 @@ constexpr char kTaskProgramName[] = "zeloschedtask";
 constexpr char kUsualDirectory[] = "/usr/sbin/";
 constexpr char kServiceManager[] = "/run/systemd/system";
 
-// Empty when /proc does not tell.
-std::string ownDirectory() {
+}  // namespace
+
+std::string ownProgram() {
   char self[PATH_MAX];
   const ssize_t length = readlink("/proc/self/exe", self, sizeof self);
-  const std::string path(self, static_cast<size_t>(std::max<ssize_t>(length, 0)));
-  return path.substr(0, path.rfind('/') + 1);
+  return std::string(self, static_cast<size_t>(std::max<ssize_t>(length, 0)));
 }
 
 bool isUnit() {
   return getenv("INVOCATION_ID") != nullptr && access(kServiceManager, F_OK) == 0;
 }
 
-}  // namespace
-
 std::string installedTaskProgram() {
-  const std::string directory = ownDirectory();
+  const std::string own = ownProgram();
+  const std::string directory = own.substr(0, own.rfind('/') + 1);
   const std::string beside = directory + kTaskProgramName;
   const bool isBeside = !directory.empty() && access(beside.c_str(), F_OK) == 0;
   return isBeside ? beside : std::string(kUsualDirectory) + kTaskProgramName;
 }
 
-void startDetached(const std::vector<std::string> &arguments) {
+void startDetached(const std::string &program, const std::vector<std::string> &arguments) {
   std::vector<std::string> words;
   if (isUnit()) words = {"systemd-run", "--quiet", "--collect", "--no-block", "--"};
-  words.push_back(installedTaskProgram());
+  words.push_back(program);
   words.insert(words.end(), arguments.begin(), arguments.end());
   std::vector<char *> argv;
   for (std::string &word : words) argv.push_back(word.data());
