@@ -393,7 +393,7 @@ one_task() {
 
 # What status says of the runs at a moment.
 says_of_runs() {
-  at "$1" status | sed -n '/ \(task\|no\) .*\(run\|due\|failed\|gave\|finished\|waits\)/p' | grep -v 'no other user\|no power-on'
+  at "$1" status | grep -E '^[a-z]+ +(task [0-9]+ |no run was |no task)'
 }
 
 tasks_of_all_kinds() {

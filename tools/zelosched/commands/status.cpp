@@ -104,7 +104,7 @@ int runStatus(int argc, char **argv) {
 }  // namespace
 
 const Command kStatusCommand = {
-    "status", "[--quiet] [--json] | --acknowledge [ID...]", "say whether all is well",
+    "status", "[--quiet] [--json] | --acknowledge [TASK...]", "say whether all is well",
     "Prints a line for each check, the worst first: whether cron is running, whether the\n"
     "program that it starts is there and root's, whether the copies of the tasks agree,\n"
     "whether /tmp is root's and sticky and no other user is in the way of runs there, whether\n"
