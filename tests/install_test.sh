@@ -52,6 +52,7 @@ libexec/zelosched/zelo_poweroff_feasible_check
 sbin/zelosched
 sbin/zeloschedtask
 share/bash-completion/completions/zelosched
+share/zelosched/mail-on-failure
 share/zeloscheduler/take_lines_out
 share/zeloscheduler/zeloschedtask.stand-in
 FILES
