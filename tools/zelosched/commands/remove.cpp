@@ -17,7 +17,7 @@ int runRemove(int argc, char **argv) {
 }  // namespace
 
 const Command kRemoveCommand = {
-    "remove", "ID... [--yes] [--force] [--stop]", "delete tasks",
+    "remove", "TASK... [--yes] [--force] [--stop]", "delete tasks",
     "Deletes the tasks. Asks before each when the standard input is a terminal; refuses\n"
     "without --yes when it is none. A run of one that waits for its turn does not start any\n"
     "more; one that has begun goes on, which is told.\n"

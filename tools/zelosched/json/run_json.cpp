@@ -2,17 +2,14 @@
 
 #include <json/json.h>
 
+#include <ctime>
+
 #include "json/json_out.h"
-#include "runs/moment_text.h"
 
 namespace {
 
 Json::Value timeOrNull(const std::optional<long> &moment) {
-  return moment ? Json::Value(momentText(*moment)) : Json::Value();
-}
-
-Json::Value textOrNull(const std::string &text) {
-  return text.empty() ? Json::Value() : jsonText(text);
+  return moment ? jsonTime(static_cast<time_t>(*moment)) : Json::Value();
 }
 
 template <class Number>
@@ -24,11 +21,12 @@ Json::Value numberOrNull(const std::optional<Number> &number) {
 
 Json::Value jsonOf(const RunRecord &run) {
   Json::Value object(Json::objectValue);
+  // The status database, which runs come from before the history has them, knows no such number.
   object["run"] = run.run > 0 ? Json::Value(Json::Int64(run.run)) : Json::Value();
   object["task"] = Json::Int64(run.task);
   object["task_name"] = jsonText(run.taskName);
-  object["app"] = textOrNull(run.app);
-  object["owner"] = textOrNull(run.owner);
+  object["app"] = jsonTextOrNull(run.app);
+  object["owner"] = jsonTextOrNull(run.owner);
   object["trigger"] = nameOf(run.trigger);
   object["due"] = timeOrNull(run.due);
   object["queued"] = timeOrNull(run.queued);
@@ -36,7 +34,7 @@ Json::Value jsonOf(const RunRecord &run) {
   object["end"] = timeOrNull(run.end);
   object["duration_seconds"] = numberOrNull(run.duration);
   object["state"] = nameOf(run.state);
-  object["outcome"] = textOrNull(nameOf(run.outcome));
+  object["outcome"] = jsonTextOrNull(nameOf(run.outcome));
   object["exit_code"] = numberOrNull(run.exitCode);
   object["signal"] = numberOrNull(run.signal);
   object["output_bytes"] = Json::Int64(run.outputBytes);

@@ -16,7 +16,7 @@ struct Unit {
   char letter;
   long seconds;
 };
-constexpr Unit kUnits[] = {{'s', 1}, {'m', 60}, {'h', 60 * 60}, {'d', 24 * 60 * 60}};
+constexpr Unit kUnits[] = {{'s', 1}, {'m', 60}, {'h', 3600}, {'d', 86400}};
 
 std::string quoted(std::string_view command) {
   std::string text(1, kQuote);
@@ -74,7 +74,7 @@ std::string storedCommand(const LimitedCommand &limited) {
 }
 
 LimitedCommand takeApart(std::string_view stored) {
-  const LimitedCommand whole{std::string(stored), ""};
+  LimitedCommand whole{std::string(stored), ""};
   if (!stored.starts_with(kBeforeLimit)) return whole;
   const std::string_view rest = stored.substr(kBeforeLimit.size());
   const size_t end = rest.find(' ');
