@@ -92,8 +92,7 @@ class OutputOnDisk {
 class Environment {
  public:
   void set(const char *name, const std::string &value) {
-    // A C string ends at the first zero byte.
-    entries_.push_back(std::string(name) + "=" + value.c_str());
+    entries_.push_back(std::string(name) + "=" + value.substr(0, value.find('\0')));
   }
   void set(const char *name, std::optional<long> value) {
     set(name, value ? std::to_string(*value) : std::string());
