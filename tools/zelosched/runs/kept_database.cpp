@@ -79,9 +79,9 @@ Failure cannot(const char *what, const char *why) {
 
 // Busy is something else than damaged: it passes.
 [[noreturn]] void fail(const char *what, sqlite3 *db) {
-  const Failure failure = cannot(what, sqlite3_errmsg(db));
-  if (sqlite3_errcode(db) == SQLITE_BUSY) throw DatabaseBusy(failure.what());
-  throw failure;
+  const char *const why = sqlite3_errmsg(db);
+  if (sqlite3_errcode(db) == SQLITE_BUSY) throw DatabaseBusy(cannot(what, why).what());
+  throw cannot(what, why);
 }
 
 void makeDirectories() {

@@ -94,7 +94,7 @@ class Environment {
   void set(const char *name, const std::string &value) {
     const std::string begin = std::string(name) + "=";
     std::erase_if(entries_, [&](const std::string &entry) { return entry.starts_with(begin); });
-    entries_.push_back(begin + value.c_str());  // a C string ends at the first zero byte
+    entries_.push_back(begin + value.substr(0, value.find('\0')));
   }
   void set(const char *name, std::optional<long> value) {
     set(name, value ? std::to_string(*value) : std::string());
