@@ -6,16 +6,19 @@
 #include <string>
 
 #include "runs/run_record.h"
+#include "store/task_list.h"
 
 struct LatestRuns {
   bool isKnown = false;  // this user may read the runs, and they can be read
-  std::string fault;     // why they cannot be read by a user who may
+  std::string fault;     // what failed, where this user may read them
   std::map<long, RunRecord> ofEach;
   std::set<long> running;  // the tasks that have a run which goes on
 
   const RunRecord *of(long task) const;
 };
 
+// By a list that the caller has read, or one that is read for it.
+LatestRuns latestRuns(const TaskList &list);
 LatestRuns latestRuns();
 
 // "finished", "failed 7", "killed KILL", "running", "not started".
@@ -23,6 +26,3 @@ std::string outcomeInBrief(const RunRecord &run);
 
 // "failed 7, 3 h ago"; "running for 3 h".
 std::string runInBrief(const RunRecord &run, long now);
-
-// The run is over and did not end well.
-bool endedBadly(const RunRecord &run);
