@@ -837,7 +837,8 @@ int flock(int descriptor, int operation) noexcept {
   FAIL_OR_CALL(flock, nullptr, -1, descriptor, operation);
 }
 
-// What SQLite works with.
+// What SQLite works with. Where long has 32 bits, the calls above are these.
+#if __SIZEOF_LONG__ > 4
 
 int open64(const char *path, int flags, ...) {
   va_list list;
@@ -855,16 +856,18 @@ ssize_t pwrite64(int descriptor, const void *buffer, size_t size, off64_t at) {
   FAIL_OR_CALL(pwrite64, nullptr, ssize_t{-1}, descriptor, buffer, size, at);
 }
 
-int fdatasync(int descriptor) {
-  FAIL_OR_CALL(fdatasync, nullptr, -1, descriptor);
-}
-
 int fcntl64(int descriptor, int command, ...) {
   va_list list;
   va_start(list, command);
   void *argument = va_arg(list, void *);
   va_end(list);
   FAIL_OR_CALL(fcntl64, nullptr, -1, descriptor, command, argument);
+}
+
+#endif
+
+int fdatasync(int descriptor) {
+  FAIL_OR_CALL(fdatasync, nullptr, -1, descriptor);
 }
 
 char *mkdtemp(char *pattern) noexcept {
