@@ -416,7 +416,7 @@ constexpr long kMicrosecondsPerSecond = 1000000;
 constexpr long kNanosecondsPerMicrosecond = 1000;
 
 // Whether the caller shall really sleep.
-bool recordSleep(const char *call, long microseconds) {
+bool recordSleep(const char *call, long long microseconds) {
   const OwnWork own;
   sleeps().append(static_cast<int>(microseconds), call);
   if (forced().sleepAction) forced().sleepAction(sleeps().lines().size());
@@ -1192,7 +1192,7 @@ time_t mktime(struct tm *broken) noexcept {
 unsigned sleep(unsigned seconds) {
   const auto *plan = failing(Call::k_sleep);
   const bool really =
-      support::recordSleep("sleep", long{seconds} * support::kMicrosecondsPerSecond);
+      support::recordSleep("sleep", seconds * 1LL * support::kMicrosecondsPerSecond);
   if (plan != nullptr) return resultOf(*plan, seconds);
   if (!really) return 0;
   const unsigned timesShorter = support::forced().timesShorter;
@@ -1207,7 +1207,7 @@ unsigned sleep(unsigned seconds) {
 
 int usleep(useconds_t microseconds) {
   const auto *plan = failing(Call::k_usleep);
-  const bool really = support::recordSleep("usleep", long{microseconds});
+  const bool really = support::recordSleep("usleep", microseconds);
   if (plan != nullptr) return resultOf(*plan, -1);
   if (!really) return 0;
   REAL(usleep);
