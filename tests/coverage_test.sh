@@ -1,6 +1,7 @@
 #!/bin/bash
-# What the tests run of the libraries, in lines and branches. The test programs are the ordinary
-# ones; only the libraries that they load count what is run.
+# What the tests run of the libraries and the tools, in lines and branches. The test programs are the
+# ordinary ones; only the libraries that they load, and the tools that the scripts start, count what
+# is run.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -13,6 +14,8 @@ root=$(cd "$(dirname "$0")/.." && pwd -P)
 readonly COVERED=$BUILD_DIR/covered
 readonly LEAST_LINES=99
 readonly LEAST_BRANCHES=94
+readonly LEAST_LINES_OF_TOOLS=95
+readonly SCRIPTS=(zelosched_cli_test zelosched_boot_test zelosched_terminal_test)
 
 build() {
   BUILD_DIR=$COVERED JOBS=1 "$root/scripts/build" --preset=coverage >"$BUILD_DIR/covered.log" 2>&1 ||
@@ -31,18 +34,36 @@ run_tests() {
     { sed -n '/^FAILED/,/^ok/p' "$log"; tail -1 "$log"; return 1; }
 }
 
+# Scripts find the tools and what they preload in the build directory.
+run_scripts() {
+  local name log bad=0
+  mkdir -p "$COVERED/tests"
+  ln -sf "$BUILD_DIR"/tests/*.so "$COVERED/tests"
+  for name in "${SCRIPTS[@]}"; do
+    log=$COVERED/$name.log
+    BUILD_DIR=$COVERED "$root/scripts/sandbox" "$root/tests/$name.sh" >"$log" 2>&1 </dev/null ||
+      { grep -v '^ok' "$log"; bad=1; }
+  done
+  return "$bad"
+}
+
+# covers_enough LEAST-LINES LEAST-BRANCHES DIRECTORY...
 covers_enough() {
-  local status=0
+  local lines=$1 branches=$2 status=0
+  shift 2
+  local report=$COVERED/coverage_of_$1.txt
   gcovr --root "$root" --exclude-throw-branches --exclude-unreachable-branches \
-    --filter "$root/schedule/" --filter "$root/libzeloscheduler/" --filter "$root/platform/" \
-    --fail-under-line "$LEAST_LINES" --fail-under-branch "$LEAST_BRANCHES" --print-summary "$COVERED" \
-    >"$COVERED/coverage.txt" 2>"$COVERED/coverage.err" || status=$?
-  sed 's/^/    /' "$COVERED/coverage.txt" "$COVERED/coverage.err"
-  grep -E '^(lines|branches): ' "$COVERED/coverage.txt" | sed 's/^/# /'
+    "${@/#/--filter=$root/}" --fail-under-line "$lines" --fail-under-branch "$branches" \
+    --print-summary "$COVERED" >"$report" 2>"$COVERED/coverage.err" || status=$?
+  sed 's/^/    /' "$report" "$COVERED/coverage.err"
+  grep -E '^(lines|branches): ' "$report" | sed "s/^/# $1: /"
   return "$status"
 }
 
-check "the libraries are built to count what is run" build
+check "libraries and tools are built to count what is run" build
 check "all tests pass with them" run_tests
-check "lines and branches are covered" covers_enough
+check "the scripts that start the tools pass too" run_scripts
+check "lines and branches of the libraries are covered" \
+  covers_enough "$LEAST_LINES" "$LEAST_BRANCHES" libzeloscheduler schedule platform
+check "lines of the tools are covered" covers_enough "$LEAST_LINES_OF_TOOLS" 0 tools
 finish

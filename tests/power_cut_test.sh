@@ -13,44 +13,39 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/zelosched_test.sh
 . "$here/support/zelosched_test.sh"
 
-readonly SCRATCH=/run/power_cut_test
-readonly KEPT=/usr/zelo/etc
+readonly DISK=/usr/zelo/etc
 readonly CUT=$SCRATCH/cut.img
 # Nothing reaches the disk by itself.
 readonly OPTIONS=commit=300
-mkdir -p "$SCRATCH" "$KEPT"
+mkdir -p "$DISK"
 
 has_disk() {
   truncate -s 16M "$SCRATCH/disk.img" && mke2fs -q -t ext4 "$SCRATCH/disk.img" &&
-    mount -o "loop,$OPTIONS" "$SCRATCH/disk.img" "$KEPT"
+    mount -o "loop,$OPTIONS" "$SCRATCH/disk.img" "$DISK"
 }
 
-names() {
-  z list | awk 'NR > 1 { print $NF }' | sort | tr '\n' ' '
-}
-
-add() {
-  z add --quiet --daily 02:30 --name "$1" -- true >/dev/null
+add_task() {
+  add --daily 02:30 --name "$1" -- true
 }
 
 # The machine comes up with what was on the disk: the tasks are put back, and shown.
 tasks_after_boot() {
   mkdir -p "$SCRATCH/now"
-  mount --move "$KEPT" "$SCRATCH/now" 2>/dev/null || mount --bind "$KEPT" "$SCRATCH/now"
-  mount -o "loop,$OPTIONS" "$CUT" "$KEPT"
+  mount --move "$DISK" "$SCRATCH/now" 2>/dev/null || mount --bind "$DISK" "$SCRATCH/now"
+  mount -o "loop,$OPTIONS" "$CUT" "$DISK"
   rm -rf /tmp/scheduled_tasks
   z restore >/dev/null 2>"$SCRATCH/said" || cat "$SCRATCH/said"
   names
-  umount "$KEPT"
-  mount --move "$SCRATCH/now" "$KEPT" 2>/dev/null || umount "$SCRATCH/now"
+  umount "$DISK"
+  mount --move "$SCRATCH/now" "$DISK" 2>/dev/null || umount "$SCRATCH/now"
   rm -rf /tmp/scheduled_tasks
   z restore >/dev/null
 }
 
 keeps_three_tasks() {
-  add one && add two && add three || return 1
+  add_task one && add_task two && add_task three || return 1
   cp "$SCRATCH/disk.img" "$CUT"
-  same "$(tasks_after_boot)" "one three two "
+  same "$(tasks_after_boot)" "one three two"
 }
 
 # In place of /bin/cp: the power goes when it has emptied its target, and the target is on the disk
@@ -88,10 +83,10 @@ if ((EUID != 0)) || ! has_disk 2>"$SCRATCH/why"; then
 fi
 check "three acknowledged tasks outlive the loss of power right after" keeps_three_tasks
 check "so they do while the persistent copy is emptied for a fourth" \
-  is_whole_when_cut "$KEPT/scheduled_tasks" "four one three two " add four
+  is_whole_when_cut "$DISK/scheduled_tasks" "four one three two" add_task four
 check "and while it is emptied for a removal" \
-  is_whole_when_cut "$KEPT/scheduled_tasks" "four three two " z remove 1 --yes
+  is_whole_when_cut "$DISK/scheduled_tasks" "four three two" z remove 1 --yes
 check "a task is on the disk before the working copy is written" \
-  is_whole_when_cut /tmp/scheduled_tasks "five four three two " add five
-umount "$KEPT"
+  is_whole_when_cut /tmp/scheduled_tasks "five four three two" add_task five
+umount "$DISK"
 finish

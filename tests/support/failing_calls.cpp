@@ -19,13 +19,17 @@
 #include <algorithm>
 #include <array>
 #include <atomic>
+#include <cctype>
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <ctime>
+#include <initializer_list>
 #include <stdexcept>
+#include <string_view>
+#include <tuple>
 
 #include "shared_memory.h"
 #include "zelocore.h"
@@ -34,141 +38,178 @@
 namespace support {
 namespace {
 
-// Name, and whether a plan's key must be equal (=) to the call's or be contained in it (~).
-#define CALLS(X)                   \
-  X(QLIBCExec, '~')                \
-  X(QLIBCSzHashAlloc, '=')         \
-  X(QLIBCSzHashSetValue, '=')      \
-  X(QLIBCSzHashGetValue, '=')      \
-  X(QLIBCSzHashEnumKey, '~')       \
-  X(QLIBCSzListAlloc, '~')         \
-  X(QLIBCSzListPush, '~')          \
-  X(QLIBCStrSep, '~')              \
-  X(QLIBCFileExist, '~')           \
-  X(QLIBCFileTouch, '~')           \
-  X(QLIBCFileEnumSection, '~')     \
-  X(QLIBCFileGetSection, '=')      \
-  X(QLIBCFileSetSection, '=')      \
-  X(QLIBCFileAddSection, '=')      \
-  X(QLIBCFileRemoveSection, '=')   \
-  X(QLIBCProcForkChildNoWait, '~') \
-  X(QLIBCProcAlive, '=')           \
-  X(QLIBPluginInit, '~')           \
-  X(QLIBPluginSetArg, '=')         \
-  X(QLIBPluginSetArgByInt, '=')    \
-  X(QLIBPluginAction, '=')         \
-  X(QLIBPluginExit, '~')           \
-  X(ZELOUserGetByUID, '=')         \
-  X(SzBase64EncodeFull, '~')       \
-  X(ZELOAutoPowerConfGet, '~')     \
-  X(ZELOAutoPowerConfSet, '~')     \
-  X(ZELOAutoPoweronSet, '~')       \
-  X(QLIBCFileSetLine, '~')         \
-  X(ZELOUpdateCrontab, '~')        \
-  X(ZELOScheduleSet, '~')          \
-  X(ZELOEncodingBase64Decode, '~') \
-  X(rename, '~')                   \
-  X(fsync, '~')                    \
-  X(fstat, '~')                    \
-  X(stat, '~')                     \
-  X(lstat, '~')                    \
-  X(fchown, '~')                   \
-  X(fchmod, '~')                   \
-  X(ftruncate, '~')                \
-  X(fflush, '~')                   \
-  X(fclose, '~')                   \
-  X(getline, '~')                  \
-  X(read, '~')                     \
-  X(write, '~')                    \
-  X(fwrite, '~')                   \
-  X(mkstemp, '~')                  \
-  X(fdopen, '~')                   \
-  X(fopen, '~')                    \
-  X(flock, '~')                    \
-  X(open, '~')                     \
-  X(mkdir, '~')                    \
-  X(mkdtemp, '~')                  \
-  X(rmdir, '~')                    \
-  X(renameat2, '~')                \
-  X(chmod, '~')                    \
-  X(access, '~')                   \
-  X(unlink, '~')                   \
-  X(chdir, '~')                    \
-  X(fstatat, '~')                  \
-  X(statx, '~')                    \
-  X(mkostemp, '~')                 \
-  X(futimens, '~')                 \
-  X(fdopendir, '~')                \
-  X(readdir, '~')                  \
-  X(close, '~')                    \
-  X(open64, '~')                   \
-  X(pread64, '~')                  \
-  X(pwrite, '~')                   \
-  X(pwrite64, '~')                 \
-  X(fdatasync, '~')                \
-  X(fcntl64, '~')                  \
-  X(dup, '~')                      \
-  X(dup2, '~')                     \
-  X(fcntl, '~')                    \
-  X(pipe2, '~')                    \
-  X(seteuid, '=')                  \
-  X(setegid, '=')                  \
-  X(setreuid, '~')                 \
-  X(setresuid, '~')                \
-  X(setregid, '~')                 \
-  X(setresgid, '~')                \
-  X(setgroups, '~')                \
-  X(initgroups, '~')               \
-  X(getpwuid_r, '~')               \
-  X(setsid, '~')                   \
-  X(prctl, '=')                    \
-  X(keyctl, '~')                   \
-  X(capget, '~')                   \
-  X(capset, '~')                   \
-  X(close_range, '~')              \
-  X(sysconf, '~')                  \
-  X(clearenv, '~')                 \
-  X(putenv, '~')                   \
-  X(kill, '~')                     \
-  X(fork, '~')                     \
-  X(posix_spawn, '~')              \
-  X(pidfd_open, '~')               \
-  X(poll, '~')                     \
-  X(waitid, '~')                   \
-  X(waitpid, '~')                  \
-  X(localtime, '~')                \
-  X(localtime_r, '~')              \
-  X(mktime, '~')                   \
-  X(malloc, '~')                   \
-  X(calloc, '~')                   \
-  X(realloc, '~')                  \
-  X(system, '~')                   \
-  X(sleep, '~')                    \
-  X(usleep, '~')                   \
-  X(nanosleep, '~')                \
-  X(rand, '~')                     \
-  X(srand, '~')                    \
-  X(sqlite3_open, '~')             \
-  X(sqlite3_exec, '~')             \
-  X(sqlite3_close, '~')
+// Where long has 32 bits, SQLite works with what the product calls by the shorter names.
+#if __SIZEOF_LONG__ > 4
+#define WIDE_CALLS(X)                  \
+  X(4, pread64, "~", nullptr, kFailed) \
+  X(4, pwrite64, "~w", nullptr, kFailed)
+#else
+#define WIDE_CALLS(X)
+#endif
+
+// X(number of arguments, name, how, key, failure) of each call that is passed on as it is:
+//   how      '=' a plan's key must be equal to the call's, '~' or be contained in it; and
+//            'w' it writes, so there may be no room for it and no right to do it;
+//            'n' it never fails in a step, as it cannot fail;
+//            's' standard streams and descriptors are never touched;
+//            'd' it has done its work when it fails
+//   key      of its arguments a, b, c and so on; null for none
+//   failure  what it then gives, unless a plan says otherwise
+#define PLAIN_CALLS(X)                                                                           \
+  X(1, QLIBCSzHashAlloc, "=", std::to_string(a), kFailed)                                        \
+  X(3, QLIBCSzHashSetValue, "=", b, kFailed)                                                     \
+  X(2, QLIBCSzHashEnumKey, "~", nullptr, kFailed)                                                \
+  X(1, QLIBCSzListAlloc, "~", nullptr, kFailed)                                                  \
+  X(2, QLIBCSzListPush, "~", nullptr, kFailed)                                                   \
+  X(3, QLIBCStrSep, "~", a, kFailed)                                                             \
+  X(1, QLIBCFileExist, "~n", a, 0)                                                               \
+  X(1, QLIBCFileTouch, "~", a, kFailed)                                                          \
+  X(2, QLIBCFileEnumSection, "~", a, kFailed)                                                    \
+  X(3, QLIBCFileGetSection, "=", b, kFailed)                                                     \
+  X(5, QLIBCFileSetSection, "=", b, kFailed)                                                     \
+  X(4, QLIBCFileAddSection, "=", b, kFailed)                                                     \
+  X(2, QLIBCFileRemoveSection, "=", b, kFailed)                                                  \
+  X(0, QLIBCProcForkChildNoWait, "~", nullptr, kFailed)                                          \
+  X(1, QLIBCProcAlive, "=n", std::to_string(a), 0)                                               \
+  X(3, QLIBPluginInit, "~", recordPlugin(b, {"init ", a, " ", b}), kFailed)                      \
+  X(3, QLIBPluginSetArg, "=", recordPlugin(b, {"arg ", b, "=", c}), kFailed)                     \
+  X(3, QLIBPluginSetArgByInt, "=", recordPlugin(b, {"int ", b, "=", std::to_string(c).c_str()}), \
+    kFailed)                                                                                     \
+  X(2, QLIBPluginAction, "=",                                                                    \
+    recordPlugin(std::to_string(a), {"action ", std::to_string(a).c_str()}), kFailed)            \
+  X(1, QLIBPluginExit, "~d", recordPlugin(nullptr, {"exit"}), kFailed)                           \
+  X(2, ZELOUserGetByUID, "=", std::to_string(a), kFailed)                                        \
+  X(5, SzBase64EncodeFull, "~", nullptr, 0)                                                      \
+  X(4, ZELOEncodingBase64Decode, "~", nullptr, 0)                                                \
+  X(2, rename, "~w", std::string(a) + " " + b, kFailed)                                          \
+  X(5, renameat2, "~w", std::string(b) + " " + d, kFailed)                                       \
+  X(1, fsync, "~w", nullptr, kFailed)                                                            \
+  X(2, fstat, "~s", nullptr, kFailed)                                                            \
+  X(2, stat, "~", a, kFailed)                                                                    \
+  X(2, lstat, "~", a, kFailed)                                                                   \
+  X(3, fchown, "~w", nullptr, kFailed)                                                           \
+  X(2, fchmod, "~w", nullptr, kFailed)                                                           \
+  X(2, ftruncate, "~w", nullptr, kFailed)                                                        \
+  X(3, read, "~s", nullptr, kFailed)                                                             \
+  X(3, write, "~ws", nullptr, kFailed)                                                           \
+  X(4, pwrite, "~w", nullptr, kFailed)                                                           \
+  X(1, mkstemp, "~w", a, kFailed)                                                                \
+  X(2, flock, "~", nullptr, kFailed)                                                             \
+  WIDE_CALLS(X)                                                                                  \
+  X(1, fdatasync, "~w", nullptr, kFailed)                                                        \
+  X(1, mkdtemp, "~w", a, kFailed)                                                                \
+  X(1, rmdir, "~", a, kFailed)                                                                   \
+  X(2, mkdir, "~w", a, kFailed)                                                                  \
+  X(2, chmod, "~w", a, kFailed)                                                                  \
+  X(2, access, "~", a, kFailed)                                                                  \
+  X(1, unlink, "~w", a, kFailed)                                                                 \
+  X(1, chdir, "~", a, kFailed)                                                                   \
+  X(4, fstatat, "~", b, kFailed)                                                                 \
+  X(5, statx, "~", b, kFailed)                                                                   \
+  X(2, mkostemp, "~w", a, kFailed)                                                               \
+  X(2, futimens, "~w", nullptr, kFailed)                                                         \
+  X(1, fdopendir, "~", nullptr, kFailed)                                                         \
+  X(1, readdir, "~", nullptr, kFailed)                                                           \
+  X(1, dup, "~", nullptr, kFailed)                                                               \
+  X(2, dup2, "~", nullptr, kFailed)                                                              \
+  X(2, pipe2, "~", nullptr, kFailed)                                                             \
+  X(2, fopen, "~w", a, kFailed)                                                                  \
+  X(2, fdopen, "~w", b, kFailed)                                                                 \
+  X(1, fflush, "~ws", nullptr, EOF)                                                              \
+  X(1, fclose, "~wsd", nullptr, EOF)                                                             \
+  X(4, fwrite, "~ws", nullptr, 0)                                                                \
+  X(1, seteuid, "=", std::to_string(a), kFailed)                                                 \
+  X(1, setegid, "=", std::to_string(a), kFailed)                                                 \
+  X(2, setreuid, "~", nullptr, kFailed)                                                          \
+  X(2, setregid, "~", nullptr, kFailed)                                                          \
+  X(3, setresuid, "~", nullptr, kFailed)                                                         \
+  X(3, setresgid, "~", nullptr, kFailed)                                                         \
+  X(2, setgroups, "~", nullptr, kFailed)                                                         \
+  X(2, initgroups, "~", a, kFailed)                                                              \
+  X(0, setsid, "~", nullptr, kFailed)                                                            \
+  X(3, close_range, "~", nullptr, kFailed)                                                       \
+  X(0, clearenv, "~", nullptr, kFailed)                                                          \
+  X(1, putenv, "~", a, kFailed)                                                                  \
+  X(2, kill, "~", std::to_string(a), kFailed)                                                    \
+  X(1, sysconf, "~", nullptr, kFailed)                                                           \
+  X(0, fork, "~", nullptr, kFailed)                                                              \
+  X(3, poll, "~", nullptr, kFailed)                                                              \
+  X(4, waitid, "~d", nullptr, kFailed)                                                           \
+  X(3, waitpid, "~d", nullptr, kFailed)                                                          \
+  X(1, system, "~", recordSystem(a), kFailed)                                                    \
+  X(1, localtime, "~", nullptr, kFailed)                                                         \
+  X(2, localtime_r, "~", nullptr, kFailed)                                                       \
+  X(1, mktime, "~", nullptr, kFailed)                                                            \
+  X(1, sqlite3_close, "~d", nullptr, SQLITE_BUSY)
+
+// X(name, how) of those that are defined further below, or in other test programs.
+#define OTHER_CALLS(X)         \
+  X(QLIBCExec, "~w")           \
+  X(QLIBCSzHashGetValue, "=n") \
+  X(ZELOAutoPowerConfGet, "~") \
+  X(ZELOAutoPowerConfSet, "~") \
+  X(ZELOAutoPoweronSet, "~")   \
+  X(QLIBCFileSetLine, "~")     \
+  X(ZELOUpdateCrontab, "~")    \
+  X(ZELOScheduleSet, "~")      \
+  X(getline, "~")              \
+  X(open, "~w")                \
+  X(open64, "~w")              \
+  X(close, "~w")               \
+  X(fcntl64, "~")              \
+  X(fcntl, "~")                \
+  X(getpwuid_r, "~")           \
+  X(prctl, "=")                \
+  X(keyctl, "~")               \
+  X(capget, "~")               \
+  X(capset, "~")               \
+  X(posix_spawn, "~")          \
+  X(pidfd_open, "~")           \
+  X(malloc, "~")               \
+  X(calloc, "~")               \
+  X(realloc, "~")              \
+  X(sleep, "~n")               \
+  X(usleep, "~n")              \
+  X(nanosleep, "~n")           \
+  X(rand, "~n")                \
+  X(srand, "~n")               \
+  X(sqlite3_open, "~")         \
+  X(sqlite3_exec, "~")
 
 enum class Call : size_t {
-#define X(name, match) k_##name,
-  CALLS(X)
-#undef X
+#define PLAIN(count, name, how, key, failure) k_##name,
+#define OTHER(name, how) k_##name,
+  PLAIN_CALLS(PLAIN) OTHER_CALLS(OTHER)
+#undef PLAIN
+#undef OTHER
       kCount
 };
 
 struct CallName {
   const char *name;
-  bool exact;
+  std::string_view how;
 };
 
 constexpr CallName kCalls[] = {
-#define X(name, match) {#name, (match) == '='},
-    CALLS(X)
-#undef X
+#define PLAIN(count, name, how, key, failure) {#name, how},
+#define OTHER(name, how) {#name, how},
+    PLAIN_CALLS(PLAIN) OTHER_CALLS(OTHER)
+#undef PLAIN
+#undef OTHER
 };
+
+constexpr const CallName &nameOf(Call call) {
+  return kCalls[static_cast<size_t>(call)];
+}
+
+constexpr bool is(Call call, char how) {
+  return nameOf(call).how.find(how) != std::string_view::npos;
+}
+
+// Of the platform, which reports its failures in the error record.
+bool hasErrorRecord(Call call) {
+  return std::isupper(static_cast<unsigned char>(nameOf(call).name[0])) != 0;
+}
 
 constexpr int kInjectedCode = 0x2A00;  // of the calls that fail in a step
 constexpr size_t kPlansPerCall = 8;
@@ -277,30 +318,13 @@ bool concerns(Call call, const Plan &plan, const char *key, size_t size) {
   if (!plan.stands || size < plan.minSize) return false;
   if (plan.key[0] == '\0') return true;
   if (key == nullptr) return false;
-  return kCalls[static_cast<size_t>(call)].exact ? std::strcmp(key, plan.key) == 0
-                                                 : std::strstr(key, plan.key) != nullptr;
-}
-
-bool canFail(Call call) {
-  constexpr Call kNever[] = {
-      Call::k_QLIBCFileExist, Call::k_QLIBCProcAlive, Call::k_QLIBCSzHashGetValue,
-      Call::k_sleep,          Call::k_usleep,         Call::k_nanosleep,
-      Call::k_rand,           Call::k_srand};
-  return std::find(std::begin(kNever), std::end(kNever), call) == std::end(kNever);
+  return is(call, '=') ? std::strcmp(key, plan.key) == 0 : std::strstr(key, plan.key) != nullptr;
 }
 
 // No room and no right to write is found by what writes.
 bool canFailWith(Call call, int error) {
-  constexpr Call kWriting[] = {
-      Call::k_open,      Call::k_open64, Call::k_fopen,     Call::k_fdopen,    Call::k_mkstemp,
-      Call::k_mkostemp,  Call::k_mkdir,  Call::k_mkdtemp,   Call::k_renameat2, Call::k_write,
-      Call::k_fwrite,    Call::k_pwrite, Call::k_pwrite64,  Call::k_fflush,    Call::k_fclose,
-      Call::k_close,     Call::k_fsync,  Call::k_fdatasync, Call::k_rename,    Call::k_unlink,
-      Call::k_ftruncate, Call::k_fchown, Call::k_fchmod,    Call::k_chmod,     Call::k_futimens,
-      Call::k_QLIBCExec};
   const bool isOfWriters = error == ENOSPC || error == EDQUOT || error == EROFS;
-  return canFail(call) && (!isOfWriters || std::find(std::begin(kWriting), std::end(kWriting),
-                                                     call) != std::end(kWriting));
+  return !is(call, 'n') && (!isOfWriters || is(call, 'w'));
 }
 
 int errorOf(Call call) {
@@ -328,7 +352,7 @@ void actBefore(Call call) {
   if (!callsAreWatched || OwnWork::isGoingOn() || isAllocation(call)) return;
   const OwnWork own;
   const int error = errno;
-  forced().callAction(kCalls[static_cast<size_t>(call)].name);
+  forced().callAction(nameOf(call).name);
   errno = error;
 }
 
@@ -339,7 +363,7 @@ const Plan *failing(Call call, const char *key = nullptr, size_t size = 0) {
   ++calls.count;
   actBefore(call);
   if (fallsOn(call)) {
-    if (call <= Call::k_ZELOEncodingBase64Decode) {
+    if (hasErrorRecord(call)) {
       QLIBCErrSetEx(kInjectedCode, kInjectedFile, kInjectedLine);
     }
     return &state().step.plan;
@@ -377,6 +401,14 @@ bool isStandard(int descriptor) {
   return descriptor >= 0 && descriptor <= STDERR_FILENO;
 }
 
+template <class Argument>
+bool isStandardArgument(Argument argument) {
+  if constexpr (std::is_same_v<Argument, FILE *> || std::is_same_v<Argument, int>) {
+    return isStandard(argument);
+  }
+  return false;
+}
+
 template <class Make>
 void record(SharedLines &lines, Make make) {
   const OwnWork own;
@@ -411,6 +443,65 @@ class KeyOfCall {
   const char *text_ = nullptr;
   const std::string *made_ = nullptr;
 };
+
+// Each returns the key of its call.
+template <class Key>
+Key recordPlugin(Key key, std::initializer_list<const char *> texts) {
+  record(pluginCalls(), [&] {
+    std::string line;
+    for (const char *text : texts) line += text != nullptr ? text : "";
+    return line;
+  });
+  return key;
+}
+
+const char *recordSystem(const char *command) {
+  record(systemCommands(), [&] { return command != nullptr ? command : ""; });
+  return command;
+}
+
+// What an unsuccessful call gives: -1 or a null pointer.
+struct Failed {
+  template <class Result>
+  operator Result() const {
+    if constexpr (std::is_pointer_v<Result>) {
+      return nullptr;
+    } else {
+      return -1;
+    }
+  }
+};
+constexpr Failed kFailed;
+
+template <class Function>
+struct Signature;
+template <class ResultOf, class... Arguments>
+struct Signature<ResultOf(Arguments...)> {
+  using Result = ResultOf;
+  using Tuple = std::tuple<Arguments...>;
+  static constexpr bool kIsNoexcept = false;
+};
+template <class ResultOf, class... Arguments>
+struct Signature<ResultOf(Arguments...) noexcept> : Signature<ResultOf(Arguments...)> {
+  static constexpr bool kIsNoexcept = true;
+};
+
+// The key may be a text that is made for it, which is the test's own work; looking for the next
+// definition of the call is not, and comes after it.
+template <Call call, class Next, class Key, class Failure, class... Arguments>
+auto failOrCall(Next next, Key makeKey, const Failure &failure, Arguments... arguments) {
+  using Result = decltype(next()(arguments...));
+  if (is(call, 's') && (isStandardArgument(arguments) || ...)) return next()(arguments...);
+  const KeyOfCall key(makeKey);
+  if constexpr (is(call, 'd')) {
+    const Result result = next()(arguments...);
+    const auto *plan = failing(call, key.text());
+    return plan != nullptr ? resultOf(*plan, static_cast<Result>(failure)) : result;
+  } else {
+    const auto *plan = failing(call, key.text());
+    return plan != nullptr ? resultOf(*plan, static_cast<Result>(failure)) : next()(arguments...);
+  }
+}
 
 constexpr long kMicrosecondsPerSecond = 1000000;
 constexpr long kNanosecondsPerMicrosecond = 1000;
@@ -588,24 +679,52 @@ using support::isStandard;
 using support::Plan;
 using support::resultOf;
 
-#define NEXT(variable, name) \
-  static const auto variable = reinterpret_cast<decltype(&name)>(support::nextSymbol(#name))
+#define REAL(name) \
+  static const auto real_##name = reinterpret_cast<decltype(&(name))>(support::nextSymbol(#name))
 
-#define REAL(name) NEXT(real_##name, name)
+// Gives the next definition of a call.
+#define NEXT_OF(name)                                                                         \
+  [] {                                                                                        \
+    static const auto next = reinterpret_cast<decltype(&(name))>(support::nextSymbol(#name)); \
+    return next;                                                                              \
+  }
 
-// The key may be a text that is made for it, which is the test's own work; looking for the call is
-// not, and comes after it.
-#define FAIL_OR_CALL(name, key, failure, ...)                             \
-  do {                                                                    \
-    const support::KeyOfCall key_of_call([&] { return key; });            \
-    if (const auto *plan = failing(Call::k_##name, key_of_call.text())) { \
-      return resultOf(*plan, failure);                                    \
-    }                                                                     \
-    NEXT(next_##name, name);                                              \
-    return next_##name(__VA_ARGS__);                                      \
-  } while (false)
+#define FAIL_OR_CALL(name, key, failure, ...) \
+  return support::failOrCall<Call::k_##name>( \
+      NEXT_OF(name), [&] { return key; }, failure, __VA_ARGS__)
+
+#define PARAMETER(name, index, variable) \
+  std::tuple_element_t<index, support::Signature<decltype(name)>::Tuple> variable
+#define PARAMETERS_0(name)
+#define PARAMETERS_1(name) PARAMETER(name, 0, a)
+#define PARAMETERS_2(name) PARAMETERS_1(name), PARAMETER(name, 1, b)
+#define PARAMETERS_3(name) PARAMETERS_2(name), PARAMETER(name, 2, c)
+#define PARAMETERS_4(name) PARAMETERS_3(name), PARAMETER(name, 3, d)
+#define PARAMETERS_5(name) PARAMETERS_4(name), PARAMETER(name, 4, e)
+#define ARGUMENTS_0
+#define ARGUMENTS_1 , a
+#define ARGUMENTS_2 , a, b
+#define ARGUMENTS_3 , a, b, c
+#define ARGUMENTS_4 , a, b, c, d
+#define ARGUMENTS_5 , a, b, c, d, e
 
 extern "C" {
+
+using support::kFailed;
+using support::recordPlugin;
+using support::recordSystem;
+
+#define DEFINE(count, name, how, key, failure)                                        \
+  support::Signature<decltype(name)>::Result name(PARAMETERS_##count(name)) noexcept( \
+      support::Signature<decltype(name)>::kIsNoexcept) {                              \
+    return support::failOrCall<Call::k_##name>(                                       \
+        NEXT_OF(name), [&] { return key; }, failure ARGUMENTS_##count);               \
+  }
+// What the headers say of a call beside its types is for callers.
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wignored-attributes"
+PLAIN_CALLS(DEFINE)
+#pragma GCC diagnostic pop
 
 // ---- libzelocore
 
@@ -634,168 +753,16 @@ int QLIBCExec(const char *program, ...) {
                static_cast<char *>(nullptr));
 }
 
-PSZHASH QLIBCSzHashAlloc(int capacity) {
-  FAIL_OR_CALL(QLIBCSzHashAlloc, std::to_string(capacity), PSZHASH{}, capacity);
-}
-
-int QLIBCSzHashSetValue(PSZHASH *hash, const char *key, const char *value) {
-  FAIL_OR_CALL(QLIBCSzHashSetValue, key, -1, hash, key, value);
-}
-
 const char *QLIBCSzHashGetValue(PSZHASH hash, const char *key) {
   if (const auto *plan = failing(Call::k_QLIBCSzHashGetValue, key)) {
     const char *nothing = resultOf(*plan, static_cast<const char *>(nullptr));
     return plan->hasText ? plan->text : nothing;
   }
-  NEXT(next_QLIBCSzHashGetValue, QLIBCSzHashGetValue);
-  return next_QLIBCSzHashGetValue(hash, key);
-}
-
-int QLIBCSzHashEnumKey(PSZHASH hash, PSZLIST *list) {
-  FAIL_OR_CALL(QLIBCSzHashEnumKey, nullptr, -1, hash, list);
-}
-
-PSZLIST QLIBCSzListAlloc(int capacity) {
-  FAIL_OR_CALL(QLIBCSzListAlloc, nullptr, PSZLIST{}, capacity);
-}
-
-int QLIBCSzListPush(PSZLIST *list, const char *text) {
-  FAIL_OR_CALL(QLIBCSzListPush, nullptr, -1, list, text);
-}
-
-int QLIBCStrSep(const char *text, const char *separators, PSZLIST *list) {
-  FAIL_OR_CALL(QLIBCStrSep, text, -1, text, separators, list);
-}
-
-int QLIBCFileExist(const char *path) {
-  FAIL_OR_CALL(QLIBCFileExist, path, 0, path);
-}
-
-int QLIBCFileTouch(const char *path) {
-  FAIL_OR_CALL(QLIBCFileTouch, path, -1, path);
-}
-
-int QLIBCFileEnumSection(const char *path, PSZLIST *list) {
-  FAIL_OR_CALL(QLIBCFileEnumSection, path, -1, path, list);
-}
-
-int QLIBCFileGetSection(const char *path, const char *section, PSZHASH *hash) {
-  FAIL_OR_CALL(QLIBCFileGetSection, section, -1, path, section, hash);
-}
-
-int QLIBCFileSetSection(const char *path, const char *section, int flags, PSZHASH hash,
-                        int reserved) {
-  FAIL_OR_CALL(QLIBCFileSetSection, section, -1, path, section, flags, hash, reserved);
-}
-
-int QLIBCFileAddSection(const char *path, const char *section, PSZHASH hash, int reserved) {
-  FAIL_OR_CALL(QLIBCFileAddSection, section, -1, path, section, hash, reserved);
-}
-
-int QLIBCFileRemoveSection(const char *path, const char *section) {
-  FAIL_OR_CALL(QLIBCFileRemoveSection, section, -1, path, section);
-}
-
-int QLIBCProcForkChildNoWait(void) {
-  FAIL_OR_CALL(QLIBCProcForkChildNoWait, nullptr, -1);
-}
-
-int QLIBCProcAlive(pid_t pid) {
-  FAIL_OR_CALL(QLIBCProcAlive, std::to_string(pid), 0, pid);
-}
-
-int QLIBPluginInit(const char *plugin, const char *action, void **context) {
-  support::record(support::pluginCalls(), [&] {
-    return std::string("init ") + (plugin != nullptr ? plugin : "") + " " +
-           (action != nullptr ? action : "");
-  });
-  FAIL_OR_CALL(QLIBPluginInit, action, -1, plugin, action, context);
-}
-
-int QLIBPluginSetArg(void **context, const char *key, const char *value) {
-  support::record(support::pluginCalls(), [&] {
-    return std::string("arg ") + (key != nullptr ? key : "") + "=" +
-           (value != nullptr ? value : "");
-  });
-  FAIL_OR_CALL(QLIBPluginSetArg, key, -1, context, key, value);
-}
-
-int QLIBPluginSetArgByInt(void **context, const char *key, int value) {
-  support::record(support::pluginCalls(), [&] {
-    return std::string("int ") + (key != nullptr ? key : "") + "=" + std::to_string(value);
-  });
-  FAIL_OR_CALL(QLIBPluginSetArgByInt, key, -1, context, key, value);
-}
-
-int QLIBPluginAction(int stage, void **context) {
-  support::record(support::pluginCalls(), [&] { return "action " + std::to_string(stage); });
-  FAIL_OR_CALL(QLIBPluginAction, std::to_string(stage), -1, stage, context);
-}
-
-int QLIBPluginExit(void **context) {
-  support::record(support::pluginCalls(), [] { return "exit"; });
-  REAL(QLIBPluginExit);
-  const int result = real_QLIBPluginExit(context);
-  const auto *plan = failing(Call::k_QLIBPluginExit);
-  return plan != nullptr ? resultOf(*plan, -1) : result;
-}
-
-// ---- libzelosdk
-
-int ZELOUserGetByUID(uid_t uid, PZELOUSER *user) {
-  FAIL_OR_CALL(ZELOUserGetByUID, std::to_string(uid), -1, uid, user);
-}
-
-int SzBase64EncodeFull(const char *source, size_t length, char *target, size_t capacity,
-                       int reserved) {
-  FAIL_OR_CALL(SzBase64EncodeFull, nullptr, 0, source, length, target, capacity, reserved);
-}
-
-int ZELOEncodingBase64Decode(const char *source, size_t length, char *target, size_t *capacity) {
-  FAIL_OR_CALL(ZELOEncodingBase64Decode, nullptr, 0, source, length, target, capacity);
+  REAL(QLIBCSzHashGetValue);
+  return real_QLIBCSzHashGetValue(hash, key);
 }
 
 // ---- files
-
-int rename(const char *from, const char *to) noexcept {
-  FAIL_OR_CALL(rename, std::string(from) + " " + to, -1, from, to);
-}
-
-int renameat2(int from_directory, const char *from, int to_directory, const char *to,
-              unsigned flags) noexcept {
-  FAIL_OR_CALL(renameat2, std::string(from) + " " + to, -1, from_directory, from, to_directory, to,
-               flags);
-}
-
-int fsync(int descriptor) {
-  FAIL_OR_CALL(fsync, nullptr, -1, descriptor);
-}
-
-int fstat(int descriptor, struct stat *status) noexcept {
-  REAL(fstat);
-  if (isStandard(descriptor)) return real_fstat(descriptor, status);
-  FAIL_OR_CALL(fstat, nullptr, -1, descriptor, status);
-}
-
-int stat(const char *path, struct stat *status) noexcept {
-  FAIL_OR_CALL(stat, path, -1, path, status);
-}
-
-int lstat(const char *path, struct stat *status) noexcept {
-  FAIL_OR_CALL(lstat, path, -1, path, status);
-}
-
-int fchown(int descriptor, uid_t owner, gid_t group) noexcept {
-  FAIL_OR_CALL(fchown, nullptr, -1, descriptor, owner, group);
-}
-
-int fchmod(int descriptor, mode_t mode) noexcept {
-  FAIL_OR_CALL(fchmod, nullptr, -1, descriptor, mode);
-}
-
-int ftruncate(int descriptor, off_t length) noexcept {
-  FAIL_OR_CALL(ftruncate, nullptr, -1, descriptor, length);
-}
 
 // What open may have been compiled to.
 int __open_2(const char *path, int flags) {
@@ -813,30 +780,6 @@ int open(const char *path, int flags, ...) {
   FAIL_OR_CALL(open, path, -1, path, flags, mode);
 }
 
-ssize_t read(int descriptor, void *buffer, size_t size) {
-  REAL(read);
-  if (isStandard(descriptor)) return real_read(descriptor, buffer, size);
-  FAIL_OR_CALL(read, nullptr, ssize_t{-1}, descriptor, buffer, size);
-}
-
-ssize_t write(int descriptor, const void *buffer, size_t size) {
-  REAL(write);
-  if (isStandard(descriptor)) return real_write(descriptor, buffer, size);
-  FAIL_OR_CALL(write, nullptr, ssize_t{-1}, descriptor, buffer, size);
-}
-
-ssize_t pwrite(int descriptor, const void *buffer, size_t size, off_t at) {
-  FAIL_OR_CALL(pwrite, nullptr, ssize_t{-1}, descriptor, buffer, size, at);
-}
-
-int mkstemp(char *pattern) {
-  FAIL_OR_CALL(mkstemp, pattern, -1, pattern);
-}
-
-int flock(int descriptor, int operation) noexcept {
-  FAIL_OR_CALL(flock, nullptr, -1, descriptor, operation);
-}
-
 // What SQLite works with. Where long has 32 bits, the calls above are these.
 #if __SIZEOF_LONG__ > 4
 
@@ -846,14 +789,6 @@ int open64(const char *path, int flags, ...) {
   const mode_t mode = (flags & O_CREAT) != 0 ? va_arg(list, mode_t) : 0;
   va_end(list);
   FAIL_OR_CALL(open64, path, -1, path, flags, mode);
-}
-
-ssize_t pread64(int descriptor, void *buffer, size_t size, off64_t at) {
-  FAIL_OR_CALL(pread64, nullptr, ssize_t{-1}, descriptor, buffer, size, at);
-}
-
-ssize_t pwrite64(int descriptor, const void *buffer, size_t size, off64_t at) {
-  FAIL_OR_CALL(pwrite64, nullptr, ssize_t{-1}, descriptor, buffer, size, at);
 }
 
 int fcntl64(int descriptor, int command, ...) {
@@ -866,63 +801,6 @@ int fcntl64(int descriptor, int command, ...) {
 
 #endif
 
-int fdatasync(int descriptor) {
-  FAIL_OR_CALL(fdatasync, nullptr, -1, descriptor);
-}
-
-char *mkdtemp(char *pattern) noexcept {
-  FAIL_OR_CALL(mkdtemp, pattern, nullptr, pattern);
-}
-
-int rmdir(const char *path) noexcept {
-  FAIL_OR_CALL(rmdir, path, -1, path);
-}
-
-int mkdir(const char *path, mode_t mode) noexcept {
-  FAIL_OR_CALL(mkdir, path, -1, path, mode);
-}
-
-int chmod(const char *path, mode_t mode) noexcept {
-  FAIL_OR_CALL(chmod, path, -1, path, mode);
-}
-
-int access(const char *path, int mode) noexcept {
-  FAIL_OR_CALL(access, path, -1, path, mode);
-}
-
-int unlink(const char *path) noexcept {
-  FAIL_OR_CALL(unlink, path, -1, path);
-}
-
-int chdir(const char *path) noexcept {
-  FAIL_OR_CALL(chdir, path, -1, path);
-}
-
-int fstatat(int directory, const char *path, struct stat *status, int flags) noexcept {
-  FAIL_OR_CALL(fstatat, path, -1, directory, path, status, flags);
-}
-
-int statx(int directory, const char *path, int flags, unsigned mask,
-          struct statx *status) noexcept {
-  FAIL_OR_CALL(statx, path, -1, directory, path, flags, mask, status);
-}
-
-int mkostemp(char *pattern, int flags) {
-  FAIL_OR_CALL(mkostemp, pattern, -1, pattern, flags);
-}
-
-int futimens(int descriptor, const timespec *times) noexcept {
-  FAIL_OR_CALL(futimens, nullptr, -1, descriptor, times);
-}
-
-DIR *fdopendir(int descriptor) {
-  FAIL_OR_CALL(fdopendir, nullptr, static_cast<DIR *>(nullptr), descriptor);
-}
-
-dirent *readdir(DIR *directory) {
-  FAIL_OR_CALL(readdir, nullptr, static_cast<dirent *>(nullptr), directory);
-}
-
 int close(int descriptor) {
   REAL(close);
   if (isStandard(descriptor)) return real_close(descriptor);
@@ -930,14 +808,6 @@ int close(int descriptor) {
   if (result != 0) return result;  // of what was not open, which is no failure to be had
   const auto *plan = failing(Call::k_close);
   return plan != nullptr ? resultOf(*plan, -1) : result;
-}
-
-int dup(int descriptor) noexcept {
-  FAIL_OR_CALL(dup, nullptr, -1, descriptor);
-}
-
-int dup2(int descriptor, int wanted) noexcept {
-  FAIL_OR_CALL(dup2, nullptr, -1, descriptor, wanted);
 }
 
 int fcntl(int descriptor, int command, ...) {
@@ -952,33 +822,7 @@ int fcntl(int descriptor, int command, ...) {
   FAIL_OR_CALL(fcntl, nullptr, -1, descriptor, command, argument);
 }
 
-int pipe2(int *ends, int flags) noexcept {
-  FAIL_OR_CALL(pipe2, nullptr, -1, ends, flags);
-}
-
 // ---- streams
-
-FILE *fopen(const char *path, const char *mode) {
-  FAIL_OR_CALL(fopen, path, static_cast<FILE *>(nullptr), path, mode);
-}
-
-FILE *fdopen(int descriptor, const char *mode) noexcept {
-  FAIL_OR_CALL(fdopen, mode, static_cast<FILE *>(nullptr), descriptor, mode);
-}
-
-int fflush(FILE *stream) {
-  REAL(fflush);
-  if (isStandard(stream)) return real_fflush(stream);
-  FAIL_OR_CALL(fflush, nullptr, EOF, stream);
-}
-
-int fclose(FILE *stream) {
-  REAL(fclose);
-  if (isStandard(stream)) return real_fclose(stream);
-  const int result = real_fclose(stream);
-  const auto *plan = failing(Call::k_fclose);
-  return plan != nullptr ? resultOf(*plan, EOF) : result;
-}
 
 // getline may have been compiled to the call it is made of.
 ssize_t __getdelim(char **line, size_t *capacity, int delimiter, FILE *stream) {
@@ -995,27 +839,20 @@ ssize_t getline(char **line, size_t *capacity, FILE *stream) {
   return __getdelim(line, capacity, '\n', stream);
 }
 
-size_t fwrite(const void *data, size_t size, size_t count, FILE *stream) {
-  REAL(fwrite);
-  if (isStandard(stream)) return real_fwrite(data, size, count, stream);
-  FAIL_OR_CALL(fwrite, nullptr, size_t{0}, data, size, count, stream);
-}
-
 // Every other way to write to a stream counts as fwrite.
+#define FAIL_AS_FWRITE(stream)                                                                    \
+  if (const auto *plan = isStandard(stream) ? nullptr : failing(Call::k_fwrite); plan != nullptr) \
+  return resultOf(*plan, EOF)
 
 int fputs(const char *text, FILE *stream) {
+  FAIL_AS_FWRITE(stream);
   REAL(fputs);
-  if (!isStandard(stream)) {
-    if (const auto *plan = failing(Call::k_fwrite)) return resultOf(*plan, EOF);
-  }
   return real_fputs(text, stream);
 }
 
 int fputc(int character, FILE *stream) {
+  FAIL_AS_FWRITE(stream);
   REAL(fputc);
-  if (!isStandard(stream)) {
-    if (const auto *plan = failing(Call::k_fwrite)) return resultOf(*plan, EOF);
-  }
   return real_fputc(character, stream);
 }
 
@@ -1025,10 +862,8 @@ int putc(int character, FILE *stream) {
 }
 
 int vfprintf(FILE *stream, const char *format, va_list arguments) {
+  FAIL_AS_FWRITE(stream);
   REAL(vfprintf);
-  if (!isStandard(stream)) {
-    if (const auto *plan = failing(Call::k_fwrite)) return resultOf(*plan, -1);
-  }
   return real_vfprintf(stream, format, arguments);
 }
 
@@ -1042,38 +877,6 @@ int fprintf(FILE *stream, const char *format, ...) {
 
 // ---- identity and processes
 
-int seteuid(uid_t uid) noexcept {
-  FAIL_OR_CALL(seteuid, std::to_string(uid), -1, uid);
-}
-
-int setegid(gid_t gid) noexcept {
-  FAIL_OR_CALL(setegid, std::to_string(gid), -1, gid);
-}
-
-int setreuid(uid_t real, uid_t effective) noexcept {
-  FAIL_OR_CALL(setreuid, nullptr, -1, real, effective);
-}
-
-int setregid(gid_t real, gid_t effective) noexcept {
-  FAIL_OR_CALL(setregid, nullptr, -1, real, effective);
-}
-
-int setresuid(uid_t real, uid_t effective, uid_t saved) noexcept {
-  FAIL_OR_CALL(setresuid, nullptr, -1, real, effective, saved);
-}
-
-int setresgid(gid_t real, gid_t effective, gid_t saved) noexcept {
-  FAIL_OR_CALL(setresgid, nullptr, -1, real, effective, saved);
-}
-
-int setgroups(size_t count, const gid_t *groups) noexcept {
-  FAIL_OR_CALL(setgroups, nullptr, -1, count, groups);
-}
-
-int initgroups(const char *user, gid_t group) {
-  FAIL_OR_CALL(initgroups, user, -1, user, group);
-}
-
 int getpwuid_r(uid_t uid, struct passwd *entry, char *buffer, size_t size, struct passwd **result) {
   if (const auto *plan = failing(Call::k_getpwuid_r)) {
     *result = nullptr;
@@ -1081,10 +884,6 @@ int getpwuid_r(uid_t uid, struct passwd *entry, char *buffer, size_t size, struc
   }
   REAL(getpwuid_r);
   return real_getpwuid_r(uid, entry, buffer, size, result);
-}
-
-pid_t setsid() noexcept {
-  FAIL_OR_CALL(setsid, nullptr, pid_t{-1});
 }
 
 int prctl(int option, ...) noexcept {
@@ -1116,30 +915,6 @@ long syscall(long number, ...) noexcept {
                       arguments[5]);
 }
 
-int close_range(unsigned first, unsigned last, int flags) noexcept {
-  FAIL_OR_CALL(close_range, nullptr, -1, first, last, flags);
-}
-
-int clearenv() noexcept {
-  FAIL_OR_CALL(clearenv, nullptr, -1);
-}
-
-int putenv(char *entry) noexcept {
-  FAIL_OR_CALL(putenv, entry, -1, entry);
-}
-
-int kill(pid_t pid, int signal) noexcept {
-  FAIL_OR_CALL(kill, std::to_string(pid), -1, pid, signal);
-}
-
-long sysconf(int name) noexcept {
-  FAIL_OR_CALL(sysconf, nullptr, -1L, name);
-}
-
-pid_t fork() noexcept {
-  FAIL_OR_CALL(fork, nullptr, pid_t{-1});
-}
-
 int posix_spawn(pid_t *pid, const char *program, const posix_spawn_file_actions_t *actions,
                 const posix_spawnattr_t *attributes, char *const *arguments,
                 char *const *environment) {
@@ -1148,46 +923,12 @@ int posix_spawn(pid_t *pid, const char *program, const posix_spawn_file_actions_
   return real_posix_spawn(pid, program, actions, attributes, arguments, environment);
 }
 
+// Its header leaves out that it is of the C language.
 int pidfd_open(pid_t pid, unsigned flags) noexcept {
-  FAIL_OR_CALL(pidfd_open, nullptr, -1, pid, flags);
-}
-
-int poll(pollfd *events, nfds_t count, int timeout) {
-  FAIL_OR_CALL(poll, nullptr, -1, events, count, timeout);
-}
-
-int waitid(idtype_t type, id_t id, siginfo_t *info, int options) {
-  REAL(waitid);
-  const int result = real_waitid(type, id, info, options);
-  const auto *plan = failing(Call::k_waitid);
-  return plan != nullptr ? resultOf(*plan, -1) : result;
-}
-
-pid_t waitpid(pid_t pid, int *status, int options) {
-  REAL(waitpid);
-  const pid_t result = real_waitpid(pid, status, options);
-  const auto *plan = failing(Call::k_waitpid);
-  return plan != nullptr ? resultOf(*plan, pid_t{-1}) : result;
-}
-
-int system(const char *command) {
-  support::record(support::systemCommands(), [&] { return command != nullptr ? command : ""; });
-  FAIL_OR_CALL(system, command, -1, command);
+  FAIL_OR_CALL(pidfd_open, nullptr, kFailed, pid, flags);
 }
 
 // ---- time and chance
-
-struct tm *localtime(const time_t *seconds) noexcept {
-  FAIL_OR_CALL(localtime, nullptr, static_cast<struct tm *>(nullptr), seconds);
-}
-
-struct tm *localtime_r(const time_t *seconds, struct tm *broken) noexcept {
-  FAIL_OR_CALL(localtime_r, nullptr, static_cast<struct tm *>(nullptr), seconds, broken);
-}
-
-time_t mktime(struct tm *broken) noexcept {
-  FAIL_OR_CALL(mktime, nullptr, time_t{-1}, broken);
-}
 
 unsigned sleep(unsigned seconds) {
   const auto *plan = failing(Call::k_sleep);
@@ -1246,36 +987,19 @@ void srand(unsigned seed) noexcept {
 
 #if !defined(__SANITIZE_ADDRESS__)
 
-void *__libc_malloc(size_t size);
-void *__libc_calloc(size_t count, size_t size);
-void *__libc_realloc(void *memory, size_t size);
-
-void *malloc(size_t size) noexcept {
-  if (support::allocationPlanned && !support::OwnWork::isGoingOn() &&
-      failing(Call::k_malloc, nullptr, size) != nullptr) {
-    errno = ENOMEM;
-    return nullptr;
+#define ALLOCATION(name, bytes, parameters, ...)                        \
+  void *__libc_##name parameters;                                       \
+  void *name parameters noexcept {                                      \
+    if (support::allocationPlanned && !support::OwnWork::isGoingOn() && \
+        failing(Call::k_##name, nullptr, bytes) != nullptr) {           \
+      errno = ENOMEM;                                                   \
+      return nullptr;                                                   \
+    }                                                                   \
+    return __libc_##name(__VA_ARGS__);                                  \
   }
-  return __libc_malloc(size);
-}
-
-void *calloc(size_t count, size_t size) noexcept {
-  if (support::allocationPlanned && !support::OwnWork::isGoingOn() &&
-      failing(Call::k_calloc, nullptr, count * size) != nullptr) {
-    errno = ENOMEM;
-    return nullptr;
-  }
-  return __libc_calloc(count, size);
-}
-
-void *realloc(void *memory, size_t size) noexcept {
-  if (support::allocationPlanned && !support::OwnWork::isGoingOn() &&
-      failing(Call::k_realloc, nullptr, size) != nullptr) {
-    errno = ENOMEM;
-    return nullptr;
-  }
-  return __libc_realloc(memory, size);
-}
+ALLOCATION(malloc, size, (size_t size), size)
+ALLOCATION(calloc, count *size, (size_t count, size_t size), count, size)
+ALLOCATION(realloc, size, (void *memory, size_t size), memory, size)
 
 #endif
 
@@ -1305,12 +1029,5 @@ int sqlite3_exec(sqlite3 *database, const char *sql, int (*callback)(void *, int
   }
   REAL(sqlite3_exec);
   return real_sqlite3_exec(database, sql, callback, argument, error);
-}
-
-int sqlite3_close(sqlite3 *database) {
-  REAL(sqlite3_close);
-  const int result = real_sqlite3_close(database);
-  const auto *plan = failing(Call::k_sqlite3_close);
-  return plan != nullptr ? resultOf(*plan, SQLITE_BUSY) : result;
 }
 }

@@ -1,13 +1,36 @@
 # shellcheck shell=bash
-# For scripts that test zelosched: running it, also at another time, and what it says. Sourced after
-# shell_test.sh, with SCRATCH set.
+# For the tests of zelosched, scripts and transcripts: the files it works with, running it, also at
+# another time, and a machine on which all is well. What changes the sandbox for all of them is in
+# start_zelosched_tests.
+#
+# Not every name is used by every test:
+# shellcheck disable=SC2034
 
 readonly ZELOSCHED=$BUILD_DIR/bin/zelosched
 readonly FAKE=$BUILD_DIR/tests/fake_time.so
+readonly NO_FORK=$BUILD_DIR/tests/no_fork.so
+readonly SCRATCH=/run/zelosched_test
+readonly STORE=/tmp/scheduled_tasks
+readonly PROGRAM=/tmp/zeloschedtask
+readonly STATUS=/tmp/sched_status.sqlite
+readonly PERSISTENT=/usr/zelo/etc/scheduled_tasks
+readonly LAST_GOOD=/usr/zelo/etc/scheduled_tasks.last-good
+readonly KEPT=/usr/zelo/var/history.sqlite
+readonly BOOT_ID=/proc/sys/kernel/random/boot_id
+readonly ALARM=/sys/class/rtc/rtc0/wakealarm
+readonly NOBODY=65534
+unset LC_ALL LANG NO_COLOR
+export TZ=UTC
+mkdir -p "$SCRATCH"
+cd "$SCRATCH" || exit
 
 # What hangs shall fail.
 z() {
   timeout 60 "$ZELOSCHED" "$@"
+}
+
+zelosched() {
+  z "$@"
 }
 
 at() {
@@ -16,8 +39,12 @@ at() {
   FAKE_TIME=$(date -u -d "$moment" +%s) LD_PRELOAD=$FAKE z "$@"
 }
 
+# Waiting takes no time.
+patiently() {
+  FAKE_PATIENCE=1 LD_PRELOAD=$FAKE "$@"
+}
+
 # Runs it and keeps status, out and err.
-# shellcheck disable=SC2034
 try() {
   status=0
   "$@" >"$SCRATCH/out" 2>"$SCRATCH/err" </dev/null || status=$?
@@ -25,18 +52,329 @@ try() {
   err=$(cat "$SCRATCH/err")
 }
 
+add() {
+  z add --quiet "$@" >/dev/null
+}
+
+# json EXPRESSION: of what zelosched printed, `tasks`
+json() {
+  python3 -c "import json, sys; tasks = json.load(sys.stdin); print($1)"
+}
+
+ids() {
+  z list --json "$@" | json '[t["id"] for t in tasks]'
+}
+
+names() {
+  z list | awk 'NR > 1 { print $NF }' | sort | paste -sd ' '
+}
+
+task_lines() {
+  grep -c "$PROGRAM" /etc/crontab || true
+}
+
+owner_and_mode() {
+  stat -c '%U:%G %a' "$@"
+}
+
+sql() {
+  sqlite3 -separator ' ' "$@"
+}
+
+# Comments count like any other line. Of more than 10,000 lines cron reads none, and 200 are left to
+# other programs and to power times.
+fill_crontab() {
+  local present
+  present=$(wc -l </etc/crontab)
+  yes '#' | head -n $(($1 - present)) >>/etc/crontab
+}
+
+# times COUNT: an array with so many of the object that is read
+times() {
+  local object
+  object=$(cat)
+  echo "["
+  yes "$object," | head -n "$(($1 - 1))"
+  echo "$object]"
+}
+
+# the_object [SED SCRIPT]: the one task of an export, as a member of an array
+the_object() {
+  sed '1d;$d' "$1" | sed "${2:-}"
+}
+
+# ---- the machine ----------------------------------------------------------------------------
+
+# Once for all tests of a script.
+start_zelosched_tests() {
+  cp /etc/crontab "$SCRATCH/crontab"
+  cat "$BOOT_ID" >"$SCRATCH/boot_id"
+  mount -n --bind "$SCRATCH/boot_id" "$BOOT_ID"
+  mount -n -t tmpfs sys /sys
+  mkdir -p "${ALARM%/*}"
+  touch "$ALARM"
+  start_something_like_cron
+}
+
+start_something_like_cron() {
+  cp /bin/sleep "$SCRATCH/cron"
+  # No child of this shell, which waits for its own, and deaf to the library's signal.
+  (
+    trap '' HUP
+    "$SCRATCH/cron" 10000 >/dev/null 2>&1 &
+    echo $! >"$SCRATCH/crond.pid"
+  )
+}
+
+# transcripts NAME...: a line for each of their tests; or brings them up to date, where that is wanted
+transcripts() {
+  local tests
+  tests=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd -P)
+  python3 "$tests/support/transcript.py" ${UPDATE_TRANSCRIPTS:+--update} \
+    "$tests/support/zelosched_test.sh" "${@/#/$tests/transcripts/}" || tests_failed=1
+}
+
+forget_tmp() {
+  rm -rf "$STORE"* "$PROGRAM"* "$STATUS"* /tmp/lock* /tmp/zeloscheduler.*
+}
+
+# No task, and nothing of earlier tests.
+clean() {
+  forget_tmp
+  rm -rf "$PERSISTENT" "$LAST_GOOD" /usr/zelo/var /usr/zelo/etc/power_sched.conf /etc/crontab
+  cp "$SCRATCH/crontab" /etc/crontab
+  cp "$SCRATCH/crond.pid" /var/run/crond.pid
+  : >"$ALARM"
+}
+
+# One task, of which status finds nothing wrong.
+all_well() {
+  add --daily 08:30 -- true
+  install -m 0755 "$BUILD_DIR/bin/zeloschedtask" "$PROGRAM"
+}
+
+# edit_by_hand SCRIPT...: of sed, in an editor that knows nothing of the store's header and trailer.
+# As these are gone, nobody waits for the rest of what looks like a copy in progress.
+edit_by_hand() {
+  sed -i -e "$1" -e '/^# zelo section file$/d; /^# end of file/d' "$STORE"
+}
+
+# many_tasks COUNT: each minute of the hour in turn
+many_tasks() {
+  add --daily 08:30 -- true
+  grep = "$STORE" >"$SCRATCH/keys"
+  for ((id = 1; id <= $1; id++)); do
+    echo "[$id]"
+    sed "s/^id=.*/id=\"$id\"/; s/^run min=.*/run min=\"$((id % 60))\"/" "$SCRATCH/keys"
+  done >"$STORE"
+}
+
+# The machine comes up: /tmp is empty, and the crontab is as it was.
+boot() {
+  forget_tmp
+  cat /proc/sys/kernel/random/uuid >"$SCRATCH/boot_id"
+}
+
+# Not even root can move a directory away on which something is mounted. Until it is let go.
+hold() {
+  rm -rf "$1"
+  mkdir "$1"
+  mount -n -t tmpfs -o mode=0777 none "$1"
+}
+
+let_go() {
+  umount -n "$1"
+  rmdir "$1"
+}
+
+state() {
+  cat "$STORE" "$PERSISTENT" /etc/crontab 2>&1 | sha256sum
+}
+
+# remember, COMMAND, is_unchanged
+remember() {
+  state >"$SCRATCH/state"
+}
+
+is_unchanged() {
+  state | cmp - "$SCRATCH/state"
+}
+
 # A program that every user can run, wherever the checkout lies: below root's home, say, which is
-# closed to others.
+# closed to others. One that counts what is run of it finds a place for that.
 readonly FOR_OTHERS=/run/for_others/zelosched
 copy_for_others() {
   local directory=${FOR_OTHERS%/*}
   mkdir -p "$directory"
+  mkdir -m 0777 "$directory/counts"
   cp "$BUILD_DIR"/lib/*.so* "$directory"
   cp "$ZELOSCHED" "$directory/zelosched.program"
-  cat >"$FOR_OTHERS" <<EOF
+  cat >"$FOR_OTHERS" <<SCRIPT
 #!/bin/sh
-LD_LIBRARY_PATH=$directory exec $directory/zelosched.program "\$@"
-EOF
+GCOV_PREFIX=$directory/counts LD_LIBRARY_PATH=$directory exec $directory/zelosched.program "\$@"
+SCRIPT
   chmod -R a+rX "$directory"
   chmod a+x "$FOR_OTHERS"
+}
+
+as_nobody() {
+  setpriv --reuid "$NOBODY" --regid "$NOBODY" --clear-groups "$@"
+}
+
+nobodys_zelosched() {
+  [[ -e $FOR_OTHERS ]] || copy_for_others
+  as_nobody "$FOR_OTHERS" "$@"
+}
+
+# ---- tasks and runs -------------------------------------------------------------------------
+
+three_tasks() {
+  add --daily 08:30 --name later -- true
+  add --daily 07:30 --name sooner --app backup --owner nobody -- true
+  add --daily 06:30 --name off --disabled -- true
+}
+
+one_recorded_run() {
+  all_well
+  z run --wait 1 >/dev/null
+}
+
+# A process that holds the lock on a file until it is ended, as $held.
+hold_lock() {
+  flock --no-fork "$1" sleep 600 >/dev/null 2>&1 &
+  held=$!
+  until ! flock --nonblock "$1" true; do :; done
+}
+
+# Prints what bash would offer for the line.
+completions() {
+  PATH=$BUILD_DIR/bin:$PATH bash -c '
+    source <(zelosched completion bash)
+    COMP_WORDS=("$@")
+    COMP_CWORD=$(($# - 1))
+    _zelosched
+    printf "%s\n" "${COMPREPLY[@]}"' - "$@"
+}
+
+commands() {
+  z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'
+}
+
+# In 256 MB of addresses, which no program with sanitizers starts in.
+bounded() {
+  (
+    if ! grep -q __asan_init "$ZELOSCHED"; then ulimit -v 262144; fi
+    "$@"
+  )
+}
+
+# ---- boots ----------------------------------------------------------------------------------
+
+saved() {
+  add --daily 02:30 --name one -- true
+  add --daily 03:30 --name two -- true
+}
+
+three_saved() {
+  saved
+  add --daily 04:30 --name three -- true
+}
+
+# What it is, and of a file what is in it. Reading a FIFO would not end.
+contents_of() {
+  stat -c %F "$1" 2>/dev/null || true
+  if [[ -f $1 ]]; then md5sum <"$1"; fi
+}
+
+# Bytes, or as much as is usual.
+leave_room() {
+  local used size=50%
+  used=$(df --output=used -B1 "$1" | tail -1)
+  if (($# > 1)); then size=$((used + $2)); fi
+  mount -n -o "remount,size=$size" "$1"
+}
+
+make_readonly() {
+  mount -n --bind "$1" "$1"
+  mount -n -o remount,bind,ro "$1"
+}
+
+# Where zelosched is, but the program that it puts back is as somebody makes it.
+elsewhere() {
+  rm -rf /run/elsewhere
+  mkdir /run/elsewhere
+  cp "$ZELOSCHED" /run/elsewhere
+}
+
+elsewhere_zelosched() {
+  LD_LIBRARY_PATH=$BUILD_DIR/lib /run/elsewhere/zelosched "$@"
+}
+
+# What is named like the files that a killed writer leaves
+scratch_names() {
+  find /tmp /run /usr/zelo/etc -name '*.??????' -not -name 'zeloscheduler.*' -not -name '*.sqlite' |
+    grep -v -e "^$BUILD_DIR" -e "^${FOR_OTHERS%/*}"
+}
+
+names_in_tmp() {
+  find /tmp/lock "$STATUS" "$STATUS"-* -printf '%p %u:%g %m %y\n' 2>/dev/null | sort
+}
+
+# record ID START STATUS [COMMENT [STATUS_ID [PID]]]: a run, as the library does
+record() {
+  if [[ ! -e $STATUS ]]; then
+    install -m 0600 /dev/null "$STATUS"
+    sql "$STATUS" "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);"
+  fi
+  sql "$STATUS" "INSERT INTO task_status VALUES(${5:-NULL}, ${6:-4194305},
+    $(date -u -d "$2" +%s), 'app', $1, $3, '${4:-}')"
+}
+
+readonly NOW="2026-11-20 12:00"
+keep() {
+  at "$NOW" history --keep
+}
+
+history() {
+  z history "$@" --json |
+    json '"\n".join(", ".join(str(run[key]) for key in ("id", "start", "result")) for run in tasks)'
+}
+
+# Off from one to eight o'clock on a Friday.
+readonly OFF="2026-11-20 01:00:20" ON="2026-11-20 08:00:40" LATER="2026-11-20 08:05"
+go_off() {
+  at "$OFF" history --keep
+  boot
+  at "$ON" restore >/dev/null
+}
+
+missed() {
+  at "$LATER" catch-up --dry-run "$@" | sed -n 's/^task [0-9]* (\(.*\)) was due at \(.*\): would.*/\1 \2/p'
+}
+
+one_task() {
+  add --daily 02:30 --name one -- true
+}
+
+tasks_of_all_kinds() {
+  rm -f ran
+  add --daily 02:30 --name daily -- "echo daily >>$SCRATCH/ran"
+  add --daily 00:15 --every 1h --until 23 --name hourly -- "echo hourly >>$SCRATCH/ran"
+  at "$OFF" add --quiet --once 2026-11-20T03:00 --name once -- "echo once >>$SCRATCH/ran" >/dev/null
+  add --weekly fri 08:00 --name weekly -- "echo weekly >>$SCRATCH/ran"
+  add --daily 01:00 --name before -- true
+  add --daily 08:01 --name after -- true
+  add --weekly sat 04:00 --name saturday -- true
+  add --daily 05:00 --disabled --name disabled -- true
+  z power add on --daily 05:00 >/dev/null
+}
+
+# What ran, once there are so many.
+ran() {
+  local tenths
+  for ((tenths = 0; tenths < 200; tenths++)); do
+    if [[ $(wc -l <ran) -ge $1 ]]; then break; fi
+    sleep 0.1
+  done 2>/dev/null
+  sort ran
 }
