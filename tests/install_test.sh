@@ -52,8 +52,11 @@ libexec/zelosched/zelo_poweroff_feasible_check
 sbin/zelosched
 sbin/zeloschedtask
 share/bash-completion/completions/zelosched
+share/fish/vendor_completions.d/zelosched.fish
+share/zelosched/zelosched-1.schema.json
 share/zeloscheduler/take_lines_out
 share/zeloscheduler/zeloschedtask.stand-in
+share/zsh/vendor-completions/_zelosched
 FILES
 }
 
@@ -126,9 +129,9 @@ readonly -a new_task=(owner=65534 name=n cmd=true 'run hour=1' 'run min=2')
 
 # Owner, name, command, hour and minute of a stored task.
 stored_fields() {
-  with_library "$PREFIX/sbin/zelosched" export "$1" | python3 -c 'import json, sys
-task = json.load(sys.stdin)[0]
-print(*(task[key] for key in ("owner", "name", "cmd", "run hour", "run min")))'
+  with_library "$PREFIX/sbin/zelosched" show "$1" --json | python3 -c 'import json, sys
+task = json.load(sys.stdin)["tasks"][0]
+print(*(task[key] for key in ("owner_uid", "name", "command")), *(int(part) for part in task["schedule"]["at"].split(":")))'
 }
 
 # refused UID PAIR...: with status 1, and nothing stored is another one than before

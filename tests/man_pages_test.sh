@@ -24,7 +24,7 @@ install_pages() {
 
 # Pages that are not links to others.
 pages() {
-  grep -L '^\.so ' "$MAN"/man[378]/*
+  grep -L '^\.so ' "$MAN"/man[3578]/*
 }
 
 exported_functions() {
@@ -49,6 +49,7 @@ have_sections() {
       case $page:$section in
         *.8:"RETURN VALUE") section="EXIT STATUS" ;;
         *.8:ERRORS) continue ;; # they are in the exit status
+        *.5:"RETURN VALUE" | *.5:ERRORS) continue ;; # of calls and programs
       esac
       [[ -n $(section_of_page "$page" "$section") ]] ||
         { echo "${page##*/} lacks $section"; missing=1; }
@@ -144,7 +145,7 @@ else
 fi
 check "what the pages refer to is there" see_also_is_there
 while read -r page; do
-  case $page in *.8) continue ;; esac
+  case $page in *.[58]) continue ;; esac
   check "the prototypes of ${page##*/} are the header's" synopsis_agrees_with_header "$page"
   if grep -q '^ZELO_SANITIZE:STRING=.' "$BUILD_DIR/CMakeCache.txt"; then
     skip "the examples of ${page##*/} are built" "the library has sanitizers"

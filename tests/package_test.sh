@@ -168,9 +168,13 @@ zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-restore.se
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-shutdown.service
 zeloscheduler-tools -rw-r--r-- root:root usr/lib/tmpfiles.d/libzeloscheduler-program.conf
 zeloscheduler-tools -rw-r--r-- root:root usr/share/bash-completion/completions/zelosched
+zeloscheduler-tools -rw-r--r-- root:root usr/share/fish/vendor_completions.d/zelosched.fish
 zeloscheduler-tools -rw-r--r-- root:root usr/share/lintian/overrides/zeloscheduler-tools
+zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man5/zelosched-json.5.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zelosched.8.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zeloschedtask.8.gz
+zeloscheduler-tools -rw-r--r-- root:root usr/share/zelosched/zelosched-1.schema.json
+zeloscheduler-tools -rw-r--r-- root:root usr/share/zsh/vendor-completions/_zelosched
 zeloscheduler-tools -rwxr-xr-x root:root etc/init.d/zelosched-restore
 zeloscheduler-tools -rwxr-xr-x root:root usr/sbin/zelosched
 zeloscheduler-tools -rwxr-xr-x root:root usr/sbin/zeloschedtask
@@ -485,7 +489,7 @@ has_all_tasks() {
 }
 
 task_count() {
-  in_root zelosched export | grep -c '"id"' || true
+  in_root zelosched list --power --json | grep -c '"id"' || true
 }
 
 # ---- the tests ----------------------------------------------------------------------------------

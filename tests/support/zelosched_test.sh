@@ -56,17 +56,37 @@ add() {
   z add --quiet "$@" >/dev/null
 }
 
-# json EXPRESSION: of what zelosched printed, `tasks`
+# json EXPRESSION: of what zelosched printed, `tasks`; what stands in its lists
 json() {
-  python3 -c "import json, sys; tasks = json.load(sys.stdin); print($1)"
+  python3 -c "import json, sys
+tasks = json.load(sys.stdin)
+if 'version' in tasks: tasks = sum((list for name, list in tasks.items() if name != 'version'), [])
+print($1)"
+}
+
+# The library's form of tasks with its members decoded, an array of an object a line.
+plain() {
+  z export --wire "$@" | python3 -c 'import base64, json, re, sys
+objects = [{k: json.loads(v) for k, v in json.loads(line).items()} for line in sys.stdin]
+for task in objects:
+    command = base64.b64decode(task.pop("cmd"))
+    try:
+        task["cmd"] = command.decode()
+    except UnicodeDecodeError:
+        task["cmd base64"] = base64.b64encode(command).decode()
+    for key, text in task.items():
+        if re.fullmatch("id|owner|simple edit form|listable|can .*|start .*|run .*|repeat hour|last work hour", key):
+            task[key] = int(text)
+lines = [json.dumps(task, separators=(",", ":"), sort_keys=True) for task in objects]
+print("[\n" + ",\n".join(lines) + "\n]")'
 }
 
 ids() {
-  z list --json "$@" | json '[t["id"] for t in tasks]'
+  z list --power --json "$@" | json '[t["id"] for t in tasks]'
 }
 
 names() {
-  z list | awk 'NR > 1 { print $NF }' | sort | paste -sd ' '
+  z list --power | awk 'NR > 1 { print $2 }' | sort | paste -sd ' '
 }
 
 task_lines() {

@@ -44,9 +44,10 @@ int runEdit(int argc, char **argv) {
 }  // namespace
 
 const Command kEditCommand = {
-    "edit", "ID [OPTION...] [-- COMMAND...]", "change a task",
-    "Changes what the options name; the rest of the task stays. Another kind of\n"
-    "schedule takes the start date away, and keeps --every and --until.\n"
+    "edit", "TASK [OPTION...] [-- COMMAND...]", "change a task",
+    "Changes what the options name; the rest of the task stays. It is named by its id, or by\n"
+    "its name when no other has that. Another kind of schedule takes the start date away,\n"
+    "and keeps --every and --until.\n"
     "\n"
     "The id of a power time is made of its times and changes with them.\n"
     "\n" TASK_OPTIONS_HELP

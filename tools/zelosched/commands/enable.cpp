@@ -43,13 +43,13 @@ int runDisable(int argc, char **argv) {
 }  // namespace
 
 const Command kEnableCommand = {
-    "enable", "ID...", "let tasks run at their times",
+    "enable", "TASK...", "let tasks run at their times",
     "Lets the tasks run at their times. One with a fault that would do harm is refused, and\n"
     "so is one whose line would make /etc/crontab longer than cron reads.\n",
     runEnable};
 
 const Command kDisableCommand = {
-    "disable", "ID...", "keep tasks, but do not run them",
+    "disable", "TASK...", "keep tasks, but do not run them",
     "Keeps the tasks, but does not run them until they are enabled. A run that is under\n"
     "way goes on.\n",
     runDisable};

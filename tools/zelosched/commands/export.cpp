@@ -1,12 +1,16 @@
 // zelosched export
 #include <json/json.h>
 
+#include <algorithm>
 #include <cstdio>
+#include <cstring>
 
 #include "commands/command.h"
 #include "commands/for_each_id.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "json/task_json.h"
+#include "json/wire_json.h"
 #include "store/task_list.h"
 #include "terminal/text.h"
 
@@ -14,14 +18,13 @@ namespace {
 
 constexpr Option kOptions[] = {{"wire"}};
 
-void warnOfLosses(const ZELO_SCHED_TASK &task) {
+// ---- the library's own form -----------------------------------------------------------------
+
+void printWire(const ZELO_SCHED_TASK &task) {
   for (const std::string &key : lossyKeysOf(task)) {
     complain("\"" + key + "\" of " + titleOf(task) +
              " is not UTF-8: bytes that JSON cannot carry were replaced");
   }
-}
-
-void printWire(const ZELO_SCHED_TASK &task) {
   std::vector<char> text(ZELO_SCHED_JSON_SIZE_ANY);
   forgetError();
   if (ZELOSchedTaskConvertToJson(&task, text.data(), text.size()) < 0) {
@@ -30,38 +33,86 @@ void printWire(const ZELO_SCHED_TASK &task) {
   std::fputs(text.data(), stdout);
 }
 
+// ---- tasks for import -----------------------------------------------------------------------
+
+// What a file cannot hold must not seem to be in it.
+void requireExportable(const ZELO_SCHED_TASK &task) {
+  if (isPower(task)) throw Failure(titleOf(task) + " is a power time, which no export holds");
+  const std::vector<std::string> members = lossyMembersOf(task);
+  if (!members.empty()) {
+    throw Failure(titleOf(task) + " was left out: its " + members.front() +
+                  " is not UTF-8, which JSON cannot carry: see --wire");
+  }
+}
+
+// By the key of a task, so that a later export of the same tasks is the same text.
+bool isBefore(const Json::Value &a, const Json::Value &b) {
+  const auto textOf = [](const Json::Value &object, const char *name) {
+    return object[name].isString() ? object[name].asString() : "";
+  };
+  for (const char *name : {"app", "name"}) {
+    const int order = textOf(a, name).compare(textOf(b, name));
+    if (order != 0) return order < 0;
+  }
+  return false;
+}
+
+class Export {
+ public:
+  explicit Export(bool isWire) : isWire_(isWire) {}
+
+  void add(const ZELO_SCHED_TASK &task) {
+    if (isWire_) return printWire(task);
+    requireExportable(task);
+    tasks_.push_back(settingsOf(task));
+  }
+
+  // The exit status.
+  int addAll() {
+    const TaskList list;
+    int status = kDone;
+    for (const ZELO_SCHED_TASK *task : list.tasks()) {
+      if (isPower(*task) && !isWire_) continue;
+      status = std::max(status, attempt([&] { add(*task); }));
+    }
+    return status;
+  }
+
+  void finish() {
+    if (isWire_) return;
+    std::stable_sort(tasks_.begin(), tasks_.end(), isBefore);
+    Json::Value top = topObject();
+    top["tasks"] = jsonList(tasks_);
+    printIndented(top);
+  }
+
+ private:
+  bool isWire_;
+  std::vector<Json::Value> tasks_;
+};
+
 int runExport(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
-  const bool isWire = arguments.has("wire");
-  std::vector<Json::Value> objects;
-  const auto take = [&](const ZELO_SCHED_TASK &task) {
-    warnOfLosses(task);
-    if (isWire) {
-      printWire(task);
-    } else {
-      objects.push_back(jsonOf(task));
-    }
-  };
+  Export out(arguments.has("wire"));
   int status = kDone;
   if (arguments.operands().empty()) {
-    const TaskList list;
-    for (const ZELO_SCHED_TASK *task : list.tasks()) take(*task);
+    status = out.addAll();
   } else {
-    status = forEachId(parseIds(arguments.operands()), [&](long id) { take(*loadTask(id)); });
+    status = forEachId(parseIds(arguments.operands()), [&](long id) { out.add(*loadTask(id)); });
   }
-  if (!isWire) printJson(objects);
+  out.finish();
   return status;
 }
 
 }  // namespace
 
 const Command kExportCommand = {
-    "export", "[ID...] [--wire]", "write tasks as JSON",
-    "Writes all tasks, or those that are named, as a JSON array of plain objects, which\n"
-    "'zelosched import' reads. Their members are the task's keys; numbers are numbers, and\n"
-    "the command is plain text (or \"cmd base64\", when it is not UTF-8).\n"
+    "export", "[TASK...] [--wire]", "write tasks as JSON",
+    "Writes all tasks, or those that are named, as JSON for 'zelosched import': by their\n"
+    "applications and names, without ids and power times. zelosched-json(5) describes it. A\n"
+    "task with a text that is not UTF-8 is left out, which is told, and the exit status is 1.\n"
     "\n"
-    "  --wire                         the doubly encoded form of the library's JSON calls,\n"
-    "                                 an object a line\n",
+    "  --wire                         the form of the library's JSON calls instead, an object\n"
+    "                                 a line: also power times, with ids\n",
     runExport};

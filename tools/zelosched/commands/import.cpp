@@ -10,7 +10,9 @@
 #include "check/task_check.h"
 #include "commands/command.h"
 #include "commands/options.h"
-#include "json/json_out.h"
+#include "json/json_in.h"
+#include "json/task_json.h"
+#include "json/wire_json.h"
 #include "store/change_lock.h"
 #include "store/power_room.h"
 #include "store/save.h"
@@ -20,9 +22,9 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"new"}};
+constexpr Option kOptions[] = {{"wire"}, {"new"}};
 constexpr char kStandardInput[] = "-";
-constexpr char kPowerApp[] = "ZELO.TOV.TaskScheduler.AutoPower";
+constexpr char kNoTask[] = "there is no task to import";
 constexpr size_t kMegabyte = size_t{1} << 20;
 constexpr size_t kMostBytes = 16 * kMegabyte;
 
@@ -52,6 +54,8 @@ std::string readAll(const std::string &path) {
   }
   return text;
 }
+
+// ---- the library's own form -----------------------------------------------------------------
 
 bool isBlank(const char *text) {
   return text[std::strspn(text, " \t\r\n")] == '\0';
@@ -136,19 +140,16 @@ void save(ZELO_SCHED_TASK *task, bool isNew) {
   }
 }
 
-int runImport(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
-  arguments.requireNoCommand();
-  if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
-  const std::vector<Json::Value> objects = parseObjects(readAll(arguments.operands().front()));
+int importWire(const std::string &text, bool areNew) {
+  const std::vector<Json::Value> objects = parseObjects(text);
   const ChangeLock lock;
-  const std::vector<Task> tasks = readTasks(objects, arguments.has("new"));
-  requireSavable(tasks, arguments.has("new"));
+  const std::vector<Task> tasks = readTasks(objects, areNew);
+  requireSavable(tasks, areNew);
   int status = kDone;
-  if (tasks.empty()) std::puts("there is no task to import");
+  if (tasks.empty()) std::puts(kNoTask);
   for (size_t i = 0; i < tasks.size(); ++i) {
     try {
-      save(tasks[i].get(), arguments.has("new"));
+      save(tasks[i].get(), areNew);
     } catch (const Failure &failure) {
       status = complain(orderOf(i, tasks.size()) + ": " + failure.what());
     }
@@ -156,17 +157,56 @@ int runImport(int argc, char **argv) {
   return status;
 }
 
+// ---- the vocabulary -------------------------------------------------------------------------
+
+std::vector<Task> newTasks(const std::string &text) {
+  JsonFaults faults;
+  std::vector<Task> tasks;
+  for (const TaskText &taskText : taskTextsOf(text, &faults)) {
+    tasks.push_back(newTask(ZELO_SCHED_BACKEND_SCHEDULE));
+    fillTask(taskText, tasks.back().get(), &faults);
+  }
+  if (faults.empty()) return tasks;
+  complainOf(faults);
+  throw Failure("nothing was imported, because of " + counted(faults.size(), "fault"));
+}
+
+int importTasks(const std::string &text) {
+  const ChangeLock lock;
+  const std::vector<Task> tasks = newTasks(text);
+  requireSavable(tasks, true);
+  int status = kDone;
+  if (tasks.empty()) std::puts(kNoTask);
+  for (size_t i = 0; i < tasks.size(); ++i) {
+    const int saved = attempt([&] { save(tasks[i].get(), true); });
+    status = std::max(status, saved);
+  }
+  return status;
+}
+
+int runImport(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoCommand();
+  if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
+  if (arguments.has("new") && !arguments.has("wire")) throw UsageError("'--new' is for --wire");
+  const std::string text = readAll(arguments.operands().front());
+  return arguments.has("wire") ? importWire(text, arguments.has("new")) : importTasks(text);
+}
+
 }  // namespace
 
 const Command kImportCommand = {
-    "import", "FILE|- [--new]", "save tasks from JSON",
-    "Saves the tasks of a JSON text: an array, one object, or an object a line, in either\n"
-    "form that 'zelosched export' writes. A task overwrites the stored one of its id when\n"
-    "that has the same name and application; every other becomes a new task.\n"
+    "import", "FILE|- [--wire [--new]]", "save new tasks from JSON",
+    "Adds the tasks of a JSON text, as 'zelosched export' writes it; zelosched-json(5) tells\n"
+    "what can stand in it. Each becomes a new task.\n"
     "\n"
-    "When one of them cannot be saved, none is, and each of those is told. Nor is any when\n"
-    "all together would make /etc/crontab longer than cron reads.\n"
+    "When one of them cannot be saved, none is, and every fault is told with its place. Nor\n"
+    "is any when all together would make /etc/crontab longer than cron reads.\n"
     "At most 16 MB and 10000 tasks are read at once.\n"
     "\n"
-    "  --new                          overwrite nothing: all become new tasks\n",
+    "  --wire                         the form of the library's JSON calls instead: an array,\n"
+    "                                 one object, or an object a line, also of plain texts\n"
+    "                                 and numbers. A task overwrites the stored one of its id\n"
+    "                                 when that has the same name and application\n"
+    "  --new                          with --wire: overwrite nothing, all become new tasks\n",
     runImport};

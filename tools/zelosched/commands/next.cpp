@@ -11,7 +11,10 @@
 #include "commands/for_each_id.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "json/task_json.h"
 #include "runs/coming_runs.h"
+#include "store/owner.h"
+#include "store/power_room.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
 #include "terminal/terminal.h"
@@ -115,15 +118,20 @@ void print(const std::vector<Entry> &entries) {
 }
 
 void printAsJson(const std::vector<Entry> &entries) {
-  std::vector<Json::Value> objects;
+  Json::Value top = topObject();
+  Json::Value &runs = top["runs"] = Json::Value(Json::arrayValue);
   for (const Entry &entry : entries) {
+    const TaskRecord &task = *entry.task;
     Json::Value object;
-    object["run"] = minuteText(entry.run);
-    object["id"] = entry.task->ID;
-    object["name"] = jsonText(entry.task->Name);
-    objects.push_back(std::move(object));
+    object["due"] = jsonOf(entry.run);
+    object["task"] = task.ID;
+    object["task_name"] = jsonText(task.Name);
+    object["app"] = jsonTextOrNull(task.App);
+    object["owner"] = jsonText(userName(task.Owner));
+    object["power"] = isPower(task) ? Json::Value(directionOf(task)) : Json::Value();
+    runs.append(std::move(object));
   }
-  printJson(objects);
+  printTop(top);
 }
 
 int runNext(int argc, char **argv) {
@@ -150,10 +158,10 @@ int runNext(int argc, char **argv) {
 }  // namespace
 
 const Command kNextCommand = {
-    "next", "[ID...] [--count N] [--json]", "list the coming runs",
-    "Lists the coming runs of all enabled tasks, or of the tasks that are named, day by\n"
-    "day.\n"
+    "next", "[TASK...] [--count N] [--json]", "list the coming runs",
+    "Lists the coming runs of all enabled tasks, or of the tasks that are named, by their\n"
+    "ids or names, day by day.\n"
     "\n"
     "  -n, --count N                  how many runs; 20\n"
-    "  --json                         a JSON array of run, id and name\n",
+    "  --json                         as JSON: see zelosched-json(5)\n",
     runNext};

@@ -50,6 +50,11 @@ const Option &optionOf(int found, std::span<const Option> options) {
   throw UsageError("'" + printable(name) + "' " + said);
 }
 
+std::string usageOf(const Command &command) {
+  const bool isNameAll = *command.synopsis == '\0';
+  return std::string(command.name) + (isNameAll ? "" : " ") + command.synopsis;
+}
+
 bool hasBlank(const char *text) {
   return std::strchr(text, ' ') != nullptr;
 }
@@ -124,17 +129,6 @@ void Arguments::requireNoCommand() const {
   if (afterDashes_) throw UsageError("this command takes nothing after '--'");
 }
 
-std::vector<long> parseIds(const std::vector<std::string> &operands) {
-  std::vector<long> ids;
-  for (const std::string &operand : operands) {
-    const std::optional<long> id = parseNumber(operand);
-    if (!id || *id < 0) throw UsageError("'" + printable(operand) + "' is no task id");
-    if (std::find(ids.begin(), ids.end(), *id) == ids.end()) ids.push_back(*id);
-  }
-  if (ids.empty()) throw UsageError("which task? Give its id");
-  return ids;
-}
-
 int runWithOptions(const Command &command, int argc, char **argv) {
   char **const end = std::find_if(
       argv + 1, argv + argc, [](const char *word) { return strcmp(word, kEndOfOptions) == 0; });
@@ -142,14 +136,14 @@ int runWithOptions(const Command &command, int argc, char **argv) {
     return strcmp(word, "--help") == 0 || strcmp(word, "-h") == 0;
   });
   if (wantsHelp) {
-    std::printf("usage: zelosched %s %s\n\n%s", command.name, command.synopsis, command.help);
+    std::printf("usage: zelosched %s\n\n%s", usageOf(command).c_str(), command.help);
     return kDone;
   }
   try {
     return command.run(argc, argv);
   } catch (const UsageError &error) {
-    std::fprintf(stderr, "zelosched %s: %s\nusage: zelosched %s %s\nTry 'zelosched %s --help'.\n",
-                 command.name, error.what(), command.name, command.synopsis, command.name);
+    std::fprintf(stderr, "zelosched %s: %s\nusage: zelosched %s\nTry 'zelosched %s --help'.\n",
+                 command.name, error.what(), usageOf(command).c_str(), command.name);
     return kUsage;
   }
 }

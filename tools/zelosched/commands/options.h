@@ -48,7 +48,8 @@ class Arguments {
   std::optional<std::vector<std::string>> afterDashes_;
 };
 
-// The operands as task ids; one at least, no id twice.
+// The ids of the tasks that the operands name, by an id or by a name that is one task's alone; one
+// at least, no id twice. Digits alone are an id. Throws UsageError and Failure.
 std::vector<long> parseIds(const std::vector<std::string> &operands);
 
 // Runs the sub-command: answers --help, and says what is wrong with the arguments.

@@ -9,6 +9,7 @@
 #include "commands/options.h"
 #include "commands/remove_tasks.h"
 #include "json/json_out.h"
+#include "json/task_json.h"
 #include "runs/coming_runs.h"
 #include "store/change_lock.h"
 #include "store/power_room.h"
@@ -20,7 +21,6 @@
 
 namespace {
 
-constexpr char kPowerApp[] = "ZELO.TOV.TaskScheduler.AutoPower";
 constexpr char kNothing[] = "-";
 
 // ---- list -----------------------------------------------------------------------------------
@@ -52,9 +52,11 @@ int runPowerList(int argc, char **argv) {
     printTable(tasks);
     return kDone;
   }
-  std::vector<Json::Value> objects;
-  for (const ZELO_SCHED_TASK *task : tasks) objects.push_back(jsonOf(*task));
-  printJson(objects);
+  const LocalMinute now = localMinute(time(nullptr));
+  Json::Value top = topObject();
+  Json::Value &times = top["power_times"] = Json::Value(Json::arrayValue);
+  for (const ZELO_SCHED_TASK *task : tasks) times.append(powerTimeOf(*task, nextRun(*task, now)));
+  printTop(top);
   return kDone;
 }
 
@@ -126,9 +128,9 @@ const Command kPowerCommand = {
     "  zelosched power list [--json]\n"
     "  zelosched power add on|off --daily 07:30\n"
     "  zelosched power add on|off --weekly mon-fri 07:30\n"
-    "  zelosched power remove ID...\n"
+    "  zelosched power remove TASK...\n"
     "\n"
-    "The power times are tasks too: enable, disable, edit and show take their ids, which\n"
+    "The power times are tasks too: enable, disable, edit and show take them. Their ids\n"
     "are made of the times and change with them. At a power-off time cron starts\n"
     "/usr/zelo/bin/zelo_poweroff_feasible_check; the sample of it that comes with this\n"
     "package looks at running tasks and switches nothing off.\n"
@@ -138,5 +140,5 @@ const Command kPowerCommand = {
     "  --disabled                     save it, but without effect until it is enabled\n"
     "  -q, --quiet                    print the id and nothing else\n"
     "  -y, --yes                      remove without a question\n"
-    "  --json                         a JSON array\n",
+    "  --json                         as JSON: see zelosched-json(5)\n",
     runPower};

@@ -17,7 +17,7 @@ int runRemove(int argc, char **argv) {
 }  // namespace
 
 const Command kRemoveCommand = {
-    "remove", "ID... [--yes]", "delete tasks",
+    "remove", "TASK... [--yes]", "delete tasks",
     "Deletes the tasks. Asks before each when the standard input is a terminal; refuses\n"
     "without --yes when it is none.\n"
     "\n"

@@ -1,6 +1,5 @@
 #include "commands/remove_tasks.h"
 
-#include <json/json.h>
 #include <unistd.h>
 
 #include <cstdio>
@@ -8,7 +7,7 @@
 
 #include "commands/for_each_id.h"
 #include "commands/options.h"
-#include "json/json_out.h"
+#include "json/wire_json.h"
 #include "store/change_lock.h"
 #include "store/save.h"
 #include "store/task_list.h"
@@ -31,12 +30,14 @@ bool isConfirmed(const ZELO_SCHED_TASK &task) {
 // The id may have been given to another task since. The name of a power time is its place in the
 // list, which is another one as soon as one before it is removed.
 bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
-  Json::Value members[] = {jsonOf(one), jsonOf(other)};
-  for (Json::Value &object : members) {
-    object.removeMember("next trigger time");
-    if (isPower(one)) object.removeMember("name");
-  }
-  return members[0] == members[1];
+  const auto membersOf = [](const ZELO_SCHED_TASK &task) {
+    std::vector<StoredMember> members = storedMembersOf(task);
+    if (isPower(task)) {
+      std::erase_if(members, [](const StoredMember &member) { return member.key == "name"; });
+    }
+    return members;
+  };
+  return membersOf(one) == membersOf(other);
 }
 
 Task loadRemovable(long id, const RemoveRules &rules) {

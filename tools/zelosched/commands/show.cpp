@@ -10,9 +10,10 @@
 #include "commands/for_each_id.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "json/task_json.h"
 #include "runs/coming_runs.h"
-#include "runs/result_text.h"
-#include "runs/runs.h"
+#include "runs/latest_runs.h"
+#include "runs/time_limit.h"
 #include "store/owner.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
@@ -28,25 +29,13 @@ struct Line {
   std::string text;
 };
 
-std::optional<Run> lastRun(const ZELO_SCHED_TASK &task) {
-  if (!mayReadRuns()) return std::nullopt;
-  const std::vector<Run> runs = RunDatabase().newest(task.ID, 1);
-  if (runs.empty()) return std::nullopt;
-  return runs.front();
-}
-
-// The status database is in "/tmp", where anybody can be in its way: the task is shown without it.
-std::string lastRunInWords(const ZELO_SCHED_TASK &task, int *status) {
-  if (!mayReadRuns()) return "only root may see";
-  std::string words = "?";
-  const int result = attempt([&] {
-    const std::optional<Run> run = lastRun(task);
-    words = run ? minuteText(localMinute(run->start)) + ", " +
-                      resultInWords(run->statusCode, run->comment)
-                : "none is recorded";
-  });
-  *status = std::max(*status, result);
-  return words;
+std::string lastRunInWords(const ZELO_SCHED_TASK &task, const LatestRuns &runs) {
+  if (!runs.isKnown) return runs.fault.empty() ? "only root may see" : "?";
+  const RunRecord *run = runs.of(task.ID);
+  if (run == nullptr) return "none is recorded";
+  const std::string brief = runInBrief(*run, time(nullptr));
+  const std::optional<long> begin = run->start ? run->start : run->queued;
+  return begin ? minuteText(localMinute(*begin)) + ", " + brief : brief;
 }
 
 // A zero stands for the beginning: of the year, or of the month.
@@ -71,9 +60,10 @@ std::string overlapText(const ZELO_SCHED_TASK &task) {
   return self + " overlap another run of it, " + app + " overlap others of its application";
 }
 
-std::vector<Line> linesOf(const ZELO_SCHED_TASK &task, int *status) {
+std::vector<Line> linesOf(const ZELO_SCHED_TASK &task, const LatestRuns &runs) {
   const LocalMinute now = localMinute(time(nullptr));
   const std::optional<LocalMinute> next = nextRun(task, now);
+  const LimitedCommand limited = takeApart(task.Command);
   std::vector<Line> lines = {
       {"ID", std::to_string(task.ID)},
       {"Name", task.Name},
@@ -81,9 +71,10 @@ std::vector<Line> linesOf(const ZELO_SCHED_TASK &task, int *status) {
       {"Runs", scheduleInWords(task)},
       {"From", startsLater(task, now) ? startDate(task) + " on" : ""},
       {"Next run", next ? minuteText(*next) : "none"},
-      {"Last run", lastRunInWords(task, status)},
+      {"Last run", lastRunInWords(task, runs)},
       {"Owner", userText(task)},
-      {"Command", task.Command},
+      {"Command", limited.command},
+      {"Time limit", limited.limit},
       {"Action", task.Action},
       {"App", task.App},
       {"App name", task.AppName},
@@ -95,46 +86,48 @@ std::vector<Line> linesOf(const ZELO_SCHED_TASK &task, int *status) {
   return lines;
 }
 
-// The exit status.
-int print(const ZELO_SCHED_TASK &task) {
-  int status = kDone;
-  for (const Line &line : linesOf(task, &status)) {
+void print(const ZELO_SCHED_TASK &task, const LatestRuns &runs) {
+  for (const Line &line : linesOf(task, runs)) {
     std::printf("%12s: %s\n", line.title, printable(line.text).c_str());
   }
-  return status;
+}
+
+// Power times are other objects than tasks, and stand in a list of their own.
+void add(const ZELO_SCHED_TASK &task, const LatestRuns &runs, Json::Value *top) {
+  const std::optional<LocalMinute> next = nextRun(task, localMinute(time(nullptr)));
+  if (isPower(task)) {
+    (*top)["power_times"].append(powerTimeOf(task, next));
+  } else {
+    (*top)["tasks"].append(jsonOf(task, next, runs));
+  }
 }
 
 int runShow(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
   const std::vector<long> ids = parseIds(arguments.operands());
-  std::vector<Json::Value> objects;
+  const LatestRuns runs = latestRuns();
+  Json::Value top = topObject();
+  top["tasks"] = Json::Value(Json::arrayValue);
   bool isFirst = true;
-  int shown = kDone;
   const int found = forEachId(ids, [&](long id) {
     const Task task = loadTask(id);
-    if (arguments.has("json")) {
-      objects.push_back(jsonOf(*task));
-      return;
-    }
+    if (arguments.has("json")) return add(*task, runs, &top);
     if (!isFirst) std::puts("");
     isFirst = false;
-    shown = std::max(shown, print(*task));
+    print(*task, runs);
   });
-  // One task is one object, without an array around it.
-  if (objects.size() == 1 && ids.size() == 1) {
-    std::puts(onOneLine(objects.front()).c_str());
-  } else if (arguments.has("json") && ids.size() > 1) {
-    printJson(objects);
-  }
-  return std::max(found, shown);
+  if (arguments.has("json")) printTop(top);
+  const int known = runs.fault.empty() ? kDone : complain(runs.fault);
+  return std::max(found, known);
 }
 
 }  // namespace
 
 const Command kShowCommand = {
-    "show", "ID... [--json]", "show all that is known of tasks",
-    "Shows all that is known of the tasks, with what is wrong with them.\n"
+    "show", "TASK... [--json]", "show all that is known of tasks",
+    "Shows all that is known of the tasks, with what is wrong with them. A task is named by\n"
+    "its id, or by its name when no other has that.\n"
     "\n"
-    "  --json                         a JSON object; of several tasks an array\n",
+    "  --json                         as JSON: see zelosched-json(5)\n",
     runShow};

@@ -54,18 +54,17 @@ Json::Value jsonOf(const Finding &finding) {
   object["severity"] = nameOf(finding.severity);
   object["kind"] = finding.kind;
   object["text"] = jsonText(finding.text);
-  if (finding.task != 0) object["task"] = Json::Int64(finding.task);
-  if (!finding.taskName.empty()) object["task_name"] = jsonText(finding.taskName);
+  object["task"] = finding.task != 0 ? Json::Value(Json::Int64(finding.task)) : Json::Value();
+  object["task_name"] = jsonTextOrNull(finding.taskName);
   return object;
 }
 
 void printAsJson(const Findings &findings) {
-  Json::Value whole;
-  whole["version"] = 1;
+  Json::Value whole = topObject();
   whole["state"] = nameOf(worstOf(findings));
   whole["findings"] = Json::Value(Json::arrayValue);
   for (const Finding &finding : findings) whole["findings"].append(jsonOf(finding));
-  std::puts(onOneLine(whole).c_str());
+  printTop(whole);
 }
 
 int runStatus(int argc, char **argv) {
@@ -94,7 +93,7 @@ const Command kStatusCommand = {
     "tasks are running.\n"
     "\n"
     "  -q, --quiet                    only what is not well\n"
-    "  --json                         one JSON object\n"
+    "  --json                         as JSON: see zelosched-json(5)\n"
     "\n"
     "Exit status: 0 all is well, 1 something is wrong, 3 this user may not see all of it,\n"
     "4 tasks do not run at all.\n",

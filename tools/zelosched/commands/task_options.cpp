@@ -2,6 +2,8 @@
 
 #include <algorithm>
 
+#include "check/task_check.h"
+#include "runs/time_limit.h"
 #include "store/owner.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
@@ -23,8 +25,9 @@ constexpr ScheduleOption kKinds[] = {{"once", setOnce},
 constexpr ScheduleOption kRefinements[] = {
     {"every", setEvery}, {"until", setUntil}, {"start", setStart}};
 
-constexpr const char *kOtherOptions[] = {"name",     "owner",  "app",     "app-name",
-                                         "app-args", "action", "overlap", "app-overlap"};
+constexpr const char *kOtherOptions[] = {"name",     "owner",       "app",
+                                         "app-name", "app-args",    "action",
+                                         "overlap",  "app-overlap", "time-limit"};
 
 bool hasAny(const Arguments &arguments, const ScheduleOption *begin, const ScheduleOption *end) {
   return std::any_of(begin, end,
@@ -84,12 +87,28 @@ void applyOwner(const Arguments &arguments, ZELO_SCHED_TASK *task) {
   task->Owner = *uid;
 }
 
+std::string timeLimit(const std::string &text) {
+  if (text == "none") return "";
+  if (secondsOfLimit(text)) return text;
+  throw UsageError("'--time-limit' takes 90s, 30m, 2h, 1d or none, not '" + printable(text) + "'");
+}
+
+// The limit is a part of the stored command; changing one of both keeps the other.
 void applyCommand(const Arguments &arguments, ZELO_SCHED_TASK *task) {
-  if (!arguments.afterDashes()) return;
-  const std::string command = commandLine(*arguments.afterDashes());
-  if (command.find_first_not_of(" \t\r\n") == std::string::npos)
+  const auto limit = arguments.value("time-limit");
+  if (!arguments.afterDashes() && !limit) return;
+  LimitedCommand limited = takeApart(task->Command);
+  if (limit) limited.limit = timeLimit(*limit);
+  if (arguments.afterDashes()) limited.command = commandLine(*arguments.afterDashes());
+  if (limited.command.find_first_not_of(" \t\r\n") == std::string::npos)
     throw UsageError("there is no command after '--'");
-  setText(task->Command, "command", command);
+  const std::string stored = storedCommand(limited);
+  if (!limited.limit.empty() && stored.size() > kMostCommandBytes) {
+    throw Failure("not saved: with its time limit the command is " + std::to_string(stored.size()) +
+                  " bytes long, and only " + std::to_string(kMostCommandBytes) +
+                  " can be stored: put it into a script");
+  }
+  setText(task->Command, "command", stored);
 }
 
 // A power time is nothing but when.

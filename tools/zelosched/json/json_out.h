@@ -1,10 +1,7 @@
-// Tasks as JSON for other programs: one object a task, its members the keys of the hash form, with
-// numbers as numbers and the command in plain text.
+// JSON texts: what can stand in one, and how one is written.
 #pragma once
 
-#include <zelosched.h>
-
-#include <cstddef>
+#include <ctime>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -13,27 +10,30 @@ namespace Json {
 class Value;
 }
 
+// Of the vocabulary that zelosched-json(5) describes; each top object names it.
+inline constexpr int kJsonVersion = 1;
+
+bool isUtf8(std::string_view text);
+
 // The text as JSON can carry it: each byte that is no UTF-8 becomes U+FFFD.
 Json::Value jsonText(std::string_view text);
 
-// With "backend" and "next trigger time" beside the keys of the hash form. A command that is not
-// UTF-8 stands in Base64, as "cmd base64" in place of "cmd".
-Json::Value jsonOf(const ZELO_SCHED_TASK &task);
+// Null for an empty one.
+Json::Value jsonTextOrNull(std::string_view text);
 
-// The keys whose texts lost bytes that JSON cannot carry.
-std::vector<std::string> lossyKeysOf(const ZELO_SCHED_TASK &task);
+// "2026-12-24T18:30:00+01:00", in local time; null after the year 9999, where this form ends.
+Json::Value jsonTime(time_t moment);
 
-// The way back, also from the form of ZELOSchedTaskConvertToJson, which is told by its members
-// being JSON texts themselves. Members that are no key are passed over; keys that are missing have
-// the defaults of the hash form. Throws Failure.
-void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task);
+// {"version": 1}, to which lists are added.
+Json::Value topObject();
 
-// So many tasks can be read at once.
-inline constexpr size_t kMostTasks = 10000;
+Json::Value jsonList(const std::vector<Json::Value> &values);
 
-// The objects of a text: an array, one object, or one a line. Throws Failure, also for more of them
-// than kMostTasks, or more values than so many have.
-std::vector<Json::Value> parseObjects(const std::string &text);
+// To the standard output: the values of the lists of a top object on a line each.
+void printTop(const Json::Value &top);
+
+// The same on as many lines as it takes to compare two of them line by line.
+void printIndented(const Json::Value &top);
 
 // An array to the standard output, an object a line.
 void printJson(const std::vector<Json::Value> &objects);

@@ -6,6 +6,9 @@
 
 enum class Trigger { kSchedule, kManual, kCatchUp, kOther };
 enum class RunState { kWaiting, kRunning, kEnded };
+// An exit status has the same name, which a scoped one does not hide.
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wshadow"
 enum class Outcome {
   kNone,  // it has not ended
   kFinished,
@@ -18,6 +21,7 @@ enum class Outcome {
   kStopped,    // by 'stop', while it ran
   kLost,       // its process is gone, and nobody saw how it ended
 };
+#pragma GCC diagnostic pop
 
 struct RunRecord {
   long run = 0;  // its number in the history, which no other run ever gets

@@ -9,6 +9,9 @@
 #include <set>
 #include <string>
 
+// The application of all power times.
+inline constexpr char kPowerApp[] = "ZELO.TOV.TaskScheduler.AutoPower";
+
 // "on" or "off".
 std::string directionOf(const ZELO_SCHED_TASK &task);
 

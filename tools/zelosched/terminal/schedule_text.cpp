@@ -222,6 +222,41 @@ std::string dayInWords(const ZELO_SCHED_TASK &task) {
   }
 }
 
+// "mon-fri", "mon,wed-fri", from Monday on. Two days beside each other are no range.
+std::string daysInBrief(const ZELO_SCHED_TASK &task) {
+  constexpr size_t kLeastOfRange = 3;
+  const auto dayAt = [](size_t i) { return static_cast<uint32_t>((i + 1) % kDaysOfWeek); };
+  std::string text;
+  for (size_t first = 0; first < kDaysOfWeek;) {
+    size_t end = first;
+    while (end < kDaysOfWeek && schedIsWeekdayOn(task, dayAt(end))) ++end;
+    const bool isRange = end - first >= kLeastOfRange;
+    if (end > first) {
+      text += (text.empty() ? "" : ",") + lowered(kShortDays[dayAt(first)]);
+      if (isRange) text += "-" + lowered(kShortDays[dayAt(end - 1)]);
+    }
+    first = isRange ? end : first + 1;
+  }
+  return text.empty() ? "no day" : text;
+}
+
+std::string dayInBrief(const ZELO_SCHED_TASK &task) {
+  switch (task.Type) {
+    case ZELO_SCHED_TYPE_ONCE:
+      return dateOf(task);
+    case ZELO_SCHED_TYPE_DAILY:
+      return "daily";
+    case ZELO_SCHED_TYPE_WEEKLY:
+      return daysInBrief(task);
+    case ZELO_SCHED_TYPE_MONTHLY:
+      return "monthly " + std::to_string(task.StartDay);
+    case ZELO_SCHED_TYPE_YEARLY:
+      return "yearly " + hourText(task.StartMonth) + "-" + hourText(task.StartDay);
+    default:
+      return "unknown type " + std::to_string(task.Type);
+  }
+}
+
 }  // namespace
 
 void setOnce(ZELO_SCHED_TASK *task, const std::string &text) {
@@ -311,5 +346,13 @@ std::string scheduleInWords(const ZELO_SCHED_TASK &task) {
   if (task.RepeatHour != 0 && task.LastWorkHour > task.RunHour) {
     text += ", every " + counted(task.RepeatHour, "hour") + " until " + hourText(task.LastWorkHour);
   }
+  return text;
+}
+
+std::string scheduleInBrief(const ZELO_SCHED_TASK &task) {
+  std::string text = dayInBrief(task) + " " + timeOf(task);
+  if (task.RepeatHour == 0 || task.LastWorkHour <= task.RunHour) return text;
+  text += " every " + std::to_string(task.RepeatHour) + "h";
+  if (task.LastWorkHour != kLastHourOfDay) text += " until " + hourText(task.LastWorkHour);
   return text;
 }

@@ -26,3 +26,7 @@ void setStart(ZELO_SCHED_TASK *task, const std::string &text);
 
 // "weekly on Mon, Wed and Fri at 08:30, every 2 hours until 18"
 std::string scheduleInWords(const ZELO_SCHED_TASK &task);
+
+// "mon-fri 08:00 every 2h until 18", "2026-12-24 18:30", "monthly 15 08:30": as short as it can be
+// said without loss.
+std::string scheduleInBrief(const ZELO_SCHED_TASK &task);

@@ -45,15 +45,45 @@ std::string emphasised(const std::string &text, Emphasis emphasis, bool colour) 
   return kStart[static_cast<size_t>(emphasis)] + text + kEnd;
 }
 
-// Nothing follows the last column, blanks neither.
-void appendCell(std::string *line, const Column &column, const Cell &cell, size_t width, bool last,
-                bool colour) {
-  const std::string text = fitted(cell.text, width);
+// The text of a cell, line by line.
+std::vector<std::string> linesOf(const Column &column, const std::string &text, size_t width) {
+  return column.wraps ? wrapped(text, width) : std::vector<std::string>{fitted(text, width)};
+}
+
+void appendText(std::string *line, const Column &column, const std::string &text, Emphasis emphasis,
+                size_t width, bool colour) {
   const std::string padding(width - std::min(width, widthOf(text)), ' ');
   if (column.alignment == Column::kRight) *line += padding;
-  *line += emphasised(text, cell.emphasis, colour);
-  if (column.alignment == Column::kLeft && !last) *line += padding;
-  if (!last) *line += std::string(kGap, ' ');
+  *line += emphasised(text, emphasis, colour);
+  if (column.alignment == Column::kLeft) *line += padding;
+  *line += std::string(kGap, ' ');
+}
+
+void dropBlanksAtEnd(std::string *line) {
+  line->resize(line->find_last_not_of(' ') + 1);
+}
+
+// As many lines as the cell that takes most.
+std::string rowText(const std::vector<Column> &columns, const std::vector<Cell> &row,
+                    const Widths &widths, bool colour) {
+  std::vector<std::vector<std::string>> cells;
+  size_t height = 1;
+  for (size_t i = 0; i < row.size(); ++i) {
+    cells.push_back(linesOf(columns[i], row[i].text, widths[i]));
+    height = std::max(height, cells.back().size());
+  }
+  std::string out;
+  for (size_t n = 0; n < height; ++n) {
+    std::string line;
+    for (size_t i = 0; i < row.size(); ++i) {
+      const bool isThere = n < cells[i].size() && !cells[i][n].empty();
+      appendText(&line, columns[i], isThere ? cells[i][n] : "",
+                 isThere ? row[i].emphasis : Emphasis::kNone, widths[i], colour);
+    }
+    dropBlanksAtEnd(&line);
+    out += line + '\n';
+  }
+  return out;
 }
 
 }  // namespace
@@ -79,15 +109,8 @@ std::string Table::text(size_t columns, bool colour) const {
   }
   if (columns > 0) shrink(columns_, columns, &widths);
 
-  std::string out;
-  const auto appendRow = [&](const std::vector<Cell> &row) {
-    for (size_t i = 0; i < row.size(); ++i) {
-      appendCell(&out, columns_[i], row[i], widths[i], i + 1 == row.size(), colour);
-    }
-    out += '\n';
-  };
-  appendRow(titles);
-  std::for_each(rows_.begin(), rows_.end(), appendRow);
+  std::string out = rowText(columns_, titles, widths, colour);
+  for (const std::vector<Cell> &row : rows_) out += rowText(columns_, row, widths, colour);
   return out;
 }
 

@@ -1,4 +1,5 @@
-// A table of aligned columns. On a terminal, columns that may shrink give way until a line fits.
+// A table of aligned columns. On a terminal, columns that may shrink give way until a line fits:
+// what is too long for one then is cut, or goes on below.
 #pragma once
 
 #include <string>
@@ -8,6 +9,7 @@ struct Column {
   const char *title;
   enum Alignment { kLeft, kRight } alignment = kLeft;
   bool shrinks = false;
+  bool wraps = false;  // one that shrinks: goes on below instead of being cut
 };
 
 enum class Emphasis { kNone, kDim, kBad };

@@ -140,6 +140,32 @@ std::string fitted(const std::string &printable, size_t columns) {
   return room == 0 ? out : out + ellipsis;
 }
 
+std::vector<std::string> wrapped(const std::string &printable, size_t columns) {
+  std::vector<std::string> lines;
+  std::string line;
+  size_t width = 0;
+  size_t blank = std::string::npos;  // the last one of the line
+  forEachCharacter(printable, [&](std::string_view bytes, uint32_t code) {
+    const auto own = static_cast<size_t>(columnsOf(code));
+    if (width + own > columns && !line.empty()) {
+      const bool isBlank = bytes == " ";
+      const size_t end = isBlank ? line.size() : blank;
+      const bool hasBlank = end != std::string::npos;
+      lines.push_back(line.substr(0, hasBlank ? end : line.size()));
+      line = hasBlank && !isBlank ? line.substr(end + 1) : "";
+      width = widthOf(line);
+      blank = std::string::npos;
+      if (isBlank) return true;
+    }
+    if (bytes == " ") blank = line.size();
+    line += bytes;
+    width += own;
+    return true;
+  });
+  if (!line.empty() || lines.empty()) lines.push_back(line);
+  return lines;
+}
+
 std::string counted(size_t number, const char *word) {
   return std::to_string(number) + " " + word + (number == 1 ? "" : "s");
 }

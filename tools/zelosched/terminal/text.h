@@ -3,6 +3,7 @@
 
 #include <string>
 #include <string_view>
+#include <vector>
 
 // The text with everything escaped that could change more than its own place on a terminal: control
 // characters (\n, \t, \x1b, ...), marks that turn the direction of writing, and bytes that are no
@@ -21,6 +22,9 @@ size_t widthOf(std::string_view printable);
 
 // The text, cut to so many columns where it is wider, which an ellipsis shows.
 std::string fitted(const std::string &printable, size_t columns);
+
+// The text in lines of at most so many columns, at its blanks where it has them; one at least.
+std::vector<std::string> wrapped(const std::string &printable, size_t columns);
 
 // "word", or its plural for every number but one.
 std::string counted(size_t number, const char *word);

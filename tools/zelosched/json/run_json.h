@@ -1,0 +1,10 @@
+// A run in the JSON vocabulary that zelosched-json(5) describes.
+#pragma once
+
+#include "runs/run_record.h"
+
+namespace Json {
+class Value;
+}
+
+Json::Value jsonOf(const RunRecord &run);

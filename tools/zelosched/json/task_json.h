@@ -1,0 +1,54 @@
+// Tasks in the JSON vocabulary that zelosched-json(5) describes.
+#pragma once
+
+#include <json/value.h>
+#include <zelosched.h>
+
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "runs/coming_runs.h"
+#include "runs/latest_runs.h"
+
+// ---- writing --------------------------------------------------------------------------------
+
+// What a file of tasks holds of one.
+Json::Value settingsOf(const ZELO_SCHED_TASK &task);
+
+// All that is known of it. What this user may not see of its runs is left out.
+Json::Value jsonOf(const ZELO_SCHED_TASK &task, const std::optional<LocalMinute> &next,
+                   const LatestRuns &runs);
+
+// A time at which the machine goes on or off.
+Json::Value powerTimeOf(const ZELO_SCHED_TASK &task, const std::optional<LocalMinute> &next);
+
+Json::Value jsonOf(const LocalMinute &minute);
+
+// The members whose texts have bytes that JSON cannot carry.
+std::vector<std::string> lossyMembersOf(const ZELO_SCHED_TASK &task);
+
+// ---- reading --------------------------------------------------------------------------------
+
+struct JsonFault {
+  std::string place;  // "tasks[2].schedule.at"
+  std::string what;
+};
+using JsonFaults = std::vector<JsonFault>;
+
+// A task of a file, before it is known which stored one it is for.
+struct TaskText {
+  std::string place;  // "tasks[2]"
+  Json::Value object;
+};
+
+// The tasks of a file, whose top object is looked at. Throws Failure for what is no JSON at all.
+std::vector<TaskText> taskTextsOf(const std::string &text, JsonFaults *faults);
+
+// Sets what the text names, on the defaults or on a stored task. Members that are absent keep what
+// the task has; another kind of schedule, or another day of it, takes the start date away. Without
+// a fault the task is fit to be saved.
+void fillTask(const TaskText &text, ZELO_SCHED_TASK *task, JsonFaults *faults);
+
+// Each on a line of standard error.
+void complainOf(const JsonFaults &faults);
