@@ -2,7 +2,9 @@
 // does nothing.
 #include <fcntl.h>
 #include <pwd.h>
+#include <spawn.h>
 #include <sqlite3.h>
+#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -11,6 +13,8 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
+#include <vector>
 
 #include "support/row.h"
 #include "support/stored_tasks.h"
@@ -20,6 +24,7 @@ namespace {
 constexpr char kStarted[] = "/tmp/started";
 // Without another program, so that the shell's first instruction for it is the command's.
 constexpr char kCommand[] = ": > /tmp/started";
+constexpr char kWithoutKeeper[] = "--without-keeper";
 constexpr int kId = 1;
 constexpr int kPatience = 1000;  // milliseconds, with a run that is closing the database
 
@@ -102,10 +107,51 @@ void forkShell() {
   orDie(shell > 0 && waitpid(shell, &status, 0) == shell && status == 0, "/bin/sh -c true");
 }
 
+// Whoever is left of a run, a keeper too, has ended: it would take time from the next.
+void awaitAll() {
+  awaitEnd();
+  while (waitpid(-1, nullptr, 0) > 0) {
+  }
+}
+
+void startProgram(const std::vector<const char *> &words) {
+  std::vector<char *> arguments;
+  for (const char *word : words) {
+    arguments.push_back(const_cast<char *>(word));
+  }
+  arguments.push_back(nullptr);
+  pid_t pid = 0;
+  int status = 0;
+  orDie(posix_spawn(&pid, words.front(), nullptr, nullptr, arguments.data(), environ) == 0 &&
+            waitpid(pid, &status, 0) == pid && status == 0,
+        words.front());
+}
+
+// The command waits for us, and the keeper for its end.
+void runWithKeeper() {
+  startProgram({ZELO_BIN_DIR "/zeloschedtask", "--run", "id=1", "--now"});
+  awaitCommand();
+}
+
+void runWithoutKeeper() {
+  startProgram({"/proc/self/exe", kWithoutKeeper});
+  awaitCommand();
+}
+
+// This program, as what starts a run without a keeper.
+__attribute__((constructor)) void startWhenAsked(int argc, char **argv) {
+  if (argc == 2 && strcmp(argv[1], kWithoutKeeper) == 0) {
+    _exit(ZELOSchedTaskRun(kId, 0, 0) == 0 ? EXIT_SUCCESS : EXIT_FAILURE);
+  }
+}
+
 }  // namespace
 
 void makeRows() {
   storeTask();
+  prctl(PR_SET_CHILD_SUBREAPER, 1);
+  Row("zeloschedtask to the command", Work{runWithKeeper, nullptr, awaitAll})
+      .atMost(1.3, "the same without a keeper", Work{runWithoutKeeper, nullptr, awaitAll});
   Row("ZELOSchedTaskRun to the command", Work{run, nullptr, awaitEnd})
       .atMost(2, "fork, /bin/sh -c true", Work{forkShell, nullptr, awaitEnd})
       .atMost(1.3, "two forks, the record, the owner, the shell",

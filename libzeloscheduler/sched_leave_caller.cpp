@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <linux/capability.h>
 #include <linux/keyctl.h>
+#include <linux/magic.h>
 #include <linux/securebits.h>
 #include <sched.h>
 #include <signal.h>
@@ -11,6 +12,7 @@
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
+#include <sys/vfs.h>
 #include <syslog.h>
 #include <unistd.h>
 #include <zelosched.h>
@@ -94,15 +96,25 @@ bool moveLockFromStandardDescriptors() {
   return true;
 }
 
-// Whether it can be written to and nothing else. One that is to be closed on an exec was never
-// meant for a command.
+// A pipe without a name. Its caller opens the writing end both ways lest the command is ended when
+// whoever reads it is; what can be read there is what the run has written.
+bool isOwnPipe(int descriptor) {
+  struct statfs where = {};
+  return fstatfs(descriptor, &where) == 0 && where.f_type == PIPEFS_MAGIC;
+}
+
+// Whether it can be written to and, but for such a pipe, nothing else. One that is to be closed on
+// an exec was never meant for a command.
 bool isOutputOnly(int descriptor) {
   const int flags = fcntl(descriptor, F_GETFL);
   const int ownFlags = fcntl(descriptor, F_GETFD);
+  if (flags < 0 || ownFlags < 0 || (ownFlags & FD_CLOEXEC) != 0) {
+    return false;
+  }
+  const int access = flags & O_ACCMODE;
   struct stat info = {};
-  return flags >= 0 && (flags & O_ACCMODE) == O_WRONLY && ownFlags >= 0 &&
-         (ownFlags & FD_CLOEXEC) == 0 && fstat(descriptor, &info) == 0 &&
-         (S_ISFIFO(info.st_mode) || S_ISREG(info.st_mode));
+  return (access == O_WRONLY || (access == O_RDWR && isOwnPipe(descriptor))) &&
+         fstat(descriptor, &info) == 0 && (S_ISFIFO(info.st_mode) || S_ISREG(info.st_mode));
 }
 
 bool leadToNothing(int descriptor, int access) {

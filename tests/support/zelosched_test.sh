@@ -60,7 +60,8 @@ add() {
 json() {
   python3 -c "import json, sys
 tasks = json.load(sys.stdin)
-if 'version' in tasks: tasks = sum((list for name, list in tasks.items() if name != 'version'), [])
+if 'version' in tasks and 'state' not in tasks:
+    tasks = sum((list for name, list in tasks.items() if name != 'version'), [])
 print($1)"
 }
 
@@ -158,8 +159,15 @@ forget_tmp() {
   rm -rf "$STORE"* "$PROGRAM"* "$STATUS"* /tmp/lock* /tmp/zeloscheduler.*
 }
 
+# Those of earlier tests would write into the history of the next.
+end_keepers() {
+  local keeper
+  for keeper in $(pgrep -x zeloschedtask || true); do kill -9 "$keeper" 2>/dev/null || true; done
+}
+
 # No task, and nothing of earlier tests.
 clean() {
+  end_keepers
   forget_tmp
   rm -rf "$PERSISTENT" "$LAST_GOOD" /usr/zelo/var /usr/zelo/etc/power_sched.conf /etc/crontab
   cp "$SCRATCH/crontab" /etc/crontab
@@ -342,7 +350,7 @@ names_in_tmp() {
 
 # record ID START STATUS [COMMENT [STATUS_ID [PID]]]: a run, as the library does
 record() {
-  if [[ ! -e $STATUS ]]; then
+  if [[ ! -s $STATUS ]]; then
     install -m 0600 /dev/null "$STATUS"
     sql "$STATUS" "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);"
   fi
@@ -356,8 +364,10 @@ keep() {
 }
 
 history() {
-  z history "$@" --json |
-    json '"\n".join(", ".join(str(run[key]) for key in ("id", "start", "result")) for run in tasks)'
+  z history --json "$@" | python3 -c 'import json, sys
+for run in json.load(sys.stdin)["runs"]:
+    words = [run["outcome"] or run["state"], run["exit_code"] or run["signal"] or ""]
+    print(run["task"], run["start"][:19].replace("T", " "), " ".join(map(str, words)).strip(), sep=", ")'
 }
 
 # Off from one to eight o'clock on a Friday.

@@ -40,7 +40,11 @@ long parseSpan(const std::string &text) {
 // Runs the task, unless it is only to be listed.
 void catchUp(const MissedTask &missed, bool isDryRun) {
   if (!isDryRun) {
-    startRunUnseen(*missed.task, Disabled::kIsSkipped);
+    RunRequest request;
+    request.trigger = Trigger::kCatchUp;
+    request.due = missed.due;
+    request.isDisabledSkipped = true;
+    const StartedRun run(*missed.task, request);
     forgetMissed(*missed.task);
   }
   std::printf("%s was due at %s: %s\n", titleOf(*missed.task).c_str(),

@@ -4,11 +4,14 @@
 #include "commands/command.h"
 #include "commands/for_each_id.h"
 #include "commands/options.h"
+#include "commands/stop_task.h"
 #include "store/change_lock.h"
 #include "store/save.h"
 #include "store/task_list.h"
 
 namespace {
+
+constexpr Option kDisableOptions[] = {{"stop"}};
 
 // A task that would do harm may be disabled, which ends the harm, but not enabled.
 void setState(long id, int32_t state) {
@@ -26,18 +29,29 @@ void setState(long id, int32_t state) {
   if (task->ID != formerId) std::printf("it was task %d before\n", formerId);
 }
 
-int setStates(int argc, char **argv, int32_t state) {
-  const Arguments arguments(argc, argv, {});
-  arguments.requireNoCommand();
-  return forEachId(parseIds(arguments.operands()), [&](long id) { setState(id, state); });
+void disable(long id, bool stops) {
+  setState(id, ZELO_SCHED_STATE_DISABLED);
+  const Task task = findTask(id);
+  if (!task) return;  // a power time, which has another id now
+  if (stops) {
+    stopTask(id, "a run of it");
+  } else {
+    tellOfRunsOf(*task);
+  }
 }
 
 int runEnable(int argc, char **argv) {
-  return setStates(argc, argv, ZELO_SCHED_STATE_ENABLED);
+  const Arguments arguments(argc, argv, {});
+  arguments.requireNoCommand();
+  return forEachId(parseIds(arguments.operands()),
+                   [](long id) { setState(id, ZELO_SCHED_STATE_ENABLED); });
 }
 
 int runDisable(int argc, char **argv) {
-  return setStates(argc, argv, ZELO_SCHED_STATE_DISABLED);
+  const Arguments arguments(argc, argv, kDisableOptions);
+  arguments.requireNoCommand();
+  return forEachId(parseIds(arguments.operands()),
+                   [&](long id) { disable(id, arguments.has("stop")); });
 }
 
 }  // namespace
@@ -49,7 +63,9 @@ const Command kEnableCommand = {
     runEnable};
 
 const Command kDisableCommand = {
-    "disable", "TASK...", "keep tasks, but do not run them",
+    "disable", "TASK... [--stop]", "keep tasks, but do not run them",
     "Keeps the tasks, but does not run them until they are enabled. A run that is under\n"
-    "way goes on.\n",
+    "way, or waits for its turn, goes on, which is told.\n"
+    "\n"
+    "  --stop                         end it, as 'zelosched stop' does\n",
     runDisable};

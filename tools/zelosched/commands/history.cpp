@@ -1,5 +1,8 @@
 // zelosched history
+#include "runs/history.h"
+
 #include <json/json.h>
+#include <unistd.h>
 
 #include <cstdio>
 #include <ctime>
@@ -7,87 +10,94 @@
 #include "commands/command.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "json/run_json.h"
 #include "runs/coming_runs.h"
 #include "runs/history_keep.h"
+#include "runs/moment_text.h"
 #include "runs/result_text.h"
-#include "runs/runs.h"
-#include "store/task_list.h"
+#include "terminal/number.h"
 #include "terminal/table.h"
+#include "terminal/text.h"
 
 namespace {
 
-constexpr Option kOptions[] = {{"limit", Option::kValue, 'n'}, {"json"}, {"keep"}};
+constexpr Option kOptions[] = {
+    {"limit", Option::kValue, 'n'}, {"json"}, {"failed"}, {"since", Option::kValue},
+    {"task", Option::kValue},       {"keep"}, {"tell"}};
 constexpr long kUsualLimit = 50;
 constexpr long kMostRuns = 100000000;
 constexpr char kNothing[] = "-";
 
-using Names = std::map<long, std::string>;
-
-Names taskNames() {
-  const TaskList list;
-  Names names;
-  for (const ZELO_SCHED_TASK *task : list.tasks()) names[task->ID] = task->Name;
-  return names;
-}
-
-std::string nameOf(const Names &names, long id) {
-  const auto found = names.find(id);
-  return found == names.end() ? kNothing : found->second;
-}
-
-std::string startText(const Run &run) {
+std::string startText(const KeptRun &run) {
+  const std::optional<long> moment = run.start ? run.start : run.queued;
+  if (!moment) return kNothing;
   constexpr long kSecondsPerMinute = 60;
   char seconds[16];
-  std::snprintf(seconds, sizeof seconds, ":%02ld", run.start % kSecondsPerMinute);
-  return minuteText(localMinute(run.start)) + seconds;
+  std::snprintf(seconds, sizeof seconds, ":%02ld", *moment % kSecondsPerMinute);
+  return minuteText(localMinute(*moment)) + seconds;
 }
 
-// Only starts are recorded: of a run that is over, nobody knows when it ended.
-std::string durationText(const Run &run) {
-  if (run.statusCode != ZELO_SCHED_STATUS_RUNNING) return kNothing;
+// Of one that goes on, by the wall clock.
+std::optional<long> durationOf(const KeptRun &run) {
+  if (run.duration) return static_cast<long>(*run.duration);
+  if (run.state != RunState::kRunning || !run.start) return std::nullopt;
+  return std::max(0L, static_cast<long>(time(nullptr)) - *run.start);
+}
+
+std::string durationText(const KeptRun &run) {
+  const std::optional<long> seconds = durationOf(run);
+  if (!seconds) return kNothing;
   constexpr long kMinute = 60;
   constexpr long kHour = 3600;
-  const long seconds = std::max(0L, time(nullptr) - run.start);
   char text[64];
-  std::snprintf(text, sizeof text, "%ld:%02ld:%02ld", seconds / kHour, seconds % kHour / kMinute,
-                seconds % kMinute);
+  std::snprintf(text, sizeof text, "%ld:%02ld:%02ld", *seconds / kHour, *seconds % kHour / kMinute,
+                *seconds % kMinute);
   return text;
 }
 
-void print(const std::vector<Run> &runs) {
-  const Names names = taskNames();
+void print(const std::vector<KeptRun> &runs) {
   Table table({{"START"},
                {"DURATION", Column::kRight},
-               {"ID", Column::kRight},
-               {"RESULT", Column::kLeft, true},
+               {"RUN", Column::kRight},
+               {"TASK", Column::kRight},
+               {"OUTCOME", Column::kLeft, true},
                {"NAME", Column::kLeft, true}});
-  for (const Run &run : runs) {
+  for (const KeptRun &run : runs) {
     table.add({{startText(run)},
                {durationText(run)},
-               {std::to_string(run.taskId)},
-               {resultInWords(run.statusCode, run.comment),
-                isBadResult(run.statusCode) ? Emphasis::kBad : Emphasis::kNone},
-               {nameOf(names, run.taskId)}});
+               {std::to_string(run.run)},
+               {std::to_string(run.task)},
+               {resultInWords(run), isBad(run) ? Emphasis::kBad : Emphasis::kNone},
+               {run.taskName.empty() ? kNothing : run.taskName}});
   }
   table.print();
 }
 
-void printAsJson(const std::vector<Run> &runs) {
-  std::vector<Json::Value> objects;
-  for (const Run &run : runs) {
-    Json::Value object;
-    object["id"] = Json::Int64(run.taskId);
-    object["app"] = jsonText(run.app);
-    object["status id"] = Json::Int64(run.statusId);
-    object["pid"] = Json::Int64(run.pid);
-    object["timestamp"] = Json::Int64(run.start);
-    object["start"] = startText(run);
-    object["status code"] = run.statusCode;
-    object["comment"] = jsonText(run.comment);
-    object["result"] = resultInWords(run.statusCode, run.comment);
-    objects.push_back(std::move(object));
+void printAsJson(const std::vector<KeptRun> &runs) {
+  std::printf("{\"version\":1,\"runs\":[");
+  for (size_t i = 0; i < runs.size(); ++i) {
+    std::printf("%s\n%s", i == 0 ? "" : ",", onOneLine(jsonOf(runs[i])).c_str());
   }
-  printJson(objects);
+  std::printf("\n]}\n");
+}
+
+// One that was removed has no name any more, but its runs are there.
+std::optional<long> taskOf(const Arguments &arguments) {
+  std::vector<std::string> operands = arguments.operands();
+  if (const std::optional<std::string> named = arguments.value("task")) operands.push_back(*named);
+  if (operands.empty()) return std::nullopt;
+  const std::vector<long> ids = parseIds(operands);
+  if (ids.size() > 1) throw UsageError("one task at a time");
+  return ids.front();
+}
+
+long momentOf(const std::string &text) {
+  const std::optional<long> moment = parseMoment(text, time(nullptr));
+  if (moment) return *moment;
+  throw UsageError(
+      "'--since' takes a time such as 2026-12-24, '2026-12-24 18:30', 18:30 or 12h "
+      "(ago), not '" +
+      printable(text) + "'");
 }
 
 int runHistory(int argc, char **argv) {
@@ -98,15 +108,20 @@ int runHistory(int argc, char **argv) {
     if (argc > 2) throw UsageError("'--keep' stands alone");
     return keepHistory();
   }
-  std::optional<long> id;
-  if (!arguments.operands().empty()) {
-    const std::vector<long> ids = parseIds(arguments.operands());
-    if (ids.size() > 1) throw UsageError("one task at a time");
-    id = ids.front();
+  // For the sweep, which cannot do it itself in its unit.
+  if (arguments.has("tell")) return attempt(tellOfRuns);
+  RunFilter filter;
+  filter.task = taskOf(arguments);
+  filter.failed = arguments.has("failed");
+  if (const std::optional<std::string> since = arguments.value("since")) {
+    filter.since = momentOf(*since);
   }
-  const long limit = arguments.number("limit", 1, kMostRuns).value_or(kUsualLimit);
-  std::vector<Run> runs;
-  const int status = collectRuns(id, limit, &runs);
+  filter.limit = arguments.number("limit", 1, kMostRuns).value_or(kUsualLimit);
+  // What it cannot take over is said, and what is kept is shown all the same.
+  int status = geteuid() == 0 ? attempt(sweepRuns) : kDone;
+  std::vector<KeptRun> runs;
+  const int read = attempt([&] { runs = keptRuns(filter); });
+  if (read != kDone) return read;
   // An empty table would say that there was no run.
   if (status != kDone && runs.empty()) return status;
   if (arguments.has("json")) {
@@ -120,12 +135,19 @@ int runHistory(int argc, char **argv) {
 }  // namespace
 
 const Command kHistoryCommand = {
-    "history", "[ID] [--limit N] [--json] | --keep", "list the runs and how they ended",
-    "Lists the runs of all tasks, or of one, the latest first. Of runs that are over no\n"
-    "end is recorded, so a duration is known only of one that goes on.\n"
+    "history", "[ID] [--failed] [--since TIME] [--task ID] [--limit N] [--json] | --keep",
+    "list the runs and how they ended",
+    "Lists the runs of all tasks, or of one, the latest first: when each began, how long it\n"
+    "took, its number, by which 'zelosched log' shows what it printed, its task, and how it\n"
+    "ended. Runs that are under way or wait for their turn are among them.\n"
     "\n"
+    "  --failed                       only those that did not end well\n"
+    "  --since TIME                   only those since then, such as 2026-12-24, 18:30,\n"
+    "                                 '2026-12-24 18:30', or 12h and 2d for so long ago\n"
+    "  --task ID                      only those of this task, as ID alone does\n"
     "  -n, --limit N                  how many runs; 50\n"
-    "  --json                         a JSON array\n"
-    "  --keep                         lists nothing, but keeps the runs over the next boot; the\n"
-    "                                 system does it every few minutes and at shutdown\n",
+    "  --json                         a JSON object\n"
+    "  --keep                         lists nothing, but takes over what other programs have\n"
+    "                                 run, tells of runs that were lost, and drops what is old;\n"
+    "                                 the system does it every few minutes and at shutdown\n",
     runHistory};

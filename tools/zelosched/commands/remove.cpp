@@ -5,22 +5,24 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"yes", Option::kNone, 'y'}, {"force"}};
+constexpr Option kOptions[] = {{"yes", Option::kNone, 'y'}, {"force"}, {"stop"}};
 
 int runRemove(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
   return removeTasks(parseIds(arguments.operands()),
-                     {arguments.has("yes"), arguments.has("force"), false});
+                     {arguments.has("yes"), arguments.has("force"), false, arguments.has("stop")});
 }
 
 }  // namespace
 
 const Command kRemoveCommand = {
-    "remove", "TASK... [--yes]", "delete tasks",
+    "remove", "TASK... [--yes] [--force] [--stop]", "delete tasks",
     "Deletes the tasks. Asks before each when the standard input is a terminal; refuses\n"
-    "without --yes when it is none.\n"
+    "without --yes when it is none. A run of one that waits for its turn does not start any\n"
+    "more; one that has begun goes on, which is told.\n"
     "\n"
     "  -y, --yes                      do not ask\n"
+    "  --stop                         end a run that has begun, as 'zelosched stop' does\n"
     "  --force                        even if its application does not let it be removed\n",
     runRemove};

@@ -7,6 +7,7 @@
 
 #include "commands/for_each_id.h"
 #include "commands/options.h"
+#include "commands/stop_task.h"
 #include "json/wire_json.h"
 #include "store/change_lock.h"
 #include "store/save.h"
@@ -47,9 +48,19 @@ Task loadRemovable(long id, const RemoveRules &rules) {
   return task;
 }
 
-void removeAndTell(const ZELO_SCHED_TASK &task) {
+// A run that waits for its turn must not begin when the task is gone: neither one from before, nor
+// one that read the task just then.
+void removeAndTell(const ZELO_SCHED_TASK &task, const RemoveRules &rules) {
+  const std::string title = titleOf(task);
+  cancelWaitingOf(task);
   removeTask(task);
-  std::printf("%s removed\n", titleOf(task).c_str());
+  std::printf("%s removed\n", title.c_str());
+  cancelWaitingOf(task);
+  if (rules.stops) {
+    stopTask(task.ID, "a run of it");
+  } else {
+    tellOfRunsOf(task);
+  }
 }
 
 // The lock is not held while an answer is waited for.
@@ -60,13 +71,13 @@ void askAndRemove(long id, const RemoveRules &rules) {
   if (!isSame(*task, *loadTask(id))) {
     throw Failure(titleOf(*task) + " stays: it has been changed meanwhile");
   }
-  removeAndTell(*task);
+  removeAndTell(*task, rules);
 }
 
 void removeOne(long id, const RemoveRules &rules) {
   if (!rules.isSure) return askAndRemove(id, rules);
   const ChangeLock lock;
-  removeAndTell(*loadRemovable(id, rules));
+  removeAndTell(*loadRemovable(id, rules), rules);
 }
 
 }  // namespace

@@ -6,9 +6,10 @@
 #include "commands/command.h"
 
 struct RemoveRules {
-  bool isSure;     // without a question
-  bool insists;    // whatever the application allows
-  bool powerOnly;  // a task that is no power time is refused
+  bool isSure;         // without a question
+  bool insists;        // whatever the application allows
+  bool powerOnly;      // a task that is no power time is refused
+  bool stops = false;  // ends the runs of it that go on
 };
 
 // The exit status. Throws UsageError when there is nobody to ask.

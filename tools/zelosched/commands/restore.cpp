@@ -1,11 +1,9 @@
 // zelosched restore
 #include <sched_shared_names.h>
 #include <sched_store_lock.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <climits>
 #include <cstdio>
 #include <cstring>
 #include <string>
@@ -20,6 +18,7 @@
 #include "store/store_copy.h"
 #include "store/store_files.h"
 #include "store/synchronise.h"
+#include "store/task_program.h"
 #include "terminal/failure.h"
 
 namespace {
@@ -28,8 +27,6 @@ constexpr Option kOptions[] = {{"force"}};
 
 constexpr mode_t kStoreMode = 0644;
 
-constexpr char kTaskProgramName[] = "zeloschedtask";
-constexpr char kUsualDirectory[] = "/usr/sbin/";
 constexpr mode_t kProgramMode = 0755;
 
 // ---- putting the tasks back ---------------------------------------------------------------------
@@ -173,24 +170,8 @@ void clearScratch() {
 
 // ---- the program that cron starts ---------------------------------------------------------------
 
-// Empty when /proc does not tell.
-std::string ownDirectory() {
-  char self[PATH_MAX];
-  const ssize_t length = readlink("/proc/self/exe", self, sizeof self);
-  const std::string path(self, static_cast<size_t>(std::max<ssize_t>(length, 0)));
-  return path.substr(0, path.rfind('/') + 1);
-}
-
-// It is installed beside this one.
-std::string installedProgram() {
-  const std::string directory = ownDirectory();
-  const std::string beside = directory + kTaskProgramName;
-  const bool isBeside = !directory.empty() && access(beside.c_str(), F_OK) == 0;
-  return isBeside ? beside : std::string(kUsualDirectory) + kTaskProgramName;
-}
-
 void putProgramBack() {
-  const std::string installed = installedProgram();
+  const std::string installed = installedTaskProgram();
   const std::string program = contentsOf(installed);
   if (program.empty()) throw Failure(installed + " is cut off: it has no bytes");
   replaceName({kTaskProgram, kProgramMode, false, program});

@@ -1,146 +1,286 @@
 #include "runs/history_keep.h"
 
+#include <sys/stat.h>
+#include <unistd.h>
 #include <zelosched.h>
 
 #include <algorithm>
 #include <cstdio>
-#include <tuple>
+#include <ctime>
 
-#include "runs/kept_database.h"
+#include "runs/history.h"
 #include "runs/missed.h"
+#include "runs/notices.h"
+#include "runs/output_file.h"
+#include "runs/runs.h"
+#include "runs/status_row.h"
+#include "runs/task_notes.h"
+#include "store/task_list.h"
+#include "store/task_program.h"
 #include "terminal/failure.h"
 #include "terminal/text.h"
 
 namespace {
 
-constexpr long kMostRuns = 100000;
+class Sweep {
+ public:
+  Sweep(const RunDatabase &status, const TaskList &list) : status_(status), list_(list) {}
 
-#define RUN_KEY "timestamp, status_id, pid, task_id, app"
+  // In one transaction. How many rows of the history it added or changed.
+  long run(const KeptDatabase &kept);
+  const std::vector<long> &runsWithoutKeeper() const { return withoutKeeper_; }
 
-constexpr char kKeep[] =
-    "INSERT INTO run(" RUN_KEY
-    ", status_code, comment, boot)"
-    " VALUES(?, ?, ?, ?, ?, ?, ?, ?)"
-    " ON CONFLICT DO UPDATE SET status_code = excluded.status_code, comment = excluded.comment"
-    " WHERE status_code <> excluded.status_code OR comment <> excluded.comment";
-// By their number alone: a clock that is wrong for once must not take the history away.
-constexpr char kDropMany[] =
-    "DELETE FROM run WHERE (" RUN_KEY
-    ") <"
-    " (SELECT " RUN_KEY
-    " FROM run ORDER BY timestamp DESC, status_id DESC, pid DESC, task_id DESC,"
-    " app DESC LIMIT 1 OFFSET ?)";
+ private:
+  void takeOver(const KeptDatabase &kept);
+  void takeOver(const KeptDatabase &kept, const Run &row);
+  void lookAfter(const KeptDatabase &kept, KeptRun run);
+  std::optional<Run> rowOf(const KeptRun &run) const;
+  bool isOverByItsRow(const KeptRun &run) const;
+  void endByRow(KeptRun *run) const;
+  const TaskRecord *taskOf(const KeptRun &run) const;
+  void describe(KeptRun *run) const;
+  void save(const KeptDatabase &kept, KeptRun *run);
 
-#define SELECT_RUNS "SELECT " RUN_KEY ", status_code, comment, boot FROM run "
-constexpr char kNewest[] = SELECT_RUNS "ORDER BY timestamp DESC, status_id DESC LIMIT ?";
-constexpr char kNewestOfTask[] =
-    SELECT_RUNS "WHERE task_id = ? ORDER BY timestamp DESC, status_id DESC LIMIT ?";
+  const RunDatabase &status_;
+  const TaskList &list_;
+  std::string boot_ = bootId();
+  Settings settings_ = settingsOrComplaints();
+  long changed_ = 0;
+  std::vector<long> withoutKeeper_;
+};
 
-// Carried over as running, by this boot or an earlier one, whose processes are all gone.
-bool isGone(const Run &run, bool isThisBoot) {
-  return isThisBoot ? isGone(run) : run.statusCode == ZELO_SCHED_STATUS_RUNNING;
+bool isKnown(const KeptDatabase &kept, const Run &row) {
+  Query query(kept,
+              "SELECT 1 FROM run WHERE start = ? AND status_id = ? AND pid = ?"
+              " AND task = ? AND app = ?");
+  query.with(row.start).with(row.statusId).with(row.pid).with(row.taskId).with(row.app);
+  const bool isThere = query.next();
+  if (isThere) query.next();
+  return isThere;
 }
 
-Run runOf(const Query &query, const std::string &thisBoot) {
-  Run run;
-  int column = 0;
-  run.start = query.number(column++);
-  run.statusId = query.number(column++);
-  run.pid = query.number(column++);
-  run.taskId = query.number(column++);
-  run.app = query.text(column++);
-  run.statusCode = static_cast<int>(query.number(column++));
-  run.comment = query.text(column++);
-  if (isGone(run, query.text(column) == thisBoot)) run.statusCode = ZELO_SCHED_STATUS_GONE;
-  return run;
+// Noted by its keeper, which reads the row at the end alone.
+std::vector<KeptRun> underWayOf(const KeptDatabase &kept, const Run &row, const std::string &boot) {
+  RunFilter filter;
+  filter.underWay = true;
+  std::vector<KeptRun> found = runsOf(kept, filter);
+  std::erase_if(found, [&](const KeptRun &run) {
+    return run.statusId || run.process.pid != row.pid || run.task != row.taskId || run.boot != boot;
+  });
+  return found;
 }
 
-std::vector<Run> keptRuns(std::optional<long> taskId, long limit) {
-  std::vector<Run> runs;
-  const KeptDatabase kept(KeptDatabase::kRead);
-  if (!kept.isThere()) return runs;
-  const std::string boot = bootId();
-  Query query(kept, taskId ? kNewestOfTask : kNewest);
-  if (taskId) query.with(*taskId);
-  query.with(limit);
-  while (query.next()) runs.push_back(runOf(query, boot));
-  return runs;
+bool isProcessAlive(const KeptRun &run) {
+  if (run.process.born != 0) return isAlive(run.process);
+  // Of a row of which only the number is known.
+  return run.process.pid > 0 && run.process.pid <= INT32_MAX &&
+         isAlive(processNamed(run.process.pid));
 }
 
-// What tells it from every other; it never changes.
-auto identityOf(const Run &run) {
-  return std::tie(run.start, run.statusId, run.pid, run.taskId, run.app);
+const TaskRecord *Sweep::taskOf(const KeptRun &run) const {
+  const auto &tasks = list_.tasks();
+  const auto found = std::find_if(tasks.begin(), tasks.end(), [&](const TaskRecord *task) {
+    return task->ID == run.task && task->App == run.app;
+  });
+  return found == tasks.end() ? nullptr : *found;
 }
 
-bool isSame(const Run &a, const Run &b) {
-  return identityOf(a) == identityOf(b);
+void Sweep::describe(KeptRun *run) const {
+  const TaskRecord *const task = taskOf(*run);
+  if (task != nullptr) run->taskName = task->Name;
 }
 
-bool isNewer(const Run &a, const Run &b) {
-  return identityOf(a) > identityOf(b);
+void Sweep::save(const KeptDatabase &kept, KeptRun *run) {
+  saveRun(kept, run);
+  ++changed_;
 }
 
-// Leaves one of each two that are the same. Of a run that is in both databases, the row of the
-// status database comes first and has the later result. But where that database outlived a boot, a
-// run that is "running" there may have the number of a process of today, and only the kept row
-// knows.
-std::vector<Run> withoutDoubles(const std::vector<Run> &sorted) {
-  std::vector<Run> runs;
-  for (const Run &run : sorted) {
-    if (runs.empty() || !isSame(runs.back(), run)) {
-      runs.push_back(run);
-    } else if (runs.back().statusCode == ZELO_SCHED_STATUS_RUNNING) {
-      runs.back().statusCode = run.statusCode;
+void Sweep::takeOver(const KeptDatabase &kept, const Run &row) {
+  if (isKnown(kept, row)) return;
+  std::vector<KeptRun> underWay = underWayOf(kept, row, boot_);
+  if (!underWay.empty()) {
+    KeptRun &run = underWay.front();
+    if (isAlive(run.keeper)) return;  // which writes it at the end
+    run.start = row.start;
+    run.statusId = row.statusId;
+    run.state = RunState::kRunning;  // until somebody has looked after it
+    save(kept, &run);
+    return;
+  }
+  KeptRun run;
+  run.task = row.taskId;
+  run.app = row.app;
+  run.boot = boot_;
+  run.trigger = Trigger::kOther;
+  takeStatus(row, &run);
+  describe(&run);
+  if (run.state == RunState::kRunning) run.process = processNamed(row.pid);
+  run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
+  save(kept, &run);
+}
+
+void Sweep::takeOver(const KeptDatabase &kept) {
+  const std::string name = runDatabaseName();
+  Query last(kept, "SELECT status_id FROM swept WHERE file = ?");
+  last.with(name);
+  long done = last.next() ? last.number(0) : 0;
+  if (status_.lastStatusId() < done) done = 0;  // it has been emptied
+  for (const Run &row : status_.after(done)) {
+    takeOver(kept, row);
+    done = row.statusId;
+  }
+  Query(kept, "DELETE FROM swept WHERE file <> ?").with(name).run();
+  Query(kept,
+        "INSERT INTO swept(file, status_id) VALUES(?1, ?2)"
+        " ON CONFLICT DO UPDATE SET status_id = ?2 WHERE status_id <> ?2")
+      .with(name)
+      .with(done)
+      .run();
+}
+
+// In the status database.
+std::optional<Run> Sweep::rowOf(const KeptRun &run) const {
+  std::optional<Run> row =
+      run.statusId ? status_.runOfId(*run.statusId) : status_.runOfProcess(run.process.pid, 0);
+  if (!row || row->pid != run.process.pid || row->taskId != run.task) return std::nullopt;
+  // Before its row was read, a start is when a keeper saw it.
+  const bool isItsTime =
+      run.statusId ? row->start == run.start : run.queued && row->start >= *run.queued;
+  return isItsTime ? row : std::nullopt;
+}
+
+// Written by the process last of all.
+bool Sweep::isOverByItsRow(const KeptRun &run) const {
+  const std::optional<Run> row = rowOf(run);
+  return row && row->statusCode != ZELO_SCHED_STATUS_RUNNING;
+}
+
+// Its process is gone, and no keeper is there to say how it ended.
+void Sweep::endByRow(KeptRun *run) const {
+  if (const std::optional<Run> row = rowOf(*run)) {
+    takeStatus(*row, run);
+  } else {
+    run->outcome = run->stopAsked && !run->start ? Outcome::kCancelled : Outcome::kLost;
+  }
+  if (run->state != RunState::kEnded) run->outcome = Outcome::kLost;
+  run->state = RunState::kEnded;
+  const TaskRecord *const task = taskOf(*run);
+  judgeEnd(task == nullptr ? "" : task->Command, run->stopAsked.has_value(), run);
+}
+
+void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
+  const bool isOfThisBoot = run.boot == boot_;
+  if (isOfThisBoot && isAlive(run.keeper)) return;
+  if (isOfThisBoot && isProcessAlive(run)) {
+    if (run.keeper.pid != 0) {
+      withoutKeeper_.push_back(run.run);
+      return;
     }
+    if (!isOverByItsRow(run)) return;
   }
-  return runs;
+  if (isOfThisBoot) {
+    endByRow(&run);
+  } else {
+    run.outcome = Outcome::kLost;
+    run.state = RunState::kEnded;
+  }
+  // What its keeper had read by the time when that was killed.
+  OutputFile printed = OutputFile::open(run.process);
+  run.outputBytes = std::max(run.outputBytes, printed.total());
+  save(kept, &run);
+  if (printed.isOpen()) saveOutput(kept, run, printed.contents(), settings_);
+  printed.remove();
 }
 
-// Newest first.
-std::vector<Run> together(std::vector<Run> recent, const std::vector<Run> &kept, long limit) {
-  recent.insert(recent.end(), kept.begin(), kept.end());
-  std::stable_sort(recent.begin(), recent.end(), isNewer);
-  std::vector<Run> runs = withoutDoubles(recent);
-  if (runs.size() > static_cast<size_t>(limit)) runs.resize(static_cast<size_t>(limit));
-  return runs;
-}
-
-void keepRuns() {
-  const std::vector<Run> runs = RunDatabase().newest(std::nullopt, kMostRuns);
-  const KeptDatabase kept(KeptDatabase::kChange);
-  const std::string boot = bootId();
+long Sweep::run(const KeptDatabase &kept) {
   Transaction transaction(kept);
-  Query keep(kept, kKeep);
-  long count = 0;
-  for (const Run &run : runs) {
-    keep.with(run.start).with(run.statusId).with(run.pid).with(run.taskId).with(run.app);
-    count += keep.with(run.statusCode).with(run.comment).with(boot).run();
-  }
-  Query(kept, kDropMany).with(kMostRuns - 1).run();
+  if (!areTasksLost()) noteTasks(kept, list_);
+  takeOver(kept);
+  RunFilter filter;
+  filter.underWay = true;
+  for (KeptRun &run : runsOf(kept, filter)) lookAfter(kept, std::move(run));
   transaction.commit();
-  // A timer calls this: nothing new is nothing to fill the log with.
+  return changed_;
+}
+
+long sweep() {
+  const RunDatabase status;
+  if (status.lastStatusId() == 0 && !KeptDatabase(KeptDatabase::kRead).isThere()) return 0;
+  const TaskList list(TaskList::Unreadable::kIsLeftOut);
+  const KeptDatabase kept(KeptDatabase::kChange);
+  Sweep sweep(status, list);
+  const long changed = sweep.run(kept);
+  for (const long run : sweep.runsWithoutKeeper()) {
+    startDetached(installedTaskProgram(), {"--keep", "run=" + std::to_string(run)});
+  }
+  return changed;
+}
+
+// The clock alone must not fill the log.
+void sweepAndSay() {
+  const long count = sweep();
   if (count > 0) std::printf("%s kept\n", counted(static_cast<size_t>(count), "run").c_str());
+}
+
+// Of two at once, one tells. It is noted first: better never than twice.
+std::vector<KeptRun> takeUntold(const KeptDatabase &kept) {
+  Transaction transaction(kept);
+  Query query(kept, "SELECT run FROM run WHERE told = 0 AND state = 2");
+  std::vector<KeptRun> untold;
+  while (query.next()) {
+    RunFilter filter;
+    filter.run = query.number(0);
+    for (KeptRun &run : runsOf(kept, filter)) untold.push_back(std::move(run));
+  }
+  Query note(kept, "UPDATE run SET told = 1 WHERE run = ?");
+  for (const KeptRun &run : untold) note.with(run.run).run();
+  transaction.commit();
+  return untold;
+}
+
+// What an administrator's programs need, such as a mailer, the unit of the sweep does not have.
+void haveRunsToldOf() {
+  if (!isAnybodyToBeTold()) return;
+  if (isUnit()) {
+    startDetached(ownProgram(), {"history", "--tell"});
+  } else {
+    tellOfRuns();
+  }
+}
+
+void dropOld() {
+  const KeptDatabase kept(KeptDatabase::kChange);
+  Transaction transaction(kept);
+  SettingsFaults faults;
+  dropOldRuns(kept, readSettings(&faults));
+  transaction.commit();
 }
 
 }  // namespace
 
+void tellOfRuns() {
+  std::vector<KeptRun> untold;
+  std::vector<Output> outputs;
+  {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    if (!kept.isThere()) return;
+    untold = takeUntold(kept);
+    for (const KeptRun &run : untold) {
+      outputs.push_back(outputOf(kept, run.run).value_or(Output()));
+    }
+  }
+  for (size_t i = 0; i < untold.size(); ++i) tellOfEnd(untold[i], outputs[i], false);
+}
+
+void sweepRuns() {
+  sweep();
+}
+
 int keepHistory() {
-  return std::max(attempt(keepRuns), attempt(markMachineUp));
-}
-
-std::vector<Run> allRuns(std::optional<long> taskId, long limit) {
-  return together(RunDatabase().newest(taskId, limit), keptRuns(taskId, limit), limit);
-}
-
-int collectRuns(std::optional<long> taskId, long limit, std::vector<Run> *runs) {
-  std::vector<Run> recent;
-  std::vector<Run> kept;
-  const int results[] = {
-      attempt([&] { recent = RunDatabase().newest(taskId, limit); }),
-      attempt([&] { kept = keptRuns(taskId, limit); }),
-  };
-  *runs = together(std::move(recent), kept, limit);
-  return *std::max_element(std::begin(results), std::end(results));
+  const int swept = attempt(sweepAndSay);
+  const int noted = attempt(markMachineUp);
+  if (swept != kDone || noted != kDone) return std::max(swept, noted);
+  return std::max(attempt(dropOld), attempt(haveRunsToldOf));
 }
 
 bool mayReadAllRuns() {

@@ -1,23 +1,19 @@
-// The runs that are kept over a boot.
+// The sweep: what keepers could not write into the history, and what other programs have run.
 #pragma once
 
-#include <optional>
-#include <vector>
+// Carries the runs of the status database over into the history, each once; ends there those whose
+// process is gone; notes what became of the tasks; and has a new keeper for each run whose keeper
+// was killed. Makes no history where there is nothing to keep. Throws Failure.
+void sweepRuns();
 
-#include "runs/runs.h"
-
-// Carries the runs of the status database over into the kept ones: each once, also when it was
-// carried over before, and with the result that it has now. The newest hundred thousand are kept.
-// Also notes that the machine is up (missed.h). What failed is said; the exit status.
+// That, with all that is done from time to time: notes that the machine is up (missed.h), tells of
+// the runs that nobody has told of, and drops what is too old. What failed is said; the exit
+// status.
 int keepHistory();
 
-// The runs of the status database and the kept ones, newest first; of one task, or of all; at most
-// `limit`. Throws Failure.
-std::vector<Run> allRuns(std::optional<long> taskId, long limit);
+// Tells of the runs that have ended and that nobody has told of: those that the sweep found. Throws
+// Failure.
+void tellOfRuns();
 
-// As allRuns, of those that can be read: one of the two is in "/tmp", where anybody can be in its
-// way. What cannot be read is said; the exit status.
-int collectRuns(std::optional<long> taskId, long limit, std::vector<Run> *runs);
-
-// Both may be read.
+// This user has the rights to read the status database and the history.
 bool mayReadAllRuns();

@@ -19,23 +19,68 @@ constexpr char kDirectory[] = "/usr/zelo/var";
 constexpr mode_t kDirectoryMode = 0755;
 constexpr mode_t kMode = 0600;  // command results are nobody else's business
 constexpr char kBootId[] = "/proc/sys/kernel/random/boot_id";
-constexpr int kPatience = 10000;  // milliseconds, while another command writes
+constexpr long kFirstVersion = 1;
+constexpr long kVersion = 2;  // in user_version; 0 is a new database
 
-constexpr long kVersion = 1;  // in user_version; 0 is a new database
-// The ids of runs begin anew with each boot, so that it takes all that never changes to tell two
-// rows apart.
+// A run has the number that no other run ever gets. The ids of the status database begin anew with
+// each boot, or when somebody removes that database, so that it takes all that never changes in a
+// row there to tell two runs apart. `moment` orders the runs: the start, or what was first known.
 constexpr char kSchema[] =
-    "CREATE TABLE run(timestamp INTEGER NOT NULL, status_id INTEGER NOT NULL,"
-    " pid INTEGER NOT NULL, task_id INTEGER NOT NULL, app TEXT NOT NULL,"
-    " status_code INTEGER NOT NULL, comment TEXT NOT NULL, boot TEXT NOT NULL,"
-    " PRIMARY KEY(timestamp, status_id, pid, task_id, app)) WITHOUT ROWID;"
-    "CREATE INDEX run_of_task ON run(task_id, timestamp);"
-    "CREATE TABLE up(boot TEXT NOT NULL, seen INTEGER NOT NULL);"
-    "CREATE TABLE missed(task_id INTEGER PRIMARY KEY, app TEXT NOT NULL, due INTEGER NOT NULL);"
-    "PRAGMA user_version = 1;";
+    "CREATE TABLE task(generation INTEGER PRIMARY KEY AUTOINCREMENT, task INTEGER NOT NULL,"
+    " app TEXT NOT NULL, name TEXT NOT NULL, schedule TEXT NOT NULL, command TEXT NOT NULL,"
+    " enabled INTEGER NOT NULL, created INTEGER, changed INTEGER NOT NULL, removed INTEGER);"
+    "CREATE UNIQUE INDEX task_of_today ON task(task) WHERE removed IS NULL;"
+    "CREATE TABLE run(run INTEGER PRIMARY KEY AUTOINCREMENT, task INTEGER NOT NULL,"
+    " generation INTEGER, task_name TEXT NOT NULL, app TEXT NOT NULL, owner TEXT NOT NULL,"
+    " started_by INTEGER NOT NULL, due INTEGER, queued INTEGER, start INTEGER, ended INTEGER,"
+    " duration REAL, state INTEGER NOT NULL, outcome INTEGER NOT NULL, exit_code INTEGER,"
+    " signal INTEGER, output_bytes INTEGER NOT NULL, moment INTEGER NOT NULL,"
+    " boot TEXT NOT NULL, status_id INTEGER, pid INTEGER NOT NULL, pid_born INTEGER,"
+    " keeper INTEGER, keeper_born INTEGER, stop_asked INTEGER, told INTEGER NOT NULL,"
+    " UNIQUE(start, status_id, pid, task, app));"
+    "CREATE INDEX run_by_moment ON run(moment, run);"
+    "CREATE INDEX run_of_task ON run(task, moment, run);"
+    "CREATE INDEX run_of_generation ON run(generation, moment, run);"
+    "CREATE INDEX run_under_way ON run(state) WHERE state < 2;"
+    "CREATE INDEX run_untold ON run(told) WHERE told = 0;"
+    "CREATE TABLE output(run INTEGER PRIMARY KEY, task INTEGER NOT NULL, size INTEGER NOT NULL,"
+    " left_out INTEGER NOT NULL, head BLOB NOT NULL, tail BLOB NOT NULL);"
+    "CREATE INDEX output_of_task ON output(task, run);"
+    "CREATE INDEX output_size ON output(size);"
+    "CREATE TRIGGER run_dropped AFTER DELETE ON run BEGIN"
+    " DELETE FROM output WHERE run = OLD.run; END;"
+    // How far a status database has been read.
+    "CREATE TABLE swept(file TEXT PRIMARY KEY, status_id INTEGER NOT NULL) WITHOUT ROWID;"
+    "CREATE TABLE notice(kind TEXT NOT NULL, generation INTEGER NOT NULL, moment INTEGER NOT NULL,"
+    " told INTEGER NOT NULL, PRIMARY KEY(kind, generation, moment)) WITHOUT ROWID;"
+    "CREATE TABLE IF NOT EXISTS up(boot TEXT NOT NULL, seen INTEGER NOT NULL);"
+    "CREATE TABLE IF NOT EXISTS missed(task_id INTEGER PRIMARY KEY, app TEXT NOT NULL,"
+    " due INTEGER NOT NULL);"
+    "PRAGMA user_version = 2;";
+
+// The numbers in the last two are RunState, Outcome and Trigger of run_record.h. Of the runs of
+// then, only the start and the code are known, and everybody has been told.
+constexpr char kFromFirst[] =
+    "INSERT INTO run(task, task_name, app, owner, started_by, start, state, outcome, exit_code,"
+    " signal, output_bytes, moment, boot, status_id, pid, told)"
+    " SELECT task_id, '', app, '', 3, timestamp, CASE status_code WHEN 2 THEN 1 ELSE 2 END,"
+    " CASE status_code WHEN 2 THEN 0 WHEN 3 THEN 1 WHEN 7 THEN 2 WHEN 5 THEN 3 WHEN 6 THEN 3"
+    " WHEN 0 THEN 4 WHEN 4 THEN 4 ELSE 9 END,"
+    " CASE status_code WHEN 3 THEN 0 WHEN 7 THEN CAST(comment AS INTEGER) END,"
+    " CASE WHEN status_code IN (5, 6) THEN CAST(comment AS INTEGER) END,"
+    " 0, timestamp, boot, status_id, pid, 1"
+    " FROM run_of_first ORDER BY timestamp, status_id, pid, task_id, app;"
+    "DROP TABLE run_of_first;";
 
 Failure cannot(const char *what, const char *why) {
   return Failure(std::string("cannot ") + what + " " + kPath + ": " + why);
+}
+
+// Busy is something else than damaged: it passes.
+[[noreturn]] void fail(const char *what, sqlite3 *db) {
+  const Failure failure = cannot(what, sqlite3_errmsg(db));
+  if (sqlite3_errcode(db) == SQLITE_BUSY) throw DatabaseBusy(failure.what());
+  throw failure;
 }
 
 void makeDirectories() {
@@ -89,13 +134,20 @@ long versionOf(const KeptDatabase &database) {
   return query.next() ? query.number(0) : 0;
 }
 
+void execute(const KeptDatabase &database, const char *sql) {
+  if (sqlite3_exec(database.get(), sql, nullptr, nullptr, nullptr) != SQLITE_OK) {
+    fail("write", database.get());
+  }
+}
+
 void makeTables(const KeptDatabase &database) {
   Transaction transaction(database);
-  // Another command may have been first.
-  if (versionOf(database) == 0 &&
-      sqlite3_exec(database.get(), kSchema, nullptr, nullptr, nullptr) != SQLITE_OK) {
-    throw cannot("write", sqlite3_errmsg(database.get()));
+  const long version = versionOf(database);  // another command may have been first
+  if (version == kFirstVersion) {
+    execute(database, "DROP INDEX run_of_task; ALTER TABLE run RENAME TO run_of_first;");
   }
+  if (version < kVersion) execute(database, kSchema);
+  if (version == kFirstVersion) execute(database, kFromFirst);
   transaction.commit();
 }
 
@@ -111,7 +163,7 @@ std::string bootId() {
   return id;
 }
 
-KeptDatabase::KeptDatabase(Access access) {
+KeptDatabase::KeptDatabase(Access access, std::chrono::milliseconds patience) {
   if (access == kRead && ::access(kPath, F_OK) != 0 && errno == ENOENT) return;
   if (isKeptFromUs()) throw cannot("read", "that takes root's rights");
   if (access == kChange) makeFile();
@@ -120,12 +172,14 @@ KeptDatabase::KeptDatabase(Access access) {
   const int result = sqlite3_open_v2(pathBehindLinks().c_str(), &opened,
                                      SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOFOLLOW, nullptr);
   db_.reset(opened);
-  if (result != SQLITE_OK) throw cannot("open", sqlite3_errmsg(opened));
-  sqlite3_busy_timeout(opened, kPatience);
+  if (result != SQLITE_OK) fail("open", opened);
+  sqlite3_busy_timeout(opened, static_cast<int>(patience.count()));
   const long version = versionOf(*this);
   if (version > kVersion) throw cannot("read", "a later zelosched made it");
   if (version == kVersion) return;
-  if (access == kChange) {
+  // What cannot be written, such as a file system that is read-only, cannot be brought to this
+  // version either.
+  if (access == kChange || version == kFirstVersion) {
     makeTables(*this);
   } else {
     db_.reset();
@@ -134,34 +188,47 @@ KeptDatabase::KeptDatabase(Access access) {
 
 Query::Query(const KeptDatabase &database, const char *sql) : db_(database.get()) {
   sqlite3_stmt *prepared = nullptr;
-  if (sqlite3_prepare_v2(db_, sql, -1, &prepared, nullptr) != SQLITE_OK) {
-    throw cannot("read", sqlite3_errmsg(db_));
-  }
+  if (sqlite3_prepare_v2(db_, sql, -1, &prepared, nullptr) != SQLITE_OK) fail("read", db_);
   statement_.reset(prepared);
 }
 
-Query &Query::with(long number) {
-  if (sqlite3_bind_int64(statement_.get(), ++parameters_, number) != SQLITE_OK) {
-    throw cannot("read", sqlite3_errmsg(db_));
-  }
+Query &Query::bound(int result) {
+  if (result != SQLITE_OK) fail("read", db_);
   return *this;
 }
 
+Query &Query::with(long number) {
+  return bound(sqlite3_bind_int64(statement_.get(), ++parameters_, number));
+}
+
+// Without a value it is NULL.
+Query &Query::with(std::optional<long> number) {
+  if (number) return with(*number);
+  return bound(sqlite3_bind_null(statement_.get(), ++parameters_));
+}
+
+Query &Query::with(std::optional<double> number) {
+  ++parameters_;
+  return bound(number ? sqlite3_bind_double(statement_.get(), parameters_, *number)
+                      : sqlite3_bind_null(statement_.get(), parameters_));
+}
+
 Query &Query::with(const std::string &text) {
-  if (sqlite3_bind_text(statement_.get(), ++parameters_, text.data(), static_cast<int>(text.size()),
-                        SQLITE_TRANSIENT) != SQLITE_OK) {
-    throw cannot("read", sqlite3_errmsg(db_));
-  }
-  return *this;
+  return bound(sqlite3_bind_text(statement_.get(), ++parameters_, text.data(),
+                                 static_cast<int>(text.size()), SQLITE_TRANSIENT));
+}
+
+Query &Query::withBytes(const std::string &bytes) {
+  return bound(sqlite3_bind_blob(statement_.get(), ++parameters_, bytes.data(),
+                                 static_cast<int>(bytes.size()), SQLITE_TRANSIENT));
 }
 
 bool Query::next() {
   const int result = sqlite3_step(statement_.get());
   if (result == SQLITE_ROW) return true;
-  const std::string why = sqlite3_errmsg(db_);
+  if (result != SQLITE_DONE) fail("read or write", db_);
   sqlite3_reset(statement_.get());
   parameters_ = 0;
-  if (result != SQLITE_DONE) throw cannot("read or write", why.c_str());
   return false;
 }
 
@@ -175,10 +242,24 @@ long Query::number(int column) const {
   return sqlite3_column_int64(statement_.get(), column);
 }
 
+std::optional<long> Query::optionalNumber(int column) const {
+  if (sqlite3_column_type(statement_.get(), column) == SQLITE_NULL) return std::nullopt;
+  return number(column);
+}
+
+std::optional<double> Query::optionalReal(int column) const {
+  if (sqlite3_column_type(statement_.get(), column) == SQLITE_NULL) return std::nullopt;
+  return sqlite3_column_double(statement_.get(), column);
+}
+
+long Query::lastKey() const {
+  return sqlite3_last_insert_rowid(db_);
+}
+
 std::string Query::text(int column) const {
-  const unsigned char *text = sqlite3_column_text(statement_.get(), column);
+  const void *text = sqlite3_column_blob(statement_.get(), column);
   const auto size = static_cast<size_t>(sqlite3_column_bytes(statement_.get(), column));
-  return text == nullptr ? "" : std::string(reinterpret_cast<const char *>(text), size);
+  return text == nullptr ? "" : std::string(static_cast<const char *>(text), size);
 }
 
 Transaction::Transaction(const KeptDatabase &database) : database_(database) {

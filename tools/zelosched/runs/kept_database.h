@@ -1,10 +1,14 @@
-// What must outlive a boot, in /usr/zelo/var/history.sqlite: the runs, since the status database
-// goes with /tmp; when the machine was last known to be up; and the tasks whose time passed while
-// it was off.
+// What must outlive a boot, in /usr/zelo/var/history.sqlite: the runs and what they printed, since
+// the status database goes with /tmp; the tasks as they were last seen; when the machine was last
+// known to be up; and the tasks whose time passed while it was off.
 #pragma once
 
+#include <chrono>
 #include <memory>
+#include <optional>
 #include <string>
+
+#include "terminal/failure.h"
 
 struct sqlite3;
 struct sqlite3_stmt;
@@ -15,11 +19,20 @@ bool isKeptFromUs();
 // The kernel's name of this boot. Throws Failure.
 std::string bootId();
 
+// Another process has the database to itself for longer than we wait.
+class DatabaseBusy : public Failure {
+ public:
+  using Failure::Failure;
+};
+
 class KeptDatabase {
  public:
   enum Access { kRead, kChange };
-  // For reading null inside when there is no database yet; for a change it is made. Throws Failure.
-  explicit KeptDatabase(Access access);
+  static constexpr std::chrono::milliseconds kUsualPatience{10000};
+
+  // For reading null inside when there is no database yet; for a change it is made, and one of an
+  // earlier version is brought to this one. Throws Failure.
+  explicit KeptDatabase(Access access, std::chrono::milliseconds patience = kUsualPatience);
 
   bool isThere() const { return db_ != nullptr; }
   sqlite3 *get() const { return db_.get(); }
@@ -38,7 +51,10 @@ class Query {
 
   // The next parameter.
   Query &with(long number);
+  Query &with(std::optional<long> number);
+  Query &with(std::optional<double> number);
   Query &with(const std::string &text);
+  Query &withBytes(const std::string &bytes);
 
   // To the next row. False at the end, and it can be run again.
   bool next();
@@ -46,12 +62,18 @@ class Query {
   long run();
 
   long number(int column) const;
-  std::string text(int column) const;
+  std::optional<long> optionalNumber(int column) const;
+  std::optional<double> optionalReal(int column) const;
+  std::string text(int column) const;  // or bytes
+  // The key of the row last inserted.
+  long lastKey() const;
 
  private:
   struct Finalize {
     void operator()(sqlite3_stmt *statement) const;
   };
+  Query &bound(int result);
+
   sqlite3 *db_;
   std::unique_ptr<sqlite3_stmt, Finalize> statement_;
   int parameters_ = 0;

@@ -6,7 +6,7 @@
 #include <algorithm>
 
 #include "runs/coming_runs.h"
-#include "runs/history_keep.h"
+#include "runs/history.h"
 #include "runs/kept_database.h"
 #include "store/store_files.h"
 
@@ -31,28 +31,30 @@ void noteMissed(const KeptDatabase &kept, time_t lastUp, time_t now) {
   }
 }
 
-// They could not be put back, or nobody tried so far. No time of theirs may count as passed over
-// until they are.
-bool areTasksLost() {
-  struct stat info {};
-  const bool isThere = lstat(kWorkingCopy, &info) == 0 && info.st_size > 0;
-  return !isThere && (access(kPersistentCopy, F_OK) == 0 || access(kLastGoodCopy, F_OK) == 0);
-}
-
 bool hasRunAt(const TaskRecord &task, time_t due) {
   return lastRunBetween(task, due - kMinute, due).has_value();
 }
 
 bool ranSince(const TaskRecord &task, time_t due) {
-  constexpr long kLatest = 100;
+  RunFilter filter;
+  filter.task = task.ID;
+  filter.since = due;
+  const std::vector<KeptRun> runs = keptRuns(filter);
   const time_t now = time(nullptr);
-  const std::vector<Run> runs = allRuns(task.ID, kLatest);
   // One behind now was recorded by a clock that was wrong.
-  return std::any_of(runs.begin(), runs.end(),
-                     [&](const Run &run) { return run.start >= due && run.start <= now; });
+  return std::any_of(runs.begin(), runs.end(), [&](const KeptRun &run) {
+    return run.start && *run.start >= due && *run.start <= now;
+  });
 }
 
 }  // namespace
+
+// No time of theirs may count as passed over until they are.
+bool areTasksLost() {
+  struct stat info {};
+  const bool isThere = lstat(kWorkingCopy, &info) == 0 && info.st_size > 0;
+  return !isThere && (access(kPersistentCopy, F_OK) == 0 || access(kLastGoodCopy, F_OK) == 0);
+}
 
 void markMachineUp() {
   if (areTasksLost()) return;

@@ -21,6 +21,9 @@ struct MissedTask {
 // with them finds what they missed. Throws Failure.
 void markMachineUp();
 
+// The tasks could not be put back into /tmp, or nobody tried so far.
+bool areTasksLost();
+
 // The tasks of the list that were due since that moment while the machine was off, are enabled and
 // have that time still, and did not run afterwards; by the time when they were due. Throws Failure.
 std::vector<MissedTask> missedTasks(const TaskList &list, time_t since);

@@ -1,13 +1,12 @@
 #include "runs/processes.h"
 
 #include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
-#include <fstream>
-#include <iterator>
 #include <optional>
 #include <sstream>
 #include <string>
@@ -16,10 +15,21 @@
 
 namespace {
 
+// Of a process that ends meanwhile reading fails, which a stream would throw.
+std::string textOf(const std::string &path) {
+  constexpr size_t kEnough = 4096;  // for a status page
+  const int file = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  if (file < 0) return "";
+  std::string text(kEnough, '\0');
+  const ssize_t size = read(file, text.data(), text.size());
+  close(file);
+  text.resize(static_cast<size_t>(std::max<ssize_t>(size, 0)));
+  return text;
+}
+
 ProcessStat statOf(const std::string &pid) {
   constexpr int kFieldsBetween = 17;  // between the parent and the start in /proc/PID/stat
-  std::ifstream file("/proc/" + pid + "/stat");
-  const std::string text(std::istreambuf_iterator<char>(file), {});
+  const std::string text = textOf("/proc/" + pid + "/stat");
   const size_t name = text.rfind(')');  // the name before it may hold anything
   if (name == std::string::npos) return {};
   std::istringstream fields(text.substr(name + 1));
@@ -33,22 +43,40 @@ ProcessStat statOf(const std::string &pid) {
 
 }  // namespace
 
-std::map<pid_t, ProcessStat> children() {
+ProcessStat statOf(pid_t pid) {
+  return statOf(std::to_string(pid));
+}
+
+std::map<pid_t, ProcessStat> processes() {
   std::map<pid_t, ProcessStat> found;
   DIR *directory = opendir("/proc");
   if (directory == nullptr) return found;
   while (const dirent *entry = readdir(directory)) {
     const std::optional<long> pid = parseNumber(entry->d_name);
     if (!pid) continue;
-    const ProcessStat stat = statOf(entry->d_name);
-    if (stat.parent == getpid()) found[static_cast<pid_t>(*pid)] = stat;
+    found[static_cast<pid_t>(*pid)] = statOf(entry->d_name);
   }
   closedir(directory);
   return found;
 }
 
+std::map<pid_t, ProcessStat> children() {
+  std::map<pid_t, ProcessStat> found = processes();
+  std::erase_if(found, [](const auto &process) { return process.second.parent != getpid(); });
+  return found;
+}
+
+bool hasChild(pid_t pid) {
+  const std::string number = std::to_string(pid);
+  const std::string list = "/proc/" + number + "/task/" + number + "/children";
+  if (access(list.c_str(), F_OK) == 0) return !textOf(list).empty();
+  const std::map<pid_t, ProcessStat> all = processes();
+  return std::any_of(all.begin(), all.end(),
+                     [&](const auto &process) { return process.second.parent == pid; });
+}
+
 bool isOfRoot(pid_t pid) {
-  std::ifstream status("/proc/" + std::to_string(pid) + "/status");
+  std::istringstream status(textOf("/proc/" + std::to_string(pid) + "/status"));
   const std::string label = "Uid:";
   std::string line;  // the first one has a name that the process chooses
   while (std::getline(status, line) && !line.starts_with(label)) {

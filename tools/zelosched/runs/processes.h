@@ -11,7 +11,13 @@ struct ProcessStat {
   unsigned long long started = 0;
 };
 
+ProcessStat statOf(pid_t pid);
+std::map<pid_t, ProcessStat> processes();
+
+// Ours.
 std::map<pid_t, ProcessStat> children();
+
+bool hasChild(pid_t pid);
 
 // What a command leaves behind becomes ours, and may be older than the next run's process. But it
 // cannot have root's saved user id, which a run's process keeps as its way back.

@@ -44,6 +44,33 @@ std::string resultInWords(int statusCode, const std::string &comment) {
   }
 }
 
+std::string resultInWords(const RunRecord &run) {
+  if (run.state == RunState::kWaiting) return "waits for its turn";
+  if (run.state == RunState::kRunning) return "running";
+  switch (run.outcome) {
+    case Outcome::kFinished:
+      return "finished";
+    case Outcome::kFailed:
+      return run.exitCode ? "failed with exit code " + std::to_string(*run.exitCode) : "failed";
+    case Outcome::kKilled:
+      return run.signal ? "killed by " + signalName(std::to_string(*run.signal)) : "killed";
+    case Outcome::kNotStarted:
+      return "could not start";
+    case Outcome::kTimeLimit:
+      return "ended by its time limit";
+    case Outcome::kGaveUp:
+      return "gave up waiting";
+    case Outcome::kCancelled:
+      return "cancelled while it waited";
+    case Outcome::kStopped:
+      return "stopped";
+    case Outcome::kNone:
+    case Outcome::kLost:
+      break;
+  }
+  return "was running but its process is gone";
+}
+
 bool isBadResult(int statusCode) {
   return statusCode != ZELO_SCHED_STATUS_FINISHED && statusCode != ZELO_SCHED_STATUS_RUNNING;
 }

@@ -10,13 +10,13 @@
 #include <cstdint>
 #include <cstring>
 
+#include "runs/kept_database.h"
 #include "terminal/failure.h"
 #include "terminal/text.h"
 
 namespace {
 
 constexpr char kDatabase[] = "/tmp/sched_status.sqlite";
-constexpr int kPatience = 10000;  // milliseconds, while runs record themselves
 constexpr int kAlive = 1;
 
 constexpr char kColumns[] =
@@ -59,11 +59,17 @@ bool isGone(const Run &run) {
          (!isProcess || QLIBCProcAlive(static_cast<pid_t>(run.pid)) != kAlive);
 }
 
+std::string runDatabaseName() {
+  struct stat info {};
+  if (lstat(kDatabase, &info) != 0) return "";
+  return bootId() + " " + std::to_string(info.st_dev) + ":" + std::to_string(info.st_ino);
+}
+
 bool mayReadRuns() {
   return access(kDatabase, R_OK | W_OK) == 0 || errno != EACCES;
 }
 
-RunDatabase::RunDatabase() {
+RunDatabase::RunDatabase(int patience) {
   struct stat info {};
   if (lstat(kDatabase, &info) != 0) {
     if (errno == ENOENT) return;
@@ -75,7 +81,7 @@ RunDatabase::RunDatabase() {
   forgetError();
   db_.reset(ZELOSchedDBInit());
   if (db_ == nullptr) throw failedTo(std::string("read ") + kDatabase);
-  sqlite3_busy_timeout(db_.get(), kPatience);
+  sqlite3_busy_timeout(db_.get(), patience);
 }
 
 std::vector<Run> RunDatabase::select(const char *rest, const std::vector<long> &values) const {
@@ -125,9 +131,29 @@ long RunDatabase::lastStatusId() const {
 }
 
 std::optional<Run> RunDatabase::runOfProcess(long pid, long statusId) const {
-  const std::vector<Run> found = select("WHERE pid = ? AND status_id > ?", {pid, statusId});
+  const std::vector<Run> found =
+      select("WHERE pid = ? AND status_id > ? ORDER BY status_id DESC", {pid, statusId});
   if (found.empty()) return std::nullopt;
   return found.front();
+}
+
+std::vector<Run> RunDatabase::after(long statusId) const {
+  return select("WHERE status_id > ? ORDER BY status_id", {statusId});
+}
+
+std::optional<Run> RunDatabase::runOfId(long statusId) const {
+  const std::vector<Run> found = select("WHERE status_id = ?", {statusId});
+  if (found.empty()) return std::nullopt;
+  return found.front();
+}
+
+std::optional<Run> RunDatabase::inTheWayOf(std::optional<long> taskId,
+                                           std::optional<std::string> app, long pid) const {
+  for (const Run &run : running()) {
+    const bool isInTheWay = (taskId && run.taskId == *taskId) || (app && run.app == *app);
+    if (isInTheWay && run.pid != pid) return run;
+  }
+  return std::nullopt;
 }
 
 void RunDatabase::Close::operator()(sqlite3 *db) const {

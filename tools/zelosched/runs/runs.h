@@ -1,4 +1,5 @@
-// The recorded runs. The status database is read only: SELECT, and never made by a look at it.
+// The runs that the library has recorded. The status database is read only: SELECT, and never made
+// by a look at it.
 #pragma once
 
 #include <map>
@@ -22,13 +23,19 @@ struct Run {
 // By its record it goes on, but its process does not.
 bool isGone(const Run &run);
 
+// Names the status database in use, which is gone with the boot at the latest. Empty when there is
+// none.
+std::string runDatabaseName();
+
 // This user has the rights to read the status database, or will have when it is there.
 bool mayReadRuns();
 
 class RunDatabase {
  public:
+  static constexpr int kUsualPatience = 10000;  // milliseconds, while runs record themselves
+
   // Null inside when there is no database yet, which therefore has no runs. Throws Failure.
-  RunDatabase();
+  explicit RunDatabase(int patience = kUsualPatience);
 
   // Newest first; of one task, or of all; at most `limit`, or all for a negative one.
   std::vector<Run> newest(std::optional<long> taskId, long limit) const;
@@ -36,7 +43,14 @@ class RunDatabase {
   std::map<long, Run> latestOfEach() const;
   std::vector<Run> running() const;
   long lastStatusId() const;
-  // The run of a process that was recorded after `statusId`.
+  // Recorded after that one, in the order of their ids.
+  std::vector<Run> after(long statusId) const;
+  std::optional<Run> runOfId(long statusId) const;
+  // A live run that keeps one of this task, and of this application, waiting; either may be asked
+  // for. Not that of this process.
+  std::optional<Run> inTheWayOf(std::optional<long> taskId, std::optional<std::string> app,
+                                long pid) const;
+  // The run of a process that was recorded after `statusId`; the last one.
   std::optional<Run> runOfProcess(long pid, long statusId) const;
 
  private:

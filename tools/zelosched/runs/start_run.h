@@ -1,13 +1,42 @@
-// Starting a run of a task now, whatever its times say. Each throws Failure.
+// Starting a run of a task now, whatever its times say: as cron would, by the same program.
 #pragma once
 
 #include <zelosched.h>
 
-// A task that is disabled by now is passed over without a word, or not.
-enum class Disabled { kRunsToo = 0, kIsSkipped = 1 };  // as ZELOSchedTaskRun takes it
+#include <chrono>
+#include <optional>
+#include <string>
 
-// The run prints to this descriptor, and gets none of ours.
-void startRun(const ZELO_SCHED_TASK &task, int output, Disabled disabled = Disabled::kRunsToo);
+#include "runs/run_events.h"
 
-// What it prints leads nowhere: a run that nobody waits for must not hold the caller's pipe open.
-void startRunUnseen(const ZELO_SCHED_TASK &task, Disabled disabled = Disabled::kRunsToo);
+struct RunRequest {
+  Trigger trigger = Trigger::kManual;
+  std::optional<long> due;
+  bool isDisabledSkipped = false;  // a task that is disabled by now is passed over without a word
+  bool wantsOutput = false;
+};
+
+// A run that was started, and its keeper, which goes on whether or not anybody listens.
+class StartedRun {
+ public:
+  // Throws Failure.
+  StartedRun(const ZELO_SCHED_TASK &task, const RunRequest &request);
+  ~StartedRun();
+  StartedRun(const StartedRun &) = delete;
+  StartedRun &operator=(const StartedRun &) = delete;
+
+  // Waits so long for something new, and takes it. False when nothing will come any more, or a
+  // signal came.
+  bool listen(std::chrono::milliseconds time);
+  const RunEvents &events() const { return events_; }
+  // No more will be told: at the end, or as the keeper was killed.
+  bool isSilent() const { return telling_ < 0; }
+  // Where what the run prints can be read, to its end; -1 when nobody wanted it.
+  int output() const { return output_; }
+
+ private:
+  int telling_ = -1;
+  int output_ = -1;
+  std::string line_;  // whose end is still to come
+  RunEvents events_;
+};

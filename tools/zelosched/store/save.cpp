@@ -4,6 +4,7 @@
 
 #include "check/crontab_check.h"
 #include "check/task_check.h"
+#include "runs/task_notes.h"
 #include "sched_cron_room.h"
 #include "store/power_room.h"
 #include "store/store_copy.h"
@@ -99,6 +100,7 @@ void createTask(ZELO_SCHED_TASK *task) {
     throwFailedChange(failedTo("save the task"),
                       [&] { return isPower(*task) && isStored(powerId(*task)); });
   }
+  noteCreated(*task);
   requireCrontabInStep();
 }
 
@@ -115,6 +117,7 @@ void editTask(ZELO_SCHED_TASK *task) {
                       [&] { return isPower(*task) && isStored(powerId(*task)); });
   }
   if (isPower(*task)) task->ID = powerId(*task);
+  noteEdited(*task);
   requireCrontabInStep();
 }
 
@@ -126,6 +129,7 @@ void removeTask(const ZELO_SCHED_TASK &task) {
     throwFailedChange(failedTo("remove " + titleOf(task)),
                       [&] { return isPower(task) && !isStored(task.ID); });
   }
+  noteRemoved(task);
   requireCrontabInStep();
 }
 

@@ -1,0 +1,708 @@
+#include "keeper.h"
+
+#include <fcntl.h>
+#include <malloc.h>
+#include <poll.h>
+#include <signal.h>
+#include <sys/ioctl.h>
+#include <sys/prctl.h>
+#include <sys/signalfd.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/wait.h>
+#include <syslog.h>
+#include <unistd.h>
+#include <zelocore.h>
+#include <zelosched.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <cmath>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <ctime>
+#include <fstream>
+
+#include "runs/history.h"
+#include "runs/notices.h"
+#include "runs/output_file.h"
+#include "runs/process_tree.h"
+#include "runs/processes.h"
+#include "runs/result_text.h"
+#include "runs/run_events.h"
+#include "runs/runs.h"
+#include "runs/settings.h"
+#include "runs/status_row.h"
+#include "runs/task_notes.h"
+#include "store/owner.h"
+#include "store/task_list.h"
+#include "terminal/failure.h"
+
+namespace {
+
+constexpr long kMinute = 60;  // seconds
+
+// The owner may open it for writing by the names of the standard streams.
+constexpr mode_t kPipeMode = 0622;
+constexpr size_t kMostAtOnce = size_t{64} << 10;  // what a pipe holds
+
+// Milliseconds between two looks at what others write.
+constexpr int kFirstLook = 5;
+constexpr int kLook = 200;
+constexpr double kWaitsAfter = 0.1;  // seconds after which a run without a command waits, perhaps
+constexpr double kTurnPause = 2;     // seconds between two looks at who is in its way
+constexpr int kStatusPatience = 50;  // milliseconds: the pipe must not fill up meanwhile
+constexpr int kLastPatience = 10000;
+constexpr std::chrono::milliseconds kHistoryPatience(50);
+constexpr double kSavePause = 0.2;    // seconds
+constexpr double kSaveAtEnd = 60;     // seconds in which the end of a run is to be written
+constexpr double kFirstWait = 3;      // seconds: nobody waits for a shorter time
+constexpr double kDrain = 60.0 * 60;  // seconds
+constexpr double kGrace = 10;         // seconds
+
+double seconds() {
+  timespec now{};
+  clock_gettime(CLOCK_BOOTTIME, &now);
+  constexpr double kNano = 1e-9;
+  return static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec) * kNano;
+}
+
+// ---- what the caller learns ---------------------------------------------------------------------
+
+struct Report {
+  int result;
+  int code;
+  int line;
+  char file[64];
+};
+
+Report reportOf(int result) {
+  Report report{};
+  report.result = result;
+  report.code = QLIBCErrGet();
+  report.line = QLIBCErrorGetLine();
+  std::snprintf(report.file, sizeof report.file, "%s", QLIBCErrorGetFile());
+  return report;
+}
+
+int startRun(const RunOrder &order) {
+  return ZELOSchedTaskRun(order.task, order.isAnyTime ? 0 : 1, order.isDisabledSkipped ? 1 : 0);
+}
+
+// ---- leaving the caller -------------------------------------------------------------------------
+
+void closeAllBut(std::vector<int> kept) {
+  std::sort(kept.begin(), kept.end());
+  unsigned first = STDERR_FILENO + 1;
+  for (const int descriptor : kept) {
+    if (descriptor < static_cast<int>(first)) continue;
+    const auto number = static_cast<unsigned>(descriptor);
+    if (number > first) close_range(first, number - 1, 0);
+    first = number + 1;
+  }
+  close_range(first, ~0U, 0);
+}
+
+void leaveSignals() {
+  struct sigaction action = {};
+  action.sa_handler = SIG_DFL;
+  for (int signal = 1; signal < NSIG; ++signal) sigaction(signal, &action, nullptr);
+  // Who told us to look after a run may be gone, and so may be who wants to see what it prints.
+  action.sa_handler = SIG_IGN;
+  for (const int signal : {SIGHUP, SIGINT, SIGQUIT, SIGPIPE, SIGTSTP, SIGTTOU}) {
+    sigaction(signal, &action, nullptr);
+  }
+  sigset_t none;
+  sigemptyset(&none);
+  sigprocmask(SIG_SETMASK, &none, nullptr);
+}
+
+void leadToNothing(std::initializer_list<int> streams) {
+  const int nothing = open("/dev/null", O_RDWR | O_CLOEXEC);
+  for (const int stream : streams) {
+    if (nothing >= 0) {
+      dup2(nothing, stream);
+    } else {
+      close(stream);
+    }
+  }
+  if (nothing > STDERR_FILENO) close(nothing);
+}
+
+void leaveCaller(const std::vector<int> &kept) {
+  setsid();
+  leaveSignals();
+  static_cast<void>(chdir("/") < 0);
+  leadToNothing({STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO});
+  closelog();
+  closeAllBut(kept);
+}
+
+// The end to read from. The other one becomes standard output and error, and is open for reading
+// too: as long as the run has it, nobody who writes is ended since nobody reads.
+int makePipe() {
+  int ends[2];
+  if (pipe2(ends, O_CLOEXEC) != 0) return -1;
+  fchmod(ends[1], kPipeMode);
+  const std::string name = "/proc/self/fd/" + std::to_string(ends[1]);
+  const int both = open(name.c_str(), O_RDWR | O_CLOEXEC);
+  const int lent = both >= 0 ? both : ends[1];
+  dup2(lent, STDOUT_FILENO);
+  dup2(lent, STDERR_FILENO);
+  if (both >= 0) close(both);
+  close(ends[1]);
+  return ends[0];
+}
+
+// ---- the run's process --------------------------------------------------------------------------
+
+std::vector<pid_t> ownChildren() {
+  std::vector<pid_t> found;
+  std::ifstream file("/proc/thread-self/children");
+  for (pid_t pid; file >> pid;) found.push_back(pid);
+  if (!found.empty()) return found;
+  for (const auto &[pid, stat] : children()) found.push_back(pid);
+  return found;
+}
+
+// What the command leaves behind becomes ours too, behind it. One that is about to end has no
+// program any more, and is not over yet.
+pid_t runsProcess() {
+  constexpr int kLooks = 1000;
+  constexpr useconds_t kPause = 1000;
+  for (int i = 0; i < kLooks; ++i) {
+    const std::vector<pid_t> all = ownChildren();
+    if (all.empty()) return 0;
+    for (const pid_t pid : all) {
+      if (isOver(pid) || (isOfRoot(pid) && isOfOurProgram(pid))) return pid;
+    }
+    usleep(kPause);
+  }
+  return 0;
+}
+
+void keepFromOutOfMemory() {
+  const int score = open("/proc/self/oom_score_adj", O_WRONLY | O_CLOEXEC);
+  if (score < 0) return;
+  constexpr char kScore[] = "-500";
+  static_cast<void>(write(score, kScore, sizeof kScore - 1) < 0);
+  close(score);
+}
+
+// ---- the keeper ---------------------------------------------------------------------------------
+
+class Keeper {
+ public:
+  explicit Keeper(const RunOrder &order) : order_(order) {}
+  // Starts the run, tells how that went, and keeps it.
+  void start(int report);
+  // Takes the place of one that was killed.
+  bool adopt(long run);
+
+ private:
+  void keep();
+  void learnOfTask();
+  void pump(int milliseconds);
+  size_t readOnce(size_t most);
+  void passRest();
+  void passOn(std::string_view bytes);
+  void tell(const std::string &line);
+  void reap();
+  void lookWhetherItRuns();
+  void lookForTurn();
+  void readStatus();
+  void measure();
+  bool save(bool isEnd);
+  void saveWhenDue();
+  void saveEnd();
+  void logEnd() const;
+  void tellPrograms();
+  void endWhatIsLeft();
+  void drain();
+
+  RunOrder order_;
+  Settings settings_;
+  KeptRun run_;
+  Task task_;
+  OutputFile output_;
+  int pipe_ = -1;
+  int signals_ = -1;
+  int processFile_ = -1;  // of one that is no child
+  double began_ = 0;
+  double ended_ = 0;
+  std::optional<double> started_;
+  bool isOver_ = false;
+  std::optional<int> waitStatus_;
+  bool hasWaited_ = false;
+  std::optional<long> toldOf_;
+  bool isDirty_ = true;
+  int pause_ = kFirstLook;
+  double nextTurnLook_ = 0;
+  double nextSave_ = 0;
+  bool isGivenUp_ = false;
+  bool isRecovered_ = false;
+  bool isSaved_ = false;
+  pid_t teller_ = 0;
+};
+
+void Keeper::start(int report) {
+  leaveCaller({report, order_.tellTo, order_.copyTo});
+  prctl(PR_SET_CHILD_SUBREAPER, 1);
+  openlog("zeloschedtask", LOG_PID, LOG_CRON);
+  forgetError();
+  pipe_ = makePipe();
+  began_ = seconds();
+  run_.queued = time(nullptr);
+  const int result = startRun(order_);
+  const Report told = reportOf(result);
+  leadToNothing({STDOUT_FILENO, STDERR_FILENO});
+  if (result < 0) {
+    static_cast<void>(write(report, &told, sizeof told) < 0);
+    return;
+  }
+  const pid_t process = runsProcess();
+  run_.process = processNamed(process);
+  static_cast<void>(write(report, &told, sizeof told) < 0);
+  close(report);
+  if (process == 0) return;  // nothing was due
+  sigset_t children;
+  sigemptyset(&children);
+  sigaddset(&children, SIGCHLD);
+  sigprocmask(SIG_BLOCK, &children, nullptr);
+  signals_ = signalfd(-1, &children, SFD_CLOEXEC | SFD_NONBLOCK);
+  keepFromOutOfMemory();
+  tell("process " + std::to_string(run_.process.pid) + " " + std::to_string(run_.process.born));
+  run_.task = order_.task;
+  run_.trigger = order_.trigger;
+  run_.due = order_.due;
+  if (!run_.due && run_.trigger == Trigger::kSchedule) run_.due = *run_.queued / kMinute * kMinute;
+  SettingsFaults faults;
+  settings_ = readSettings(&faults);
+  output_ = OutputFile::make(run_.process, settings_.outputFirst, settings_.outputLast);
+  reap();
+  learnOfTask();
+  for (const std::string &fault : faults) {
+    syslog(LOG_WARNING, "%s: the usual value holds", fault.c_str());
+  }
+  keep();
+}
+
+bool Keeper::adopt(long number) {
+  leaveCaller({});
+  openlog("zelosched", LOG_PID, LOG_CRON);
+  try {
+    const KeptDatabase kept(KeptDatabase::kChange);
+    Transaction transaction(kept);
+    RunFilter filter;
+    filter.run = number;
+    filter.underWay = true;
+    const std::vector<KeptRun> found = runsOf(kept, filter);
+    if (found.empty() || isAlive(found.front().keeper)) return false;
+    run_ = found.front();
+    processFile_ = static_cast<int>(syscall(SYS_pidfd_open, run_.process.pid, 0));
+    if (processFile_ < 0 || !isAlive(run_.process)) return false;
+    run_.keeper = processNamed(getpid());
+    saveRun(kept, &run_);
+    transaction.commit();
+  } catch (const Failure &failure) {
+    syslog(LOG_WARNING, "%s", failure.what());
+    return false;
+  }
+  order_.task = run_.task;
+  const std::string output = "/proc/" + std::to_string(run_.process.pid) + "/fd/1";
+  struct stat info {};
+  if (stat(output.c_str(), &info) == 0 && S_ISFIFO(info.st_mode)) {
+    pipe_ = open(output.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY);
+  }
+  SettingsFaults faults;
+  settings_ = readSettings(&faults);
+  output_ = OutputFile::open(run_.process);
+  if (!output_.isOpen()) {
+    output_ = OutputFile::make(run_.process, settings_.outputFirst, settings_.outputLast);
+  }
+  run_.outputBytes = output_.total();
+  began_ = seconds();
+  isDirty_ = false;
+  task_ = findTask(run_.task);
+  keep();
+  return true;
+}
+
+// It may have been removed since; then only its number is known.
+void Keeper::learnOfTask() {
+  run_.boot = bootId();
+  run_.keeper = processNamed(getpid());
+  try {
+    task_ = findTask(order_.task);
+  } catch (const Failure &) {
+    task_.reset();
+  }
+  if (!task_) return;
+  run_.taskName = task_->Name;
+  run_.app = task_->App;
+  run_.owner = userName(task_->Owner);
+}
+
+void Keeper::keep() {
+  while (!isOver_) {
+    if (run_.state == RunState::kWaiting) lookWhetherItRuns();
+    saveWhenDue();
+    malloc_trim(0);
+    const bool isSettled = run_.state != RunState::kWaiting && (!isDirty_ || isGivenUp_);
+    pump(isSettled ? -1 : pause_);
+    pause_ = std::min(2 * pause_, kLook);
+  }
+  ended_ = seconds();
+  run_.end = time(nullptr);
+  passRest();
+  readStatus();
+  saveEnd();
+  logEnd();
+  tell(endLine(run_));
+  if (order_.tellTo >= 0) close(order_.tellTo);
+  if (order_.copyTo >= 0) close(order_.copyTo);
+  order_.tellTo = order_.copyTo = -1;
+  tellPrograms();
+  output_.remove();
+  output_ = OutputFile();
+  task_.reset();
+  endWhatIsLeft();
+  drain();
+}
+
+// ---- what it prints
+
+void Keeper::passOn(std::string_view bytes) {
+  output_.append(bytes);
+  run_.outputBytes += static_cast<long>(bytes.size());
+  while (order_.copyTo >= 0 && !bytes.empty()) {
+    const ssize_t count = write(order_.copyTo, bytes.data(), bytes.size());
+    if (count >= 0) {
+      bytes.remove_prefix(static_cast<size_t>(count));
+    } else if (errno != EINTR) {  // nobody wants it any more
+      close(order_.copyTo);
+      order_.copyTo = -1;
+    }
+  }
+}
+
+size_t Keeper::readOnce(size_t most) {
+  static char buffer[kMostAtOnce];
+  ssize_t count;
+  do {
+    count = read(pipe_, buffer, std::min(most, sizeof buffer));
+  } while (count < 0 && errno == EINTR);
+  if (count > 0) {
+    if (!isSaved_) passOn(std::string_view(buffer, static_cast<size_t>(count)));
+    return static_cast<size_t>(count);
+  }
+  close(pipe_);
+  pipe_ = -1;
+  return 0;
+}
+
+// What there is now: who goes on writing has been left behind by the run.
+void Keeper::passRest() {
+  int left = 0;
+  if (pipe_ < 0 || ioctl(pipe_, FIONREAD, &left) != 0) return;
+  while (left > 0) {
+    const size_t count = readOnce(static_cast<size_t>(left));
+    if (count == 0) return;
+    left -= static_cast<int>(count);
+  }
+}
+
+// Waits so long for something to happen, and takes it.
+void Keeper::pump(int milliseconds) {
+  pollfd wanted[] = {
+      {pipe_, POLLIN, 0}, {signals_, POLLIN, 0}, {isOver_ ? -1 : processFile_, POLLIN, 0}};
+  if (poll(wanted, std::size(wanted), milliseconds) <= 0) return;
+  if (wanted[1].revents != 0) reap();
+  if (wanted[2].revents != 0) isOver_ = true;
+  if (wanted[0].revents != 0) readOnce(kMostAtOnce);
+}
+
+void Keeper::tell(const std::string &line) {
+  if (order_.tellTo < 0) return;
+  const std::string text = line + "\n";
+  static_cast<void>(write(order_.tellTo, text.data(), text.size()) < 0);
+}
+
+// ---- how it goes
+
+void Keeper::reap() {
+  signalfd_siginfo info{};
+  while (read(signals_, &info, sizeof info) > 0) {
+  }
+  int status = 0;
+  for (pid_t pid; (pid = waitpid(-1, &status, WNOHANG)) > 0;) {
+    if (pid == run_.process.pid && !isOver_) {
+      isOver_ = true;
+      waitStatus_ = status;
+    }
+  }
+}
+
+// The command has begun when the run's process has a child. Its row would say so too; but whoever
+// reads the status database just when the run writes it delays the run by up to a second.
+void Keeper::lookWhetherItRuns() {
+  if (!hasChild(static_cast<pid_t>(run_.process.pid))) {
+    if (seconds() - began_ > kWaitsAfter && seconds() >= nextTurnLook_) lookForTurn();
+    return;
+  }
+  if (processFile_ < 0) started_ = hasWaited_ ? seconds() : began_;
+  run_.state = RunState::kRunning;
+  run_.start = time(nullptr);  // until its row is read
+  isDirty_ = true;
+  tell("running");
+}
+
+void Keeper::lookForTurn() {
+  nextTurnLook_ = seconds() + kTurnPause;
+  if (!task_) return;
+  const auto taskId =
+      task_->CanRunTaskSameTime == 0 ? std::optional<long>(run_.task) : std::nullopt;
+  const auto app =
+      task_->CanRunAppSameTime == 0 ? std::optional<std::string>(task_->App) : std::nullopt;
+  std::optional<Run> other;
+  try {
+    other = RunDatabase(kStatusPatience).inTheWayOf(taskId, app, run_.process.pid);
+  } catch (const Failure &) {  // it is for the eye alone
+  }
+  if (!other && seconds() - began_ < kFirstWait) return;
+  hasWaited_ = true;
+  const long whose = other ? other->taskId : 0;
+  if (toldOf_ == whose) return;
+  toldOf_ = whose;
+  tell("waiting " + std::to_string(whose));
+}
+
+// The row of a process that had the same number before is in the history, as another keeper's.
+bool isOfAnother(const Run &row, const KeptRun &run) {
+  try {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    if (!kept.isThere()) return false;
+    Query query(kept,
+                "SELECT 1 FROM run WHERE start = ? AND status_id = ? AND pid = ? AND"
+                " task = ? AND app = ? AND run <> ? AND keeper <> 0");
+    query.with(row.start).with(row.statusId).with(row.pid).with(row.taskId).with(row.app);
+    return query.with(run.run).next();
+  } catch (const Failure &) {
+    return false;
+  }
+}
+
+// When the run's process is over: its row, and how it ended itself, tell what happened.
+void Keeper::readStatus() {
+  const bool isKilled = waitStatus_ && WIFSIGNALED(*waitStatus_);
+  const bool isSeen = waitStatus_.has_value();
+  const bool hasBegun = run_.state == RunState::kRunning;
+  std::optional<Run> row;
+  try {
+    row = RunDatabase(kLastPatience).runOfProcess(run_.process.pid, 0);
+  } catch (const Failure &failure) {
+    syslog(LOG_WARNING, "%s", failure.what());
+  }
+  if (row && (row->taskId != run_.task || isOfAnother(*row, run_))) row.reset();
+  if (row) {
+    takeStatus(*row, &run_);
+    // It leaves its row as it was when it cannot become the owner, for one.
+    if (run_.outcome == Outcome::kNone || run_.outcome == Outcome::kLost) {
+      run_.outcome = isKilled || !isSeen ? Outcome::kLost : Outcome::kNotStarted;
+    }
+  } else if (hasBegun) {
+    run_.outcome = Outcome::kLost;
+  } else {
+    if (!isKilled && !hasWaited_) lookForTurn();
+    run_.outcome = isKilled     ? Outcome::kCancelled
+                   : hasWaited_ ? Outcome::kGaveUp
+                                : Outcome::kNotStarted;
+  }
+  run_.state = RunState::kEnded;
+  if (row || hasBegun) measure();
+}
+
+void Keeper::measure() {
+  constexpr double kMilli = 1000;
+  if (!started_ && !hasWaited_ && processFile_ < 0) started_ = began_;
+  if (started_) {
+    run_.duration = std::round((ended_ - *started_) * kMilli) / kMilli;
+  } else if (run_.start && *run_.end >= *run_.start) {
+    run_.duration = static_cast<double>(*run_.end - *run_.start);  // nobody saw it begin
+  }
+}
+
+// ---- what is written
+
+bool Keeper::save(bool isEnd) {
+  try {
+    const KeptDatabase kept(KeptDatabase::kChange, kHistoryPatience);
+    Transaction transaction(kept);
+    if (task_ && !run_.generation) run_.generation = generationOf(kept, *task_);
+    RunFilter filter;
+    filter.run = run_.run;
+    const std::vector<KeptRun> known =
+        run_.run != 0 ? runsOf(kept, filter) : std::vector<KeptRun>();
+    if (!known.empty()) run_.stopAsked = known.front().stopAsked;
+    KeptRun written = run_;
+    if (isEnd) {
+      judgeEnd(task_ ? task_->Command : "", run_.stopAsked.has_value(), &written);
+      written.isTold = true;
+    }
+    saveRun(kept, &written);
+    if (isEnd) {
+      saveOutput(kept, written, output_.contents(), settings_);
+      isRecovered_ = written.outcome == Outcome::kFinished && wasBadBefore(kept, written);
+    }
+    transaction.commit();
+    if (run_.run != written.run) tell("run " + std::to_string(written.run));
+    run_ = written;
+    isDirty_ = false;
+    return true;
+  } catch (const DatabaseBusy &failure) {
+    nextSave_ = seconds() + kSavePause;
+    if (isEnd && seconds() - ended_ > kSaveAtEnd) {
+      syslog(LOG_WARNING, "%s: the run of task %ld is not recorded", failure.what(), run_.task);
+      return true;
+    }
+    return false;
+  } catch (const Failure &failure) {
+    if (!isGivenUp_ || isEnd) {
+      syslog(LOG_WARNING, "%s: the run of task %ld is not recorded%s", failure.what(), run_.task,
+             isEnd ? "" : " yet");
+    }
+    isGivenUp_ = true;
+    if (isEnd) judgeEnd(task_ ? task_->Command : "", run_.stopAsked.has_value(), &run_);
+    return true;
+  }
+}
+
+void Keeper::saveWhenDue() {
+  if (isDirty_ && !isGivenUp_ && seconds() >= nextSave_) save(false);
+}
+
+void Keeper::saveEnd() {
+  while (!save(true)) pump(kLook);
+  isSaved_ = true;
+}
+
+void Keeper::logEnd() const {
+  const std::string title = task_ ? titleOf(*task_) : "task " + std::to_string(run_.task);
+  char duration[64] = "";
+  if (run_.duration) std::snprintf(duration, sizeof duration, " after %.1f s", *run_.duration);
+  openlog("zelosched", LOG_PID, LOG_CRON);
+  syslog(isBad(run_) ? LOG_WARNING : LOG_INFO, "%s of %s: %s%s", title.c_str(),
+         run_.owner.empty() ? "an unknown user" : run_.owner.c_str(), resultInWords(run_).c_str(),
+         duration);
+}
+
+// In a process of its own: the pipe must be read meanwhile.
+void Keeper::tellPrograms() {
+  if (!isAnybodyToBeTold()) return;
+  const Output output = output_.contents();
+  teller_ = fork();
+  if (teller_ != 0) return;
+  if (pipe_ >= 0) close(pipe_);
+  sigset_t none;
+  sigemptyset(&none);
+  sigprocmask(SIG_SETMASK, &none, nullptr);
+  tellOfEnd(run_, output, isRecovered_);
+  _exit(EXIT_SUCCESS);
+}
+
+// ---- afterwards
+
+// Past its time limit nothing of a run goes on.
+void Keeper::endWhatIsLeft() {
+  if (run_.outcome != Outcome::kTimeLimit || processFile_ >= 0) return;
+  ProcessTree left(getpid(), {teller_});
+  left.signal(SIGTERM);
+  const double until = seconds() + kGrace;
+  while (left.look() > 0 && seconds() < until) pump(kLook);
+  left.killAll();
+}
+
+void Keeper::drain() {
+  const double until = seconds() + kDrain;
+  malloc_trim(0);
+  while (pipe_ >= 0 && seconds() < until) {
+    pump(static_cast<int>((until - seconds()) * 1000) + 1);
+  }
+}
+
+// ---- the caller's side --------------------------------------------------------------------------
+
+bool readWhole(int file, Report *report) {
+  size_t got = 0;
+  while (got < sizeof *report) {
+    const ssize_t count = read(file, reinterpret_cast<char *>(report) + got, sizeof *report - got);
+    if (count < 0 && errno == EINTR) continue;
+    if (count <= 0) return false;
+    got += static_cast<size_t>(count);
+  }
+  return true;
+}
+
+// Of a keeper that was killed before it could tell: as its parent, and the one that takes in
+// orphans, we have its run now, when there is one. That begins a session of its own at once.
+bool hasRunBegun(pid_t keeper) {
+  constexpr int kLooks = 1000;
+  constexpr useconds_t kPause = 1000;
+  for (int i = 0; i < kLooks; ++i) {
+    siginfo_t info = {};
+    if (waitid(P_ALL, 0, &info, WEXITED | WNOHANG | WNOWAIT) != 0) return false;  // no child
+    for (const pid_t pid : ownChildren()) {
+      if (pid != keeper && getsid(pid) == pid) return true;
+    }
+    if (info.si_pid != 0) {
+      waitpid(info.si_pid, nullptr, 0);
+    } else {
+      usleep(kPause);
+    }
+  }
+  return true;  // something goes on
+}
+
+int passReportOn(const Report &report) {
+  static char file[sizeof report.file];
+  std::memcpy(file, report.file, sizeof file);
+  QLIBCErrSetEx(report.code, file, report.line);
+  return report.result;
+}
+
+}  // namespace
+
+int runWithKeeper(const RunOrder &order) {
+  int ends[2];
+  if (pipe2(ends, O_CLOEXEC) != 0) return startRun(order);
+  prctl(PR_SET_CHILD_SUBREAPER, 1);
+  const pid_t keeper = fork();
+  if (keeper == 0) {
+    try {
+      Keeper(order).start(ends[1]);
+    } catch (const std::exception &error) {
+      syslog(LOG_WARNING, "%s", error.what());
+    }
+    _exit(EXIT_SUCCESS);
+  }
+  close(ends[1]);
+  Report report{};
+  const bool isTold = keeper > 0 && readWhole(ends[0], &report);
+  close(ends[0]);
+  if (isTold) return passReportOn(report);
+  if (keeper > 0 && hasRunBegun(keeper)) return 0;
+  return startRun(order);
+}
+
+int keepOn(long run) {
+  const pid_t keeper = fork();
+  if (keeper < 0) return EXIT_FAILURE;
+  if (keeper > 0) return EXIT_SUCCESS;
+  try {
+    Keeper(RunOrder{}).adopt(run);
+  } catch (const std::exception &error) {
+    syslog(LOG_WARNING, "%s", error.what());
+  }
+  _exit(EXIT_SUCCESS);
+}

@@ -1,0 +1,44 @@
+// zelosched stop
+#include <unistd.h>
+
+#include <cstdio>
+
+#include "commands/command.h"
+#include "commands/for_each_id.h"
+#include "commands/options.h"
+#include "commands/stop_task.h"
+#include "terminal/failure.h"
+
+namespace {
+
+constexpr Option kOptions[] = {{"grace", Option::kValue}};
+constexpr long kMostGrace = 24L * 60 * 60;  // seconds
+
+int runStop(int argc, char **argv) {
+  const Arguments arguments(argc, argv, kOptions);
+  arguments.requireNoCommand();
+  const std::vector<long> ids = parseIds(arguments.operands());
+  const std::chrono::seconds grace(
+      arguments.number("grace", 0, kMostGrace).value_or(kUsualGrace.count()));
+  if (geteuid() != 0) throw Failure("stopping runs takes root's rights");
+  return forEachId(ids, [&](long id) {
+    const Task task = findTask(id);
+    const std::string title = task ? titleOf(*task) : "task " + std::to_string(id);
+    if (stopTask(id, title, grace) > 0) return;
+    if (!task) throw Failure("there is no task " + std::to_string(id) + ", and no run of it");
+    throw Failure(title + " is not running");
+  });
+}
+
+}  // namespace
+
+const Command kStopCommand = {
+    "stop", "ID... [--grace SECONDS]", "end the runs of tasks that go on or wait",
+    "Ends the runs of the tasks that are under way: one that waits for its turn does not\n"
+    "start; of one that goes on, every process gets SIGTERM, also those that its command\n"
+    "has put into the background or into a session of their own, and what is left after 10\n"
+    "seconds gets SIGKILL. The history says that they were stopped. Of a run that another\n"
+    "program has started, processes that have left their parents are not found.\n"
+    "\n"
+    "  --grace SECONDS                how long a run has to end by itself; 10\n",
+    runStop};

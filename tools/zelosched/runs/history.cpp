@@ -1,0 +1,271 @@
+#include "runs/history.h"
+
+#include <sys/statvfs.h>
+
+#include <algorithm>
+#include <ctime>
+
+#include "runs/processes.h"
+
+namespace {
+
+constexpr char kDirectory[] = "/usr/zelo/var";
+constexpr long kDay = 24L * 60 * 60;  // seconds
+
+#define COLUMNS                                                                          \
+  "run, task, generation, task_name, app, owner, started_by, due, queued, start, ended," \
+  " duration, state, outcome, exit_code, signal, output_bytes, boot, status_id, pid,"    \
+  " pid_born, keeper, keeper_born, stop_asked, told"
+
+constexpr char kInsert[] =
+    "INSERT INTO run(task, generation, task_name, app, owner, started_by, due, queued, start,"
+    " ended, duration, state, outcome, exit_code, signal, output_bytes, boot, status_id, pid,"
+    " pid_born, keeper, keeper_born, told, moment)"
+    " VALUES(?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?)";
+// When it was asked to stop is never taken back.
+constexpr char kUpdate[] =
+    "UPDATE run SET task = ?, generation = ?, task_name = ?, app = ?, owner = ?, started_by = ?,"
+    " due = ?, queued = ?, start = ?, ended = ?, duration = ?, state = ?, outcome = ?,"
+    " exit_code = ?, signal = ?, output_bytes = ?, boot = ?, status_id = ?, pid = ?,"
+    " pid_born = ?, keeper = ?, keeper_born = ?, told = ?, moment = ? WHERE run = ?";
+
+// The sweep's row of the same run.
+constexpr char kGiveWay[] =
+    "DELETE FROM run WHERE start = ? AND status_id = ? AND pid = ? AND task = ? AND app = ?"
+    " AND run <> ?";
+
+template <class Enum>
+Enum enumOf(long number, Enum last) {
+  return number < 0 || number > static_cast<long>(last) ? last : static_cast<Enum>(number);
+}
+
+std::optional<int> smallNumber(const Query &query, int column) {
+  const std::optional<long> number = query.optionalNumber(column);
+  return number ? std::optional<int>(static_cast<int>(*number)) : std::nullopt;
+}
+
+KeptRun runOf(const Query &query) {
+  KeptRun run;
+  int column = 0;
+  run.run = query.number(column++);
+  run.task = query.number(column++);
+  run.generation = query.optionalNumber(column++);
+  run.taskName = query.text(column++);
+  run.app = query.text(column++);
+  run.owner = query.text(column++);
+  run.trigger = enumOf(query.number(column++), Trigger::kOther);
+  run.due = query.optionalNumber(column++);
+  run.queued = query.optionalNumber(column++);
+  run.start = query.optionalNumber(column++);
+  run.end = query.optionalNumber(column++);
+  run.duration = query.optionalReal(column++);
+  run.state = enumOf(query.number(column++), RunState::kEnded);
+  run.outcome = enumOf(query.number(column++), Outcome::kLost);
+  run.exitCode = smallNumber(query, column++);
+  run.signal = smallNumber(query, column++);
+  run.outputBytes = query.number(column++);
+  run.boot = query.text(column++);
+  run.statusId = query.optionalNumber(column++);
+  run.process.pid = query.number(column++);
+  run.process.born = query.number(column++);
+  run.keeper.pid = query.number(column++);
+  run.keeper.born = query.number(column++);
+  run.stopAsked = query.optionalNumber(column++);
+  run.isTold = query.number(column) != 0;
+  return run;
+}
+
+std::optional<long> asLong(std::optional<int> number) {
+  return number ? std::optional<long>(*number) : std::nullopt;
+}
+
+void bind(Query *query, const KeptRun &run) {
+  query->with(run.task).with(run.generation).with(run.taskName).with(run.app).with(run.owner);
+  query->with(static_cast<long>(run.trigger)).with(run.due).with(run.queued).with(run.start);
+  query->with(run.end).with(run.duration).with(static_cast<long>(run.state));
+  query->with(static_cast<long>(run.outcome)).with(asLong(run.exitCode)).with(asLong(run.signal));
+  query->with(run.outputBytes).with(run.boot).with(run.statusId).with(run.process.pid);
+  query->with(run.process.born).with(run.keeper.pid).with(run.keeper.born);
+  query->with(run.isTold ? 1L : 0L);
+  const std::optional<long> known = run.start ? run.start : run.queued ? run.queued : run.end;
+  query->with(known ? *known : static_cast<long>(time(nullptr)));
+}
+
+std::optional<long> generationOf(const KeptDatabase &kept, long task) {
+  Query query(kept, "SELECT generation FROM task WHERE task = ? AND removed IS NULL");
+  query.with(task);
+  return query.next() ? std::optional<long>(query.number(0)) : std::nullopt;
+}
+
+// Of a task that is there, its own; of one that is not, all that had the id.
+std::string conditionOf(const KeptDatabase &kept, const RunFilter &filter,
+                        std::vector<long> *values) {
+  std::string condition = " WHERE 1";
+  const auto add = [&](const char *text, long value) {
+    condition += text;
+    values->push_back(value);
+  };
+  if (filter.task) {
+    const std::optional<long> generation = generationOf(kept, *filter.task);
+    if (generation) {
+      add(" AND generation = ?", *generation);
+    } else {
+      add(" AND task = ?", *filter.task);
+    }
+  }
+  if (filter.run) add(" AND run = ?", *filter.run);
+  if (filter.since) add(" AND moment >= ?", *filter.since);
+  if (filter.failed) {
+    condition += " AND state = 2 AND outcome <> ";
+    condition += std::to_string(static_cast<int>(Outcome::kFinished));
+  }
+  if (filter.underWay) condition += " AND state < 2";
+  return condition;
+}
+
+bool isNearlyFull(const Settings &settings) {
+  constexpr unsigned long kAll = 100;
+  struct statvfs info {};
+  if (statvfs(kDirectory, &info) != 0) return true;
+  return info.f_bavail * kAll <
+         info.f_blocks * static_cast<unsigned long>(settings.outputFreePercent);
+}
+
+// The oldest go first.
+void dropOutputs(const KeptDatabase &kept, long task, const Settings &settings) {
+  Query(kept,
+        "DELETE FROM output WHERE task = ?1 AND run <="
+        " (SELECT run FROM output WHERE task = ?1 ORDER BY run DESC LIMIT 1 OFFSET ?2)")
+      .with(task)
+      .with(settings.outputRuns)
+      .run();
+  Query sum(kept, "SELECT total(size) FROM output");
+  Query oldest(kept, "SELECT run, size FROM output ORDER BY run LIMIT 1");
+  Query drop(kept, "DELETE FROM output WHERE run = ?");
+  sum.next();
+  for (long left = sum.number(0); left > settings.outputTotal && oldest.next();) {
+    const long run = oldest.number(0);
+    left -= oldest.number(1);
+    while (oldest.next()) {
+    }
+    drop.with(run).run();
+  }
+}
+
+}  // namespace
+
+ProcessName processNamed(long pid) {
+  return {pid, static_cast<long>(statOf(static_cast<pid_t>(pid)).started)};
+}
+
+bool isAlive(const ProcessName &process) {
+  if (process.pid <= 0 || process.born == 0) return false;
+  const ProcessStat stat = statOf(static_cast<pid_t>(process.pid));
+  return stat.started == static_cast<unsigned long long>(process.born) && stat.state != 'Z' &&
+         stat.state != 'X';
+}
+
+bool isBad(const RunRecord &run) {
+  return run.state == RunState::kEnded && run.outcome != Outcome::kFinished;
+}
+
+std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter) {
+  std::vector<KeptRun> runs;
+  if (!kept.isThere()) return runs;
+  std::vector<long> values;
+  const std::string sql = "SELECT " COLUMNS " FROM run" + conditionOf(kept, filter, &values) +
+                          " ORDER BY moment DESC, run DESC LIMIT ?";
+  Query query(kept, sql.c_str());
+  for (const long value : values) query.with(value);
+  query.with(filter.limit);
+  while (query.next()) runs.push_back(runOf(query));
+  return runs;
+}
+
+std::vector<KeptRun> lastRuns(const KeptDatabase &kept) {
+  std::vector<KeptRun> runs;
+  if (!kept.isThere()) return runs;
+  Query query(kept, "SELECT " COLUMNS
+                    " FROM run WHERE run IN (SELECT (SELECT run FROM run WHERE"
+                    " run.generation = task.generation ORDER BY moment DESC, run DESC LIMIT 1)"
+                    " FROM task WHERE removed IS NULL) ORDER BY task");
+  while (query.next()) runs.push_back(runOf(query));
+  return runs;
+}
+
+std::vector<KeptRun> keptRuns(const RunFilter &filter) {
+  return runsOf(KeptDatabase(KeptDatabase::kRead), filter);
+}
+
+void saveRun(const KeptDatabase &kept, KeptRun *run) {
+  if (run->start && run->statusId) {
+    Query giveWay(kept, kGiveWay);
+    giveWay.with(*run->start).with(*run->statusId).with(run->process.pid).with(run->task);
+    giveWay.with(run->app).with(run->run).run();
+  }
+  if (!run->generation) run->generation = generationOf(kept, run->task);
+  if (run->run != 0) {
+    Query update(kept, kUpdate);
+    bind(&update, *run);
+    if (update.with(run->run).run() > 0) return;
+    run->run = 0;  // somebody has taken the database away meanwhile
+  }
+  Query insert(kept, kInsert);
+  bind(&insert, *run);
+  insert.run();
+  run->run = insert.lastKey();
+}
+
+void saveOutput(const KeptDatabase &kept, const KeptRun &run, const Output &output,
+                const Settings &settings) {
+  if (isNearlyFull(settings)) return;
+  const auto size = static_cast<long>(output.head.size() + output.tail.size());
+  if (size == 0 || settings.outputRuns == 0) return;
+  Query insert(kept,
+               "INSERT OR REPLACE INTO output(run, task, size, left_out, head, tail)"
+               " VALUES(?, ?, ?, ?, ?, ?)");
+  insert.with(run.run).with(run.task).with(size).with(output.leftOut);
+  insert.withBytes(output.head).withBytes(output.tail).run();
+  dropOutputs(kept, run.task, settings);
+}
+
+std::optional<Output> outputOf(const KeptDatabase &kept, long run) {
+  if (!kept.isThere()) return std::nullopt;
+  Query query(kept, "SELECT head, tail, left_out FROM output WHERE run = ?");
+  query.with(run);
+  if (!query.next()) return std::nullopt;
+  return Output{query.text(0), query.text(1), query.number(2)};
+}
+
+// Whatever the clock says, of each task the newest stay, and never more than the total.
+void dropOldRuns(const KeptDatabase &kept, const Settings &settings) {
+  Query(kept,
+        "DELETE FROM run WHERE state = 2 AND run IN (SELECT run FROM (SELECT run, moment,"
+        " row_number() OVER (PARTITION BY task ORDER BY moment DESC, run DESC) AS place FROM run)"
+        " WHERE place > ? AND moment < ?)")
+      .with(settings.runsOfTask)
+      .with(static_cast<long>(time(nullptr)) - settings.runsDays * kDay)
+      .run();
+  Query(kept,
+        "DELETE FROM run WHERE state = 2 AND (moment, run) <= (SELECT moment, run FROM run"
+        " ORDER BY moment DESC, run DESC LIMIT 1 OFFSET ?)")
+      .with(settings.runsTotal)
+      .run();
+}
+
+bool noteTold(const KeptDatabase &kept, std::string_view kind, long generation, long moment) {
+  Query note(kept,
+             "INSERT OR IGNORE INTO notice(kind, generation, moment, told)"
+             " VALUES(?, ?, ?, ?)");
+  note.with(std::string(kind)).with(generation).with(moment);
+  return note.with(static_cast<long>(time(nullptr))).run() > 0;
+}
+
+bool wasBadBefore(const KeptDatabase &kept, const KeptRun &run) {
+  if (!run.generation) return false;
+  Query query(kept,
+              "SELECT outcome FROM run WHERE generation = ? AND run < ? AND state = 2"
+              " ORDER BY run DESC LIMIT 1");
+  query.with(*run.generation).with(run.run);
+  return query.next() && query.number(0) != static_cast<long>(Outcome::kFinished);
+}

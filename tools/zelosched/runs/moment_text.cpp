@@ -1,0 +1,85 @@
+#include "runs/moment_text.h"
+
+#include <cstdio>
+#include <ctime>
+
+#include "terminal/number.h"
+
+namespace {
+
+constexpr long kMinute = 60;
+constexpr long kHour = 60 * kMinute;
+constexpr long kDay = 24 * kHour;
+
+std::optional<long> ago(const std::string &text, long now) {
+  if (text.size() < 2) return std::nullopt;
+  const std::optional<long> count = parseNumber(text.substr(0, text.size() - 1));
+  constexpr long kMostCount = 10000000;
+  if (!count || *count < 0 || *count > kMostCount) return std::nullopt;
+  switch (text.back()) {
+    case 's':
+      return now - *count;
+    case 'm':
+      return now - *count * kMinute;
+    case 'h':
+      return now - *count * kHour;
+    case 'd':
+      return now - *count * kDay;
+    default:
+      return std::nullopt;
+  }
+}
+
+std::optional<long> byFormat(const std::string &text, const char *format, tm fields) {
+  const char *end = strptime(text.c_str(), format, &fields);
+  if (end == nullptr || *end != '\0') return std::nullopt;
+  fields.tm_isdst = -1;
+  return mktime(&fields);
+}
+
+std::optional<long> withOffset(const std::string &text) {
+  for (const char *format : {"%Y-%m-%dT%H:%M:%S%z", "%Y-%m-%dT%H:%M%z"}) {
+    tm fields{};
+    const char *end = strptime(text.c_str(), format, &fields);
+    if (end == nullptr || *end != '\0') continue;
+    const long offset = fields.tm_gmtoff;
+    return timegm(&fields) - offset;
+  }
+  return std::nullopt;
+}
+
+}  // namespace
+
+std::string momentText(long moment) {
+  const time_t seconds = moment;
+  tm fields{};
+  char text[64];
+  if (localtime_r(&seconds, &fields) == nullptr) return std::to_string(moment);
+  const long minutes = fields.tm_gmtoff / kMinute;
+  const long size = minutes < 0 ? -minutes : minutes;
+  std::snprintf(text, sizeof text, "%04d-%02d-%02dT%02d:%02d:%02d%c%02ld:%02ld",
+                fields.tm_year + 1900, fields.tm_mon + 1, fields.tm_mday, fields.tm_hour,
+                fields.tm_min, fields.tm_sec, minutes < 0 ? '-' : '+', size / kMinute,
+                size % kMinute);
+  return text;
+}
+
+std::optional<long> parseMoment(std::string_view given, long now) {
+  const std::string text(given);
+  if (const std::optional<long> moment = ago(text, now)) return moment;
+  if (const std::optional<long> moment = withOffset(text)) return moment;
+  for (const char *format :
+       {"%Y-%m-%d", "%Y-%m-%d %H:%M", "%Y-%m-%d %H:%M:%S", "%Y-%m-%dT%H:%M", "%Y-%m-%dT%H:%M:%S"}) {
+    if (const std::optional<long> moment = byFormat(text, format, tm{})) return moment;
+  }
+  const time_t seconds = now;
+  tm today{};
+  localtime_r(&seconds, &today);
+  today.tm_sec = 0;
+  std::optional<long> moment = byFormat(text, "%H:%M", today);
+  if (moment && *moment > now) {
+    --today.tm_mday;
+    moment = byFormat(text, "%H:%M", today);
+  }
+  return moment;
+}

@@ -1,0 +1,14 @@
+// Telling those who want to know that a run has ended: the programs in /etc/zelosched/run-ended.d.
+#pragma once
+
+#include "runs/history.h"
+
+// There is somebody to tell.
+bool isAnybodyToBeTold();
+
+// Runs each program that is root's alone, in the order of their names, with the record as
+// environment variables ZELO_RUN_... and what was printed in a file whose name is one of them.
+// Waits for each, and ends it with all its process group after 30 seconds. What is wrong with one
+// is a line in the system log. `isRecovered`: it is the first that ended well after one that did
+// not.
+void tellOfEnd(const RunRecord &run, const Output &output, bool isRecovered);

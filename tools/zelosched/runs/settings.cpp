@@ -1,0 +1,115 @@
+#include "runs/settings.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <fstream>
+#include <optional>
+#include <string_view>
+
+#include "terminal/failure.h"
+#include "terminal/number.h"
+#include "terminal/text.h"
+
+namespace {
+
+constexpr char kPath[] = "/etc/zelosched.conf";
+constexpr size_t kLongestLine = 1000;
+
+enum class Kind { kNumber, kBytes, kPercent };
+
+struct Setting {
+  const char *name;
+  long Settings::*member;
+  Kind kind;
+  long least;
+  long most;
+};
+
+// A keeper holds what it keeps of a run in a file in memory, hence the bounds on the bytes of one.
+constexpr Setting kSettings[] = {
+    {"output-first", &Settings::outputFirst, Kind::kBytes, 0, 16L << 20},
+    {"output-last", &Settings::outputLast, Kind::kBytes, 0, 16L << 20},
+    {"output-runs", &Settings::outputRuns, Kind::kNumber, 0, 100000},
+    {"output-total", &Settings::outputTotal, Kind::kBytes, 0, 64L << 30},
+    {"output-free", &Settings::outputFreePercent, Kind::kPercent, 0, 100},
+    {"runs-of-task", &Settings::runsOfTask, Kind::kNumber, 1, 100000000},
+    {"runs-total", &Settings::runsTotal, Kind::kNumber, 1, 100000000},
+    {"runs-days", &Settings::runsDays, Kind::kNumber, 0, 36500},
+};
+
+std::string_view trimmed(std::string_view text) {
+  constexpr char kBlanks[] = " \t\r";
+  const size_t first = text.find_first_not_of(kBlanks);
+  if (first == std::string_view::npos) return {};
+  return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
+}
+
+// "64K", "16M", "1G", or a number alone.
+std::optional<long> valueOf(std::string_view text, Kind kind) {
+  long unit = 1;
+  if (!text.empty() && kind == Kind::kBytes) {
+    constexpr std::string_view kUnits = "KMG";
+    constexpr int kShift = 10;
+    const size_t place = kUnits.find(text.back());
+    if (place != std::string_view::npos) {
+      unit = 1L << (kShift * (static_cast<int>(place) + 1));
+      text.remove_suffix(1);
+    }
+  }
+  if (kind == Kind::kPercent && !text.empty() && text.back() == '%') text.remove_suffix(1);
+  const std::optional<long> number = parseNumber(trimmed(text));
+  constexpr long kMostCount = 1L << 32;  // times the greatest unit still fits
+  if (!number || *number < 0 || *number > kMostCount) return std::nullopt;
+  return *number * unit;
+}
+
+// What is wrong with the line; empty when nothing is.
+std::string take(std::string_view line, Settings *settings) {
+  const std::string_view text = trimmed(line.substr(0, line.find('#')));
+  if (text.empty()) return "";
+  const size_t sign = text.find('=');
+  if (sign == std::string_view::npos) return "'" + printable(text) + "' has no '='";
+  const std::string_view name = trimmed(text.substr(0, sign));
+  const std::string_view value = trimmed(text.substr(sign + 1));
+  const auto *const setting =
+      std::find_if(std::begin(kSettings), std::end(kSettings),
+                   [&](const Setting &candidate) { return name == candidate.name; });
+  if (setting == std::end(kSettings)) return "there is no setting '" + printable(name) + "'";
+  const std::optional<long> number = valueOf(value, setting->kind);
+  if (!number || *number < setting->least || *number > setting->most) {
+    return std::string(setting->name) + " is a number from " + std::to_string(setting->least) +
+           " to " + std::to_string(setting->most) + ", not '" + printable(value) + "'";
+  }
+  settings->*setting->member = *number;
+  return "";
+}
+
+}  // namespace
+
+Settings readSettings(SettingsFaults *faults) {
+  Settings settings;
+  errno = 0;
+  std::ifstream file(kPath);
+  if (!file) {
+    const int reason = errno;
+    if (reason != ENOENT) {
+      faults->push_back(std::string("cannot read ") + kPath + ": " + std::strerror(reason));
+    }
+    return settings;
+  }
+  std::string line;
+  for (int number = 1; std::getline(file, line); ++number) {
+    const std::string fault = line.size() > kLongestLine ? "it is too long" : take(line, &settings);
+    if (fault.empty()) continue;
+    faults->push_back(std::string(kPath) + ", line " + std::to_string(number) + ": " + fault);
+  }
+  return settings;
+}
+
+Settings settingsOrComplaints() {
+  SettingsFaults faults;
+  Settings settings = readSettings(&faults);
+  for (const std::string &fault : faults) complain(fault + ": the usual value holds");
+  return settings;
+}

@@ -1,0 +1,157 @@
+#include "runs/stop_run.h"
+
+#include <poll.h>
+#include <signal.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <ctime>
+#include <thread>
+
+#include "runs/history_keep.h"
+#include "runs/process_tree.h"
+#include "runs/processes.h"
+#include "runs/runs.h"
+#include "terminal/failure.h"
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+constexpr std::chrono::milliseconds kPause(10);
+constexpr int kStatusPatience = 20;  // milliseconds: it may hold the lock, stopped as it is
+
+// A process, held so that its number cannot become another one's.
+class Held {
+ public:
+  explicit Held(const ProcessName &process)
+      : file_(static_cast<int>(syscall(SYS_pidfd_open, process.pid, 0))) {
+    if (file_ < 0 || isAlive(process)) return;
+    close(file_);
+    file_ = -1;
+  }
+  ~Held() {
+    if (file_ >= 0) close(file_);
+  }
+  Held(const Held &) = delete;
+  Held &operator=(const Held &) = delete;
+
+  bool isThere() const { return file_ >= 0; }
+  bool send(int number) const {
+    return syscall(SYS_pidfd_send_signal, file_, number, nullptr, 0) == 0;
+  }
+  bool waitForEnd(std::chrono::milliseconds time) const {
+    pollfd wanted{file_, POLLIN, 0};
+    return poll(&wanted, 1, static_cast<int>(std::max<long>(time.count(), 0))) > 0;
+  }
+
+ private:
+  int file_;
+};
+
+bool hasStopped(pid_t pid) {
+  constexpr int kLooks = 200;
+  for (int i = 0; i < kLooks; ++i) {
+    const char state = statOf(pid).state;
+    if (state == 'T') return true;
+    if (state == 'Z' || state == '\0') return false;
+    std::this_thread::sleep_for(kPause / 2);
+  }
+  return false;
+}
+
+bool hasRow(pid_t pid) {
+  const std::vector<Run> running = RunDatabase(kStatusPatience).running();
+  return std::any_of(running.begin(), running.end(),
+                     [&](const Run &run) { return run.pid == pid; });
+}
+
+Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds grace) {
+  const Clock::time_point until = Clock::now() + grace;
+  tree->signal(SIGTERM);
+  while (Clock::now() < until) {
+    const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(until - Clock::now());
+    const bool isOver = own.waitForEnd(std::min(left, kPause * 5));
+    // A command that was about to start comes after the first signal.
+    tree->signalNew(SIGTERM);
+    if (isOver && tree->look() == 0) return Stopped::kEnded;
+  }
+  while (tree->look() > 0 || !own.waitForEnd(std::chrono::milliseconds(0))) {
+    tree->killAll();
+    own.waitForEnd(kPause * 5);
+    if (tree->look() == 0 && Clock::now() - until > std::chrono::seconds(10)) break;
+  }
+  return Stopped::kKilled;
+}
+
+}  // namespace
+
+bool cancelWaiting(const ProcessName &process) {
+  constexpr int kTries = 200;
+  const Held own(process);
+  const auto pid = static_cast<pid_t>(process.pid);
+  for (int i = 0; own.isThere() && i < kTries; ++i) {
+    if (!own.send(SIGSTOP) || !hasStopped(pid)) break;
+    try {
+      if (hasChild(pid) || hasRow(pid)) break;
+      own.send(SIGKILL);
+      own.waitForEnd(std::chrono::seconds(10));
+      return true;
+    } catch (const Failure &) {  // it was just about to write its row
+      own.send(SIGCONT);
+      std::this_thread::sleep_for(kPause);
+    }
+  }
+  if (own.isThere()) own.send(SIGCONT);
+  return false;
+}
+
+Stopped stopRun(const KeptRun &run, std::chrono::milliseconds grace) {
+  if (run.state == RunState::kWaiting && cancelWaiting(run.process)) return Stopped::kCancelled;
+  const Held own(run.process);
+  if (!own.isThere()) return Stopped::kWasOver;
+  const auto pid = static_cast<pid_t>(run.process.pid);
+  if (isAlive(run.keeper) && statOf(pid).parent == run.keeper.pid) {
+    ProcessTree tree(static_cast<pid_t>(run.keeper.pid), {}, {pid});
+    return endTree(&tree, own, grace);
+  }
+  ProcessTree tree(pid);
+  endTree(&tree, own, grace);
+  return Stopped::kPartly;
+}
+
+std::vector<KeptRun> runsToStop(long task) {
+  attempt(sweepRuns);
+  RunFilter filter;
+  filter.task = task;
+  filter.underWay = true;
+  std::vector<KeptRun> runs;
+  attempt([&] { runs = keptRuns(filter); });
+  std::erase_if(runs, [](const KeptRun &run) { return !isAlive(run.process); });
+  // Those that the history does not have.
+  for (const Run &row : RunDatabase().running()) {
+    const bool isKnown = std::any_of(
+        runs.begin(), runs.end(), [&](const KeptRun &run) { return run.process.pid == row.pid; });
+    if (isKnown || row.taskId != task) continue;
+    KeptRun run;
+    run.task = row.taskId;
+    run.statusId = row.statusId;
+    run.process = processNamed(row.pid);
+    run.start = row.start;
+    run.state = RunState::kRunning;
+    runs.push_back(std::move(run));
+  }
+  return runs;
+}
+
+void noteStop(std::vector<KeptRun> *runs) {
+  const auto now = static_cast<long>(time(nullptr));
+  attempt([&] {
+    const KeptDatabase kept(KeptDatabase::kChange);
+    Transaction transaction(kept);
+    Query note(kept, "UPDATE run SET stop_asked = ? WHERE run = ? AND state < 2");
+    for (const KeptRun &run : *runs) note.with(now).with(run.run).run();
+    transaction.commit();
+  });
+}

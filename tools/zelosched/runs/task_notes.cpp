@@ -1,0 +1,177 @@
+#include "runs/task_notes.h"
+
+#include <unistd.h>
+
+#include <ctime>
+
+#include "terminal/failure.h"
+
+namespace {
+
+// What says when it runs; a change of it makes an earlier time of it no missed one.
+std::string scheduleOf(const TaskRecord &task) {
+  std::string text = std::to_string(task.Type) + " " + std::string(task.Week);
+  for (const uint32_t number : {task.StartYear, task.StartMonth, task.StartDay, task.RunHour,
+                                task.RunMin, task.RepeatHour, task.LastWorkHour}) {
+    text += " " + std::to_string(number);
+  }
+  return text;
+}
+
+long now() {
+  return static_cast<long>(time(nullptr));
+}
+
+void add(const KeptDatabase &kept, const TaskRecord &task, std::optional<long> created) {
+  Query insert(kept,
+               "INSERT INTO task(task, app, name, schedule, command, enabled, created, changed)"
+               " VALUES(?, ?, ?, ?, ?, ?, ?, ?)");
+  insert.with(task.ID).with(std::string(task.App)).with(std::string(task.Name));
+  insert.with(scheduleOf(task)).with(std::string(task.Command)).with(isEnabled(task) ? 1L : 0L);
+  insert.with(created).with(now()).run();
+}
+
+void end(const KeptDatabase &kept, long id) {
+  Query(kept, "UPDATE task SET removed = ? WHERE task = ? AND removed IS NULL")
+      .with(now())
+      .with(id)
+      .run();
+}
+
+// What is known of a task of today.
+struct Seen {
+  long generation;
+  std::string app;
+  std::string name;
+  std::string schedule;
+  std::string command;
+  bool isEnabled;
+};
+
+std::optional<Seen> seenOf(const KeptDatabase &kept, long id) {
+  Query query(kept,
+              "SELECT generation, app, name, schedule, command, enabled FROM task"
+              " WHERE task = ? AND removed IS NULL");
+  query.with(id);
+  if (!query.next()) return std::nullopt;
+  return Seen{query.number(0), query.text(1), query.text(2),
+              query.text(3),   query.text(4), query.number(5) != 0};
+}
+
+void update(const KeptDatabase &kept, const TaskRecord &task, const Seen &seen) {
+  const std::string schedule = scheduleOf(task);
+  const bool isSame = seen.schedule == schedule && seen.isEnabled == isEnabled(task);
+  if (isSame && seen.app == task.App && seen.name == task.Name && seen.command == task.Command) {
+    return;
+  }
+  Query change(kept,
+               "UPDATE task SET app = ?, name = ?, schedule = ?, command = ?, enabled = ?,"
+               " changed = iif(?, changed, ?) WHERE generation = ?");
+  change.with(std::string(task.App)).with(std::string(task.Name)).with(schedule);
+  change.with(std::string(task.Command)).with(isEnabled(task) ? 1L : 0L).with(isSame ? 1L : 0L);
+  change.with(now()).with(seen.generation).run();
+}
+
+// Another program may have removed it and made a new one, which got its id. A task that has both
+// another name and another command is taken for such a one, and so is one of another application.
+bool isAnother(const TaskRecord &task, const Seen &seen) {
+  return seen.app != task.App || (seen.name != task.Name && seen.command != task.Command);
+}
+
+// Runs that were recorded before anybody looked at the tasks are those of the first task seen.
+void adoptRuns(const KeptDatabase &kept, const TaskRecord &task) {
+  Query(kept,
+        "UPDATE run SET generation = (SELECT generation FROM task WHERE task = ?1 AND removed IS"
+        " NULL) WHERE task = ?1 AND app = ?2 AND generation IS NULL"
+        " AND (SELECT count(*) FROM task WHERE task = ?1) = 1")
+      .with(task.ID)
+      .with(std::string(task.App))
+      .run();
+}
+
+void look(const KeptDatabase &kept, const TaskRecord &task) {
+  const std::optional<Seen> seen = seenOf(kept, task.ID);
+  if (seen && !isAnother(task, *seen)) return update(kept, task, *seen);
+  if (seen) end(kept, task.ID);
+  add(kept, task, std::nullopt);
+  adoptRuns(kept, task);
+}
+
+// A change that was made is not a failure since it could not be noted: the sweep does that.
+template <class Step>
+void note(const TaskRecord &task, Step step) {
+  if (isPower(task)) return;
+  try {
+    const KeptDatabase kept(KeptDatabase::kChange);
+    Transaction transaction(kept);
+    step(kept);
+    transaction.commit();
+  } catch (const Failure &failure) {
+    complain(std::string(failure.what()) + ": the history does not know of the change yet");
+  }
+}
+
+}  // namespace
+
+std::map<long, TaskNote> taskNotes(const KeptDatabase &kept) {
+  std::map<long, TaskNote> notes;
+  if (!kept.isThere()) return notes;
+  Query query(kept,
+              "SELECT generation, task, app, name, enabled, created, changed FROM task"
+              " WHERE removed IS NULL");
+  while (query.next()) {
+    TaskNote found;
+    found.generation = query.number(0);
+    found.task = query.number(1);
+    found.app = query.text(2);
+    found.name = query.text(3);
+    found.isEnabled = query.number(4) != 0;
+    found.created = query.optionalNumber(5);
+    found.changed = query.number(6);
+    notes[found.task] = std::move(found);
+  }
+  return notes;
+}
+
+void noteCreated(const TaskRecord &task) {
+  note(task, [&](const KeptDatabase &kept) {
+    end(kept, task.ID);
+    add(kept, task, now());
+  });
+}
+
+void noteEdited(const TaskRecord &task) {
+  note(task, [&](const KeptDatabase &kept) {
+    const std::optional<Seen> seen = seenOf(kept, task.ID);
+    if (seen) return update(kept, task, *seen);
+    add(kept, task, std::nullopt);
+    adoptRuns(kept, task);
+  });
+}
+
+void noteRemoved(const TaskRecord &task) {
+  note(task, [&](const KeptDatabase &kept) {
+    // Its runs must not be those of the next task with its id.
+    if (!seenOf(kept, task.ID)) {
+      add(kept, task, std::nullopt);
+      adoptRuns(kept, task);
+    }
+    end(kept, task.ID);
+  });
+}
+
+void noteTasks(const KeptDatabase &kept, const TaskList &list) {
+  std::map<long, TaskNote> gone = taskNotes(kept);
+  for (const TaskRecord *task : list.tasks()) {
+    if (isPower(*task)) continue;
+    gone.erase(task->ID);
+    look(kept, *task);
+  }
+  for (const auto &[id, unused] : gone) end(kept, id);
+}
+
+std::optional<long> generationOf(const KeptDatabase &kept, const TaskRecord &task) {
+  look(kept, task);
+  const std::optional<Seen> seen = seenOf(kept, task.ID);
+  return seen ? std::optional<long>(seen->generation) : std::nullopt;
+}
