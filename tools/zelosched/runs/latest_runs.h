@@ -1,6 +1,7 @@
 // The last run of each task, for those that show tasks.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <set>
 #include <string>
@@ -10,10 +11,10 @@
 struct LatestRuns {
   bool isKnown = false;  // this user may read the runs, and they can be read
   std::string fault;     // why they cannot be read by a user who may
-  std::map<long, RunRecord> ofEach;
-  std::set<long> running;  // the tasks that have a run which goes on
+  std::map<int64_t, RunRecord> ofEach;
+  std::set<int64_t> running;  // the tasks that have a run which goes on
 
-  const RunRecord *of(long task) const;
+  const RunRecord *of(int64_t task) const;
 };
 
 LatestRuns latestRuns();
@@ -22,7 +23,7 @@ LatestRuns latestRuns();
 std::string outcomeInBrief(const RunRecord &run);
 
 // "failed 7, 3 h ago"; "running for 3 h".
-std::string runInBrief(const RunRecord &run, long now);
+std::string runInBrief(const RunRecord &run, int64_t now);
 
 // The run is over and did not end well.
 bool endedBadly(const RunRecord &run);

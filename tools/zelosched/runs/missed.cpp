@@ -12,7 +12,7 @@
 
 namespace {
 
-constexpr long kMinute = 60;  // seconds
+constexpr int64_t kMinute = 60;  // seconds
 
 std::optional<time_t> lastRunBetween(const TaskRecord &task, time_t after, time_t last) {
   const std::vector<LocalMinute> runs = runsBetween(task, localMinute(after), localMinute(last));

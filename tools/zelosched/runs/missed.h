@@ -1,13 +1,14 @@
 // Tasks whose time passed while the machine was off.
 #pragma once
 
+#include <cstdint>
 #include <ctime>
 #include <vector>
 
 #include "store/task_list.h"
 
 // How long a missed task is told of.
-inline constexpr long kMissedRemembered = 7L * 24 * 60 * 60;  // seconds
+inline constexpr int64_t kMissedRemembered = int64_t{7} * 24 * 60 * 60;  // seconds
 
 struct MissedTask {
   const TaskRecord *task;

@@ -18,20 +18,22 @@ std::string scheduleOf(const TaskRecord &task) {
   return text;
 }
 
-long now() {
-  return static_cast<long>(time(nullptr));
+int64_t now() {
+  return static_cast<int64_t>(time(nullptr));
 }
 
-void add(const KeptDatabase &kept, const TaskRecord &task, std::optional<long> created) {
+void add(const KeptDatabase &kept, const TaskRecord &task, std::optional<int64_t> created) {
   Query insert(kept,
                "INSERT INTO task(task, app, name, schedule, command, enabled, created, changed)"
                " VALUES(?, ?, ?, ?, ?, ?, ?, ?)");
   insert.with(task.ID).with(std::string(task.App)).with(std::string(task.Name));
-  insert.with(scheduleOf(task)).with(std::string(task.Command)).with(isEnabled(task) ? 1L : 0L);
+  insert.with(scheduleOf(task))
+      .with(std::string(task.Command))
+      .with(isEnabled(task) ? int64_t{1} : int64_t{0});
   insert.with(created).with(now()).run();
 }
 
-void end(const KeptDatabase &kept, long id) {
+void end(const KeptDatabase &kept, int64_t id) {
   Query(kept, "UPDATE task SET removed = ? WHERE task = ? AND removed IS NULL")
       .with(now())
       .with(id)
@@ -40,7 +42,7 @@ void end(const KeptDatabase &kept, long id) {
 
 // What is known of a task of today.
 struct Seen {
-  long generation;
+  int64_t generation;
   std::string app;
   std::string name;
   std::string schedule;
@@ -48,7 +50,7 @@ struct Seen {
   bool isEnabled;
 };
 
-std::optional<Seen> seenOf(const KeptDatabase &kept, long id) {
+std::optional<Seen> seenOf(const KeptDatabase &kept, int64_t id) {
   Query query(kept,
               "SELECT generation, app, name, schedule, command, enabled FROM task"
               " WHERE task = ? AND removed IS NULL");
@@ -68,7 +70,9 @@ void update(const KeptDatabase &kept, const TaskRecord &task, const Seen &seen) 
                "UPDATE task SET app = ?, name = ?, schedule = ?, command = ?, enabled = ?,"
                " changed = iif(?, changed, ?) WHERE generation = ?");
   change.with(std::string(task.App)).with(std::string(task.Name)).with(schedule);
-  change.with(std::string(task.Command)).with(isEnabled(task) ? 1L : 0L).with(isSame ? 1L : 0L);
+  change.with(std::string(task.Command))
+      .with(isEnabled(task) ? int64_t{1} : int64_t{0})
+      .with(isSame ? int64_t{1} : int64_t{0});
   change.with(now()).with(seen.generation).run();
 }
 
@@ -113,8 +117,8 @@ void note(const TaskRecord &task, Step step) {
 
 }  // namespace
 
-std::map<long, TaskNote> taskNotes(const KeptDatabase &kept) {
-  std::map<long, TaskNote> notes;
+std::map<int64_t, TaskNote> taskNotes(const KeptDatabase &kept) {
+  std::map<int64_t, TaskNote> notes;
   if (!kept.isThere()) return notes;
   Query query(kept,
               "SELECT generation, task, app, name, enabled, created, changed FROM task"
@@ -161,7 +165,7 @@ void noteRemoved(const TaskRecord &task) {
 }
 
 void noteTasks(const KeptDatabase &kept, const TaskList &list) {
-  std::map<long, TaskNote> gone = taskNotes(kept);
+  std::map<int64_t, TaskNote> gone = taskNotes(kept);
   for (const TaskRecord *task : list.tasks()) {
     if (isPower(*task)) continue;
     gone.erase(task->ID);
@@ -170,8 +174,8 @@ void noteTasks(const KeptDatabase &kept, const TaskList &list) {
   for (const auto &[id, unused] : gone) end(kept, id);
 }
 
-std::optional<long> generationOf(const KeptDatabase &kept, const TaskRecord &task) {
+std::optional<int64_t> generationOf(const KeptDatabase &kept, const TaskRecord &task) {
   look(kept, task);
   const std::optional<Seen> seen = seenOf(kept, task.ID);
-  return seen ? std::optional<long>(seen->generation) : std::nullopt;
+  return seen ? std::optional<int64_t>(seen->generation) : std::nullopt;
 }
