@@ -15,7 +15,6 @@ readonly COVERED=$BUILD_DIR/covered
 readonly LEAST_LINES=99
 readonly LEAST_BRANCHES=94
 readonly LEAST_LINES_OF_TOOLS=95
-readonly SCRIPTS=(zelosched_cli_test zelosched_boot_test zelosched_terminal_test)
 
 build() {
   BUILD_DIR=$COVERED JOBS=1 "$root/scripts/build" --preset=coverage >"$BUILD_DIR/covered.log" 2>&1 ||
@@ -37,9 +36,11 @@ run_tests() {
 # Scripts find the tools and what they preload in the build directory.
 run_scripts() {
   local name log bad=0
+  local -a names
+  mapfile -t names <<<"$(awk '$1 == "script" && $2 ~ /^zelosched_/ { print $2 }' "$BUILD_DIR/test-programs")"
   mkdir -p "$COVERED/tests"
   ln -sf "$BUILD_DIR"/tests/*.so "$COVERED/tests"
-  for name in "${SCRIPTS[@]}"; do
+  for name in "${names[@]}"; do
     log=$COVERED/$name.log
     BUILD_DIR=$COVERED "$root/scripts/sandbox" "$root/tests/$name.sh" >"$log" 2>&1 </dev/null ||
       { grep -v '^ok' "$log"; bad=1; }

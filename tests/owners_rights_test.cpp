@@ -341,8 +341,9 @@ TEST_F(OwnersRightsTest, RealIdsThatCannotBeRestoredAreReportedAndTheRunIsRecord
     clearLog();
     failCall(call, {.from = 2, .error = EAGAIN});
     EXPECT_EQ(runSaved(id), ZELO_SCHED_STATUS_FINISHED);
-    EXPECT_EQ(logged(), Lines{"sched_run_environment.cpp:N Failed to restore real ids: [0:0] Resource "
-                              "temporarily unavailable"});
+    EXPECT_EQ(logged(),
+              Lines{"sched_run_environment.cpp:N Failed to restore real ids: [0:0] Resource "
+                    "temporarily unavailable"});
   }
 }
 

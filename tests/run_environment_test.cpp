@@ -220,7 +220,8 @@ TEST_F(RunEnvironmentTest, ACallerWithoutStandardInputOnlyKeepsTheOthers) {
         close(0);
       },
       save(0, kListLinks));
-  EXPECT_EQ(links, " /dev/null /tmp/run_environment_test.stdout /tmp/run_environment_test.stdout\n");
+  EXPECT_EQ(links,
+            " /dev/null /tmp/run_environment_test.stdout /tmp/run_environment_test.stdout\n");
 }
 
 // As a shell's loop that reads what it works on, line by line.
@@ -251,7 +252,9 @@ TEST_F(RunEnvironmentTest, APipeOfTheCallersGetsWhatTheCommandPrints) {
 
 TEST_F(RunEnvironmentTest, AFileOfTheCallersGetsWhatTheCommandPrints) {
   outputAfter(
-      [] { lendOutput(open("/tmp/run_environment_test.stdout", O_WRONLY | O_CREAT | O_TRUNC, 0644)); },
+      [] {
+        lendOutput(open("/tmp/run_environment_test.stdout", O_WRONLY | O_CREAT | O_TRUNC, 0644));
+      },
       save(0, "echo said; echo complained >&2"));
   EXPECT_EQ(readFile("/tmp/run_environment_test.stdout"), "said\ncomplained\n");
 }

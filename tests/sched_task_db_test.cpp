@@ -492,10 +492,6 @@ TEST_F(RunningTest, TheApplicationCheckNeedsItsArguments) {
   EXPECT_EQ(callCount("sqlite3_exec"), 0U);
 }
 
-TEST_F(RunningTest, NothingRunsWithoutARow) {
-  expectFound(0);
-}
-
 TEST_F(RunningTest, ALiveRunIsFoundWithItsNumbers) {
   addStatusRow({.pid = getpid(), .timestamp = 5, .app = "app", .taskId = 8, .statusCode = 2});
   const long id =
@@ -553,47 +549,46 @@ TEST_F(RunningTest, ARunOfNoTaskIsFoundWithTheNumberZero) {
   EXPECT_EQ(status_.taskID, 0);
 }
 
-TEST_F(RunningTest, OtherTasksAndApplicationsDoNotCount) {
-  addStatusRow({.pid = getpid(), .app = "App", .taskId = 8, .statusCode = kRunning});
-  expectFound(0);
+// What the database holds, and which of the rows is found.
+struct Known {
+  const char *what;
+  std::vector<StatusRow> rows;
+  std::optional<size_t> found;
+};
+
+StatusRow run(pid_t pid, int code = kRunning, const char *app = "app", long task = 7) {
+  return {.pid = pid, .app = app, .taskId = task, .statusCode = code};
 }
 
-TEST_F(RunningTest, OnlyStatusTwoIsRunning) {
-  for (const int code : {0, 1, 3, 4, 5, 6, 7}) {
-    addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = code});
+TEST_F(RunningTest, TheFirstRunWhoseProcessLivesIsFoundAndNoRowIsChanged) {
+  const pid_t live = getpid();
+  const pid_t dead = deadProcess();
+  const Known states[] = {
+      {"no row", {}, {}},
+      {"of another task and application", {run(live, kRunning, "App", 8)}, {}},
+      {"ended", {run(live, 0), run(live, 1), run(live, 3), run(live, 4)}, {}},
+      {"ended badly", {run(live, 5), run(live, 6), run(live, 7)}, {}},
+      {"died", {run(dead)}, {}},
+      {"lives", {run(live)}, 0},
+      {"lives behind one that died", {run(dead), run(live), run(dead)}, 1},
+      {"two that live", {run(live), run(live)}, 0},
+  };
+  for (const Known &state : states) {
+    SCOPED_TRACE(state.what);
+    execute("DELETE FROM task_status");
+    std::vector<long> ids;
+    for (const StatusRow &row : state.rows) ids.push_back(addStatusRow(row));
+    const std::vector<StatusRow> rows = statusRows();
+    expectFound(state.found ? 1 : 0);
+    EXPECT_EQ(status_.statusID, state.found ? ids[*state.found] : 0);
+    EXPECT_EQ(status_.pid, state.found ? live : 0);
+    EXPECT_EQ(statusRows(), rows);
   }
-  expectFound(0);
 }
 
-TEST_F(RunningTest, ARunWhoseProcessHasDiedDoesNotCountAndIsNotChanged) {
-  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
-  const std::vector<StatusRow> rows = statusRows();
-  expectFound(0);
-  EXPECT_EQ(statusRows(), rows);
-}
-
-TEST_F(RunningTest, NothingIsStoredForARunWhoseProcessHasDied) {
-  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
-  EXPECT_EQ(ZELOSchedDBIsTaskRunning(db(), 7, &status_), 0);
-  EXPECT_EQ(status_.pid, 0);
-  EXPECT_EQ(status_.statusID, 0);
-}
-
-TEST_F(RunningTest, ALiveRunBehindDeadOnesIsFound) {
-  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
-  const long id =
-      addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = kRunning});
-  addStatusRow({.pid = deadProcess(), .app = "app", .taskId = 7, .statusCode = kRunning});
+TEST_F(RunningTest, NoProcessIsAskedForBehindTheFirst) {
+  for (int i = 0; i < 2; ++i) addStatusRow(run(getpid()));
   expectFound(1);
-  EXPECT_EQ(status_.statusID, id);
-}
-
-TEST_F(RunningTest, OfTwoLiveRunsTheFirstIsTaken) {
-  const long id =
-      addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = kRunning});
-  addStatusRow({.pid = getpid(), .app = "app", .taskId = 7, .statusCode = kRunning});
-  expectFound(1);
-  EXPECT_EQ(status_.statusID, id);
   EXPECT_EQ(callCount("QLIBCProcAlive"), 2U);  // once in each of the two checks
 }
 
@@ -769,37 +764,37 @@ TEST_F(SetStatusTest, AnyRowWithAnyCodeIsRefused) {
   EXPECT_EQ(codesAndComments(), Lines{"2 none"});
 }
 
-TEST_F(SetStatusTest, OneRowIsSetWhateverItsCode) {
-  addStatusRow({.statusId = 4, .statusCode = kRunning});
-  addStatusRow({.statusId = 5, .statusCode = kRunning});
-  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 5, 0, kFinished, "done"), 0);
-  EXPECT_EQ(codesAndComments(), (Lines{"2 none", "3 done"}));
-}
-
-TEST_F(SetStatusTest, OneRowIsSetOnlyWhenItHasTheOldCode) {
-  addStatusRow({.statusId = 4, .statusCode = kRunning});
-  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, 7, kFinished, nullptr), 0);
-  EXPECT_EQ(codesAndComments(), Lines{"2 none"});
-  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, kRunning, kFinished, nullptr), 0);
-  EXPECT_EQ(codesAndComments(), Lines{"3 none"});
-}
-
-TEST_F(SetStatusTest, EveryRowWithTheOldCodeIsSet) {
-  for (const int code : {3, 2, 3, 7}) addStatusRow({.statusCode = code});
-  EXPECT_EQ(ZELOSchedDBSetStatus(db(), -1, 3, 6, "9"), 0);
-  EXPECT_EQ(codesAndComments(), (Lines{"6 9", "2 none", "6 9", "7 none"}));
-}
-
-TEST_F(SetStatusTest, AnEmptyCommentLeavesTheCommentUnchanged) {
-  addStatusRow({.statusId = 4, .statusCode = kRunning, .comment = "old"});
-  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, 0, 3, ""), 0);
-  EXPECT_EQ(codesAndComments(), Lines{"3 old"});
-  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 4, 0, 4, nullptr), 0);
-  EXPECT_EQ(codesAndComments(), Lines{"4 old"});
-}
-
-TEST_F(SetStatusTest, AKeyThatNoRowHasIsNoFailure) {
-  EXPECT_EQ(ZELOSchedDBSetStatus(db(), 99, 0, kFinished, nullptr), 0);
+TEST_F(SetStatusTest, TheRowsThatAreMeantAreSetAndNoOther) {
+  struct Change {
+    std::vector<StatusRow> rows;
+    int id;
+    int oldCode;
+    int newCode;
+    const char *szComment;
+    Lines then;
+  };
+  const StatusRow fourth = {.statusId = 4, .statusCode = kRunning};
+  const StatusRow fifth = {.statusId = 5, .statusCode = kRunning};
+  const StatusRow told = {.statusId = 4, .statusCode = kRunning, .comment = "old"};
+  const std::vector<StatusRow> four = {
+      {.statusCode = 3}, {.statusCode = 2}, {.statusCode = 3}, {.statusCode = 7}};
+  const Change changes[] = {
+      {{fourth, fifth}, 5, 0, 3, "done", {"2 none", "3 done"}},  // one, whatever its code
+      {{fourth}, 4, 7, 3, nullptr, {"2 none"}},                  // only with the old code
+      {{fourth}, 4, 2, 3, nullptr, {"3 none"}},
+      {four, -1, 3, 6, "9", {"6 9", "2 none", "6 9", "7 none"}},  // all with the old code
+      {{told}, 4, 0, 3, "", {"3 old"}},                           // the comment stays
+      {{told}, 4, 0, 4, nullptr, {"4 old"}},
+      {{fourth}, 99, 0, 3, nullptr, {"2 none"}},  // none is no failure
+  };
+  for (const Change &change : changes) {
+    SCOPED_TRACE(&change - changes);
+    execute("DELETE FROM task_status");
+    for (const StatusRow &row : change.rows) addStatusRow(row);
+    EXPECT_EQ(
+        ZELOSchedDBSetStatus(db(), change.id, change.oldCode, change.newCode, change.szComment), 0);
+    EXPECT_EQ(codesAndComments(), change.then);
+  }
   EXPECT_EQ(logged(), Lines{});
 }
 
@@ -936,16 +931,28 @@ TEST_F(GetStatusTest, ACommentIsNoFormat) {
   EXPECT_STREQ(comment_, "%s%n%d");
 }
 
-TEST_F(GetStatusTest, ARunWhoseProcessHasDiedReadsAsGoneAndItsRowStays) {
-  addStatusRow({.pid = deadProcess(), .taskId = kTask, .statusCode = kRunning});
-  const std::vector<StatusRow> rows = statusRows();
-  expectCode(ZELO_SCHED_STATUS_GONE);
-  EXPECT_EQ(statusRows(), rows);
-}
-
-TEST_F(GetStatusTest, ALiveRunReadsAsRunning) {
-  addStatusRow({.pid = getpid(), .taskId = kTask, .statusCode = kRunning});
-  expectCode(kRunning);
+TEST_F(GetStatusTest, OnlyARunningRunWhoseProcessHasDiedReadsAsGoneAndItsRowStays) {
+  const pid_t dead = deadProcess();
+  struct Read {
+    pid_t pid;
+    int stored;
+    int code;
+  };
+  const Read reads[] = {{dead, kRunning, ZELO_SCHED_STATUS_GONE},
+                        {getpid(), kRunning, kRunning},
+                        {dead, 3, 3},
+                        {dead, 4, 4},
+                        {dead, 5, 5},
+                        {dead, 6, 6},
+                        {dead, 7, 7}};
+  for (const Read &read : reads) {
+    SCOPED_TRACE(read.stored);
+    execute("DELETE FROM task_status");
+    addStatusRow({.pid = read.pid, .taskId = kTask, .statusCode = read.stored});
+    const std::vector<StatusRow> rows = statusRows();
+    expectCode(read.code);
+    EXPECT_EQ(statusRows(), rows);
+  }
 }
 
 TEST_F(GetStatusTest, ARunWithoutAProcessIdReadsAsRunning) {
@@ -961,16 +968,6 @@ TEST_F(GetStatusTest, OnlyTheAnswerOneMeansAlive) {
     support::resetFailingCalls();
     failCall("QLIBCProcAlive", {.times = kAlways, .result = answer});
     expectCode(ZELO_SCHED_STATUS_GONE);
-  }
-}
-
-TEST_F(GetStatusTest, ARunThatEndedReadsAsItEnded) {
-  const pid_t dead = deadProcess();
-  for (const int code : {3, 4, 5, 6, 7}) {
-    SCOPED_TRACE(code);
-    execute("DELETE FROM task_status");
-    addStatusRow({.pid = dead, .taskId = kTask, .statusCode = code});
-    expectCode(code);
   }
 }
 

@@ -761,8 +761,9 @@ TEST_F(TaskRunTest, ALockThatCannotBeReleasedLeavesItsCodeAndTheRunGoesOn) {
     failCall("ZELOUserGetByUID");
     useBackendRun([](ZELO_SCHED_TASK *, int *, char *, size_t) { return 0; });
     runToEnd(id);
-    EXPECT_EQ(logged(),
-              Lines{"sched_run_environment.cpp:N Get uid [0] failed. [0x0500 sched_task_run.cpp:N]"});
+    EXPECT_EQ(
+        logged(),
+        Lines{"sched_run_environment.cpp:N Get uid [0] failed. [0x0500 sched_task_run.cpp:N]"});
   }
 }
 

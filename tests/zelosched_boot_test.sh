@@ -10,5 +10,5 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 . "$here/support/zelosched_test.sh"
 
 start_zelosched_tests
-transcripts zelosched_restore.txt zelosched_history.txt zelosched_missed.txt
+transcripts zelosched_restore.txt zelosched_history.txt zelosched_missed.txt zelosched_health.txt
 finish

@@ -61,8 +61,8 @@ carries_every_run_over() {
   first_version
   z history >/dev/null
   same "$(sqlite3 "$KEPT" "SELECT run, task, app, state, outcome, exit_code, signal FROM run ORDER BY run")" "$CARRIED_OVER" &&
-    same "$(kept "PRAGMA user_version; SELECT count(*), sum(told) FROM run; SELECT * FROM up; SELECT * FROM missed; SELECT count(*) FROM sqlite_master WHERE name = 'run_of_first'")" \
-      $'2\n10 10\nb2 1795161609\n1 a 1795161500\n0'
+    same "$(kept "PRAGMA user_version; SELECT count(*), sum(told) FROM run; SELECT count(*) FROM sqlite_master WHERE name IN ('run_of_first', 'up', 'missed')")" \
+      $'2\n10 10\n0'
 }
 
 shows_them() {

@@ -249,12 +249,34 @@ keeps_the_ends_of_much_output() {
     head -c 49152 /dev/zero | tr '\0' z; } | cmp - "$SCRATCH/out" && run_is 10065536 output_bytes
 }
 
+is_not_filled_by_ten_gigabytes() {
+  clean
+  add 'head -c 10000000000 /dev/zero'
+  z run --wait 1 >/dev/null
+  run_is "10000000000 1 65536" "output_bytes, (SELECT count(*) FROM output), (SELECT max(size) FROM output)"
+}
+
 follows_what_goes_on() {
   clean
   add "echo first; $HOLD; echo last"
   start 1
   z log 1 --follow >"$SCRATCH/out" &
   until_is first cat "$SCRATCH/out" && go && wait $! && same "$(cat "$SCRATCH/out")" $'first\nlast'
+}
+
+a_command_may_end_its_process_group() {
+  clean
+  add 'echo said; kill -KILL 0'
+  z run --wait 1 >/dev/null 2>&1 || true
+  same "$(z log 1)" said && run_is 2 state && is_gone_by_name
+}
+
+# Whoever opens the pipe for reading takes what the run itself has printed, and no more.
+what_reads_its_own_output_harms_nobody() {
+  clean
+  add 'exec 3<>/dev/stdout; echo said; head -c 5 <&3 >/dev/null; echo more' --owner nobody
+  z run --wait 1 >/dev/null 2>&1 || true
+  run_is 2 state && is_gone_by_name
 }
 
 a_run_may_close_its_output() {
@@ -318,7 +340,10 @@ zelosched: /etc/zelosched.conf, line 3: 'runs-days' has no '=': the usual value 
 }
 
 check "of much output the ends are kept" keeps_the_ends_of_much_output
+check "ten gigabytes fill nothing" is_not_filled_by_ten_gigabytes
 check "what goes on is followed to its end" follows_what_goes_on
+check "a command may end its process group" a_command_may_end_its_process_group
+check "what reads its own output harms nobody" what_reads_its_own_output_harms_nobody
 check "a run may close its output at once" a_run_may_close_its_output
 check "an owner may open his output by its name" an_owner_writes_to_stderr_by_name
 check "a daemon that holds the pipe is read on, and is not the run's" a_daemon_does_not_keep_a_run_from_ending

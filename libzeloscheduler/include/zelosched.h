@@ -476,8 +476,9 @@ typedef struct ZELO_SCHED_STATUS {
  * the callee left. How the run went is told by the status database and the log
  * alone.
  * Of the caller's descriptors the command keeps 1 and 2 alone, and each of these
- * only where it is a pipe or a regular file, open for writing alone and not to be
- * closed on an exec: it prints there, for as long as it likes, and who reads the
+ * only where it is a pipe or a regular file, open for writing alone (a pipe without
+ * a name, from pipe(2), may be open for reading too) and not to be closed on an
+ * exec: it prints there, for as long as it likes, and who reads the
  * pipe decides how that is shown. Any other 1 or 2 (a terminal, a socket, open
  * for reading too, closed) is /dev/null in its place, and so is 0 always. The
  * names /dev/stdout and /dev/stderr can be opened only where the task's owner may

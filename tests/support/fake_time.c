@@ -1,7 +1,9 @@
 /*
  * To be preloaded into a program: the clock stands where FAKE_TIME (seconds since
- * the epoch) says, and with FAKE_PATIENCE set, waiting takes no time: sleeps return
- * at once, and each look at the monotonic clock finds it ten seconds later.
+ * the epoch) says, the machine was started FAKE_UPTIME seconds before that (or, when
+ * it is not set, at the beginning of November 2026), and with FAKE_PATIENCE set,
+ * waiting takes no time: sleeps return at once, and each look at the monotonic clock
+ * finds it ten seconds later.
  */
 #include <dlfcn.h>
 #include <stdlib.h>
@@ -18,12 +20,26 @@ time_t time(time_t *result) {
   return seconds;
 }
 
+/* The first look at it finds this; it goes on from there. */
+static time_t fake_uptime(const char *fake) {
+  const time_t kStarted = 1793491200; /* 2026-11-01 */
+  const char *uptime = getenv("FAKE_UPTIME");
+  return uptime != NULL ? (time_t)strtoll(uptime, NULL, 10)
+                        : (time_t)strtoll(fake, NULL, 10) - kStarted;
+}
+
 int clock_gettime(clockid_t clock, struct timespec *now) {
   static int (*real)(clockid_t, struct timespec *);
   static time_t later;
+  static time_t first;
+  const char *fake = getenv("FAKE_TIME");
   int result;
   if (real == NULL) *(void **)&real = dlsym(RTLD_NEXT, "clock_gettime");
   result = real(clock, now);
+  if (clock == CLOCK_BOOTTIME && fake != NULL) {
+    if (first == 0) first = now->tv_sec;
+    now->tv_sec += fake_uptime(fake) - first;
+  }
   if (clock == CLOCK_MONOTONIC && getenv("FAKE_PATIENCE") != NULL) {
     later += 10;
     now->tv_sec += later;

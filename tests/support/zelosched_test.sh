@@ -371,7 +371,8 @@ for run in json.load(sys.stdin)["runs"]:
 }
 
 # Off from one to eight o'clock on a Friday.
-readonly OFF="2026-11-20 01:00:20" ON="2026-11-20 08:00:40" LATER="2026-11-20 08:05"
+readonly ADDED="2026-11-20 01:00:10" OFF="2026-11-20 01:00:20" ON="2026-11-20 08:00:40"
+readonly LATER="2026-11-20 08:05"
 go_off() {
   at "$OFF" history --keep
   boot
@@ -382,20 +383,30 @@ missed() {
   at "$LATER" catch-up --dry-run "$@" | sed -n 's/^task [0-9]* (\(.*\)) was due at \(.*\): would.*/\1 \2/p'
 }
 
+before() {
+  at "$ADDED" add --quiet "$@" >added
+}
+
 one_task() {
-  add --daily 02:30 --name one -- true
+  before --daily 02:30 --name one -- true
+}
+
+# What status says of the runs at a moment.
+says_of_runs() {
+  at "$1" status | grep -E '^[a-z]+ +(task [0-9]+ |no run was |no task)'
 }
 
 tasks_of_all_kinds() {
   rm -f ran
-  add --daily 02:30 --name daily -- "echo daily >>$SCRATCH/ran"
-  add --daily 00:15 --every 1h --until 23 --name hourly -- "echo hourly >>$SCRATCH/ran"
-  at "$OFF" add --quiet --once 2026-11-20T03:00 --name once -- "echo once >>$SCRATCH/ran" >/dev/null
-  add --weekly fri 08:00 --name weekly -- "echo weekly >>$SCRATCH/ran"
-  add --daily 01:00 --name before -- true
-  add --daily 08:01 --name after -- true
-  add --weekly sat 04:00 --name saturday -- true
-  add --daily 05:00 --disabled --name disabled -- true
+  before --daily 02:30 --name daily -- "echo daily >>$SCRATCH/ran"
+  before --daily 00:15 --every 1h --until 23 --name hourly -- \
+    "echo hourly >>$SCRATCH/ran"
+  before --once 2026-11-20T03:00 --name once -- "echo once >>$SCRATCH/ran"
+  before --weekly fri 08:00 --name weekly -- "echo weekly >>$SCRATCH/ran"
+  before --daily 01:00 --name before -- true
+  before --daily 08:04 --name after -- true
+  before --weekly sat 04:00 --name saturday -- true
+  before --daily 05:00 --disabled --name disabled -- true
   z power add on --daily 05:00 >/dev/null
 }
 

@@ -1,42 +1,160 @@
 #include "check/run_findings.h"
 
+#include <unistd.h>
+
+#include <algorithm>
+#include <map>
+
 #include "runs/coming_runs.h"
+#include "runs/history.h"
 #include "runs/history_keep.h"
 #include "runs/missed.h"
+#include "runs/result_text.h"
 #include "runs/runs.h"
+#include "terminal/text.h"
 
-Findings checkRunsInProgress(const TaskList &list) {
-  if (!mayReadRuns()) {
-    return {{Severity::kUnknown, "running", "whether a task is running, only root may see"}};
-  }
-  Findings findings;
-  for (const Run &run : RunDatabase().running()) {
-    std::string title = "task " + std::to_string(run.taskId);
-    for (const ZELO_SCHED_TASK *task : list.tasks()) {
-      if (task->ID == run.taskId) title = titleOf(*task);
-    }
-    findings.push_back({Severity::kOk, "running",
-                        title + " is running since " + minuteText(localMinute(run.start)) +
-                            " as process " + std::to_string(run.pid),
-                        run.taskId});
-  }
-  if (findings.empty()) findings.push_back({Severity::kOk, "running", "no task is running"});
-  return findings;
+namespace {
+
+constexpr int64_t kDay = int64_t{24} * 60 * 60;  // seconds
+constexpr int64_t kMinute = 60;
+
+using Tasks = std::map<int64_t, const TaskRecord *>;
+
+std::string momentInWords(int64_t moment) {
+  return minuteText(localMinute(moment));
 }
 
-Findings checkMissedRuns(const TaskList &list) {
-  if (!mayReadAllRuns()) {
-    return {{Severity::kUnknown, "missed-run", "whether a run was missed, only root may see"}};
+class RunCheck {
+ public:
+  explicit RunCheck(const TaskList &list) : list_(list) {
+    for (const TaskRecord *task : list.tasks()) tasks_[task->ID] = task;
   }
-  Findings findings;
-  for (const MissedTask &missed : missedTasks(list, time(nullptr) - kMissedRemembered)) {
-    findings.push_back({Severity::kWarning, "missed-run",
-                        titleOf(*missed.task) + " was due at " +
-                            minuteText(localMinute(missed.due)) +
-                            ", when the machine was off: 'zelosched run " +
-                            std::to_string(missed.task->ID) + "' runs it now",
-                        missed.task->ID, missed.task->Name});
+
+  Findings make() {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    judgeLastRuns(kept);
+    judgeMissed(kept);
+    judgeRunning(kept);
+    return std::move(findings_);
   }
-  if (findings.empty()) findings.push_back({Severity::kOk, "missed-run", "no run was missed"});
-  return findings;
+
+ private:
+  void add(Severity severity, const char *kind, const TaskRecord &task, const std::string &text) {
+    findings_.push_back({severity, kind, titleOf(task) + " " + text, task.ID, task.Name});
+  }
+
+  // Of a task that is still there and enabled; one that was disabled worries nobody.
+  const TaskRecord *enabledTask(int64_t id) const {
+    const auto found = tasks_.find(id);
+    return found != tasks_.end() && isEnabled(*found->second) ? found->second : nullptr;
+  }
+
+  void judgeLastRuns(const KeptDatabase &kept) {
+    bool isWell = true;
+    for (const KeptRun &run : lastRuns(kept)) {
+      const TaskRecord *const task = enabledTask(run.task);
+      const bool isMeant = run.outcome == Outcome::kStopped || run.outcome == Outcome::kCancelled;
+      if (task == nullptr || !isBad(run) || isMeant) continue;
+      const int64_t moment = run.start ? *run.start : run.queued.value_or(run.end.value_or(0));
+      const bool isAcknowledged =
+          run.generation && acknowledgedAt(kept, *run.generation) >= run.end.value_or(moment);
+      isWell = false;
+      const std::string id = std::to_string(task->ID);
+      add(isAcknowledged ? Severity::kOk : Severity::kWarning,
+          run.outcome == Outcome::kGaveUp ? "gave-up" : "failed-run", *task,
+          resultInWords(run) + " at " + momentInWords(moment) +
+              (isAcknowledged ? " (acknowledged)"
+                              : ": 'zelosched log " + id + "' shows what it printed"));
+    }
+    if (isWell) findings_.push_back({Severity::kOk, "failed-run", "no task's last run failed"});
+  }
+
+  void judgeMissed(const KeptDatabase &kept) {
+    bool isWell = true;
+    for (const MissedTask &missed : missedTasks(kept, list_, 0)) {
+      const TaskRecord &task = *missed.task;
+      if (missed.times > 0) {
+        isWell = false;
+        const std::string id = std::to_string(task.ID);
+        const std::string times =
+            missed.times > 1 ? ", the last of " + std::to_string(missed.times) + " times," : "";
+        add(Severity::kWarning, "missed-run", task,
+            "was due at " + momentInWords(missed.due) + times +
+                " and did not run: 'zelosched run " + id +
+                "' runs it now, 'zelosched status "
+                "--acknowledge " +
+                id + "' takes note of it");
+      }
+      if (missed.planned > 0) {
+        add(Severity::kOk, "planned-off", task,
+            "was due " +
+                std::string(missed.planned == 1 ? "once"
+                                                : std::to_string(missed.planned) + " times") +
+                " while the machine was off by its power times");
+      }
+    }
+    if (isWell) findings_.push_back({Severity::kOk, "missed-run", "no run was missed"});
+  }
+
+  // Five times as long as such a run usually takes, or a day.
+  static bool isLong(const KeptDatabase &kept, const KeptRun &run, double seconds) {
+    constexpr int64_t kRunsCompared = 10;
+    constexpr double kTimesAsLong = 5;
+    if (seconds > kDay) return true;
+    RunFilter filter;
+    filter.task = run.task;
+    std::vector<double> durations;
+    for (const KeptRun &before : runsOf(kept, filter)) {
+      if (before.state == RunState::kEnded && before.duration) {
+        durations.push_back(*before.duration);
+      }
+      if (durations.size() == kRunsCompared) break;
+    }
+    if (durations.size() < 2 || seconds < kMinute) return false;  // too little to compare with
+    const auto middle = durations.begin() + static_cast<ptrdiff_t>(durations.size() / 2);
+    std::nth_element(durations.begin(), middle, durations.end());
+    return seconds > kTimesAsLong * *middle;
+  }
+
+  void judgeRunning(const KeptDatabase &kept) {
+    RunFilter filter;
+    filter.underWay = true;
+    const auto now = static_cast<int64_t>(time(nullptr));
+    bool isAny = false;
+    for (const KeptRun &run : runsOf(kept, filter)) {
+      isAny = true;
+      const auto found = tasks_.find(run.task);
+      const std::string title =
+          found != tasks_.end() ? titleOf(*found->second) : "task " + std::to_string(run.task);
+      const int64_t since = run.start ? *run.start : run.queued.value_or(now);
+      const bool isTooLong =
+          run.state == RunState::kRunning && isLong(kept, run, static_cast<double>(now - since));
+      std::string text =
+          title +
+          (run.state == RunState::kWaiting ? " waits for its turn since " : " is running since ") +
+          momentInWords(since) + " as process " + std::to_string(run.process.pid);
+      if (isTooLong) {
+        text += ", which is unusually long: 'zelosched log --follow " + std::to_string(run.task) +
+                "' shows what it prints, 'zelosched stop " + std::to_string(run.task) + "' ends it";
+      }
+      findings_.push_back({isTooLong ? Severity::kWarning : Severity::kOk,
+                           isTooLong ? "long-run" : "running", text, run.task, run.taskName});
+    }
+    if (!isAny) findings_.push_back({Severity::kOk, "running", "no task is running"});
+  }
+
+  const TaskList &list_;
+  Tasks tasks_;
+  Findings findings_;
+};
+
+}  // namespace
+
+Findings checkRuns(const TaskList &list) {
+  if (!mayReadAllRuns() || geteuid() != 0) {
+    return {
+        {Severity::kUnknown, "runs", "which runs failed, were missed or go on, only root may see"}};
+  }
+  sweepRuns();
+  return RunCheck(list).make();
 }

@@ -4,5 +4,5 @@
 #include "check/finding.h"
 #include "store/task_list.h"
 
-Findings checkRunsInProgress(const TaskList &list);
-Findings checkMissedRuns(const TaskList &list);
+// Whose last run failed or gave up, which were missed, and which go on, and for how long.
+Findings checkRuns(const TaskList &list);

@@ -1,4 +1,6 @@
 // zelosched catch-up
+#include <unistd.h>
+
 #include <cstdio>
 #include <ctime>
 
@@ -33,7 +35,7 @@ int64_t parseSpan(const std::string &text) {
       return *count * unit.seconds;
     }
   }
-  throw UsageError("'--within' takes a time from 1m to 7d, such as 90m, 12h or 2d, not '" +
+  throw UsageError("'--within' takes a time from 1m to 8d, such as 90m, 12h or 2d, not '" +
                    printable(text) + "'");
 }
 
@@ -45,7 +47,8 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
     request.due = missed.due;
     request.isDisabledSkipped = true;
     const StartedRun run(*missed.task, request);
-    forgetMissed(*missed.task);
+    // The run may have to wait for its turn, unrecorded so far.
+    acknowledge(KeptDatabase(KeptDatabase::kChange), missed.task->ID);
   }
   std::printf("%s was due at %s: %s\n", titleOf(*missed.task).c_str(),
               minuteText(localMinute(missed.due)).c_str(),
@@ -54,8 +57,10 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
 
 int catchUpAll(const std::string &span, bool isDryRun) {
   const time_t since = time(nullptr) - parseSpan(span);
+  if (geteuid() == 0) sweepRuns();  // what other programs have run was not missed
   const TaskList list;
-  const std::vector<MissedTask> all = missedTasks(list, since);
+  std::vector<MissedTask> all = missedTasks(KeptDatabase(KeptDatabase::kRead), list, since);
+  std::erase_if(all, [](const MissedTask &missed) { return missed.times == 0; });
   if (all.empty()) std::printf("no run was missed within %s\n", span.c_str());
   int status = kDone;
   for (const MissedTask &missed : all) {
@@ -83,10 +88,11 @@ int runCatchUp(int argc, char **argv) {
 
 const Command kCatchUpCommand = {
     "catch-up", "[--within TIME] [--dry-run]", "run the tasks that were missed",
-    "Runs once, now, each enabled task whose time passed while the machine was off and\n"
-    "that did not run since. All are started at once, and wait for others as always.\n"
+    "Runs once, now, each enabled task that was due and did not run, since the machine was\n"
+    "off or cron was not running. What was due while the machine was off by its power times\n"
+    "is left out. All are started at once, and wait for others as always.\n"
     "\n"
     "  --within TIME                  only those due so short a time ago, such as 90m, 12h or\n"
-    "                                 2d; 12h, and 7d at most\n"
+    "                                 2d; 12h, and 8d at most\n"
     "  --dry-run                      list them, and run nothing\n",
     runCatchUp};

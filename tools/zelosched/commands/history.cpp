@@ -50,7 +50,7 @@ std::string durationText(const KeptRun &run) {
   constexpr int64_t kMinute = 60;
   constexpr int64_t kHour = 3600;
   char text[64];
-  std::snprintf(text, sizeof text, "%lld:%02d:%02d", static_cast<long long>(*seconds / kHour),
+  std::snprintf(text, sizeof text, "%lld:%02d:%02d", static_cast<int64_t>(*seconds / kHour),
                 static_cast<int>(*seconds % kHour / kMinute), static_cast<int>(*seconds % kMinute));
   return text;
 }
@@ -74,11 +74,11 @@ void print(const std::vector<KeptRun> &runs) {
 }
 
 void printAsJson(const std::vector<KeptRun> &runs) {
-  std::printf("{\"version\":1,\"runs\":[");
-  for (size_t i = 0; i < runs.size(); ++i) {
-    std::printf("%s\n%s", i == 0 ? "" : ",", onOneLine(jsonOf(runs[i])).c_str());
-  }
-  std::printf("\n]}\n");
+  std::vector<Json::Value> objects;
+  for (const KeptRun &run : runs) objects.push_back(jsonOf(run));
+  Json::Value top = topObject();
+  top["runs"] = jsonList(objects);
+  printTop(top);
 }
 
 // One that was removed has no name any more, but its runs are there.

@@ -190,7 +190,7 @@ int runRestore(int argc, char **argv) {
   const int results[] = {
       attempt(putProgramBack), attempt([&] { putStoreBack(isForced); }),
       takeSharedNames(),       attempt(removeLeftovers),
-      attempt(synchronise),    attempt(markMachineUp),
+      attempt(synchronise),    attempt([] { markMachineUp(true); }),
       attempt(clearScratch),
   };
   return *std::max_element(std::begin(results), std::end(results));

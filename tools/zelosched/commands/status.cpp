@@ -1,5 +1,6 @@
 // zelosched status
 #include <json/json.h>
+#include <unistd.h>
 
 #include <cstdio>
 
@@ -7,12 +8,16 @@
 #include "commands/command.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "runs/history_keep.h"
+#include "runs/missed.h"
+#include "store/task_list.h"
+#include "terminal/failure.h"
 #include "terminal/terminal.h"
 #include "terminal/text.h"
 
 namespace {
 
-constexpr Option kOptions[] = {{"quiet", Option::kNone, 'q'}, {"json"}};
+constexpr Option kOptions[] = {{"quiet", Option::kNone, 'q'}, {"json"}, {"acknowledge"}};
 
 int exitStatusOf(Severity worst) {
   switch (worst) {
@@ -67,10 +72,26 @@ void printAsJson(const Findings &findings) {
   printTop(whole);
 }
 
+int acknowledgeAll(const Arguments &arguments) {
+  if (arguments.has("quiet") || arguments.has("json")) {
+    throw UsageError("'--acknowledge' prints nothing, and takes neither '--quiet' nor '--json'");
+  }
+  if (geteuid() != 0) throw Failure("acknowledging takes root's rights");
+  sweepRuns();  // which notes the tasks that nobody has looked at so far
+  const KeptDatabase kept(KeptDatabase::kChange);
+  if (arguments.operands().empty()) {
+    acknowledge(kept, std::nullopt);
+    return kDone;
+  }
+  for (const int64_t id : parseIds(arguments.operands())) acknowledge(kept, loadTask(id)->ID);
+  return kDone;
+}
+
 int runStatus(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
-  arguments.requireNoOperands();
   arguments.requireNoCommand();
+  if (arguments.has("acknowledge")) return acknowledgeAll(arguments);
+  arguments.requireNoOperands();
   const Findings findings = examineHealth();
   if (arguments.has("json")) {
     printAsJson(findings);
@@ -83,17 +104,18 @@ int runStatus(int argc, char **argv) {
 }  // namespace
 
 const Command kStatusCommand = {
-    "status", "[--quiet] [--json]", "say whether all is well",
+    "status", "[--quiet] [--json] | --acknowledge [TASK...]", "say whether all is well",
     "Prints a line for each check, the worst first: whether cron is running, whether the\n"
     "program that it starts is there and root's, whether the copies of the tasks agree,\n"
     "whether /tmp is root's and sticky and no other user is in the way of runs there, whether\n"
     "a process keeps changes waiting, whether each task can be read, whether the crontab is in\n"
-    "step with them and short enough for cron, whether an enabled task has a fault, which\n"
-    "tasks were due while the machine was off, whether power times can take effect, and which\n"
-    "tasks are running.\n"
+    "step with them and short enough for cron, whether an enabled task has a fault, whether\n"
+    "power times can take effect, whose last run failed or gave up, which tasks were due and\n"
+    "did not run, and which are running, and unusually long.\n"
     "\n"
     "  -q, --quiet                    only what is not well\n"
     "  --json                         as JSON: see zelosched-json(5)\n"
+    "  --acknowledge                  warn no more of the runs so far of these tasks, or of all\n"
     "\n"
     "Exit status: 0 all is well, 1 something is wrong, 3 this user may not see all of it,\n"
     "4 tasks do not run at all.\n",

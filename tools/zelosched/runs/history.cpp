@@ -162,7 +162,7 @@ ProcessName processNamed(int64_t pid) {
 bool isAlive(const ProcessName &process) {
   if (process.pid <= 0 || process.born == 0) return false;
   const ProcessStat stat = statOf(static_cast<pid_t>(process.pid));
-  return stat.started == static_cast<unsigned long long>(process.born) && stat.state != 'Z' &&
+  return stat.started == static_cast<unsigned int64_t>(process.born) && stat.state != 'Z' &&
          stat.state != 'X';
 }
 
@@ -192,6 +192,14 @@ std::vector<KeptRun> lastRuns(const KeptDatabase &kept) {
                     " FROM task WHERE removed IS NULL) ORDER BY task");
   while (query.next()) runs.push_back(runOf(query));
   return runs;
+}
+
+std::map<Outcome, int64_t> countByOutcome(const KeptDatabase &kept) {
+  std::map<Outcome, int64_t> counts;
+  if (!kept.isThere()) return counts;
+  Query query(kept, "SELECT outcome, count(*) FROM run WHERE state = 2 GROUP BY outcome");
+  while (query.next()) counts[enumOf(query.number(0), Outcome::kLost)] += query.number(1);
+  return counts;
 }
 
 std::vector<KeptRun> keptRuns(const RunFilter &filter) {

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -49,6 +50,9 @@ std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter);
 
 // The last run of each task of today: one row a task, however many runs there are.
 std::vector<KeptRun> lastRuns(const KeptDatabase &kept);
+
+// How many runs ended in which way.
+std::map<Outcome, int64_t> countByOutcome(const KeptDatabase &kept);
 
 // As runsOf, in a look of its own; none when there is no history yet.
 std::vector<KeptRun> keptRuns(const RunFilter &filter);

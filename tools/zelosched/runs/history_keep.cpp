@@ -15,6 +15,7 @@
 #include "runs/runs.h"
 #include "runs/status_row.h"
 #include "runs/task_notes.h"
+#include "store/owner.h"
 #include "store/task_list.h"
 #include "store/task_program.h"
 #include "terminal/failure.h"
@@ -238,6 +239,39 @@ std::vector<KeptRun> takeUntold(const KeptDatabase &kept) {
   return untold;
 }
 
+// Each time once, also when nobody was to be told of it then.
+std::vector<RunRecord> takeUntoldMissed(const KeptDatabase &kept, const TaskList &list) {
+  std::vector<RunRecord> untold;
+  const std::map<int64_t, TaskNote> notes = taskNotes(kept);
+  Transaction transaction(kept);
+  for (const MissedTask &missed : missedTasks(kept, list, 0)) {
+    const auto note = notes.find(missed.task->ID);
+    if (missed.times == 0 || note == notes.end()) continue;
+    if (!noteTold(kept, "missed", note->second.generation, missed.due)) continue;
+    RunRecord record;
+    record.task = missed.task->ID;
+    record.taskName = missed.task->Name;
+    record.app = missed.task->App;
+    record.owner = userName(missed.task->Owner);
+    record.trigger = Trigger::kSchedule;
+    record.due = missed.due;
+    untold.push_back(std::move(record));
+  }
+  transaction.commit();
+  return untold;
+}
+
+void tellOfMissedRuns() {
+  const TaskList list(TaskList::Unreadable::kIsLeftOut);
+  std::vector<RunRecord> untold;
+  {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    if (!kept.isThere()) return;
+    untold = takeUntoldMissed(kept, list);
+  }
+  for (const RunRecord &record : untold) tellOfMissed(record);
+}
+
 // What an administrator's programs need, such as a mailer, the unit of the sweep does not have.
 void haveRunsToldOf() {
   if (!isAnybodyToBeTold()) return;
@@ -270,6 +304,7 @@ void tellOfRuns() {
     }
   }
   for (size_t i = 0; i < untold.size(); ++i) tellOfEnd(untold[i], outputs[i], false);
+  tellOfMissedRuns();
 }
 
 void sweepRuns() {
@@ -278,7 +313,7 @@ void sweepRuns() {
 
 int keepHistory() {
   const int swept = attempt(sweepAndSay);
-  const int noted = attempt(markMachineUp);
+  const int noted = attempt([] { markMachineUp(false); });
   if (swept != kDone || noted != kDone) return std::max(swept, noted);
   return std::max(attempt(dropOld), attempt(haveRunsToldOf));
 }

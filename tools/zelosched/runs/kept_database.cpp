@@ -53,9 +53,10 @@ constexpr char kSchema[] =
     "CREATE TABLE swept(file TEXT PRIMARY KEY, status_id INTEGER NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE notice(kind TEXT NOT NULL, generation INTEGER NOT NULL, moment INTEGER NOT NULL,"
     " told INTEGER NOT NULL, PRIMARY KEY(kind, generation, moment)) WITHOUT ROWID;"
-    "CREATE TABLE IF NOT EXISTS up(boot TEXT NOT NULL, seen INTEGER NOT NULL);"
-    "CREATE TABLE IF NOT EXISTS missed(task_id INTEGER PRIMARY KEY, app TEXT NOT NULL,"
-    " due INTEGER NOT NULL);"
+    // `began`: when the machine was started, by the clock of the last look.
+    "CREATE TABLE boot(boot TEXT PRIMARY KEY, started INTEGER, began INTEGER NOT NULL,"
+    " seen INTEGER NOT NULL, clock_from INTEGER, clock_until INTEGER) WITHOUT ROWID;"
+    "CREATE TABLE acknowledged(generation INTEGER PRIMARY KEY, moment INTEGER NOT NULL);"
     "PRAGMA user_version = 2;";
 
 // The numbers in the last two are RunState, Outcome and Trigger of run_record.h. Of the runs of
@@ -70,7 +71,7 @@ constexpr char kFromFirst[] =
     " CASE WHEN status_code IN (5, 6) THEN CAST(comment AS INTEGER) END,"
     " 0, timestamp, boot, status_id, pid, 1"
     " FROM run_of_first ORDER BY timestamp, status_id, pid, task_id, app;"
-    "DROP TABLE run_of_first;";
+    "DROP TABLE run_of_first; DROP TABLE up; DROP TABLE missed;";
 
 Failure cannot(const char *what, const char *why) {
   return Failure(std::string("cannot ") + what + " " + kPath + ": " + why);
@@ -78,9 +79,9 @@ Failure cannot(const char *what, const char *why) {
 
 // Busy is something else than damaged: it passes.
 [[noreturn]] void fail(const char *what, sqlite3 *db) {
-  const Failure failure = cannot(what, sqlite3_errmsg(db));
-  if (sqlite3_errcode(db) == SQLITE_BUSY) throw DatabaseBusy(failure.what());
-  throw failure;
+  const char *const why = sqlite3_errmsg(db);
+  if (sqlite3_errcode(db) == SQLITE_BUSY) throw DatabaseBusy(cannot(what, why).what());
+  throw cannot(what, why);
 }
 
 void makeDirectories() {

@@ -1,6 +1,6 @@
 // What must outlive a boot, in /usr/zelo/var/history.sqlite: the runs and what they printed, since
-// the status database goes with /tmp; the tasks as they were last seen; when the machine was last
-// known to be up; and the tasks whose time passed while it was off.
+// the status database goes with /tmp; the tasks as they were last seen; and when the machine was
+// up.
 #pragma once
 
 #include <chrono>

@@ -6,46 +6,138 @@
 #include <algorithm>
 
 #include "runs/coming_runs.h"
-#include "runs/history.h"
-#include "runs/kept_database.h"
+#include "runs/planned_off.h"
+#include "runs/task_notes.h"
 #include "store/store_files.h"
 
 namespace {
 
-constexpr int64_t kMinute = 60;  // seconds
+constexpr int64_t kMinute = 60;          // seconds
+constexpr int64_t kGrace = 2 * kMinute;  // in which cron's program may still begin
+constexpr int64_t kClockMoved = 2 * kMinute;
 
-std::optional<time_t> lastRunBetween(const TaskRecord &task, time_t after, time_t last) {
-  const std::vector<LocalMinute> runs = runsBetween(task, localMinute(after), localMinute(last));
-  return runs.empty() ? std::nullopt : momentOf(runs.back());
+int64_t uptime() {
+  timespec up{};
+  clock_gettime(CLOCK_BOOTTIME, &up);
+  return static_cast<int64_t>(up.tv_sec);
 }
 
-// Cron begins with the minute after the one in which it was started.
-void noteMissed(const KeptDatabase &kept, time_t lastUp, time_t now) {
-  const TaskList list;
-  const time_t after = std::max(lastUp, now - kMissedRemembered);
-  Query note(kept, "INSERT OR REPLACE INTO missed(task_id, app, due) VALUES(?, ?, ?)");
-  for (const TaskRecord *task : list.tasks()) {
-    if (!isEnabled(*task) || isPower(*task)) continue;
-    const std::optional<time_t> due = lastRunBetween(*task, after, now);
-    if (due) note.with(task->ID).with(std::string(task->App)).with(*due).run();
+int64_t epoch() {
+  return static_cast<int64_t>(time(nullptr));
+}
+
+struct Boot {
+  std::optional<int64_t> started;  // the look before cron was started
+  int64_t began = 0;               // by the clock of the last look
+  bool wasClockSet = false;
+};
+
+std::optional<Boot> bootOf(const KeptDatabase &kept, const std::string &id) {
+  Query query(kept, "SELECT started, began, clock_until FROM boot WHERE boot = ?");
+  query.with(id);
+  if (!query.next()) return std::nullopt;
+  return Boot{query.optionalNumber(0), query.number(1), query.optionalNumber(2).has_value()};
+}
+
+// The first time in a boot that the clock was set, it was wrong before. Later on somebody has
+// changed the time, and what was due before was due.
+void noteClock(const KeptDatabase &kept, const std::string &id, const Boot &boot, int64_t now) {
+  const int64_t began = now - uptime();
+  const bool hasMoved = std::abs(began - boot.began) > kClockMoved;
+  if (hasMoved && !boot.wasClockSet) {
+    Query(kept, "UPDATE boot SET clock_from = ?, clock_until = ? WHERE boot = ?")
+        .with(began)
+        .with(now)
+        .with(id)
+        .run();
   }
+  Query(kept, "UPDATE boot SET began = ?, seen = ? WHERE boot = ?")
+      .with(began)
+      .with(now)
+      .with(id)
+      .run();
 }
 
-bool hasRunAt(const TaskRecord &task, time_t due) {
-  return lastRunBetween(task, due - kMinute, due).has_value();
+struct Span {
+  int64_t from;
+  int64_t until;
+};
+
+// In which the clock was wrong.
+std::vector<Span> unjudgedSpans(const KeptDatabase &kept) {
+  std::vector<Span> spans;
+  Query query(kept, "SELECT clock_from, clock_until FROM boot WHERE clock_until IS NOT NULL");
+  while (query.next()) spans.push_back({query.number(0), query.number(1)});
+  return spans;
 }
 
-bool ranSince(const TaskRecord &task, time_t due) {
-  RunFilter filter;
-  filter.task = task.ID;
-  filter.since = due;
-  const std::vector<KeptRun> runs = keptRuns(filter);
-  const time_t now = time(nullptr);
-  // One behind now was recorded by a clock that was wrong.
-  return std::any_of(runs.begin(), runs.end(), [&](const KeptRun &run) {
-    return run.start && *run.start >= due && *run.start <= now;
-  });
+// Up to which moment a time that was passed over counts as missed.
+int64_t judgedUntil(const KeptDatabase &kept, int64_t now) {
+  const std::optional<Boot> boot = bootOf(kept, bootId());
+  const int64_t certain = boot && boot->started ? *boot->started : 0;
+  return std::max(now - kGrace, std::min(certain, now));
 }
+
+class Judge {
+ public:
+  Judge(const KeptDatabase &kept, const TaskList &list, int64_t since, int64_t now)
+      : off_(list),
+        unjudged_(unjudgedSpans(kept)),
+        notes_(taskNotes(kept)),
+        lastRun_(kept, "SELECT max(moment) FROM run WHERE generation = ? AND moment <= ?"),
+        acknowledged_(kept, "SELECT moment FROM acknowledged WHERE generation = ?"),
+        since_(since),
+        now_(now),
+        until_(judgedUntil(kept, now)) {}
+
+  MissedTask missedOf(const TaskRecord &task) {
+    MissedTask missed{&task};
+    const auto note = notes_.find(task.ID);
+    if (note == notes_.end()) return missed;  // nobody knows since when it has been there
+    const int64_t since = sinceOf(note->second);
+    if (since >= until_) return missed;
+    for (const LocalMinute &minute : runsBetween(task, localMinute(since), localMinute(until_))) {
+      judge(minute, &missed);
+    }
+    return missed;
+  }
+
+ private:
+  int64_t sinceOf(const TaskNote &note) {
+    return std::max({since_, note.changed, numberOf(&lastRun_.with(note.generation).with(now_)),
+                     numberOf(&acknowledged_.with(note.generation))});
+  }
+
+  static int64_t numberOf(Query *query) {
+    int64_t number = 0;
+    while (query->next()) number = query->number(0);
+    return number;
+  }
+
+  void judge(const LocalMinute &minute, MissedTask *missed) const {
+    const std::optional<time_t> due = momentOf(minute);
+    if (!due) return;
+    const bool isUnjudged = std::any_of(unjudged_.begin(), unjudged_.end(), [&](const Span &span) {
+      return *due >= span.from && *due < span.until;
+    });
+    if (isUnjudged) return;
+    if (off_.isOffAt(minute)) {
+      ++missed->planned;
+    } else {
+      ++missed->times;
+      missed->due = *due;
+    }
+  }
+
+  PlannedOff off_;
+  std::vector<Span> unjudged_;
+  std::map<int64_t, TaskNote> notes_;
+  Query lastRun_;
+  Query acknowledged_;
+  int64_t since_;
+  int64_t now_;
+  int64_t until_;
+};
 
 }  // namespace
 
@@ -56,44 +148,56 @@ bool areTasksLost() {
   return !isThere && (access(kPersistentCopy, F_OK) == 0 || access(kLastGoodCopy, F_OK) == 0);
 }
 
-void markMachineUp() {
-  if (areTasksLost()) return;
+void markMachineUp(bool isStarting) {
   const KeptDatabase kept(KeptDatabase::kChange);
-  const std::string boot = bootId();
-  const time_t now = time(nullptr);
+  const std::string id = bootId();
+  const int64_t now = epoch();
   Transaction transaction(kept);
-  Query last(kept, "SELECT boot, seen FROM up");
-  const bool isKnown = last.next();
-  if (isKnown && last.text(0) != boot) noteMissed(kept, last.number(1), now);
-  // Noted by a clock that was wrong. What is long past stays until the task is missed again: it may
-  // be now that the clock is wrong.
-  Query(kept, "DELETE FROM missed WHERE due > ?").with(now).run();
-  Query(kept, "DELETE FROM up").run();
-  Query(kept, "INSERT INTO up(boot, seen) VALUES(?, ?)").with(boot).with(now).run();
+  const std::optional<Boot> boot = bootOf(kept, id);
+  if (boot) {
+    noteClock(kept, id, *boot, now);
+  } else {
+    Query(kept, "INSERT INTO boot(boot, started, began, seen) VALUES(?, ?, ?, ?)")
+        .with(id)
+        .with(isStarting ? std::optional<int64_t>(now) : std::nullopt)
+        .with(now - uptime())
+        .with(now)
+        .run();
+  }
+  Query(kept, "DELETE FROM boot WHERE boot <> ? AND seen < ?")
+      .with(id)
+      .with(now - 2 * kMissedRemembered)
+      .run();
   transaction.commit();
 }
 
-std::vector<MissedTask> missedTasks(const TaskList &list, time_t since) {
-  std::vector<MissedTask> missed;
-  const KeptDatabase kept(KeptDatabase::kRead);
-  if (!kept.isThere()) return missed;
-  Query query(kept,
-              "SELECT task_id, app, due FROM missed WHERE due BETWEEN ? AND ?"
-              " ORDER BY due, task_id");
-  query.with(since).with(time(nullptr));
-  while (query.next()) {
-    const auto &tasks = list.tasks();
-    const auto found = std::find_if(tasks.begin(), tasks.end(), [&](const TaskRecord *task) {
-      return task->ID == query.number(0) && task->App == query.text(1);
-    });
-    if (found == tasks.end() || !isEnabled(**found)) continue;
-    const time_t due = query.number(2);
-    if (hasRunAt(**found, due) && !ranSince(**found, due)) missed.push_back({*found, due});
+std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &list, time_t since) {
+  std::vector<MissedTask> found;
+  if (!kept.isThere() || areTasksLost()) return found;
+  const int64_t now = epoch();
+  Judge judge(kept, list, std::max(static_cast<int64_t>(since), now - kMissedRemembered), now);
+  for (const TaskRecord *task : list.tasks()) {
+    if (!isEnabled(*task) || isPower(*task)) continue;
+    const MissedTask missed = judge.missedOf(*task);
+    if (missed.times + missed.planned > 0) found.push_back(missed);
   }
-  return missed;
+  std::stable_sort(found.begin(), found.end(),
+                   [](const MissedTask &a, const MissedTask &b) { return a.due < b.due; });
+  return found;
 }
 
-void forgetMissed(const TaskRecord &task) {
-  const KeptDatabase kept(KeptDatabase::kChange);
-  Query(kept, "DELETE FROM missed WHERE task_id = ?").with(task.ID).run();
+void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task) {
+  Transaction transaction(kept);
+  Query note(
+      kept,
+      "INSERT OR REPLACE INTO acknowledged(generation, moment)"
+      " SELECT generation, ?1 FROM task WHERE removed IS NULL AND (?2 IS NULL OR task = ?2)");
+  note.with(epoch()).with(task).run();
+  transaction.commit();
+}
+
+int64_t acknowledgedAt(const KeptDatabase &kept, int64_t generation) {
+  Query query(kept, "SELECT moment FROM acknowledged WHERE generation = ?");
+  query.with(generation);
+  return query.next() ? query.number(0) : 0;
 }

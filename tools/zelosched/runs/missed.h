@@ -1,33 +1,42 @@
-// Tasks whose time passed while the machine was off.
+// Times at which a task was due and did not run, whatever kept it from that: the machine was off,
+// cron was stopped, or the program that cron starts was gone.
 #pragma once
 
 #include <cstdint>
 #include <ctime>
+#include <optional>
 #include <vector>
 
+#include "runs/kept_database.h"
 #include "store/task_list.h"
 
-// How long a missed task is told of.
-inline constexpr int64_t kMissedRemembered = int64_t{7} * 24 * 60 * 60;  // seconds
+// How long a missed time is told of.
+inline constexpr int64_t kMissedRemembered = int64_t{8} * 24 * 60 * 60;  // seconds
 
-struct MissedTask {
-  const TaskRecord *task;
-  time_t due;  // the latest of its times that passed
-};
-
-// Notes that the machine is up. The first call after a boot also notes the enabled tasks that were
-// due since the last call before it: right then the tasks are those that the machine went off with,
-// and one that is added later has missed nothing. Power times are no tasks that could be made up
-// for. As long as the tasks are missing from /tmp it notes nothing at all, so that the first call
-// with them finds what they missed. Throws Failure.
-void markMachineUp();
+// Notes that the machine is up, and how its clock stands. `isStarting`: cron was not started so
+// far, so that what is due up to this minute was missed for certain. Throws Failure.
+void markMachineUp(bool isStarting);
 
 // The tasks could not be put back into /tmp, or nobody tried so far.
 bool areTasksLost();
 
-// The tasks of the list that were due since that moment while the machine was off, are enabled and
-// have that time still, and did not run afterwards; by the time when they were due. Throws Failure.
-std::vector<MissedTask> missedTasks(const TaskList &list, time_t since);
+struct MissedTask {
+  const TaskRecord *task;
+  time_t due = 0;  // the latest of its times that it missed; 0 when there are none but planned ones
+  size_t times = 0;    // so many of them
+  size_t planned = 0;  // beside those, as the machine was off by its power times
+};
 
-// It was made up for. Throws Failure.
-void forgetMissed(const TaskRecord &task);
+// The enabled tasks of the list with such times, by the latest of these: since the task got the
+// schedule and the state that it has, since it ran for the last time, since they were acknowledged,
+// and since `since`, whichever is the latest. A time counts two minutes after it. What was due
+// before the clock was right after a boot is not judged. Power times are no tasks in this sense.
+// Throws Failure.
+std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &list, time_t since);
+
+// From now on nothing is told of what became of the runs of this task, or of all, so far.
+// Throws Failure.
+void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task);
+
+// When that was last said of a task; 0 when it never was.
+int64_t acknowledgedAt(const KeptDatabase &kept, int64_t generation);

@@ -92,8 +92,9 @@ class OutputOnDisk {
 class Environment {
  public:
   void set(const char *name, const std::string &value) {
-    // A C string ends at the first zero byte.
-    entries_.push_back(std::string(name) + "=" + value.c_str());
+    const std::string begin = std::string(name) + "=";
+    std::erase_if(entries_, [&](const std::string &entry) { return entry.starts_with(begin); });
+    entries_.push_back(begin + value.substr(0, value.find('\0')));
   }
   void set(const char *name, std::optional<int64_t> value) {
     set(name, value ? std::to_string(*value) : std::string());
@@ -212,4 +213,10 @@ void tellOfEnd(const RunRecord &record, const Output &output, bool isRecovered) 
   const OutputOnDisk file(output);
   const Environment environment = environmentOf(record, file.path(), isRecovered);
   for (const std::string &program : all) run(program, environment);
+}
+
+void tellOfMissed(const RunRecord &record) {
+  Environment environment = environmentOf(record, "", false);
+  environment.set("ZELO_RUN_OUTCOME", std::string("missed"));
+  for (const std::string &program : programs()) run(program, environment);
 }

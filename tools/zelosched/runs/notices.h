@@ -12,3 +12,7 @@ bool isAnybodyToBeTold();
 // is a line in the system log. `isRecovered`: it is the first that ended well after one that did
 // not.
 void tellOfEnd(const RunRecord &run, const Output &output, bool isRecovered);
+
+// The same of a time at which a task was due and did not run. The outcome is "missed"; there is no
+// run, and nothing was printed.
+void tellOfMissed(const RunRecord &run);

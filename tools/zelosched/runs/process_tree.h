@@ -3,6 +3,7 @@
 
 #include <sys/types.h>
 
+#include <cstdint>
 #include <map>
 #include <set>
 
@@ -29,7 +30,7 @@ class ProcessTree {
  private:
   struct Held {
     int file;
-    unsigned long long started;
+    unsigned int64_t started;
   };
   void forget(pid_t pid);
 

@@ -40,6 +40,12 @@ void requireFile(int file, const std::string &path) {
   if (!S_ISREG(info.st_mode)) throw Failure(path + " is no regular file");
 }
 
+std::string directoryOf(const std::string &path) {
+  const size_t slash = path.rfind('/');
+  if (slash == std::string::npos) return ".";
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
 std::string withoutSuffix(const std::string &path) {
   return path.substr(0, path.rfind('.'));
 }
@@ -76,6 +82,6 @@ void placeFile(const std::string &path, const std::string &contents, mode_t mode
   SchedNewFile file(path.c_str());
   fill(&file, contents, mode);
   if (!file.rename(path.c_str())) throw cannot("replace", path);
-  const std::string directory = path.substr(0, path.rfind('/'));
+  const std::string directory = directoryOf(path);
   if (!schedSyncDirectory(directory.c_str())) throw cannot("write", directory);
 }
