@@ -162,7 +162,7 @@ ProcessName processNamed(int64_t pid) {
 bool isAlive(const ProcessName &process) {
   if (process.pid <= 0 || process.born == 0) return false;
   const ProcessStat stat = statOf(static_cast<pid_t>(process.pid));
-  return stat.started == static_cast<unsigned int64_t>(process.born) && stat.state != 'Z' &&
+  return stat.started == static_cast<unsigned long long>(process.born) && stat.state != 'Z' &&
          stat.state != 'X';
 }
 

@@ -72,7 +72,7 @@ size_t ProcessTree::look() {
     const int file = static_cast<int>(syscall(SYS_pidfd_open, pid, 0));
     if (file < 0) continue;
     // It may be another one by now.
-    const unsigned int64_t started = all.at(pid).started;
+    const unsigned long long started = all.at(pid).started;
     if (statOf(pid).started == started) {
       held_[pid] = {file, started};
     } else {

@@ -3,7 +3,6 @@
 
 #include <sys/types.h>
 
-#include <cstdint>
 #include <map>
 #include <set>
 
@@ -30,7 +29,7 @@ class ProcessTree {
  private:
   struct Held {
     int file;
-    unsigned int64_t started;
+    unsigned long long started;
   };
   void forget(pid_t pid);
 

@@ -3,13 +3,12 @@
 
 #include <sys/types.h>
 
-#include <cstdint>
 #include <map>
 
 struct ProcessStat {
   char state = '\0';  // as ps shows it
   pid_t parent = 0;
-  unsigned int64_t started = 0;
+  unsigned long long started = 0;
 };
 
 ProcessStat statOf(pid_t pid);
