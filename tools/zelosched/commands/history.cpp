@@ -49,10 +49,10 @@ std::string durationText(const KeptRun &run) {
   if (!seconds) return kNothing;
   constexpr int64_t kMinute = 60;
   constexpr int64_t kHour = 3600;
-  char text[64];
-  std::snprintf(text, sizeof text, "%lld:%02d:%02d", static_cast<int64_t>(*seconds / kHour),
-                static_cast<int>(*seconds % kHour / kMinute), static_cast<int>(*seconds % kMinute));
-  return text;
+  char rest[16];
+  std::snprintf(rest, sizeof rest, ":%02d:%02d", static_cast<int>(*seconds % kHour / kMinute),
+                static_cast<int>(*seconds % kMinute));
+  return std::to_string(*seconds / kHour) + rest;
 }
 
 void print(const std::vector<KeptRun> &runs) {
