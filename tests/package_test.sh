@@ -164,6 +164,8 @@ libzeloscheduler-dev lrwxrwxrwx root:root usr/LIB/libzeloscheduler.so
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-catch-up.service
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-history.service
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-history.timer
+zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-metrics.service
+zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-metrics.timer
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-restore.service
 zeloscheduler-tools -rw-r--r-- root:root lib/systemd/system/zelosched-shutdown.service
 zeloscheduler-tools -rw-r--r-- root:root usr/lib/tmpfiles.d/libzeloscheduler-program.conf

@@ -1,6 +1,7 @@
 // What a list tells in few words: schedules, runs, and cells that go on below.
 #include <gtest/gtest.h>
 
+#include "runs/history.h"
 #include "runs/latest_runs.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
@@ -109,14 +110,14 @@ TEST(ZeloschedRunInBriefTest, ARunThatGoesOn) {
   run.state = RunState::kRunning;
   run.start = 200;
   EXPECT_EQ(runInBrief(run, 200 + 17 * 60), "running for 17 min");
-  EXPECT_FALSE(endedBadly(run));
+  EXPECT_FALSE(isBad(run));
 }
 
 TEST(ZeloschedRunInBriefTest, WhatEndedOtherwiseThanWellIsBad) {
-  EXPECT_FALSE(endedBadly(ended(Outcome::kFinished, 0)));
+  EXPECT_FALSE(isBad(ended(Outcome::kFinished, 0)));
   for (const Outcome outcome : {Outcome::kFailed, Outcome::kKilled, Outcome::kNotStarted,
                                 Outcome::kTimeLimit, Outcome::kGaveUp, Outcome::kLost}) {
-    EXPECT_TRUE(endedBadly(ended(outcome, 0)));
+    EXPECT_TRUE(isBad(ended(outcome, 0)));
   }
 }
 

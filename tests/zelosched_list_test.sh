@@ -57,6 +57,15 @@ print(base64.b64decode(json.loads(json.load(sys.stdin)["cmd"])).decode(), end=""
 
 # ---- the list -------------------------------------------------------------------------------
 
+readonly HISTORY=/usr/zelo/var/history.sqlite
+# Its keeper writes of a run once more when it has told of its end.
+started_at_nine() {
+  until [[ $(sqlite3 "$HISTORY" "SELECT count(*) FROM run WHERE state = 2 AND told = 0") == 0 ]]; do sleep 0.01; done
+  sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET timestamp = $(date -u -d '2026-11-22 09:00' +%s)"
+  sqlite3 "$HISTORY" "UPDATE run SET start = $(date -u -d '2026-11-22 09:00' +%s),
+    ended = iif(state = 2, $(date -u -d '2026-11-22 09:00' +%s), NULL)"
+}
+
 common_tasks() {
   clean
   add --daily 02:30 --name "Nightly backup" --owner root -- 'exit 7'
@@ -66,7 +75,7 @@ common_tasks() {
   add --daily 12:00 --name Off --disabled -- true
   z run 1 --wait >/dev/null 2>&1 || true
   z run 2 --wait >/dev/null
-  sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET timestamp = $(date -u -d '2026-11-22 09:00' +%s)"
+  started_at_nine
 }
 
 readonly AT_A_GLANCE="ID  NAME            OWNER  SCHEDULE                NEXT RUN    LAST RUN
@@ -125,17 +134,24 @@ a_run_that_goes_on_is_told() {
   add --daily 08:30 --name long -- 'sleep 100'
   z run 1 >/dev/null
   until [[ $(z list) == *running* ]]; do sleep 0.01; done
-  sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET timestamp = $(date -u -d '2026-11-22 09:00' +%s)"
+  started_at_nine
   [[ $(at '2026-11-22 09:17' list | tail -1) == *"  running for 17 min" ]]
 }
 
 runs_that_cannot_be_seen_are_not_chosen_from() {
   common_tasks
+  head -c 8192 /dev/urandom >"$HISTORY"
+  try z list --failed
+  [[ $status == 1 && -z $out && $err == "zelosched: cannot "*" $HISTORY: "* ]] || return 1
+  try z list
+  [[ $status == 1 && $out == *"Nightly backup"*"  ?"* && $err == "zelosched: cannot "*" $HISTORY: "* ]]
+}
+
+what_is_known_is_shown_beside_a_damaged_status_database() {
+  common_tasks
   head -c 8192 /dev/urandom >/tmp/sched_status.sqlite
   try z list --failed
-  [[ $status == 1 && -z $out && $err == "zelosched: cannot read /tmp/sched_status.sqlite: "* ]] || return 1
-  try z list
-  [[ $status == 1 && $out == *"Nightly backup"*"  ?"* && $err == "zelosched: cannot read /tmp/sched_status.sqlite: "* ]]
+  [[ $status == 1 && $out == *"Nightly backup"*"failed 7"* && $err == "zelosched: cannot read /tmp/sched_status.sqlite: "* ]]
 }
 
 # ---- names ----------------------------------------------------------------------------------
@@ -265,6 +281,7 @@ check "power times are listed when they are asked for" power_times_come_when_ask
 check "tasks are chosen by owner, application, failure and run" chooses
 check "how long a run goes on is told" a_run_that_goes_on_is_told
 check "nothing is chosen by runs that cannot be seen" runs_that_cannot_be_seen_are_not_chosen_from
+check "what is known is shown beside a damaged status database" what_is_known_is_shown_beside_a_damaged_status_database
 check "a task is named by its name wherever its id is taken" takes_names
 check "a name of several tasks is refused with their ids" a_name_of_several_is_refused
 check "a name of no task keeps all as it is" an_unknown_name_changes_nothing

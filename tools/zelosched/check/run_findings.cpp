@@ -32,6 +32,7 @@ class RunCheck {
 
   Findings make() {
     const KeptDatabase kept(KeptDatabase::kRead);
+    const Snapshot snapshot(kept);
     judgeLastRuns(kept);
     judgeMissed(kept);
     judgeRunning(kept);
@@ -155,6 +156,6 @@ Findings checkRuns(const TaskList &list) {
     return {
         {Severity::kUnknown, "runs", "which runs failed, were missed or go on, only root may see"}};
   }
-  sweepRuns();
+  sweepRuns(list);
   return RunCheck(list).make();
 }

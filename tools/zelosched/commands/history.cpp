@@ -118,7 +118,7 @@ int runHistory(int argc, char **argv) {
   }
   filter.limit = arguments.number("limit", 1, kMostRuns).value_or(kUsualLimit);
   // What it cannot take over is said, and what is kept is shown all the same.
-  int status = geteuid() == 0 ? attempt(sweepRuns) : kDone;
+  int status = geteuid() == 0 ? attempt([] { sweepRuns(); }) : kDone;
   std::vector<KeptRun> runs;
   const int read = attempt([&] { runs = keptRuns(filter); });
   if (read != kDone) return read;

@@ -12,6 +12,7 @@
 #include "json/json_out.h"
 #include "json/task_json.h"
 #include "runs/coming_runs.h"
+#include "runs/history.h"
 #include "runs/latest_runs.h"
 #include "store/owner.h"
 #include "store/task_list.h"
@@ -98,7 +99,7 @@ class Choice {
  private:
   bool hasFailed(const ZELO_SCHED_TASK &task) const {
     const RunRecord *last = runs_.of(task.ID);
-    return last != nullptr && endedBadly(*last);
+    return last != nullptr && isBad(*last);
   }
 
   const Arguments &arguments_;
@@ -151,7 +152,7 @@ void printTable(const std::vector<Row> &rows, time_t now) {
                {"LAST RUN", Column::kLeft, true, true}});
   for (const Row &row : rows) {
     const Emphasis dim = isEnabled(*row.task) ? Emphasis::kNone : Emphasis::kDim;
-    const bool failed = row.last != nullptr && endedBadly(*row.last);
+    const bool failed = row.last != nullptr && isBad(*row.last);
     table.add({{std::to_string(row.task->ID)},
                {row.task->Name},
                {row.owner},
@@ -183,7 +184,7 @@ int runList(int argc, char **argv) {
   arguments.requireNoCommand();
   const SortKey &key = sortKey(arguments.value("sort", "next"));
   const TaskList list;
-  const LatestRuns runs = latestRuns();
+  const LatestRuns runs = latestRuns(list);
   const Choice choice(arguments, runs);
   const time_t now = time(nullptr);
   std::vector<Row> rows = rowsOf(choice, list, runs, localMinute(now));

@@ -82,7 +82,7 @@ int runLog(int argc, char **argv) {
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   if (ids.size() > 1) throw UsageError("one task at a time");
   const std::optional<int64_t> number = arguments.number("run", 1, kMostRun);
-  if (geteuid() == 0) attempt(sweepRuns);
+  if (geteuid() == 0) attempt([] { sweepRuns(); });
   const KeptRun run = chooseRun(ids.front(), number);
   RunOutput output(-1);
   if (run.state != RunState::kEnded) {

@@ -101,8 +101,9 @@ void addOutcomes(const KeptDatabase &kept, MetricsText *text) {
 }
 
 void addRuns(const TaskList &list, MetricsText *text) {
-  sweepRuns();
+  sweepRuns(list);
   const KeptDatabase kept(KeptDatabase::kRead);
+  const Snapshot snapshot(kept);
   addLastRuns(lastRunsOf(kept, list), text);
   addMissed(kept, list, text);
   addOutcomes(kept, text);

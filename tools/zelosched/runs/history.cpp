@@ -175,7 +175,9 @@ std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter) {
   if (!kept.isThere()) return runs;
   std::vector<int64_t> values;
   const std::string sql = "SELECT " COLUMNS " FROM run" + conditionOf(kept, filter, &values) +
-                          " ORDER BY moment DESC, run DESC LIMIT ?";
+                          // The few that have not ended have an index of their own.
+                          (filter.underWay ? " ORDER BY +moment DESC" : " ORDER BY moment DESC") +
+                          ", run DESC LIMIT ?";
   Query query(kept, sql.c_str());
   for (const int64_t value : values) query.with(value);
   query.with(filter.limit);
@@ -189,7 +191,7 @@ std::vector<KeptRun> lastRuns(const KeptDatabase &kept) {
   Query query(kept, "SELECT " COLUMNS
                     " FROM run WHERE run IN (SELECT (SELECT run FROM run WHERE"
                     " run.generation = task.generation ORDER BY moment DESC, run DESC LIMIT 1)"
-                    " FROM task WHERE removed IS NULL) ORDER BY task");
+                    " FROM task WHERE removed IS NULL)");
   while (query.next()) runs.push_back(runOf(query));
   return runs;
 }

@@ -16,6 +16,8 @@
 #include "runs/status_row.h"
 #include "runs/task_notes.h"
 #include "store/owner.h"
+#include "store/store_copy.h"
+#include "store/store_files.h"
 #include "store/task_list.h"
 #include "store/task_program.h"
 #include "terminal/failure.h"
@@ -193,9 +195,17 @@ void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
   printed.remove();
 }
 
+// The library leaves out what it cannot read, one task or all of them.
+bool isWhole(const TaskList &list) {
+  const auto ordinary = std::count_if(list.tasks().begin(), list.tasks().end(),
+                                      [](const TaskRecord *task) { return !isPower(*task); });
+  const std::optional<int> stored = countSections(kWorkingCopy);
+  return stored && *stored == ordinary;
+}
+
 int64_t Sweep::run(const KeptDatabase &kept) {
   Transaction transaction(kept);
-  if (!areTasksLost()) noteTasks(kept, list_);
+  if (!areTasksLost()) noteTasks(kept, list_, isWhole(list_));
   takeOver(kept);
   RunFilter filter;
   filter.underWay = true;
@@ -204,10 +214,9 @@ int64_t Sweep::run(const KeptDatabase &kept) {
   return changed_;
 }
 
-int64_t sweep() {
+int64_t sweep(const TaskList &list) {
   const RunDatabase status;
   if (status.lastStatusId() == 0 && !KeptDatabase(KeptDatabase::kRead).isThere()) return 0;
-  const TaskList list(TaskList::Unreadable::kIsLeftOut);
   const KeptDatabase kept(KeptDatabase::kChange);
   Sweep sweep(status, list);
   const int64_t changed = sweep.run(kept);
@@ -219,7 +228,7 @@ int64_t sweep() {
 
 // The clock alone must not fill the log.
 void sweepAndSay() {
-  const int64_t count = sweep();
+  const int64_t count = sweep(TaskList(TaskList::Unreadable::kIsLeftOut));
   if (count > 0) std::printf("%s kept\n", counted(static_cast<size_t>(count), "run").c_str());
 }
 
@@ -308,7 +317,11 @@ void tellOfRuns() {
 }
 
 void sweepRuns() {
-  sweep();
+  sweep(TaskList(TaskList::Unreadable::kIsLeftOut));
+}
+
+void sweepRuns(const TaskList &list) {
+  sweep(list);
 }
 
 int keepHistory() {

@@ -276,6 +276,17 @@ void Transaction::commit() {
   isCommitted_ = true;
 }
 
+// Within a transaction that is the case already.
+Snapshot::Snapshot(const KeptDatabase &database)
+    : database_(database),
+      isOurs_(database.isThere() && sqlite3_get_autocommit(database.get()) != 0) {
+  if (isOurs_) Query(database_, "BEGIN").run();
+}
+
+Snapshot::~Snapshot() {
+  if (isOurs_) sqlite3_exec(database_.get(), "ROLLBACK", nullptr, nullptr, nullptr);
+}
+
 void KeptDatabase::Close::operator()(sqlite3 *db) const {
   sqlite3_close(db);
 }

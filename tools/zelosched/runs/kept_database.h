@@ -93,3 +93,16 @@ class Transaction {
   const KeptDatabase &database_;
   bool isCommitted_ = false;
 };
+
+// What is read while one lives is of one moment, and is locked once and not for each statement.
+class Snapshot {
+ public:
+  explicit Snapshot(const KeptDatabase &database);
+  ~Snapshot();
+  Snapshot(const Snapshot &) = delete;
+  Snapshot &operator=(const Snapshot &) = delete;
+
+ private:
+  const KeptDatabase &database_;
+  bool isOurs_;
+};

@@ -1,53 +1,12 @@
 #include "runs/latest_runs.h"
 
 #include <string.h>
-#include <zelosched.h>
 
-#include <algorithm>
-
-#include "runs/runs.h"
+#include "runs/history.h"
+#include "runs/history_keep.h"
 #include "terminal/failure.h"
-#include "terminal/number.h"
 
 namespace {
-
-std::optional<int> numberOf(const std::string &comment) {
-  const std::optional<int64_t> number = parseNumber(comment);
-  if (!number || *number < 0 || *number > INT32_MAX) return std::nullopt;
-  return static_cast<int>(*number);
-}
-
-RunRecord recordOf(const Run &run) {
-  RunRecord record;
-  record.task = run.taskId;
-  record.app = run.app;
-  record.start = run.start;
-  record.state = RunState::kEnded;
-  switch (run.statusCode) {
-    case ZELO_SCHED_STATUS_RUNNING:
-      record.state = RunState::kRunning;
-      break;
-    case ZELO_SCHED_STATUS_FINISHED:
-      record.outcome = Outcome::kFinished;
-      record.exitCode = 0;
-      break;
-    case ZELO_SCHED_STATUS_NOT_STARTED:
-      record.outcome = Outcome::kNotStarted;
-      break;
-    case ZELO_SCHED_STATUS_STOPPED:
-    case ZELO_SCHED_STATUS_KILLED:
-      record.outcome = Outcome::kKilled;
-      record.signal = numberOf(run.comment);
-      break;
-    case ZELO_SCHED_STATUS_EXIT_NONZERO:
-      record.outcome = Outcome::kFailed;
-      record.exitCode = numberOf(run.comment);
-      break;
-    default:
-      record.outcome = Outcome::kLost;
-  }
-  return record;
-}
 
 std::string signalName(int signal) {
   const char *name = sigabbrev_np(signal);
@@ -76,20 +35,32 @@ const RunRecord *LatestRuns::of(int64_t task) const {
   return found == ofEach.end() ? nullptr : &found->second;
 }
 
-// The status database is in "/tmp", where anybody can be in its way: tasks are shown without it.
-LatestRuns latestRuns() {
+// What the sweep cannot take over, since somebody is in the way of the status database in "/tmp",
+// say, is told, and what is known is shown all the same.
+LatestRuns latestRuns(const TaskList &list) {
   LatestRuns latest;
-  if (!mayReadRuns()) return latest;
+  if (!mayReadAllRuns()) return latest;
   try {
-    const RunDatabase database;
-    for (const auto &[task, run] : database.latestOfEach()) latest.ofEach[task] = recordOf(run);
-    for (const Run &run : database.running()) latest.running.insert(run.taskId);
+    sweepRuns(list);
+  } catch (const Failure &failure) {
+    latest.fault = failure.what();
+  }
+  try {
+    const KeptDatabase kept(KeptDatabase::kRead);
+    for (KeptRun &run : lastRuns(kept)) latest.ofEach[run.task] = std::move(run);
+    RunFilter underWay;
+    underWay.underWay = true;
+    for (const KeptRun &run : runsOf(kept, underWay)) latest.running.insert(run.task);
     latest.isKnown = true;
   } catch (const Failure &failure) {
     latest = {};
     latest.fault = failure.what();
   }
   return latest;
+}
+
+LatestRuns latestRuns() {
+  return latestRuns(TaskList(TaskList::Unreadable::kIsLeftOut));
 }
 
 std::string outcomeInBrief(const RunRecord &run) {
@@ -116,8 +87,4 @@ std::string runInBrief(const RunRecord &run, int64_t now) {
   if (!moment) return outcome;
   const std::string span = spanText(now - *moment);
   return run.state == RunState::kEnded ? outcome + ", " + span + " ago" : outcome + " for " + span;
-}
-
-bool endedBadly(const RunRecord &run) {
-  return run.state == RunState::kEnded && run.outcome != Outcome::kFinished;
 }

@@ -175,6 +175,7 @@ std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &li
   std::vector<MissedTask> found;
   if (!kept.isThere() || areTasksLost()) return found;
   const int64_t now = epoch();
+  const Snapshot snapshot(kept);
   Judge judge(kept, list, std::max(static_cast<int64_t>(since), now - kMissedRemembered), now);
   for (const TaskRecord *task : list.tasks()) {
     if (!isEnabled(*task) || isPower(*task)) continue;

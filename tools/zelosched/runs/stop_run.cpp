@@ -122,7 +122,7 @@ Stopped stopRun(const KeptRun &run, std::chrono::milliseconds grace) {
 }
 
 std::vector<KeptRun> runsToStop(int64_t task) {
-  attempt(sweepRuns);
+  attempt([] { sweepRuns(); });
   RunFilter filter;
   filter.task = task;
   filter.underWay = true;

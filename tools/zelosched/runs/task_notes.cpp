@@ -50,14 +50,26 @@ struct Seen {
   bool isEnabled;
 };
 
+#define SELECT_SEEN                                                                        \
+  "SELECT generation, app, name, schedule, command, enabled, task FROM task WHERE removed" \
+  " IS NULL"
+
+Seen seenOf(const Query &query) {
+  return {query.number(0), query.text(1), query.text(2),
+          query.text(3),   query.text(4), query.number(5) != 0};
+}
+
 std::optional<Seen> seenOf(const KeptDatabase &kept, int64_t id) {
-  Query query(kept,
-              "SELECT generation, app, name, schedule, command, enabled FROM task"
-              " WHERE task = ? AND removed IS NULL");
+  Query query(kept, SELECT_SEEN " AND task = ?");
   query.with(id);
-  if (!query.next()) return std::nullopt;
-  return Seen{query.number(0), query.text(1), query.text(2),
-              query.text(3),   query.text(4), query.number(5) != 0};
+  return query.next() ? std::optional<Seen>(seenOf(query)) : std::nullopt;
+}
+
+std::map<int64_t, Seen> allSeen(const KeptDatabase &kept) {
+  std::map<int64_t, Seen> all;
+  Query query(kept, SELECT_SEEN);
+  while (query.next()) all[query.number(6)] = seenOf(query);
+  return all;
 }
 
 void update(const KeptDatabase &kept, const TaskRecord &task, const Seen &seen) {
@@ -93,8 +105,7 @@ void adoptRuns(const KeptDatabase &kept, const TaskRecord &task) {
       .run();
 }
 
-void look(const KeptDatabase &kept, const TaskRecord &task) {
-  const std::optional<Seen> seen = seenOf(kept, task.ID);
+void look(const KeptDatabase &kept, const TaskRecord &task, const Seen *seen) {
   if (seen && !isAnother(task, *seen)) return update(kept, task, *seen);
   if (seen) end(kept, task.ID);
   add(kept, task, std::nullopt);
@@ -164,18 +175,21 @@ void noteRemoved(const TaskRecord &task) {
   });
 }
 
-void noteTasks(const KeptDatabase &kept, const TaskList &list) {
-  std::map<int64_t, TaskNote> gone = taskNotes(kept);
+void noteTasks(const KeptDatabase &kept, const TaskList &list, bool isWhole) {
+  std::map<int64_t, Seen> left = allSeen(kept);
   for (const TaskRecord *task : list.tasks()) {
     if (isPower(*task)) continue;
-    gone.erase(task->ID);
-    look(kept, *task);
+    const auto seen = left.find(task->ID);
+    look(kept, *task, seen == left.end() ? nullptr : &seen->second);
+    if (seen != left.end()) left.erase(seen);
   }
-  for (const auto &[id, unused] : gone) end(kept, id);
+  if (!isWhole) return;
+  for (const auto &[id, unused] : left) end(kept, id);
 }
 
 std::optional<int64_t> generationOf(const KeptDatabase &kept, const TaskRecord &task) {
-  look(kept, task);
+  const std::optional<Seen> before = seenOf(kept, task.ID);
+  look(kept, task, before ? &*before : nullptr);
   const std::optional<Seen> seen = seenOf(kept, task.ID);
   return seen ? std::optional<int64_t>(seen->generation) : std::nullopt;
 }

@@ -29,8 +29,9 @@ void noteCreated(const TaskRecord &task);
 void noteEdited(const TaskRecord &task);
 void noteRemoved(const TaskRecord &task);
 
-// Notes what other programs have changed since the last look. In a transaction of the caller's.
-void noteTasks(const KeptDatabase &kept, const TaskList &list);
+// Notes what other programs have changed since the last look. Only where the list has every stored
+// task (`isWhole`) are those that it lacks gone. In a transaction of the caller's.
+void noteTasks(const KeptDatabase &kept, const TaskList &list, bool isWhole);
 
 // The generation of a task that runs now, noted when it was not known.
 std::optional<int64_t> generationOf(const KeptDatabase &kept, const TaskRecord &task);
