@@ -35,7 +35,7 @@ void writeNumber(int64_t number, char *str, size_t cbStr) {
 }
 
 // The number of a text that is nothing but a few digits, as nearly all are. Reading each with
-// strtol would take three times as long.
+// strtoll would take three times as long.
 bool readShortNumber(const char *str, uint32_t *number) {
   constexpr int kFitAlways = 9;
   uint32_t value = 0;
@@ -58,8 +58,9 @@ int signedFromText(void *private_data, const char *str) {
   SCHED_CHECK_ARG(private_data != nullptr, "((void *)0) != private_data", -1);
   SCHED_CHECK_ARG(str != nullptr, "NULL != str", -1);
   uint32_t number = 0;
-  *static_cast<int32_t *>(private_data) =
-      static_cast<int32_t>(readShortNumber(str, &number) ? number : strtol(str, nullptr, kDecimal));
+  // Of a longer number the lowest 32 bits are kept, which strtol would not give where long has 32.
+  *static_cast<int32_t *>(private_data) = static_cast<int32_t>(
+      readShortNumber(str, &number) ? number : strtoll(str, nullptr, kDecimal));
   return 0;
 }
 
@@ -77,7 +78,7 @@ int unsignedFromText(void *private_data, const char *str) {
     return 0;
   }
   char *end = nullptr;
-  *static_cast<uint32_t *>(private_data) = static_cast<uint32_t>(strtoul(str, &end, kDecimal));
+  *static_cast<uint32_t *>(private_data) = static_cast<uint32_t>(strtoull(str, &end, kDecimal));
   if (*end != '\0') {
     SCHED_SET_ERROR(kErrMalformed);
     return -1;

@@ -13,6 +13,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <climits>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -189,36 +190,47 @@ void keepJournal(sqlite3 *db) {
   sqlite3_finalize(statement);
 }
 
-int32_t numberOf(const char *szValue) {
-  return szValue != nullptr ? static_cast<int32_t>(strtol(szValue, nullptr, 10)) : 0;
+// A row of the table. The interface's record has 32 bits for the time, which end in 2038.
+struct Row : ZELO_SCHED_STATUS {
+  long long started;
+};
+
+// strtol would give other numbers where long has 32 bits.
+long long numberOf(const char *szValue) {
+  return szValue != nullptr ? strtoll(szValue, nullptr, 10) : 0;
 }
 
-void takeColumn(ZELO_SCHED_STATUS *row, const char *szColumn, const char *szValue) {
+long asLong(long long number) {
+  return static_cast<long>(std::clamp<long long>(number, LONG_MIN, LONG_MAX));
+}
+
+void takeColumn(Row *row, const char *szColumn, const char *szValue) {
   if (isNamed(szColumn, "pid")) {
-    row->pid = numberOf(szValue);
+    row->pid = static_cast<int32_t>(numberOf(szValue));
   } else if (isNamed(szColumn, "status_id")) {
-    row->statusID = numberOf(szValue);
+    row->statusID = static_cast<int32_t>(numberOf(szValue));
   } else if (isNamed(szColumn, "timestamp")) {
-    row->timestamp = numberOf(szValue);
+    row->started = numberOf(szValue);
+    row->timestamp = static_cast<int32_t>(row->started);
   } else if (isNamed(szColumn, "task_id")) {
-    row->taskID = szValue != nullptr ? strtol(szValue, nullptr, 10) : 0;
+    row->taskID = asLong(numberOf(szValue));
   } else if (isNamed(szColumn, "app")) {
     copyText(row->szApp, szValue != nullptr ? szValue : "");
   } else if (isNamed(szColumn, "status_code")) {
-    row->statusCode = numberOf(szValue);
+    row->statusCode = static_cast<int32_t>(numberOf(szValue));
   } else if (isNamed(szColumn, "comment")) {
     copyText(row->szComment, szValue != nullptr ? szValue : "");
   }
 }
 
-void takeColumns(ZELO_SCHED_STATUS *row, int columns, char **values, char **names) {
+void takeColumns(Row *row, int columns, char **values, char **names) {
   for (int i = 0; i < columns; ++i) {
     takeColumn(row, names[i], values[i]);
   }
 }
 
 int takeFirstRow(void *context, int columns, char **values, char **names) {
-  auto *row = static_cast<ZELO_SCHED_STATUS *>(context);
+  auto *row = static_cast<Row *>(context);
   if (row->found == 0) {
     takeColumns(row, columns, values, names);
     row->found = 1;
@@ -231,7 +243,7 @@ int takeFirstLiveRow(void *context, int columns, char **values, char **names) {
   if (live->found != 0) {
     return 0;
   }
-  ZELO_SCHED_STATUS row = {};
+  Row row = {};
   takeColumns(&row, columns, values, names);
   if (row.pid > 0 && QLIBCProcAlive(row.pid) == kAlive) {
     live->pid = row.pid;
@@ -251,7 +263,7 @@ int reportedCode(const ZELO_SCHED_STATUS &row) {
 
 int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStatusCode,
               char *szComment, size_t cbComment) {
-  ZELO_SCHED_STATUS row = {};
+  Row row = {};
   if (execute(db, select, takeFirstRow, &row) < 0) {
     return -1;
   }
@@ -263,7 +275,7 @@ int getStatus(sqlite3 *db, const Statement &select, long *pTimestamp, int *pStat
     copyText(szComment, cbComment, row.szComment);
   }
   if (pTimestamp != nullptr) {
-    *pTimestamp = row.timestamp;
+    *pTimestamp = asLong(row.started);
   }
   return 1;
 }
@@ -317,22 +329,22 @@ int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTask, int *pStatus
   SCHED_CHECK_ARG(db != nullptr, "((void *)0) != db", -1);
   SCHED_CHECK_ARG(pTask != nullptr, "NULL != pTask", -1);
   const int pid = getpid();
-  const long now = time(nullptr);
+  const long long now = time(nullptr);
   const long taskID = pTask->ID;
   Statement insert;
   insert.append(
       "INSERT INTO task_status (app, pid, timestamp, task_id, status_code) "
-      "VALUES ('%s', %d, %ld, %ld, %d);",
+      "VALUES ('%s', %d, %lld, %ld, %d);",
       pTask->App, pid, now, taskID, ZELO_SCHED_STATUS_RUNNING);
   if (execute(db, insert, pTask->App, AfterText::kNothing, nullptr, nullptr) < 0) {
     return -1;
   }
   Statement select;
   select.append(
-      "SELECT status_id from task_status WHERE app='%s' AND task_id=%ld AND timestamp=%ld "
+      "SELECT status_id from task_status WHERE app='%s' AND task_id=%ld AND timestamp=%lld "
       "AND status_code=%d AND pid=%d;",
       pTask->App, taskID, now, ZELO_SCHED_STATUS_RUNNING, pid);
-  ZELO_SCHED_STATUS row = {};
+  Row row = {};
   if (execute(db, select, takeFirstRow, &row) < 0) {
     return -1;
   }

@@ -437,7 +437,7 @@ TEST_F(StoreTest, AStoredTaskIsFoundByItsId) {
 
 TEST_F(StoreTest, AnIdWithoutASectionIsNotFound) {
   create("task");
-  for (const long id : {0L, 2L, -1L, -1000000L, 9223372036854775807L}) {
+  for (const long id : {0L, 2L, -1L, -1000000L, LONG_MAX}) {
     const Task task = makeTask("", "");
     EXPECT_EQ(backend_.get_by_id(id, task.get()), 0) << id;
     EXPECT_EQ(task->State, ZELO_SCHED_STATE_NOT_EXISTED);

@@ -54,7 +54,8 @@ class SmallFileSystem {
   void makeWritable() const { EXPECT_EQ(mount("small", path_, "tmpfs", MS_REMOUNT, kSmall), 0); }
 
   void fill() const {
-    writeFile(fileIn(kFiller), std::string(std::filesystem::space(path_).available, 'x'));
+    writeFile(fileIn(kFiller),
+              std::string(static_cast<size_t>(std::filesystem::space(path_).available), 'x'));
     EXPECT_EQ(std::filesystem::space(path_).available, 0U);
   }
   void makeRoom() const { std::filesystem::remove(fileIn(kFiller)); }

@@ -633,8 +633,9 @@ TEST_F(NamesTest, NeitherALogNorASuperJournalIsOpened) {
 
 // Temporary files have no name.
 TEST_F(NamesTest, WhatDoesNotFitIntoMemoryGoesIntoATemporaryFile) {
+  const char *const kOpen = sizeof(long) == sizeof(int32_t) ? "open" : "open64";
   bool wasOpened = false;
-  beforeEachCall([&](const std::string &call) { wasOpened = wasOpened || call == "open64"; });
+  beforeEachCall([&](const std::string &call) { wasOpened = wasOpened || call == kOpen; });
   char *error = nullptr;
   EXPECT_EQ(sqlite3_exec(db_.get(),
                          "PRAGMA temp_store=FILE; CREATE TEMP TABLE many(text);"
@@ -652,8 +653,10 @@ TEST_F(NamesTest, WhatDoesNotFitIntoMemoryGoesIntoATemporaryFile) {
 TEST_F(NamesTest, AJournalThatCannotBeEmptiedFailsTheTransaction) {
   EXPECT_EQ(answer(db_.get(), "PRAGMA synchronous=EXTRA; PRAGMA journal_mode=DELETE"), "delete");
   const std::function<void()> failures[] = {
-      [] { support::failCallFor("open", "-journal", {.error = EMFILE}); },
-      [] { support::failCall("ftruncate", {.error = EIO}); },
+      [] {
+        support::failCallFor("open", "-journal", {.times = support::kAlways, .error = EMFILE});
+      },
+      [] { support::failCall("ftruncate", {.times = support::kAlways, .error = EIO}); },
   };
   for (const auto &fail : failures) {
     fail();

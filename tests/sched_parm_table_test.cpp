@@ -324,10 +324,10 @@ TEST_F(SchedParmTableTest, NumbersOfEveryLengthAreReadAsTheCLibraryReadsThem) {
       SCOPED_TRACE(text);
       int32_t field = 99;
       EXPECT_EQ(rowOf("id").fnFromHashStr(&field, text.c_str()), 0);
-      EXPECT_EQ(field, static_cast<int32_t>(strtol(text.c_str(), nullptr, 10)));
+      EXPECT_EQ(field, static_cast<int32_t>(strtoll(text.c_str(), nullptr, 10)));
       uint32_t unsignedField = 99;
       EXPECT_EQ(rowOf("owner").fnFromHashStr(&unsignedField, text.c_str()), 0);
-      EXPECT_EQ(unsignedField, static_cast<uint32_t>(strtoul(text.c_str(), nullptr, 10)));
+      EXPECT_EQ(unsignedField, static_cast<uint32_t>(strtoull(text.c_str(), nullptr, 10)));
     }
   }
 }

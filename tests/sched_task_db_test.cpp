@@ -218,7 +218,9 @@ TEST_F(StatementTest, TheRunningChecksAskForRowsWithStatusTwo) {
 }
 
 TEST_F(StatementTest, ATaskIdIsNotCutToThirtyTwoBits) {
-  EXPECT_EQ(statementOf([&] { return ZELOSchedDBIsTaskRunning(db(), 4294967303, &status_); }),
+  if (sizeof(long) == sizeof(int32_t)) GTEST_SKIP() << "no id has more than 32 bits here";
+  const auto id = static_cast<long>(4294967303);
+  EXPECT_EQ(statementOf([&] { return ZELOSchedDBIsTaskRunning(db(), id, &status_); }),
             Lines{failedSql("SELECT pid,status_id,task_id from task_status WHERE "
                             "task_id=4294967303 AND status_code=2;",
                             "no")});

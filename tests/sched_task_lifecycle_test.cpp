@@ -522,7 +522,7 @@ TEST_F(TaskGetByIdTest, ABackendThatFailsEndsTheSearch) {
 }
 
 TEST_F(TaskGetByIdTest, AnIdThatNobodyHoldsIsNotFoundAndReachesTheBackendsWhole) {
-  for (const long id : {0L, kId, 60000000L, 0x1'0000'0007L}) {
+  for (const long id : {0L, kId, 60000000L, static_cast<long>(0x1'0000'0007)}) {
     const std::string number = std::to_string(id);
     support::clearLog();
     FakeBackends fakes(1);

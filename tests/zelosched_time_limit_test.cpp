@@ -13,7 +13,7 @@ TEST(ZeloschedTimeLimitTest, ALimitIsANumberWithAUnit) {
   EXPECT_EQ(secondsOfLimit("30m"), 1800);
   EXPECT_EQ(secondsOfLimit("2h"), 7200);
   EXPECT_EQ(secondsOfLimit("1d"), 86400);
-  EXPECT_EQ(secondsOfLimit("999999d"), 999999L * 86400);
+  EXPECT_EQ(secondsOfLimit("999999d"), 999999LL * 86400);
   for (const char *text : {"", "h", "2", "0s", "02h", "2w", "2 h", "-2h", "2.5h", "1000000s", "2hh",
                            "2h ", " 2h", "2H", "+2h", "infinity"}) {
     EXPECT_FALSE(secondsOfLimit(text)) << text;

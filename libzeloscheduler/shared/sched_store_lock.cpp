@@ -49,8 +49,8 @@ pid_t whoHolds(int file) {
     return kSchedUnknownHolder;
   }
   char where[64];
-  snprintf(where, sizeof(where), " %02x:%02x:%lu ", major(info.st_dev), minor(info.st_dev),
-           static_cast<unsigned long>(info.st_ino));
+  snprintf(where, sizeof(where), " %02x:%02x:%llu ", major(info.st_dev), minor(info.st_dev),
+           static_cast<unsigned long long>(info.st_ino));
   pid_t holder = kSchedUnknownHolder;
   char line[256];
   while (holder <= 0 && fgets(line, sizeof(line), locks) != nullptr) {

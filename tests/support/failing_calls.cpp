@@ -38,6 +38,15 @@
 namespace support {
 namespace {
 
+// Where long has 32 bits, SQLite works with what the product calls by the shorter names.
+#if __SIZEOF_LONG__ > 4
+#define WIDE_CALLS(X)                  \
+  X(4, pread64, "~", nullptr, kFailed) \
+  X(4, pwrite64, "~w", nullptr, kFailed)
+#else
+#define WIDE_CALLS(X)
+#endif
+
 // X(number of arguments, name, how, key, failure) of each call that is passed on as it is:
 //   how      '=' a plan's key must be equal to the call's, '~' or be contained in it; and
 //            'w' it writes, so there may be no room for it and no right to do it;
@@ -86,8 +95,7 @@ namespace {
   X(4, pwrite, "~w", nullptr, kFailed)                                                           \
   X(1, mkstemp, "~w", a, kFailed)                                                                \
   X(2, flock, "~", nullptr, kFailed)                                                             \
-  X(4, pread64, "~", nullptr, kFailed)                                                           \
-  X(4, pwrite64, "~w", nullptr, kFailed)                                                         \
+  WIDE_CALLS(X)                                                                                  \
   X(1, fdatasync, "~w", nullptr, kFailed)                                                        \
   X(1, mkdtemp, "~w", a, kFailed)                                                                \
   X(1, rmdir, "~", a, kFailed)                                                                   \
@@ -499,7 +507,7 @@ constexpr long kMicrosecondsPerSecond = 1000000;
 constexpr long kNanosecondsPerMicrosecond = 1000;
 
 // Whether the caller shall really sleep.
-bool recordSleep(const char *call, long microseconds) {
+bool recordSleep(const char *call, long long microseconds) {
   const OwnWork own;
   sleeps().append(static_cast<int>(microseconds), call);
   if (forced().sleepAction) forced().sleepAction(sleeps().lines().size());
@@ -772,7 +780,8 @@ int open(const char *path, int flags, ...) {
   FAIL_OR_CALL(open, path, -1, path, flags, mode);
 }
 
-// What SQLite works with.
+// What SQLite works with. Where long has 32 bits, the calls above are these.
+#if __SIZEOF_LONG__ > 4
 
 int open64(const char *path, int flags, ...) {
   va_list list;
@@ -789,6 +798,8 @@ int fcntl64(int descriptor, int command, ...) {
   va_end(list);
   FAIL_OR_CALL(fcntl64, nullptr, -1, descriptor, command, argument);
 }
+
+#endif
 
 int close(int descriptor) {
   REAL(close);
@@ -922,7 +933,7 @@ int pidfd_open(pid_t pid, unsigned flags) noexcept {
 unsigned sleep(unsigned seconds) {
   const auto *plan = failing(Call::k_sleep);
   const bool really =
-      support::recordSleep("sleep", long{seconds} * support::kMicrosecondsPerSecond);
+      support::recordSleep("sleep", seconds * 1LL * support::kMicrosecondsPerSecond);
   if (plan != nullptr) return resultOf(*plan, seconds);
   if (!really) return 0;
   const unsigned timesShorter = support::forced().timesShorter;
@@ -937,7 +948,7 @@ unsigned sleep(unsigned seconds) {
 
 int usleep(useconds_t microseconds) {
   const auto *plan = failing(Call::k_usleep);
-  const bool really = support::recordSleep("usleep", long{microseconds});
+  const bool really = support::recordSleep("usleep", microseconds);
   if (plan != nullptr) return resultOf(*plan, -1);
   if (!really) return 0;
   REAL(usleep);

@@ -60,11 +60,11 @@ std::vector<StatusRow> statusRows() {
   while (sqlite3_step(select.get()) == SQLITE_ROW) {
     StatusRow row;
     int column = 0;
-    row.statusId = sqlite3_column_int64(select.get(), column++);
-    row.pid = sqlite3_column_int64(select.get(), column++);
+    row.statusId = static_cast<long>(sqlite3_column_int64(select.get(), column++));
+    row.pid = static_cast<long>(sqlite3_column_int64(select.get(), column++));
     row.timestamp = sqlite3_column_int64(select.get(), column++);
     row.app = textOf(select, column++).value_or("");
-    row.taskId = sqlite3_column_int64(select.get(), column++);
+    row.taskId = static_cast<long>(sqlite3_column_int64(select.get(), column++));
     row.statusCode = sqlite3_column_int(select.get(), column++);
     row.comment = textOf(select, column++);
     rows.push_back(row);
@@ -90,7 +90,7 @@ long addStatusRow(const StatusRow &row) {
   if (sqlite3_step(insert.get()) != SQLITE_DONE) {
     throw std::runtime_error(sqlite3_errmsg(database.get()));
   }
-  return sqlite3_last_insert_rowid(database.get());
+  return static_cast<long>(sqlite3_last_insert_rowid(database.get()));
 }
 
 std::vector<int> waitForChildRuns() {

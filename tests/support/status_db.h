@@ -5,6 +5,7 @@
 //   addStatusRow({.pid = 1, .timestamp = 5, .app = "a", .taskId = 7, .statusCode = 2});
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>
@@ -14,7 +15,7 @@ namespace support {
 struct StatusRow {
   long statusId = 0;
   long pid = 0;
-  long timestamp = 0;
+  int64_t timestamp = 0;
   std::string app{};
   long taskId = 0;
   int statusCode = 0;

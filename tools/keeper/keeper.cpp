@@ -41,7 +41,7 @@
 
 namespace {
 
-constexpr long kMinute = 60;  // seconds
+constexpr int64_t kMinute = 60;  // seconds
 
 // The owner may open it for writing by the names of the standard streams.
 constexpr mode_t kPipeMode = 0622;
@@ -198,7 +198,7 @@ class Keeper {
   // Starts the run, tells how that went, and keeps it.
   void start(int report);
   // Takes the place of one that was killed.
-  bool adopt(long run);
+  bool adopt(int64_t run);
 
  private:
   void keep();
@@ -235,7 +235,7 @@ class Keeper {
   bool isOver_ = false;
   std::optional<int> waitStatus_;
   bool hasWaited_ = false;
-  std::optional<long> toldOf_;
+  std::optional<int64_t> toldOf_;
   bool isDirty_ = true;
   int pause_ = kFirstLook;
   double nextTurnLook_ = 0;
@@ -288,7 +288,7 @@ void Keeper::start(int report) {
   keep();
 }
 
-bool Keeper::adopt(long number) {
+bool Keeper::adopt(int64_t number) {
   leaveCaller({});
   openlog("zelosched", LOG_PID, LOG_CRON);
   try {
@@ -309,7 +309,7 @@ bool Keeper::adopt(long number) {
     syslog(LOG_WARNING, "%s", failure.what());
     return false;
   }
-  order_.task = run_.task;
+  order_.task = static_cast<long>(run_.task);
   const std::string output = "/proc/" + std::to_string(run_.process.pid) + "/fd/1";
   struct stat info {};
   if (stat(output.c_str(), &info) == 0 && S_ISFIFO(info.st_mode)) {
@@ -375,7 +375,7 @@ void Keeper::keep() {
 
 void Keeper::passOn(std::string_view bytes) {
   output_.append(bytes);
-  run_.outputBytes += static_cast<long>(bytes.size());
+  run_.outputBytes += static_cast<int64_t>(bytes.size());
   while (order_.copyTo >= 0 && !bytes.empty()) {
     const ssize_t count = write(order_.copyTo, bytes.data(), bytes.size());
     if (count >= 0) {
@@ -462,7 +462,7 @@ void Keeper::lookForTurn() {
   nextTurnLook_ = seconds() + kTurnPause;
   if (!task_) return;
   const auto taskId =
-      task_->CanRunTaskSameTime == 0 ? std::optional<long>(run_.task) : std::nullopt;
+      task_->CanRunTaskSameTime == 0 ? std::optional<int64_t>(run_.task) : std::nullopt;
   const auto app =
       task_->CanRunAppSameTime == 0 ? std::optional<std::string>(task_->App) : std::nullopt;
   std::optional<Run> other;
@@ -472,7 +472,7 @@ void Keeper::lookForTurn() {
   }
   if (!other && seconds() - began_ < kFirstWait) return;
   hasWaited_ = true;
-  const long whose = other ? other->taskId : 0;
+  const int64_t whose = other ? other->taskId : 0;
   if (toldOf_ == whose) return;
   toldOf_ = whose;
   tell("waiting " + std::to_string(whose));
@@ -563,14 +563,15 @@ bool Keeper::save(bool isEnd) {
   } catch (const DatabaseBusy &failure) {
     nextSave_ = seconds() + kSavePause;
     if (isEnd && seconds() - ended_ > kSaveAtEnd) {
-      syslog(LOG_WARNING, "%s: the run of task %ld is not recorded", failure.what(), run_.task);
+      syslog(LOG_WARNING, "%s: the run of task %ld is not recorded", failure.what(),
+             static_cast<long>(run_.task));
       return true;
     }
     return false;
   } catch (const Failure &failure) {
     if (!isGivenUp_ || isEnd) {
-      syslog(LOG_WARNING, "%s: the run of task %ld is not recorded%s", failure.what(), run_.task,
-             isEnd ? "" : " yet");
+      syslog(LOG_WARNING, "%s: the run of task %ld is not recorded%s", failure.what(),
+             static_cast<long>(run_.task), isEnd ? "" : " yet");
     }
     isGivenUp_ = true;
     if (isEnd) judgeEnd(task_ ? task_->Command : "", run_.stopAsked.has_value(), &run_);
@@ -695,7 +696,7 @@ int runWithKeeper(const RunOrder &order) {
   return startRun(order);
 }
 
-int keepOn(long run) {
+int keepOn(int64_t run) {
   const pid_t keeper = fork();
   if (keeper < 0) return EXIT_FAILURE;
   if (keeper > 0) return EXIT_SUCCESS;

@@ -3,6 +3,7 @@
 // takes place when none can be made or nothing can be written.
 #pragma once
 
+#include <cstdint>
 #include <optional>
 
 #include "runs/run_record.h"
@@ -12,7 +13,7 @@ struct RunOrder {
   bool isAnyTime = false;  // otherwise only when the task is due in this minute
   bool isDisabledSkipped = true;
   Trigger trigger = Trigger::kSchedule;
-  std::optional<long> due;  // this minute, when it is not said
+  std::optional<int64_t> due;  // this minute, when it is not said
   // What somebody who waits wants to know; -1 for none. Lines (run_events.h), and all that the run
   // prints until its end.
   int tellTo = -1;
@@ -23,4 +24,4 @@ struct RunOrder {
 int runWithKeeper(const RunOrder &order);
 
 // In the place of a keeper that was killed, in a process of its own. The exit status.
-int keepOn(long run);
+int keepOn(int64_t run);

@@ -1,6 +1,7 @@
 // What a look at the machine found.
 #pragma once
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -15,7 +16,7 @@ struct Finding {
   Severity severity;
   const char *kind;  // a word by which programs tell it from others
   std::string text;  // a sentence, with what helps against it
-  long task = 0;     // whose it is, when it is one task's
+  int64_t task = 0;  // whose it is, when it is one task's
   std::string taskName = {};
 };
 using Findings = std::vector<Finding>;

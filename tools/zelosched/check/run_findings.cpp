@@ -15,12 +15,12 @@
 
 namespace {
 
-constexpr long kDay = 24L * 60 * 60;  // seconds
-constexpr long kMinute = 60;
+constexpr int64_t kDay = int64_t{24} * 60 * 60;  // seconds
+constexpr int64_t kMinute = 60;
 
-using Tasks = std::map<long, const TaskRecord *>;
+using Tasks = std::map<int64_t, const TaskRecord *>;
 
-std::string momentInWords(long moment) {
+std::string momentInWords(int64_t moment) {
   return minuteText(localMinute(moment));
 }
 
@@ -45,7 +45,7 @@ class RunCheck {
   }
 
   // Of a task that is still there and enabled; one that was disabled worries nobody.
-  const TaskRecord *enabledTask(long id) const {
+  const TaskRecord *enabledTask(int64_t id) const {
     const auto found = tasks_.find(id);
     return found != tasks_.end() && isEnabled(*found->second) ? found->second : nullptr;
   }
@@ -56,7 +56,7 @@ class RunCheck {
       const TaskRecord *const task = enabledTask(run.task);
       const bool isMeant = run.outcome == Outcome::kStopped || run.outcome == Outcome::kCancelled;
       if (task == nullptr || !isBad(run) || isMeant) continue;
-      const long moment = run.start ? *run.start : run.queued.value_or(run.end.value_or(0));
+      const int64_t moment = run.start ? *run.start : run.queued.value_or(run.end.value_or(0));
       const bool isAcknowledged =
           run.generation && acknowledgedAt(kept, *run.generation) >= run.end.value_or(moment);
       isWell = false;
@@ -99,7 +99,7 @@ class RunCheck {
 
   // Five times as long as such a run usually takes, or a day.
   static bool isLong(const KeptDatabase &kept, const KeptRun &run, double seconds) {
-    constexpr long kRunsCompared = 10;
+    constexpr int64_t kRunsCompared = 10;
     constexpr double kTimesAsLong = 5;
     if (seconds > kDay) return true;
     RunFilter filter;
@@ -120,14 +120,14 @@ class RunCheck {
   void judgeRunning(const KeptDatabase &kept) {
     RunFilter filter;
     filter.underWay = true;
-    const auto now = static_cast<long>(time(nullptr));
+    const auto now = static_cast<int64_t>(time(nullptr));
     bool isAny = false;
     for (const KeptRun &run : runsOf(kept, filter)) {
       isAny = true;
       const auto found = tasks_.find(run.task);
       const std::string title =
           found != tasks_.end() ? titleOf(*found->second) : "task " + std::to_string(run.task);
-      const long since = run.start ? *run.start : run.queued.value_or(now);
+      const int64_t since = run.start ? *run.start : run.queued.value_or(now);
       const bool isTooLong =
           run.state == RunState::kRunning && isLong(kept, run, static_cast<double>(now - since));
       std::string text =

@@ -35,7 +35,7 @@ std::string firstWord(const std::string &path) {
 }
 
 // A number that another program has got since must not pass for cron's.
-bool isCron(long pid) {
+bool isCron(int64_t pid) {
   return firstWord("/proc/" + std::to_string(pid) + "/comm").find("cron") != std::string::npos;
 }
 
@@ -55,7 +55,7 @@ pid_t lastingHolder(const char *lockFile) {
 
 Findings checkCron() {
   const std::string text = firstWord(kCronPidFile);
-  const std::optional<long> pid = parseNumber(text);
+  const std::optional<int64_t> pid = parseNumber(text);
   const bool isRunning = pid && *pid > 0 && *pid <= INT32_MAX &&
                          QLIBCProcAlive(static_cast<pid_t>(*pid)) == kAlive && isCron(*pid);
   if (isRunning) return {{Severity::kOk, "cron", "cron is running (process " + text + ")"}};

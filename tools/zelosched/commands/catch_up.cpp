@@ -22,15 +22,15 @@ constexpr char kUsualSpan[] = "12h";
 
 struct Unit {
   char letter;
-  long seconds;
+  int64_t seconds;
 };
-constexpr Unit kUnits[] = {{'m', 60}, {'h', 60L * 60}, {'d', 24L * 60 * 60}};
+constexpr Unit kUnits[] = {{'m', 60}, {'h', int64_t{60} * 60}, {'d', int64_t{24} * 60 * 60}};
 
 // "90m", "12h", "2d".
-long parseSpan(const std::string &text) {
+int64_t parseSpan(const std::string &text) {
   for (const Unit &unit : kUnits) {
     if (text.empty() || text.back() != unit.letter) continue;
-    const std::optional<long> count = parseNumber(text.substr(0, text.size() - 1));
+    const std::optional<int64_t> count = parseNumber(text.substr(0, text.size() - 1));
     if (count && *count > 0 && *count <= kMissedRemembered / unit.seconds) {
       return *count * unit.seconds;
     }

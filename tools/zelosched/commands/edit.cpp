@@ -26,7 +26,7 @@ void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &task)
 
 int runEdit(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
-  const std::vector<long> ids = parseIds(arguments.operands());
+  const std::vector<int64_t> ids = parseIds(arguments.operands());
   if (ids.size() > 1) throw UsageError("one task at a time");
   if (!hasTaskOption(arguments)) throw UsageError("what is to be changed?");
   const ChangeLock lock;

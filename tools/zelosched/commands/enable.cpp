@@ -14,7 +14,7 @@ namespace {
 constexpr Option kDisableOptions[] = {{"stop"}};
 
 // A task that would do harm may be disabled, which ends the harm, but not enabled.
-void setState(long id, int32_t state) {
+void setState(int64_t id, int32_t state) {
   const ChangeLock lock;
   const Task task = loadTask(id);
   if (task->State == state) {
@@ -29,7 +29,7 @@ void setState(long id, int32_t state) {
   if (task->ID != formerId) std::printf("it was task %d before\n", formerId);
 }
 
-void disable(long id, bool stops) {
+void disable(int64_t id, bool stops) {
   setState(id, ZELO_SCHED_STATE_DISABLED);
   const Task task = findTask(id);
   if (!task) return;  // a power time, which has another id now
@@ -44,14 +44,14 @@ int runEnable(int argc, char **argv) {
   const Arguments arguments(argc, argv, {});
   arguments.requireNoCommand();
   return forEachId(parseIds(arguments.operands()),
-                   [](long id) { setState(id, ZELO_SCHED_STATE_ENABLED); });
+                   [](int64_t id) { setState(id, ZELO_SCHED_STATE_ENABLED); });
 }
 
 int runDisable(int argc, char **argv) {
   const Arguments arguments(argc, argv, kDisableOptions);
   arguments.requireNoCommand();
   return forEachId(parseIds(arguments.operands()),
-                   [&](long id) { disable(id, arguments.has("stop")); });
+                   [&](int64_t id) { disable(id, arguments.has("stop")); });
 }
 
 }  // namespace

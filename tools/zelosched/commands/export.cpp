@@ -99,7 +99,7 @@ int runExport(int argc, char **argv) {
   if (arguments.operands().empty()) {
     status = out.addAll();
   } else {
-    status = forEachId(parseIds(arguments.operands()), [&](long id) { out.add(*loadTask(id)); });
+    status = forEachId(parseIds(arguments.operands()), [&](int64_t id) { out.add(*loadTask(id)); });
   }
   out.finish();
   return status;

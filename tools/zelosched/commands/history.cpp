@@ -24,35 +24,35 @@ namespace {
 constexpr Option kOptions[] = {
     {"limit", Option::kValue, 'n'}, {"json"}, {"failed"}, {"since", Option::kValue},
     {"task", Option::kValue},       {"keep"}, {"tell"}};
-constexpr long kUsualLimit = 50;
-constexpr long kMostRuns = 100000000;
+constexpr int64_t kUsualLimit = 50;
+constexpr int64_t kMostRuns = 100000000;
 constexpr char kNothing[] = "-";
 
 std::string startText(const KeptRun &run) {
-  const std::optional<long> moment = run.start ? run.start : run.queued;
+  const std::optional<int64_t> moment = run.start ? run.start : run.queued;
   if (!moment) return kNothing;
-  constexpr long kSecondsPerMinute = 60;
+  constexpr int64_t kSecondsPerMinute = 60;
   char seconds[16];
-  std::snprintf(seconds, sizeof seconds, ":%02ld", *moment % kSecondsPerMinute);
+  std::snprintf(seconds, sizeof seconds, ":%02d", static_cast<int>(*moment % kSecondsPerMinute));
   return minuteText(localMinute(*moment)) + seconds;
 }
 
 // Of one that goes on, by the wall clock.
-std::optional<long> durationOf(const KeptRun &run) {
-  if (run.duration) return static_cast<long>(*run.duration);
+std::optional<int64_t> durationOf(const KeptRun &run) {
+  if (run.duration) return static_cast<int64_t>(*run.duration);
   if (run.state != RunState::kRunning || !run.start) return std::nullopt;
-  return std::max(0L, static_cast<long>(time(nullptr)) - *run.start);
+  return std::max(int64_t{0}, static_cast<int64_t>(time(nullptr)) - *run.start);
 }
 
 std::string durationText(const KeptRun &run) {
-  const std::optional<long> seconds = durationOf(run);
+  const std::optional<int64_t> seconds = durationOf(run);
   if (!seconds) return kNothing;
-  constexpr long kMinute = 60;
-  constexpr long kHour = 3600;
-  char text[64];
-  std::snprintf(text, sizeof text, "%ld:%02ld:%02ld", *seconds / kHour, *seconds % kHour / kMinute,
-                *seconds % kMinute);
-  return text;
+  constexpr int64_t kMinute = 60;
+  constexpr int64_t kHour = 3600;
+  char rest[16];
+  std::snprintf(rest, sizeof rest, ":%02d:%02d", static_cast<int>(*seconds % kHour / kMinute),
+                static_cast<int>(*seconds % kMinute));
+  return std::to_string(*seconds / kHour) + rest;
 }
 
 void print(const std::vector<KeptRun> &runs) {
@@ -82,17 +82,17 @@ void printAsJson(const std::vector<KeptRun> &runs) {
 }
 
 // One that was removed has no name any more, but its runs are there.
-std::optional<long> taskOf(const Arguments &arguments) {
+std::optional<int64_t> taskOf(const Arguments &arguments) {
   std::vector<std::string> operands = arguments.operands();
   if (const std::optional<std::string> named = arguments.value("task")) operands.push_back(*named);
   if (operands.empty()) return std::nullopt;
-  const std::vector<long> ids = parseIds(operands);
+  const std::vector<int64_t> ids = parseIds(operands);
   if (ids.size() > 1) throw UsageError("one task at a time");
   return ids.front();
 }
 
-long momentOf(const std::string &text) {
-  const std::optional<long> moment = parseMoment(text, time(nullptr));
+int64_t momentOf(const std::string &text) {
+  const std::optional<int64_t> moment = parseMoment(text, time(nullptr));
   if (moment) return *moment;
   throw UsageError(
       "'--since' takes a time such as 2026-12-24, '2026-12-24 18:30', 18:30 or 12h "

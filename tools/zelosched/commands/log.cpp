@@ -18,15 +18,15 @@
 namespace {
 
 constexpr Option kOptions[] = {{"run", Option::kValue}, {"follow", Option::kNone, 'f'}};
-constexpr long kMostRun = 1L << 62;
+constexpr int64_t kMostRun = int64_t{1} << 62;
 constexpr std::chrono::milliseconds kPause(100);
 
-std::string leftOutLine(long bytes) {
+std::string leftOutLine(int64_t bytes) {
   return "\n[" + std::to_string(bytes) + " bytes are left out here]\n";
 }
 
 // The one that was asked for, or the last one of the task.
-KeptRun chooseRun(long id, std::optional<long> number) {
+KeptRun chooseRun(int64_t id, std::optional<int64_t> number) {
   RunFilter filter;
   if (number) {
     filter.run = number;
@@ -43,7 +43,7 @@ KeptRun chooseRun(long id, std::optional<long> number) {
   throw Failure(titleOf(*task) + " has not run yet");
 }
 
-bool isUnderWay(long number) {
+bool isUnderWay(int64_t number) {
   RunFilter filter;
   filter.run = number;
   filter.underWay = true;
@@ -62,14 +62,14 @@ void showOutput(const Output &printed, RunOutput *output) {
 }
 
 void follow(const KeptRun &run, const OutputFile &file, RunOutput *output) {
-  long shown = 0;
+  int64_t shown = 0;
   for (bool isLast = false;; std::this_thread::sleep_for(kPause)) {
-    long lost = 0;
-    const long total = file.total();
+    int64_t lost = 0;
+    const int64_t total = file.total();
     const std::string bytes = file.since(shown, &lost);
     if (lost > 0) output->show(leftOutLine(lost));
     output->show(bytes);
-    shown = std::max(total, shown + lost + static_cast<long>(bytes.size()));
+    shown = std::max(total, shown + lost + static_cast<int64_t>(bytes.size()));
     if (isLast || !output->fault().empty()) break;
     isLast = !isUnderWay(run.run);
   }
@@ -79,9 +79,9 @@ void follow(const KeptRun &run, const OutputFile &file, RunOutput *output) {
 int runLog(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
-  const std::vector<long> ids = parseIds(arguments.operands());
+  const std::vector<int64_t> ids = parseIds(arguments.operands());
   if (ids.size() > 1) throw UsageError("one task at a time");
-  const std::optional<long> number = arguments.number("run", 1, kMostRun);
+  const std::optional<int64_t> number = arguments.number("run", 1, kMostRun);
   if (geteuid() == 0) attempt([] { sweepRuns(); });
   const KeptRun run = chooseRun(ids.front(), number);
   RunOutput output(-1);

@@ -27,7 +27,7 @@ MetricsText::Labels labelsOf(const TaskRecord &task) {
 }
 
 void addTasks(const TaskList &list, MetricsText *text) {
-  std::map<std::string, long> ofState{{"enabled", 0}, {"disabled", 0}};
+  std::map<std::string, int64_t> ofState{{"enabled", 0}, {"disabled", 0}};
   for (const TaskRecord *task : list.tasks()) {
     if (!isPower(*task)) ++ofState[stateName(*task)];
   }
@@ -51,7 +51,7 @@ void addNextRuns(const TaskList &list, MetricsText *text) {
 using LastRuns = std::map<const TaskRecord *, KeptRun>;
 
 LastRuns lastRunsOf(const KeptDatabase &kept, const TaskList &list) {
-  std::map<long, const TaskRecord *> tasks;
+  std::map<int64_t, const TaskRecord *> tasks;
   for (const TaskRecord *task : list.tasks()) tasks[task->ID] = task;
   LastRuns runs;
   for (KeptRun &run : lastRuns(kept)) {
@@ -116,7 +116,7 @@ void addHealth(MetricsText *text) {
        {Severity::kOk, Severity::kUnknown, Severity::kWarning, Severity::kCritical}) {
     text->add({{"state", nameOf(severity)}}, worstOf(findings) == severity ? 1 : 0);
   }
-  std::map<std::pair<std::string, std::string>, long> problems;
+  std::map<std::pair<std::string, std::string>, int64_t> problems;
   for (const Finding &finding : findings) {
     if (finding.severity != Severity::kOk) ++problems[{nameOf(finding.severity), finding.kind}];
   }

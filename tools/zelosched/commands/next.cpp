@@ -23,8 +23,8 @@
 namespace {
 
 constexpr Option kOptions[] = {{"count", Option::kValue, 'n'}, {"json"}};
-constexpr long kUsualCount = 20;
-constexpr long kMostRuns = 10000;
+constexpr int64_t kUsualCount = 20;
+constexpr int64_t kMostRuns = 10000;
 
 struct Entry {
   LocalMinute run;
@@ -87,7 +87,7 @@ class FirstRuns {
 };
 
 // A disabled task is told.
-void addNamed(long id, FirstRuns *runs) {
+void addNamed(int64_t id, FirstRuns *runs) {
   Task task = loadTask(id);
   if (isEnabled(*task)) {
     runs->add(std::move(task));
@@ -144,7 +144,7 @@ int runNext(int argc, char **argv) {
   if (arguments.operands().empty()) {
     runs.add(std::make_unique<TaskList>());
   } else {
-    status = forEachId(parseIds(arguments.operands()), [&](long id) { addNamed(id, &runs); });
+    status = forEachId(parseIds(arguments.operands()), [&](int64_t id) { addNamed(id, &runs); });
   }
   const std::vector<Entry> entries = runs.take(count);
   if (arguments.has("json")) {

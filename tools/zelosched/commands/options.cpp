@@ -107,10 +107,11 @@ std::string Arguments::value(std::string_view option, const char *otherwise) con
   return value(option).value_or(otherwise);
 }
 
-std::optional<long> Arguments::number(std::string_view option, long least, long most) const {
+std::optional<int64_t> Arguments::number(std::string_view option, int64_t least,
+                                         int64_t most) const {
   const std::optional<std::string> text = value(option);
   if (!text) return std::nullopt;
-  const std::optional<long> number = parseNumber(*text);
+  const std::optional<int64_t> number = parseNumber(*text);
   if (!number || *number < least || *number > most) {
     throw UsageError("'--" + std::string(option) + "' takes a number from " +
                      std::to_string(least) + " to " + std::to_string(most) + ", not '" +

@@ -7,6 +7,7 @@
 // What is wrong is thrown as UsageError; a sub-command's --help is answered before it runs.
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <span>
 #include <string>
@@ -34,7 +35,7 @@ class Arguments {
   std::optional<std::string> value(std::string_view option) const;
   std::string value(std::string_view option, const char *otherwise) const;
   // A whole number from `least` to `most`.
-  std::optional<long> number(std::string_view option, long least, long most) const;
+  std::optional<int64_t> number(std::string_view option, int64_t least, int64_t most) const;
   const std::vector<std::string> &operands() const { return operands_; }
   // What stands after "--", when that is there.
   const std::optional<std::vector<std::string>> &afterDashes() const { return afterDashes_; }
@@ -50,7 +51,7 @@ class Arguments {
 
 // The ids of the tasks that the operands name, by an id or by a name that is one task's alone; one
 // at least, no id twice. Digits alone are an id. Throws UsageError and Failure.
-std::vector<long> parseIds(const std::vector<std::string> &operands);
+std::vector<int64_t> parseIds(const std::vector<std::string> &operands);
 
 // Runs the sub-command: answers --help, and says what is wrong with the arguments.
 int runWithOptions(const Command &command, int argc, char **argv);

@@ -15,8 +15,8 @@ bool isNumber(const std::string &word) {
   return !word.empty() && word.find_first_not_of(kDigits) == std::string::npos;
 }
 
-long idOfNumber(const std::string &word) {
-  const std::optional<long> id = parseNumber(word);
+int64_t idOfNumber(const std::string &word) {
+  const std::optional<int64_t> id = parseNumber(word);
   if (!id) throw UsageError("'" + printable(word) + "' is no task id");
   return *id;
 }
@@ -24,9 +24,9 @@ long idOfNumber(const std::string &word) {
 // The list is read for the first name.
 class Names {
  public:
-  long idOf(const std::string &name) {
+  int64_t idOf(const std::string &name) {
     if (!list_) list_.emplace();
-    std::vector<long> ids;
+    std::vector<int64_t> ids;
     for (const TaskRecord *task : list_->tasks()) {
       if (name == task->Name) ids.push_back(task->ID);
     }
@@ -36,7 +36,7 @@ class Names {
   }
 
  private:
-  static std::string severalOf(const std::string &name, const std::vector<long> &ids) {
+  static std::string severalOf(const std::string &name, const std::vector<int64_t> &ids) {
     std::string text = "'" + printable(name) + "' is the name of tasks ";
     for (size_t i = 0; i < ids.size(); ++i) {
       text += (i == 0 ? "" : i + 1 == ids.size() ? " and " : ", ") + std::to_string(ids[i]);
@@ -49,12 +49,12 @@ class Names {
 
 }  // namespace
 
-std::vector<long> parseIds(const std::vector<std::string> &operands) {
+std::vector<int64_t> parseIds(const std::vector<std::string> &operands) {
   if (operands.empty()) throw UsageError("which task? Give its id or its name");
   Names names;
-  std::vector<long> ids;
+  std::vector<int64_t> ids;
   for (const std::string &operand : operands) {
-    const long id = isNumber(operand) ? idOfNumber(operand) : names.idOf(operand);
+    const int64_t id = isNumber(operand) ? idOfNumber(operand) : names.idOf(operand);
     if (std::find(ids.begin(), ids.end(), id) == ids.end()) ids.push_back(id);
   }
   return ids;

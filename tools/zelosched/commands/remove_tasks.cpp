@@ -41,7 +41,7 @@ bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
   return membersOf(one) == membersOf(other);
 }
 
-Task loadRemovable(long id, const RemoveRules &rules) {
+Task loadRemovable(int64_t id, const RemoveRules &rules) {
   Task task = loadTask(id);
   if (rules.powerOnly && !isPower(*task)) throw Failure(titleOf(*task) + " is no power time");
   requirePermission(*task, task->CanDeleteFromUI, "removed", rules.insists);
@@ -64,7 +64,7 @@ void removeAndTell(const ZELO_SCHED_TASK &task, const RemoveRules &rules) {
 }
 
 // The lock is not held while an answer is waited for.
-void askAndRemove(long id, const RemoveRules &rules) {
+void askAndRemove(int64_t id, const RemoveRules &rules) {
   const Task task = loadRemovable(id, rules);
   if (!isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");
   const ChangeLock lock;
@@ -74,7 +74,7 @@ void askAndRemove(long id, const RemoveRules &rules) {
   removeAndTell(*task, rules);
 }
 
-void removeOne(long id, const RemoveRules &rules) {
+void removeOne(int64_t id, const RemoveRules &rules) {
   if (!rules.isSure) return askAndRemove(id, rules);
   const ChangeLock lock;
   removeAndTell(*loadRemovable(id, rules), rules);
@@ -82,9 +82,9 @@ void removeOne(long id, const RemoveRules &rules) {
 
 }  // namespace
 
-int removeTasks(const std::vector<long> &ids, const RemoveRules &rules) {
+int removeTasks(const std::vector<int64_t> &ids, const RemoveRules &rules) {
   if (!rules.isSure && isatty(STDIN_FILENO) != 1) {
     throw UsageError("there is nobody to ask: give --yes to remove without a question");
   }
-  return forEachId(ids, [&](long id) { removeOne(id, rules); });
+  return forEachId(ids, [&](int64_t id) { removeOne(id, rules); });
 }

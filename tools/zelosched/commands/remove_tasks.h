@@ -1,6 +1,7 @@
 // Removing tasks with a question before each.
 #pragma once
 
+#include <cstdint>
 #include <vector>
 
 #include "commands/command.h"
@@ -13,4 +14,4 @@ struct RemoveRules {
 };
 
 // The exit status. Throws UsageError when there is nobody to ask.
-int removeTasks(const std::vector<long> &ids, const RemoveRules &rules);
+int removeTasks(const std::vector<int64_t> &ids, const RemoveRules &rules);

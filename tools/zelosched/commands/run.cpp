@@ -81,10 +81,10 @@ class Progress {
  private:
   std::string title_;
   Clock::time_point start_ = Clock::now();
-  long shown_ = -1;
+  int64_t shown_ = -1;
 };
 
-std::string titleOfTask(long id) {
+std::string titleOfTask(int64_t id) {
   try {
     const Task task = findTask(id);
     if (task) return titleOf(*task);
@@ -178,7 +178,7 @@ void runUnseen(const ZELO_SCHED_TASK &task) {
   }
 }
 
-void runOne(long id, const Arguments &arguments) {
+void runOne(int64_t id, const Arguments &arguments) {
   const Task task = loadTask(id);
   requirePermission(*task, task->CanRunFromUI, "run", arguments.has("force"));
   if (arguments.has("wait") || arguments.has("output")) {
@@ -191,10 +191,10 @@ void runOne(long id, const Arguments &arguments) {
 int runRun(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
-  const std::vector<long> ids = parseIds(arguments.operands());
+  const std::vector<int64_t> ids = parseIds(arguments.operands());
   // What a plain user's run leaves in /tmp would be in the way of everybody's.
   if (geteuid() != 0) throw Failure("running tasks takes root's rights");
-  return forEachId(ids, [&](long id) { runOne(id, arguments); });
+  return forEachId(ids, [&](int64_t id) { runOne(id, arguments); });
 }
 
 }  // namespace

@@ -34,7 +34,7 @@ std::string lastRunInWords(const ZELO_SCHED_TASK &task, const LatestRuns &runs) 
   const RunRecord *run = runs.of(task.ID);
   if (run == nullptr) return "none is recorded";
   const std::string brief = runInBrief(*run, time(nullptr));
-  const std::optional<long> begin = run->start ? run->start : run->queued;
+  const std::optional<int64_t> begin = run->start ? run->start : run->queued;
   return begin ? minuteText(localMinute(*begin)) + ", " + brief : brief;
 }
 
@@ -105,12 +105,12 @@ void add(const ZELO_SCHED_TASK &task, const LatestRuns &runs, Json::Value *top) 
 int runShow(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
-  const std::vector<long> ids = parseIds(arguments.operands());
+  const std::vector<int64_t> ids = parseIds(arguments.operands());
   const LatestRuns runs = latestRuns();
   Json::Value top = topObject();
   top["tasks"] = Json::Value(Json::arrayValue);
   bool isFirst = true;
-  const int found = forEachId(ids, [&](long id) {
+  const int found = forEachId(ids, [&](int64_t id) {
     const Task task = loadTask(id);
     if (arguments.has("json")) return add(*task, runs, &top);
     if (!isFirst) std::puts("");

@@ -83,7 +83,7 @@ int acknowledgeAll(const Arguments &arguments) {
     acknowledge(kept, std::nullopt);
     return kDone;
   }
-  for (const long id : parseIds(arguments.operands())) acknowledge(kept, loadTask(id)->ID);
+  for (const int64_t id : parseIds(arguments.operands())) acknowledge(kept, loadTask(id)->ID);
   return kDone;
 }
 

@@ -12,16 +12,16 @@
 namespace {
 
 constexpr Option kOptions[] = {{"grace", Option::kValue}};
-constexpr long kMostGrace = 24L * 60 * 60;  // seconds
+constexpr int64_t kMostGrace = int64_t{24} * 60 * 60;  // seconds
 
 int runStop(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
-  const std::vector<long> ids = parseIds(arguments.operands());
+  const std::vector<int64_t> ids = parseIds(arguments.operands());
   const std::chrono::seconds grace(
       arguments.number("grace", 0, kMostGrace).value_or(kUsualGrace.count()));
   if (geteuid() != 0) throw Failure("stopping runs takes root's rights");
-  return forEachId(ids, [&](long id) {
+  return forEachId(ids, [&](int64_t id) {
     const Task task = findTask(id);
     const std::string title = task ? titleOf(*task) : "task " + std::to_string(id);
     if (stopTask(id, title, grace) > 0) return;

@@ -34,7 +34,7 @@ void tell(const std::string &title, Stopped how) {
 
 }  // namespace
 
-size_t stopTask(long id, const std::string &title, std::chrono::seconds grace) {
+size_t stopTask(int64_t id, const std::string &title, std::chrono::seconds grace) {
   std::vector<KeptRun> runs = runsToStop(id);
   if (runs.empty()) return 0;
   noteStop(&runs);

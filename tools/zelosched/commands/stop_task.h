@@ -2,6 +2,7 @@
 #pragma once
 
 #include <chrono>
+#include <cstdint>
 #include <string>
 
 #include "store/task_list.h"
@@ -10,7 +11,7 @@ inline constexpr std::chrono::seconds kUsualGrace(10);
 
 // Ends the runs of the task that wait or go on, and tells of each. How many there were. Throws
 // Failure.
-size_t stopTask(long id, const std::string &title, std::chrono::seconds grace = kUsualGrace);
+size_t stopTask(int64_t id, const std::string &title, std::chrono::seconds grace = kUsualGrace);
 
 // "It is running, and goes on" and the like: on standard output, for a task that was disabled or
 // removed. Nothing when nothing of it is under way.

@@ -8,7 +8,7 @@
 
 namespace {
 
-Json::Value timeOrNull(const std::optional<long> &moment) {
+Json::Value timeOrNull(const std::optional<int64_t> &moment) {
   return moment ? jsonTime(static_cast<time_t>(*moment)) : Json::Value();
 }
 

@@ -34,8 +34,8 @@ struct FreeList {
 // The keys whose values are numbers, with what their fields hold; each of the others is a text.
 struct NumberKey {
   const char *key;
-  long least;
-  long most;
+  int64_t least;
+  int64_t most;
 };
 constexpr NumberKey signedKey(const char *key) {
   return {key, INT32_MIN, INT32_MAX};
@@ -102,7 +102,7 @@ bool isWireForm(const Json::Value &object) {
 void requireNumber(const std::string &key, const std::string &text) {
   const NumberKey *known = numberKey(key);
   if (known == nullptr) return;
-  const std::optional<long> number = parseNumber(text);
+  const std::optional<int64_t> number = parseNumber(text);
   if (!number) throw Failure("\"" + key + "\" is no whole number");
   if (*number < known->least || *number > known->most) {
     throw Failure("\"" + key + "\" is " + printable(text) + ", and must be from " +

@@ -91,8 +91,8 @@ std::vector<std::string> environmentOfCron() {
   return environment;
 }
 
-long cronProcess() {
-  const std::optional<long> pid = parseNumber(firstWord(kCronPidFile));
+int64_t cronProcess() {
+  const std::optional<int64_t> pid = parseNumber(firstWord(kCronPidFile));
   const bool isThere =
       pid && *pid > 0 && *pid <= INT32_MAX && QLIBCProcAlive(static_cast<pid_t>(*pid)) == kAlive;
   if (!isThere) return 0;
@@ -101,7 +101,7 @@ long cronProcess() {
   return name.find("cron") == std::string::npos ? 0 : *pid;
 }
 
-void takeLimitsOfCron(long cron) {
+void takeLimitsOfCron(int64_t cron) {
   if (cron == 0) return;
   for (int resource = 0; resource < RLIM_NLIMITS; ++resource) {
     const auto which = static_cast<__rlimit_resource>(resource);

@@ -1,6 +1,7 @@
 // What cron gives the programs that it starts, so that a run by hand tells how the night will be.
 #pragma once
 
+#include <cstdint>
 #include <string>
 #include <vector>
 
@@ -10,7 +11,7 @@ std::vector<std::string> environmentOfCron();
 
 // Gives this process the limits of cron's. Without a cron that runs they stay as they are. It
 // allocates nothing: a process that was forked may call it.
-void takeLimitsOfCron(long cron);
+void takeLimitsOfCron(int64_t cron);
 
 // Its process; 0 when it does not run.
-long cronProcess();
+int64_t cronProcess();

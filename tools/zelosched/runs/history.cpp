@@ -10,7 +10,7 @@
 namespace {
 
 constexpr char kDirectory[] = "/usr/zelo/var";
-constexpr long kDay = 24L * 60 * 60;  // seconds
+constexpr int64_t kDay = int64_t{24} * 60 * 60;  // seconds
 
 #define COLUMNS                                                                          \
   "run, task, generation, task_name, app, owner, started_by, due, queued, start, ended," \
@@ -35,12 +35,12 @@ constexpr char kGiveWay[] =
     " AND run <> ?";
 
 template <class Enum>
-Enum enumOf(long number, Enum last) {
-  return number < 0 || number > static_cast<long>(last) ? last : static_cast<Enum>(number);
+Enum enumOf(int64_t number, Enum last) {
+  return number < 0 || number > static_cast<int64_t>(last) ? last : static_cast<Enum>(number);
 }
 
 std::optional<int> smallNumber(const Query &query, int column) {
-  const std::optional<long> number = query.optionalNumber(column);
+  const std::optional<int64_t> number = query.optionalNumber(column);
   return number ? std::optional<int>(static_cast<int>(*number)) : std::nullopt;
 }
 
@@ -75,38 +75,40 @@ KeptRun runOf(const Query &query) {
   return run;
 }
 
-std::optional<long> asLong(std::optional<int> number) {
-  return number ? std::optional<long>(*number) : std::nullopt;
+std::optional<int64_t> asLong(std::optional<int> number) {
+  return number ? std::optional<int64_t>(*number) : std::nullopt;
 }
 
 void bind(Query *query, const KeptRun &run) {
   query->with(run.task).with(run.generation).with(run.taskName).with(run.app).with(run.owner);
-  query->with(static_cast<long>(run.trigger)).with(run.due).with(run.queued).with(run.start);
-  query->with(run.end).with(run.duration).with(static_cast<long>(run.state));
-  query->with(static_cast<long>(run.outcome)).with(asLong(run.exitCode)).with(asLong(run.signal));
+  query->with(static_cast<int64_t>(run.trigger)).with(run.due).with(run.queued).with(run.start);
+  query->with(run.end).with(run.duration).with(static_cast<int64_t>(run.state));
+  query->with(static_cast<int64_t>(run.outcome))
+      .with(asLong(run.exitCode))
+      .with(asLong(run.signal));
   query->with(run.outputBytes).with(run.boot).with(run.statusId).with(run.process.pid);
   query->with(run.process.born).with(run.keeper.pid).with(run.keeper.born);
-  query->with(run.isTold ? 1L : 0L);
-  const std::optional<long> known = run.start ? run.start : run.queued ? run.queued : run.end;
-  query->with(known ? *known : static_cast<long>(time(nullptr)));
+  query->with(run.isTold ? int64_t{1} : int64_t{0});
+  const std::optional<int64_t> known = run.start ? run.start : run.queued ? run.queued : run.end;
+  query->with(known ? *known : static_cast<int64_t>(time(nullptr)));
 }
 
-std::optional<long> generationOf(const KeptDatabase &kept, long task) {
+std::optional<int64_t> generationOf(const KeptDatabase &kept, int64_t task) {
   Query query(kept, "SELECT generation FROM task WHERE task = ? AND removed IS NULL");
   query.with(task);
-  return query.next() ? std::optional<long>(query.number(0)) : std::nullopt;
+  return query.next() ? std::optional<int64_t>(query.number(0)) : std::nullopt;
 }
 
 // Of a task that is there, its own; of one that is not, all that had the id.
 std::string conditionOf(const KeptDatabase &kept, const RunFilter &filter,
-                        std::vector<long> *values) {
+                        std::vector<int64_t> *values) {
   std::string condition = " WHERE 1";
-  const auto add = [&](const char *text, long value) {
+  const auto add = [&](const char *text, int64_t value) {
     condition += text;
     values->push_back(value);
   };
   if (filter.task) {
-    const std::optional<long> generation = generationOf(kept, *filter.task);
+    const std::optional<int64_t> generation = generationOf(kept, *filter.task);
     if (generation) {
       add(" AND generation = ?", *generation);
     } else {
@@ -124,15 +126,14 @@ std::string conditionOf(const KeptDatabase &kept, const RunFilter &filter,
 }
 
 bool isNearlyFull(const Settings &settings) {
-  constexpr unsigned long kAll = 100;
+  constexpr uint64_t kAll = 100;
   struct statvfs info {};
   if (statvfs(kDirectory, &info) != 0) return true;
-  return info.f_bavail * kAll <
-         info.f_blocks * static_cast<unsigned long>(settings.outputFreePercent);
+  return info.f_bavail * kAll < info.f_blocks * static_cast<uint64_t>(settings.outputFreePercent);
 }
 
 // The oldest go first.
-void dropOutputs(const KeptDatabase &kept, long task, const Settings &settings) {
+void dropOutputs(const KeptDatabase &kept, int64_t task, const Settings &settings) {
   Query(kept,
         "DELETE FROM output WHERE task = ?1 AND run <="
         " (SELECT run FROM output WHERE task = ?1 ORDER BY run DESC LIMIT 1 OFFSET ?2)")
@@ -143,8 +144,8 @@ void dropOutputs(const KeptDatabase &kept, long task, const Settings &settings) 
   Query oldest(kept, "SELECT run, size FROM output ORDER BY run LIMIT 1");
   Query drop(kept, "DELETE FROM output WHERE run = ?");
   sum.next();
-  for (long left = sum.number(0); left > settings.outputTotal && oldest.next();) {
-    const long run = oldest.number(0);
+  for (int64_t left = sum.number(0); left > settings.outputTotal && oldest.next();) {
+    const int64_t run = oldest.number(0);
     left -= oldest.number(1);
     while (oldest.next()) {
     }
@@ -154,8 +155,8 @@ void dropOutputs(const KeptDatabase &kept, long task, const Settings &settings) 
 
 }  // namespace
 
-ProcessName processNamed(long pid) {
-  return {pid, static_cast<long>(statOf(static_cast<pid_t>(pid)).started)};
+ProcessName processNamed(int64_t pid) {
+  return {pid, static_cast<int64_t>(statOf(static_cast<pid_t>(pid)).started)};
 }
 
 bool isAlive(const ProcessName &process) {
@@ -172,13 +173,13 @@ bool isBad(const RunRecord &run) {
 std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter) {
   std::vector<KeptRun> runs;
   if (!kept.isThere()) return runs;
-  std::vector<long> values;
+  std::vector<int64_t> values;
   const std::string sql = "SELECT " COLUMNS " FROM run" + conditionOf(kept, filter, &values) +
                           // The few that have not ended have an index of their own.
                           (filter.underWay ? " ORDER BY +moment DESC" : " ORDER BY moment DESC") +
                           ", run DESC LIMIT ?";
   Query query(kept, sql.c_str());
-  for (const long value : values) query.with(value);
+  for (const int64_t value : values) query.with(value);
   query.with(filter.limit);
   while (query.next()) runs.push_back(runOf(query));
   return runs;
@@ -195,8 +196,8 @@ std::vector<KeptRun> lastRuns(const KeptDatabase &kept) {
   return runs;
 }
 
-std::map<Outcome, long> countByOutcome(const KeptDatabase &kept) {
-  std::map<Outcome, long> counts;
+std::map<Outcome, int64_t> countByOutcome(const KeptDatabase &kept) {
+  std::map<Outcome, int64_t> counts;
   if (!kept.isThere()) return counts;
   Query query(kept, "SELECT outcome, count(*) FROM run WHERE state = 2 GROUP BY outcome");
   while (query.next()) counts[enumOf(query.number(0), Outcome::kLost)] += query.number(1);
@@ -229,7 +230,7 @@ void saveRun(const KeptDatabase &kept, KeptRun *run) {
 void saveOutput(const KeptDatabase &kept, const KeptRun &run, const Output &output,
                 const Settings &settings) {
   if (isNearlyFull(settings)) return;
-  const auto size = static_cast<long>(output.head.size() + output.tail.size());
+  const auto size = static_cast<int64_t>(output.head.size() + output.tail.size());
   if (size == 0 || settings.outputRuns == 0) return;
   Query insert(kept,
                "INSERT OR REPLACE INTO output(run, task, size, left_out, head, tail)"
@@ -239,7 +240,7 @@ void saveOutput(const KeptDatabase &kept, const KeptRun &run, const Output &outp
   dropOutputs(kept, run.task, settings);
 }
 
-std::optional<Output> outputOf(const KeptDatabase &kept, long run) {
+std::optional<Output> outputOf(const KeptDatabase &kept, int64_t run) {
   if (!kept.isThere()) return std::nullopt;
   Query query(kept, "SELECT head, tail, left_out FROM output WHERE run = ?");
   query.with(run);
@@ -254,7 +255,7 @@ void dropOldRuns(const KeptDatabase &kept, const Settings &settings) {
         " row_number() OVER (PARTITION BY task ORDER BY moment DESC, run DESC) AS place FROM run)"
         " WHERE place > ? AND moment < ?)")
       .with(settings.runsOfTask)
-      .with(static_cast<long>(time(nullptr)) - settings.runsDays * kDay)
+      .with(static_cast<int64_t>(time(nullptr)) - settings.runsDays * kDay)
       .run();
   Query(kept,
         "DELETE FROM run WHERE state = 2 AND (moment, run) <= (SELECT moment, run FROM run"
@@ -263,12 +264,12 @@ void dropOldRuns(const KeptDatabase &kept, const Settings &settings) {
       .run();
 }
 
-bool noteTold(const KeptDatabase &kept, std::string_view kind, long generation, long moment) {
+bool noteTold(const KeptDatabase &kept, std::string_view kind, int64_t generation, int64_t moment) {
   Query note(kept,
              "INSERT OR IGNORE INTO notice(kind, generation, moment, told)"
              " VALUES(?, ?, ?, ?)");
   note.with(std::string(kind)).with(generation).with(moment);
-  return note.with(static_cast<long>(time(nullptr))).run() > 0;
+  return note.with(static_cast<int64_t>(time(nullptr))).run() > 0;
 }
 
 bool wasBadBefore(const KeptDatabase &kept, const KeptRun &run) {
@@ -277,5 +278,5 @@ bool wasBadBefore(const KeptDatabase &kept, const KeptRun &run) {
               "SELECT outcome FROM run WHERE generation = ? AND run < ? AND state = 2"
               " ORDER BY run DESC LIMIT 1");
   query.with(*run.generation).with(run.run);
-  return query.next() && query.number(0) != static_cast<long>(Outcome::kFinished);
+  return query.next() && query.number(0) != static_cast<int64_t>(Outcome::kFinished);
 }

@@ -2,6 +2,7 @@
 // into /usr/zelo/var/history.sqlite, and what every output about runs is made of.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <optional>
 #include <string>
@@ -15,33 +16,33 @@
 // A process by what no other one of this boot ever has: its number and when it began, in the clock
 // ticks of /proc.
 struct ProcessName {
-  long pid = 0;
-  long born = 0;
+  int64_t pid = 0;
+  int64_t born = 0;
 };
 
 // One that has ended, and waits for its parent to ask how, is not alive.
 bool isAlive(const ProcessName &process);
 // `born` is 0 where there is none.
-ProcessName processNamed(long pid);
+ProcessName processNamed(int64_t pid);
 
 // With what only writers need to know.
 struct KeptRun : RunRecord {
-  std::optional<long> generation;  // of the task (task_notes.h)
-  std::string boot;                // during which it was last seen
-  std::optional<long> statusId;    // in the status database; none before it started
-  ProcessName process;             // the run's own, which waits for its turn and for the command
-  ProcessName keeper;              // pid 0: none
-  std::optional<long> stopAsked;   // when 'stop' was asked to end it
-  bool isTold = false;             // those who wanted to know have been told of its end
+  std::optional<int64_t> generation;  // of the task (task_notes.h)
+  std::string boot;                   // during which it was last seen
+  std::optional<int64_t> statusId;    // in the status database; none before it started
+  ProcessName process;                // the run's own, which waits for its turn and for the command
+  ProcessName keeper;                 // pid 0: none
+  std::optional<int64_t> stopAsked;   // when 'stop' was asked to end it
+  bool isTold = false;                // those who wanted to know have been told of its end
 };
 
 struct RunFilter {
-  std::optional<long> task;  // its runs, without those of a removed one that had its id
-  std::optional<long> run;
-  std::optional<long> since;  // moments
-  bool failed = false;        // those alone that did not end well
-  bool underWay = false;      // those alone that have not ended
-  long limit = -1;            // none for a negative one
+  std::optional<int64_t> task;  // its runs, without those of a removed one that had its id
+  std::optional<int64_t> run;
+  std::optional<int64_t> since;  // moments
+  bool failed = false;           // those alone that did not end well
+  bool underWay = false;         // those alone that have not ended
+  int64_t limit = -1;            // none for a negative one
 };
 
 // Newest first. Each of these throws Failure.
@@ -51,7 +52,7 @@ std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter);
 std::vector<KeptRun> lastRuns(const KeptDatabase &kept);
 
 // How many runs ended in which way.
-std::map<Outcome, long> countByOutcome(const KeptDatabase &kept);
+std::map<Outcome, int64_t> countByOutcome(const KeptDatabase &kept);
 
 // As runsOf, in a look of its own; none when there is no history yet.
 std::vector<KeptRun> keptRuns(const RunFilter &filter);
@@ -67,20 +68,20 @@ void saveRun(const KeptDatabase &kept, KeptRun *run);
 struct Output {
   std::string head;
   std::string tail;
-  long leftOut = 0;  // bytes between them
+  int64_t leftOut = 0;  // bytes between them
 };
 
 // Nothing is stored while the file system is nearly full. In a transaction of the caller's.
 void saveOutput(const KeptDatabase &kept, const KeptRun &run, const Output &output,
                 const Settings &settings);
-std::optional<Output> outputOf(const KeptDatabase &kept, long run);
+std::optional<Output> outputOf(const KeptDatabase &kept, int64_t run);
 
 // Drops what the settings no longer keep.
 void dropOldRuns(const KeptDatabase &kept, const Settings &settings);
 
 // True for the one caller that is to tell of it: of a run ("missed" and the like), at a moment. In
 // a transaction of the caller's.
-bool noteTold(const KeptDatabase &kept, std::string_view kind, long generation, long moment);
+bool noteTold(const KeptDatabase &kept, std::string_view kind, int64_t generation, int64_t moment);
 
 // Of the last run of the task before this one, which ended: it was bad.
 bool wasBadBefore(const KeptDatabase &kept, const KeptRun &run);

@@ -30,8 +30,8 @@ class Sweep {
   Sweep(const RunDatabase &status, const TaskList &list) : status_(status), list_(list) {}
 
   // In one transaction. How many rows of the history it added or changed.
-  long run(const KeptDatabase &kept);
-  const std::vector<long> &runsWithoutKeeper() const { return withoutKeeper_; }
+  int64_t run(const KeptDatabase &kept);
+  const std::vector<int64_t> &runsWithoutKeeper() const { return withoutKeeper_; }
 
  private:
   void takeOver(const KeptDatabase &kept);
@@ -48,8 +48,8 @@ class Sweep {
   const TaskList &list_;
   std::string boot_ = bootId();
   Settings settings_ = settingsOrComplaints();
-  long changed_ = 0;
-  std::vector<long> withoutKeeper_;
+  int64_t changed_ = 0;
+  std::vector<int64_t> withoutKeeper_;
 };
 
 bool isKnown(const KeptDatabase &kept, const Run &row) {
@@ -126,7 +126,7 @@ void Sweep::takeOver(const KeptDatabase &kept) {
   const std::string name = runDatabaseName();
   Query last(kept, "SELECT status_id FROM swept WHERE file = ?");
   last.with(name);
-  long done = last.next() ? last.number(0) : 0;
+  int64_t done = last.next() ? last.number(0) : 0;
   if (status_.lastStatusId() < done) done = 0;  // it has been emptied
   for (const Run &row : status_.after(done)) {
     takeOver(kept, row);
@@ -203,7 +203,7 @@ bool isWhole(const TaskList &list) {
   return stored && *stored == ordinary;
 }
 
-long Sweep::run(const KeptDatabase &kept) {
+int64_t Sweep::run(const KeptDatabase &kept) {
   Transaction transaction(kept);
   if (!areTasksLost()) noteTasks(kept, list_, isWhole(list_));
   takeOver(kept);
@@ -214,13 +214,13 @@ long Sweep::run(const KeptDatabase &kept) {
   return changed_;
 }
 
-long sweep(const TaskList &list) {
+int64_t sweep(const TaskList &list) {
   const RunDatabase status;
   if (status.lastStatusId() == 0 && !KeptDatabase(KeptDatabase::kRead).isThere()) return 0;
   const KeptDatabase kept(KeptDatabase::kChange);
   Sweep sweep(status, list);
-  const long changed = sweep.run(kept);
-  for (const long run : sweep.runsWithoutKeeper()) {
+  const int64_t changed = sweep.run(kept);
+  for (const int64_t run : sweep.runsWithoutKeeper()) {
     startDetached(installedTaskProgram(), {"--keep", "run=" + std::to_string(run)});
   }
   return changed;
@@ -228,7 +228,7 @@ long sweep(const TaskList &list) {
 
 // The clock alone must not fill the log.
 void sweepAndSay() {
-  const long count = sweep(TaskList(TaskList::Unreadable::kIsLeftOut));
+  const int64_t count = sweep(TaskList(TaskList::Unreadable::kIsLeftOut));
   if (count > 0) std::printf("%s kept\n", counted(static_cast<size_t>(count), "run").c_str());
 }
 
@@ -251,7 +251,7 @@ std::vector<KeptRun> takeUntold(const KeptDatabase &kept) {
 // Each time once, also when nobody was to be told of it then.
 std::vector<RunRecord> takeUntoldMissed(const KeptDatabase &kept, const TaskList &list) {
   std::vector<RunRecord> untold;
-  const std::map<long, TaskNote> notes = taskNotes(kept);
+  const std::map<int64_t, TaskNote> notes = taskNotes(kept);
   Transaction transaction(kept);
   for (const MissedTask &missed : missedTasks(kept, list, 0)) {
     const auto note = notes.find(missed.task->ID);

@@ -19,8 +19,8 @@ constexpr char kDirectory[] = "/usr/zelo/var";
 constexpr mode_t kDirectoryMode = 0755;
 constexpr mode_t kMode = 0600;  // command results are nobody else's business
 constexpr char kBootId[] = "/proc/sys/kernel/random/boot_id";
-constexpr long kFirstVersion = 1;
-constexpr long kVersion = 2;  // in user_version; 0 is a new database
+constexpr int64_t kFirstVersion = 1;
+constexpr int64_t kVersion = 2;  // in user_version; 0 is a new database
 
 // A run has the number that no other run ever gets. The ids of the status database begin anew with
 // each boot, or when somebody removes that database, so that it takes all that never changes in a
@@ -130,7 +130,7 @@ std::string pathBehindLinks() {
   return std::string(directory.get()) + std::strrchr(kPath, '/');
 }
 
-long versionOf(const KeptDatabase &database) {
+int64_t versionOf(const KeptDatabase &database) {
   Query query(database, "PRAGMA user_version");
   return query.next() ? query.number(0) : 0;
 }
@@ -143,7 +143,7 @@ void execute(const KeptDatabase &database, const char *sql) {
 
 void makeTables(const KeptDatabase &database) {
   Transaction transaction(database);
-  const long version = versionOf(database);  // another command may have been first
+  const int64_t version = versionOf(database);  // another command may have been first
   if (version == kFirstVersion) {
     execute(database, "DROP INDEX run_of_task; ALTER TABLE run RENAME TO run_of_first;");
   }
@@ -175,7 +175,7 @@ KeptDatabase::KeptDatabase(Access access, std::chrono::milliseconds patience) {
   db_.reset(opened);
   if (result != SQLITE_OK) fail("open", opened);
   sqlite3_busy_timeout(opened, static_cast<int>(patience.count()));
-  const long version = versionOf(*this);
+  const int64_t version = versionOf(*this);
   if (version > kVersion) throw cannot("read", "a later zelosched made it");
   if (version == kVersion) return;
   // What cannot be written, such as a file system that is read-only, cannot be brought to this
@@ -198,12 +198,12 @@ Query &Query::bound(int result) {
   return *this;
 }
 
-Query &Query::with(long number) {
+Query &Query::with(int64_t number) {
   return bound(sqlite3_bind_int64(statement_.get(), ++parameters_, number));
 }
 
 // Without a value it is NULL.
-Query &Query::with(std::optional<long> number) {
+Query &Query::with(std::optional<int64_t> number) {
   if (number) return with(*number);
   return bound(sqlite3_bind_null(statement_.get(), ++parameters_));
 }
@@ -233,17 +233,17 @@ bool Query::next() {
   return false;
 }
 
-long Query::run() {
+int64_t Query::run() {
   while (next()) {
   }
   return sqlite3_changes64(db_);
 }
 
-long Query::number(int column) const {
+int64_t Query::number(int column) const {
   return sqlite3_column_int64(statement_.get(), column);
 }
 
-std::optional<long> Query::optionalNumber(int column) const {
+std::optional<int64_t> Query::optionalNumber(int column) const {
   if (sqlite3_column_type(statement_.get(), column) == SQLITE_NULL) return std::nullopt;
   return number(column);
 }
@@ -253,7 +253,7 @@ std::optional<double> Query::optionalReal(int column) const {
   return sqlite3_column_double(statement_.get(), column);
 }
 
-long Query::lastKey() const {
+int64_t Query::lastKey() const {
   return sqlite3_last_insert_rowid(db_);
 }
 

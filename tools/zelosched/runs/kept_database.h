@@ -4,6 +4,7 @@
 #pragma once
 
 #include <chrono>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -50,8 +51,8 @@ class Query {
   Query(const KeptDatabase &database, const char *sql);
 
   // The next parameter.
-  Query &with(long number);
-  Query &with(std::optional<long> number);
+  Query &with(int64_t number);
+  Query &with(std::optional<int64_t> number);
   Query &with(std::optional<double> number);
   Query &with(const std::string &text);
   Query &withBytes(const std::string &bytes);
@@ -59,14 +60,14 @@ class Query {
   // To the next row. False at the end, and it can be run again.
   bool next();
   // Of a statement without rows: how many it changed.
-  long run();
+  int64_t run();
 
-  long number(int column) const;
-  std::optional<long> optionalNumber(int column) const;
+  int64_t number(int column) const;
+  std::optional<int64_t> optionalNumber(int column) const;
   std::optional<double> optionalReal(int column) const;
   std::string text(int column) const;  // or bytes
   // The key of the row last inserted.
-  long lastKey() const;
+  int64_t lastKey() const;
 
  private:
   struct Finalize {

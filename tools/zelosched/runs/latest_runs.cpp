@@ -14,12 +14,12 @@ std::string signalName(int signal) {
 }
 
 // In the largest unit of which it is one at least.
-std::string spanText(long seconds) {
-  constexpr long kMinute = 60;
-  constexpr long kHour = 60 * kMinute;
-  constexpr long kDay = 24 * kHour;
+std::string spanText(int64_t seconds) {
+  constexpr int64_t kMinute = 60;
+  constexpr int64_t kHour = 60 * kMinute;
+  constexpr int64_t kDay = 24 * kHour;
   constexpr struct {
-    long seconds;
+    int64_t seconds;
     const char *name;
   } kUnits[] = {{kDay, " d"}, {kHour, " h"}, {kMinute, " min"}, {1, " s"}};
   for (const auto &unit : kUnits) {
@@ -30,7 +30,7 @@ std::string spanText(long seconds) {
 
 }  // namespace
 
-const RunRecord *LatestRuns::of(long task) const {
+const RunRecord *LatestRuns::of(int64_t task) const {
   const auto found = ofEach.find(task);
   return found == ofEach.end() ? nullptr : &found->second;
 }
@@ -81,8 +81,8 @@ std::string outcomeInBrief(const RunRecord &run) {
   }
 }
 
-std::string runInBrief(const RunRecord &run, long now) {
-  const std::optional<long> moment = run.end ? run.end : run.start ? run.start : run.queued;
+std::string runInBrief(const RunRecord &run, int64_t now) {
+  const std::optional<int64_t> moment = run.end ? run.end : run.start ? run.start : run.queued;
   std::string outcome = outcomeInBrief(run);
   if (!moment) return outcome;
   const std::string span = spanText(now - *moment);

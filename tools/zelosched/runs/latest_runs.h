@@ -1,6 +1,7 @@
 // The last run of each task, for those that show tasks.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <set>
 #include <string>
@@ -11,10 +12,10 @@
 struct LatestRuns {
   bool isKnown = false;  // this user may read the runs, and they can be read
   std::string fault;     // what failed, where this user may read them
-  std::map<long, RunRecord> ofEach;
-  std::set<long> running;  // the tasks that have a run which goes on
+  std::map<int64_t, RunRecord> ofEach;
+  std::set<int64_t> running;  // the tasks that have a run which goes on
 
-  const RunRecord *of(long task) const;
+  const RunRecord *of(int64_t task) const;
 };
 
 // By a list that the caller has read, or one that is read for it.
@@ -25,4 +26,4 @@ LatestRuns latestRuns();
 std::string outcomeInBrief(const RunRecord &run);
 
 // "failed 7, 3 h ago"; "running for 3 h".
-std::string runInBrief(const RunRecord &run, long now);
+std::string runInBrief(const RunRecord &run, int64_t now);

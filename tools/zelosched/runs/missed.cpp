@@ -12,23 +12,23 @@
 
 namespace {
 
-constexpr long kMinute = 60;          // seconds
-constexpr long kGrace = 2 * kMinute;  // in which cron's program may still begin
-constexpr long kClockMoved = 2 * kMinute;
+constexpr int64_t kMinute = 60;          // seconds
+constexpr int64_t kGrace = 2 * kMinute;  // in which cron's program may still begin
+constexpr int64_t kClockMoved = 2 * kMinute;
 
-long uptime() {
+int64_t uptime() {
   timespec up{};
   clock_gettime(CLOCK_BOOTTIME, &up);
-  return static_cast<long>(up.tv_sec);
+  return static_cast<int64_t>(up.tv_sec);
 }
 
-long epoch() {
-  return static_cast<long>(time(nullptr));
+int64_t epoch() {
+  return static_cast<int64_t>(time(nullptr));
 }
 
 struct Boot {
-  std::optional<long> started;  // the look before cron was started
-  long began = 0;               // by the clock of the last look
+  std::optional<int64_t> started;  // the look before cron was started
+  int64_t began = 0;               // by the clock of the last look
   bool wasClockSet = false;
 };
 
@@ -41,8 +41,8 @@ std::optional<Boot> bootOf(const KeptDatabase &kept, const std::string &id) {
 
 // The first time in a boot that the clock was set, it was wrong before. Later on somebody has
 // changed the time, and what was due before was due.
-void noteClock(const KeptDatabase &kept, const std::string &id, const Boot &boot, long now) {
-  const long began = now - uptime();
+void noteClock(const KeptDatabase &kept, const std::string &id, const Boot &boot, int64_t now) {
+  const int64_t began = now - uptime();
   const bool hasMoved = std::abs(began - boot.began) > kClockMoved;
   if (hasMoved && !boot.wasClockSet) {
     Query(kept, "UPDATE boot SET clock_from = ?, clock_until = ? WHERE boot = ?")
@@ -59,8 +59,8 @@ void noteClock(const KeptDatabase &kept, const std::string &id, const Boot &boot
 }
 
 struct Span {
-  long from;
-  long until;
+  int64_t from;
+  int64_t until;
 };
 
 // In which the clock was wrong.
@@ -72,15 +72,15 @@ std::vector<Span> unjudgedSpans(const KeptDatabase &kept) {
 }
 
 // Up to which moment a time that was passed over counts as missed.
-long judgedUntil(const KeptDatabase &kept, long now) {
+int64_t judgedUntil(const KeptDatabase &kept, int64_t now) {
   const std::optional<Boot> boot = bootOf(kept, bootId());
-  const long certain = boot && boot->started ? *boot->started : 0;
+  const int64_t certain = boot && boot->started ? *boot->started : 0;
   return std::max(now - kGrace, std::min(certain, now));
 }
 
 class Judge {
  public:
-  Judge(const KeptDatabase &kept, const TaskList &list, long since, long now)
+  Judge(const KeptDatabase &kept, const TaskList &list, int64_t since, int64_t now)
       : off_(list),
         unjudged_(unjudgedSpans(kept)),
         notes_(taskNotes(kept)),
@@ -94,7 +94,7 @@ class Judge {
     MissedTask missed{&task};
     const auto note = notes_.find(task.ID);
     if (note == notes_.end()) return missed;  // nobody knows since when it has been there
-    const long since = sinceOf(note->second);
+    const int64_t since = sinceOf(note->second);
     if (since >= until_) return missed;
     for (const LocalMinute &minute : runsBetween(task, localMinute(since), localMinute(until_))) {
       judge(minute, &missed);
@@ -103,13 +103,13 @@ class Judge {
   }
 
  private:
-  long sinceOf(const TaskNote &note) {
+  int64_t sinceOf(const TaskNote &note) {
     return std::max({since_, note.changed, numberOf(&lastRun_.with(note.generation).with(now_)),
                      numberOf(&acknowledged_.with(note.generation))});
   }
 
-  static long numberOf(Query *query) {
-    long number = 0;
+  static int64_t numberOf(Query *query) {
+    int64_t number = 0;
     while (query->next()) number = query->number(0);
     return number;
   }
@@ -131,12 +131,12 @@ class Judge {
 
   PlannedOff off_;
   std::vector<Span> unjudged_;
-  std::map<long, TaskNote> notes_;
+  std::map<int64_t, TaskNote> notes_;
   Query lastRun_;
   Query acknowledged_;
-  long since_;
-  long now_;
-  long until_;
+  int64_t since_;
+  int64_t now_;
+  int64_t until_;
 };
 
 }  // namespace
@@ -151,7 +151,7 @@ bool areTasksLost() {
 void markMachineUp(bool isStarting) {
   const KeptDatabase kept(KeptDatabase::kChange);
   const std::string id = bootId();
-  const long now = epoch();
+  const int64_t now = epoch();
   Transaction transaction(kept);
   const std::optional<Boot> boot = bootOf(kept, id);
   if (boot) {
@@ -159,7 +159,7 @@ void markMachineUp(bool isStarting) {
   } else {
     Query(kept, "INSERT INTO boot(boot, started, began, seen) VALUES(?, ?, ?, ?)")
         .with(id)
-        .with(isStarting ? std::optional<long>(now) : std::nullopt)
+        .with(isStarting ? std::optional<int64_t>(now) : std::nullopt)
         .with(now - uptime())
         .with(now)
         .run();
@@ -174,9 +174,9 @@ void markMachineUp(bool isStarting) {
 std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &list, time_t since) {
   std::vector<MissedTask> found;
   if (!kept.isThere() || areTasksLost()) return found;
-  const long now = epoch();
+  const int64_t now = epoch();
   const Snapshot snapshot(kept);
-  Judge judge(kept, list, std::max(static_cast<long>(since), now - kMissedRemembered), now);
+  Judge judge(kept, list, std::max(static_cast<int64_t>(since), now - kMissedRemembered), now);
   for (const TaskRecord *task : list.tasks()) {
     if (!isEnabled(*task) || isPower(*task)) continue;
     const MissedTask missed = judge.missedOf(*task);
@@ -187,7 +187,7 @@ std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &li
   return found;
 }
 
-void acknowledge(const KeptDatabase &kept, std::optional<long> task) {
+void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task) {
   Transaction transaction(kept);
   Query note(
       kept,
@@ -197,7 +197,7 @@ void acknowledge(const KeptDatabase &kept, std::optional<long> task) {
   transaction.commit();
 }
 
-long acknowledgedAt(const KeptDatabase &kept, long generation) {
+int64_t acknowledgedAt(const KeptDatabase &kept, int64_t generation) {
   Query query(kept, "SELECT moment FROM acknowledged WHERE generation = ?");
   query.with(generation);
   return query.next() ? query.number(0) : 0;

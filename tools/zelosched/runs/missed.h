@@ -2,6 +2,7 @@
 // cron was stopped, or the program that cron starts was gone.
 #pragma once
 
+#include <cstdint>
 #include <ctime>
 #include <optional>
 #include <vector>
@@ -10,7 +11,7 @@
 #include "store/task_list.h"
 
 // How long a missed time is told of.
-inline constexpr long kMissedRemembered = 8L * 24 * 60 * 60;  // seconds
+inline constexpr int64_t kMissedRemembered = int64_t{8} * 24 * 60 * 60;  // seconds
 
 // Notes that the machine is up, and how its clock stands. `isStarting`: cron was not started so
 // far, so that what is due up to this minute was missed for certain. Throws Failure.
@@ -35,7 +36,7 @@ std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &li
 
 // From now on nothing is told of what became of the runs of this task, or of all, so far.
 // Throws Failure.
-void acknowledge(const KeptDatabase &kept, std::optional<long> task);
+void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task);
 
 // When that was last said of a task; 0 when it never was.
-long acknowledgedAt(const KeptDatabase &kept, long generation);
+int64_t acknowledgedAt(const KeptDatabase &kept, int64_t generation);

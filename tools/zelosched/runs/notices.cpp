@@ -96,7 +96,7 @@ class Environment {
     std::erase_if(entries_, [&](const std::string &entry) { return entry.starts_with(begin); });
     entries_.push_back(begin + value.substr(0, value.find('\0')));
   }
-  void set(const char *name, std::optional<long> value) {
+  void set(const char *name, std::optional<int64_t> value) {
     set(name, value ? std::to_string(*value) : std::string());
   }
   std::vector<char *> pointers() {
@@ -110,7 +110,7 @@ class Environment {
   std::vector<std::string> entries_;
 };
 
-std::string momentOrNothing(std::optional<long> moment) {
+std::string momentOrNothing(std::optional<int64_t> moment) {
   return moment ? momentText(*moment) : std::string();
 }
 
@@ -119,22 +119,23 @@ Environment environmentOf(const RunRecord &run, const char *outputPath, bool isR
   all.set("PATH", std::string("/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin"));
   all.set("HOME", std::string("/root"));
   all.set("LC_ALL", std::string("C.UTF-8"));
-  all.set("ZELO_RUN", std::optional<long>(run.run));
-  all.set("ZELO_RUN_TASK", std::optional<long>(run.task));
+  all.set("ZELO_RUN", std::optional<int64_t>(run.run));
+  all.set("ZELO_RUN_TASK", std::optional<int64_t>(run.task));
   all.set("ZELO_RUN_TASK_NAME", run.taskName);
   all.set("ZELO_RUN_APP", run.app);
   all.set("ZELO_RUN_OWNER", run.owner);
   all.set("ZELO_RUN_TRIGGER", std::string(nameOf(run.trigger)));
   all.set("ZELO_RUN_OUTCOME", std::string(nameOf(run.outcome)));
-  all.set("ZELO_RUN_EXIT_CODE", run.exitCode ? std::optional<long>(*run.exitCode) : std::nullopt);
-  all.set("ZELO_RUN_SIGNAL", run.signal ? std::optional<long>(*run.signal) : std::nullopt);
+  all.set("ZELO_RUN_EXIT_CODE",
+          run.exitCode ? std::optional<int64_t>(*run.exitCode) : std::nullopt);
+  all.set("ZELO_RUN_SIGNAL", run.signal ? std::optional<int64_t>(*run.signal) : std::nullopt);
   all.set("ZELO_RUN_DUE", momentOrNothing(run.due));
   all.set("ZELO_RUN_QUEUED", momentOrNothing(run.queued));
   all.set("ZELO_RUN_START", momentOrNothing(run.start));
   all.set("ZELO_RUN_END", momentOrNothing(run.end));
   all.set("ZELO_RUN_DURATION_SECONDS",
           run.duration ? std::to_string(*run.duration) : std::string());
-  all.set("ZELO_RUN_OUTPUT_BYTES", std::optional<long>(run.outputBytes));
+  all.set("ZELO_RUN_OUTPUT_BYTES", std::optional<int64_t>(run.outputBytes));
   all.set("ZELO_RUN_OUTPUT", std::string(outputPath));
   all.set("ZELO_RUN_RECOVERED", std::string(isRecovered ? "1" : ""));
   return all;

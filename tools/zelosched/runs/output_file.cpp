@@ -43,7 +43,7 @@ void writeAt(int file, const void *bytes, size_t size, int64_t place) {
 
 }  // namespace
 
-OutputFile OutputFile::make(const ProcessName &process, long first, long last) {
+OutputFile OutputFile::make(const ProcessName &process, int64_t first, int64_t last) {
   OutputFile made;
   if (isDirectoryOurs()) {
     made.path_ = pathOf(process);
@@ -123,13 +123,13 @@ void OutputFile::remove() {
   if (!path_.empty()) unlink(path_.c_str());
 }
 
-long OutputFile::total() const {
+int64_t OutputFile::total() const {
   Header header{};
   return isOpen() && readHeader(&header) ? header.total : 0;
 }
 
 // Within the first bytes, or within the last ones that are still there.
-std::string OutputFile::read(const Header &header, long from, long to) const {
+std::string OutputFile::read(const Header &header, int64_t from, int64_t to) const {
   std::string bytes;
   while (from < to) {
     int64_t place = from;
@@ -156,22 +156,22 @@ Output OutputFile::contents() const {
   Output output;
   Header header{};
   if (!isOpen() || !readHeader(&header)) return output;
-  const long headEnd = std::min(header.first, header.total);
-  const long tailStart = std::max(headEnd, header.total - header.last);
+  const int64_t headEnd = std::min(header.first, header.total);
+  const int64_t tailStart = std::max(headEnd, header.total - header.last);
   output.head = read(header, 0, headEnd);
   output.tail = read(header, tailStart, header.total);
   output.leftOut = tailStart - headEnd;
   return output;
 }
 
-std::string OutputFile::since(long from, long *lost) const {
+std::string OutputFile::since(int64_t from, int64_t *lost) const {
   *lost = 0;
   Header header{};
   if (!isOpen() || !readHeader(&header) || from >= header.total) return "";
-  const long headEnd = std::min(header.first, header.total);
+  const int64_t headEnd = std::min(header.first, header.total);
   std::string bytes = from < headEnd ? read(header, from, headEnd) : "";
-  const long next = std::max(from, headEnd);
-  const long tailStart = std::max(next, header.total - header.last);
+  const int64_t next = std::max(from, headEnd);
+  const int64_t tailStart = std::max(next, header.total - header.last);
   *lost = tailStart - next;
   return bytes + read(header, tailStart, header.total);
 }

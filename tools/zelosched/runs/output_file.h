@@ -14,7 +14,7 @@ class OutputFile {
  public:
   // A new one for the run of that process. Where none can be made it is in memory, and others
   // cannot see it. It is there until it is removed. Not isOpen() when there is not even memory.
-  static OutputFile make(const ProcessName &process, long first, long last);
+  static OutputFile make(const ProcessName &process, int64_t first, int64_t last);
   // That of a run that goes on, to be read, or to be written on.
   static OutputFile open(const ProcessName &process);
 
@@ -30,10 +30,10 @@ class OutputFile {
   void remove();
 
   // Bytes that were printed, kept or not.
-  long total() const;
+  int64_t total() const;
   Output contents() const;
   // Those from `from` on, and of those that are not there any more, how many.
-  std::string since(long from, long *lost) const;
+  std::string since(int64_t from, int64_t *lost) const;
 
  private:
   struct Header {
@@ -43,7 +43,7 @@ class OutputFile {
     int64_t total;
   };
   bool readHeader(Header *header) const;
-  std::string read(const Header &header, long from, long to) const;
+  std::string read(const Header &header, int64_t from, int64_t to) const;
 
   int file_ = -1;
   std::string path_;  // none of one in memory

@@ -52,7 +52,7 @@ std::map<pid_t, ProcessStat> processes() {
   DIR *directory = opendir("/proc");
   if (directory == nullptr) return found;
   while (const dirent *entry = readdir(directory)) {
-    const std::optional<long> pid = parseNumber(entry->d_name);
+    const std::optional<int64_t> pid = parseNumber(entry->d_name);
     if (!pid) continue;
     found[static_cast<pid_t>(*pid)] = statOf(entry->d_name);
   }
@@ -82,9 +82,9 @@ bool isOfRoot(pid_t pid) {
   while (std::getline(status, line) && !line.starts_with(label)) {
   }
   std::istringstream ids(line.substr(std::min(label.size(), line.size())));
-  long real = -1;
-  long effective = -1;
-  long saved = -1;
+  int64_t real = -1;
+  int64_t effective = -1;
+  int64_t saved = -1;
   return ids >> real >> effective >> saved && saved == 0;
 }
 

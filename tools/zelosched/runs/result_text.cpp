@@ -11,7 +11,7 @@
 namespace {
 
 std::string signalName(const std::string &number) {
-  const std::optional<long> signal = parseNumber(number);
+  const std::optional<int64_t> signal = parseNumber(number);
   const char *name = signal && *signal > 0 && *signal < INT_MAX
                          ? sigabbrev_np(static_cast<int>(*signal))
                          : nullptr;

@@ -47,7 +47,7 @@ void RunEvents::take(std::string_view text) {
     words >> code >> line >> file;
     QLIBCErrSetEx(code, file.c_str(), line);
   } else if (what == "ended") {
-    long outcome = 0;
+    int64_t outcome = 0;
     words >> outcome;
     run.outcome = static_cast<Outcome>(outcome);
     run.duration = next<double>(&words);

@@ -8,6 +8,7 @@
 //   failed 8192 12 unit.cpp   it was not started: the error record
 #pragma once
 
+#include <cstdint>
 #include <string>
 #include <string_view>
 
@@ -20,7 +21,7 @@ struct RunEvents {
   bool isWaiting = false;
   bool isRunning = false;
   bool isEnded = false;
-  long waitsFor = 0;
+  int64_t waitsFor = 0;
 
   // Of a line without its end; what it does not know it passes over.
   void take(std::string_view line);

@@ -1,6 +1,7 @@
 // A run as the history tells of it.
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <string>
 
@@ -24,8 +25,8 @@ enum class Outcome {
 #pragma GCC diagnostic pop
 
 struct RunRecord {
-  long run = 0;  // its number in the history, which no other run ever gets
-  long task = 0;
+  int64_t run = 0;  // its number in the history, which no other run ever gets
+  int64_t task = 0;
   std::string taskName;  // as it was when the run was noted
   std::string app;
   std::string owner;  // his name, or his number when he has none
@@ -33,14 +34,14 @@ struct RunRecord {
   RunState state = RunState::kWaiting;
   Outcome outcome = Outcome::kNone;
   // Moments, in seconds since the epoch.
-  std::optional<long> due;
-  std::optional<long> queued;
-  std::optional<long> start;
-  std::optional<long> end;
+  std::optional<int64_t> due;
+  std::optional<int64_t> queued;
+  std::optional<int64_t> start;
+  std::optional<int64_t> end;
   std::optional<double> duration;  // seconds, by a clock that nobody sets
   std::optional<int> exitCode;
   std::optional<int> signal;
-  long outputBytes = 0;  // all that it printed, also what was not kept
+  int64_t outputBytes = 0;  // all that it printed, also what was not kept
 };
 
 // "time-limit" and the like: the words of every output.

@@ -84,7 +84,7 @@ RunDatabase::RunDatabase(int patience) {
   sqlite3_busy_timeout(db_.get(), patience);
 }
 
-std::vector<Run> RunDatabase::select(const char *rest, const std::vector<long> &values) const {
+std::vector<Run> RunDatabase::select(const char *rest, const std::vector<int64_t> &values) const {
   std::vector<Run> runs;
   if (db_ == nullptr) return runs;
   sqlite3_stmt *prepared = nullptr;
@@ -104,7 +104,7 @@ std::vector<Run> RunDatabase::select(const char *rest, const std::vector<long> &
   return runs;
 }
 
-std::vector<Run> RunDatabase::newest(std::optional<long> taskId, long limit) const {
+std::vector<Run> RunDatabase::newest(std::optional<int64_t> taskId, int64_t limit) const {
   if (taskId) {
     return select("WHERE task_id = ? ORDER BY timestamp DESC, status_id DESC LIMIT ?",
                   {*taskId, limit});
@@ -112,8 +112,8 @@ std::vector<Run> RunDatabase::newest(std::optional<long> taskId, long limit) con
   return select("ORDER BY timestamp DESC, status_id DESC LIMIT ?", {limit});
 }
 
-std::map<long, Run> RunDatabase::latestOfEach() const {
-  std::map<long, Run> latest;
+std::map<int64_t, Run> RunDatabase::latestOfEach() const {
+  std::map<int64_t, Run> latest;
   for (const Run &run : select("ORDER BY timestamp, status_id", {})) latest[run.taskId] = run;
   return latest;
 }
@@ -125,30 +125,30 @@ std::vector<Run> RunDatabase::running() const {
   return runs;
 }
 
-long RunDatabase::lastStatusId() const {
+int64_t RunDatabase::lastStatusId() const {
   const std::vector<Run> last = select("ORDER BY status_id DESC LIMIT 1", {});
   return last.empty() ? 0 : last.front().statusId;
 }
 
-std::optional<Run> RunDatabase::runOfProcess(long pid, long statusId) const {
+std::optional<Run> RunDatabase::runOfProcess(int64_t pid, int64_t statusId) const {
   const std::vector<Run> found =
       select("WHERE pid = ? AND status_id > ? ORDER BY status_id DESC", {pid, statusId});
   if (found.empty()) return std::nullopt;
   return found.front();
 }
 
-std::vector<Run> RunDatabase::after(long statusId) const {
+std::vector<Run> RunDatabase::after(int64_t statusId) const {
   return select("WHERE status_id > ? ORDER BY status_id", {statusId});
 }
 
-std::optional<Run> RunDatabase::runOfId(long statusId) const {
+std::optional<Run> RunDatabase::runOfId(int64_t statusId) const {
   const std::vector<Run> found = select("WHERE status_id = ?", {statusId});
   if (found.empty()) return std::nullopt;
   return found.front();
 }
 
-std::optional<Run> RunDatabase::inTheWayOf(std::optional<long> taskId,
-                                           std::optional<std::string> app, long pid) const {
+std::optional<Run> RunDatabase::inTheWayOf(std::optional<int64_t> taskId,
+                                           std::optional<std::string> app, int64_t pid) const {
   for (const Run &run : running()) {
     const bool isInTheWay = (taskId && run.taskId == *taskId) || (app && run.app == *app);
     if (isInTheWay && run.pid != pid) return run;

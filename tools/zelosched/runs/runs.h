@@ -2,6 +2,7 @@
 // by a look at it.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <memory>
 #include <optional>
@@ -11,11 +12,11 @@
 struct sqlite3;
 
 struct Run {
-  long statusId = 0;
-  long pid = 0;
-  long start = 0;  // seconds since the epoch
+  int64_t statusId = 0;
+  int64_t pid = 0;
+  int64_t start = 0;  // seconds since the epoch
   std::string app;
-  long taskId = 0;
+  int64_t taskId = 0;
   int statusCode = 0;  // a run whose process is gone reads as ZELO_SCHED_STATUS_GONE
   std::string comment;
 };
@@ -38,23 +39,23 @@ class RunDatabase {
   explicit RunDatabase(int patience = kUsualPatience);
 
   // Newest first; of one task, or of all; at most `limit`, or all for a negative one.
-  std::vector<Run> newest(std::optional<long> taskId, long limit) const;
+  std::vector<Run> newest(std::optional<int64_t> taskId, int64_t limit) const;
   // The latest run of each task.
-  std::map<long, Run> latestOfEach() const;
+  std::map<int64_t, Run> latestOfEach() const;
   std::vector<Run> running() const;
-  long lastStatusId() const;
+  int64_t lastStatusId() const;
   // Recorded after that one, in the order of their ids.
-  std::vector<Run> after(long statusId) const;
-  std::optional<Run> runOfId(long statusId) const;
+  std::vector<Run> after(int64_t statusId) const;
+  std::optional<Run> runOfId(int64_t statusId) const;
   // A live run that keeps one of this task, and of this application, waiting; either may be asked
   // for. Not that of this process.
-  std::optional<Run> inTheWayOf(std::optional<long> taskId, std::optional<std::string> app,
-                                long pid) const;
+  std::optional<Run> inTheWayOf(std::optional<int64_t> taskId, std::optional<std::string> app,
+                                int64_t pid) const;
   // The run of a process that was recorded after `statusId`; the last one.
-  std::optional<Run> runOfProcess(long pid, long statusId) const;
+  std::optional<Run> runOfProcess(int64_t pid, int64_t statusId) const;
 
  private:
-  std::vector<Run> select(const char *rest, const std::vector<long> &values) const;
+  std::vector<Run> select(const char *rest, const std::vector<int64_t> &values) const;
 
   struct Close {
     void operator()(sqlite3 *db) const;

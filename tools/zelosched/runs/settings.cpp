@@ -20,18 +20,18 @@ enum class Kind { kNumber, kBytes, kPercent };
 
 struct Setting {
   const char *name;
-  long Settings::*member;
+  int64_t Settings::*member;
   Kind kind;
-  long least;
-  long most;
+  int64_t least;
+  int64_t most;
 };
 
 // A keeper holds what it keeps of a run in a file in memory, hence the bounds on the bytes of one.
 constexpr Setting kSettings[] = {
-    {"output-first", &Settings::outputFirst, Kind::kBytes, 0, 16L << 20},
-    {"output-last", &Settings::outputLast, Kind::kBytes, 0, 16L << 20},
+    {"output-first", &Settings::outputFirst, Kind::kBytes, 0, int64_t{16} << 20},
+    {"output-last", &Settings::outputLast, Kind::kBytes, 0, int64_t{16} << 20},
     {"output-runs", &Settings::outputRuns, Kind::kNumber, 0, 100000},
-    {"output-total", &Settings::outputTotal, Kind::kBytes, 0, 64L << 30},
+    {"output-total", &Settings::outputTotal, Kind::kBytes, 0, int64_t{64} << 30},
     {"output-free", &Settings::outputFreePercent, Kind::kPercent, 0, 100},
     {"runs-of-task", &Settings::runsOfTask, Kind::kNumber, 1, 100000000},
     {"runs-total", &Settings::runsTotal, Kind::kNumber, 1, 100000000},
@@ -46,20 +46,20 @@ std::string_view trimmed(std::string_view text) {
 }
 
 // "64K", "16M", "1G", or a number alone.
-std::optional<long> valueOf(std::string_view text, Kind kind) {
-  long unit = 1;
+std::optional<int64_t> valueOf(std::string_view text, Kind kind) {
+  int64_t unit = 1;
   if (!text.empty() && kind == Kind::kBytes) {
     constexpr std::string_view kUnits = "KMG";
     constexpr int kShift = 10;
     const size_t place = kUnits.find(text.back());
     if (place != std::string_view::npos) {
-      unit = 1L << (kShift * (static_cast<int>(place) + 1));
+      unit = int64_t{1} << (kShift * (static_cast<int>(place) + 1));
       text.remove_suffix(1);
     }
   }
   if (kind == Kind::kPercent && !text.empty() && text.back() == '%') text.remove_suffix(1);
-  const std::optional<long> number = parseNumber(trimmed(text));
-  constexpr long kMostCount = 1L << 32;  // times the greatest unit still fits
+  const std::optional<int64_t> number = parseNumber(trimmed(text));
+  constexpr int64_t kMostCount = int64_t{1} << 32;  // times the greatest unit still fits
   if (!number || *number < 0 || *number > kMostCount) return std::nullopt;
   return *number * unit;
 }
@@ -76,7 +76,7 @@ std::string take(std::string_view line, Settings *settings) {
       std::find_if(std::begin(kSettings), std::end(kSettings),
                    [&](const Setting &candidate) { return name == candidate.name; });
   if (setting == std::end(kSettings)) return "there is no setting '" + printable(name) + "'";
-  const std::optional<long> number = valueOf(value, setting->kind);
+  const std::optional<int64_t> number = valueOf(value, setting->kind);
   if (!number || *number < setting->least || *number > setting->most) {
     return std::string(setting->name) + " is a number from " + std::to_string(setting->least) +
            " to " + std::to_string(setting->most) + ", not '" + printable(value) + "'";

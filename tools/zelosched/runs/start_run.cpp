@@ -54,7 +54,7 @@ std::vector<char *> pointersTo(std::vector<std::string> *words) {
 
 // The process that starts the program. Signals are as cron leaves them.
 [[noreturn]] void becomeProgram(char *const *argv, char *const *envp, const Pipe &tell,
-                                const Pipe &copy, long cron) {
+                                const Pipe &copy, int64_t cron) {
   const int nothing = open("/dev/null", O_RDWR);
   for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) dup2(nothing, stream);
   if (nothing > STDERR_FILENO) close(nothing);
@@ -99,7 +99,7 @@ StartedRun::StartedRun(const ZELO_SCHED_TASK &task, const RunRequest &request) {
   std::vector<std::string> environment = environmentOfCron();
   const std::vector<char *> argv = pointersTo(&words);
   const std::vector<char *> envp = pointersTo(&environment);
-  const long cron = cronProcess();
+  const int64_t cron = cronProcess();
   const pid_t pid = fork();
   if (pid == 0) becomeProgram(argv.data(), envp.data(), tell, copy, cron);
   const int reason = errno;

@@ -4,6 +4,7 @@
 #include <zelosched.h>
 
 #include <chrono>
+#include <cstdint>
 #include <optional>
 #include <string>
 
@@ -11,7 +12,7 @@
 
 struct RunRequest {
   Trigger trigger = Trigger::kManual;
-  std::optional<long> due;
+  std::optional<int64_t> due;
   bool isDisabledSkipped = false;  // a task that is disabled by now is passed over without a word
   bool wantsOutput = false;
 };

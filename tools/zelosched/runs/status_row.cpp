@@ -7,11 +7,11 @@
 
 namespace {
 
-constexpr long kMostSignal = 1000;
-constexpr long kMostExitCode = 255;
+constexpr int64_t kMostSignal = 1000;
+constexpr int64_t kMostExitCode = 255;
 
-std::optional<int> numberIn(const std::string &comment, long most) {
-  const std::optional<long> number = parseNumber(comment);
+std::optional<int> numberIn(const std::string &comment, int64_t most) {
+  const std::optional<int64_t> number = parseNumber(comment);
   if (!number || *number < 0 || *number > most) return std::nullopt;
   return static_cast<int>(*number);
 }

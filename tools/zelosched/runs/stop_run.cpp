@@ -43,7 +43,7 @@ class Held {
   }
   bool waitForEnd(std::chrono::milliseconds time) const {
     pollfd wanted{file_, POLLIN, 0};
-    return poll(&wanted, 1, static_cast<int>(std::max<long>(time.count(), 0))) > 0;
+    return poll(&wanted, 1, static_cast<int>(std::max<int64_t>(time.count(), 0))) > 0;
   }
 
  private:
@@ -121,7 +121,7 @@ Stopped stopRun(const KeptRun &run, std::chrono::milliseconds grace) {
   return Stopped::kPartly;
 }
 
-std::vector<KeptRun> runsToStop(long task) {
+std::vector<KeptRun> runsToStop(int64_t task) {
   attempt([] { sweepRuns(); });
   RunFilter filter;
   filter.task = task;
@@ -146,7 +146,7 @@ std::vector<KeptRun> runsToStop(long task) {
 }
 
 void noteStop(std::vector<KeptRun> *runs) {
-  const auto now = static_cast<long>(time(nullptr));
+  const auto now = static_cast<int64_t>(time(nullptr));
   attempt([&] {
     const KeptDatabase kept(KeptDatabase::kChange);
     Transaction transaction(kept);

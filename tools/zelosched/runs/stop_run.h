@@ -2,6 +2,7 @@
 #pragma once
 
 #include <chrono>
+#include <cstdint>
 
 #include "runs/history.h"
 
@@ -16,5 +17,5 @@ Stopped stopRun(const KeptRun &run, std::chrono::milliseconds grace);
 
 // Notes for the runs under way of that task that somebody wants them ended, and gives them. A
 // history that cannot be written is said, and keeps no run from being stopped. Throws Failure.
-std::vector<KeptRun> runsToStop(long task);
+std::vector<KeptRun> runsToStop(int64_t task);
 void noteStop(std::vector<KeptRun> *runs);

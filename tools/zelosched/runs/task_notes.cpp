@@ -18,20 +18,22 @@ std::string scheduleOf(const TaskRecord &task) {
   return text;
 }
 
-long now() {
-  return static_cast<long>(time(nullptr));
+int64_t now() {
+  return static_cast<int64_t>(time(nullptr));
 }
 
-void add(const KeptDatabase &kept, const TaskRecord &task, std::optional<long> created) {
+void add(const KeptDatabase &kept, const TaskRecord &task, std::optional<int64_t> created) {
   Query insert(kept,
                "INSERT INTO task(task, app, name, schedule, command, enabled, created, changed)"
                " VALUES(?, ?, ?, ?, ?, ?, ?, ?)");
   insert.with(task.ID).with(std::string(task.App)).with(std::string(task.Name));
-  insert.with(scheduleOf(task)).with(std::string(task.Command)).with(isEnabled(task) ? 1L : 0L);
+  insert.with(scheduleOf(task))
+      .with(std::string(task.Command))
+      .with(isEnabled(task) ? int64_t{1} : int64_t{0});
   insert.with(created).with(now()).run();
 }
 
-void end(const KeptDatabase &kept, long id) {
+void end(const KeptDatabase &kept, int64_t id) {
   Query(kept, "UPDATE task SET removed = ? WHERE task = ? AND removed IS NULL")
       .with(now())
       .with(id)
@@ -40,7 +42,7 @@ void end(const KeptDatabase &kept, long id) {
 
 // What is known of a task of today.
 struct Seen {
-  long generation;
+  int64_t generation;
   std::string app;
   std::string name;
   std::string schedule;
@@ -57,14 +59,14 @@ Seen seenOf(const Query &query) {
           query.text(3),   query.text(4), query.number(5) != 0};
 }
 
-std::optional<Seen> seenOf(const KeptDatabase &kept, long id) {
+std::optional<Seen> seenOf(const KeptDatabase &kept, int64_t id) {
   Query query(kept, SELECT_SEEN " AND task = ?");
   query.with(id);
   return query.next() ? std::optional<Seen>(seenOf(query)) : std::nullopt;
 }
 
-std::map<long, Seen> allSeen(const KeptDatabase &kept) {
-  std::map<long, Seen> all;
+std::map<int64_t, Seen> allSeen(const KeptDatabase &kept) {
+  std::map<int64_t, Seen> all;
   Query query(kept, SELECT_SEEN);
   while (query.next()) all[query.number(6)] = seenOf(query);
   return all;
@@ -80,7 +82,9 @@ void update(const KeptDatabase &kept, const TaskRecord &task, const Seen &seen) 
                "UPDATE task SET app = ?, name = ?, schedule = ?, command = ?, enabled = ?,"
                " changed = iif(?, changed, ?) WHERE generation = ?");
   change.with(std::string(task.App)).with(std::string(task.Name)).with(schedule);
-  change.with(std::string(task.Command)).with(isEnabled(task) ? 1L : 0L).with(isSame ? 1L : 0L);
+  change.with(std::string(task.Command))
+      .with(isEnabled(task) ? int64_t{1} : int64_t{0})
+      .with(isSame ? int64_t{1} : int64_t{0});
   change.with(now()).with(seen.generation).run();
 }
 
@@ -124,8 +128,8 @@ void note(const TaskRecord &task, Step step) {
 
 }  // namespace
 
-std::map<long, TaskNote> taskNotes(const KeptDatabase &kept) {
-  std::map<long, TaskNote> notes;
+std::map<int64_t, TaskNote> taskNotes(const KeptDatabase &kept) {
+  std::map<int64_t, TaskNote> notes;
   if (!kept.isThere()) return notes;
   Query query(kept,
               "SELECT generation, task, app, name, enabled, created, changed FROM task"
@@ -172,7 +176,7 @@ void noteRemoved(const TaskRecord &task) {
 }
 
 void noteTasks(const KeptDatabase &kept, const TaskList &list, bool isWhole) {
-  std::map<long, Seen> left = allSeen(kept);
+  std::map<int64_t, Seen> left = allSeen(kept);
   for (const TaskRecord *task : list.tasks()) {
     if (isPower(*task)) continue;
     const auto seen = left.find(task->ID);
@@ -183,9 +187,9 @@ void noteTasks(const KeptDatabase &kept, const TaskList &list, bool isWhole) {
   for (const auto &[id, unused] : left) end(kept, id);
 }
 
-std::optional<long> generationOf(const KeptDatabase &kept, const TaskRecord &task) {
+std::optional<int64_t> generationOf(const KeptDatabase &kept, const TaskRecord &task) {
   const std::optional<Seen> before = seenOf(kept, task.ID);
   look(kept, task, before ? &*before : nullptr);
   const std::optional<Seen> seen = seenOf(kept, task.ID);
-  return seen ? std::optional<long>(seen->generation) : std::nullopt;
+  return seen ? std::optional<int64_t>(seen->generation) : std::nullopt;
 }

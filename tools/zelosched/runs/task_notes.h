@@ -2,6 +2,7 @@
 // that is free is given to the next new task, whose runs are its own alone.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <optional>
 #include <string>
@@ -10,17 +11,17 @@
 #include "store/task_list.h"
 
 struct TaskNote {
-  long generation = 0;  // no other task ever has it, whatever its id
-  long task = 0;
+  int64_t generation = 0;  // no other task ever has it, whatever its id
+  int64_t task = 0;
   std::string app;
   std::string name;
   bool isEnabled = false;
-  std::optional<long> created;  // nothing when nobody saw it
-  long changed = 0;  // when its schedule or state were last changed, or it was first seen
+  std::optional<int64_t> created;  // nothing when nobody saw it
+  int64_t changed = 0;  // when its schedule or state were last changed, or it was first seen
 };
 
 // Of the tasks of today, by their ids. Throws Failure.
-std::map<long, TaskNote> taskNotes(const KeptDatabase &kept);
+std::map<int64_t, TaskNote> taskNotes(const KeptDatabase &kept);
 
 // The tools tell of each change of theirs, when it is made; a failure is said, and keeps nothing
 // from being changed. Power times are no tasks in this sense.
@@ -33,4 +34,4 @@ void noteRemoved(const TaskRecord &task);
 void noteTasks(const KeptDatabase &kept, const TaskList &list, bool isWhole);
 
 // The generation of a task that runs now, noted when it was not known.
-std::optional<long> generationOf(const KeptDatabase &kept, const TaskRecord &task);
+std::optional<int64_t> generationOf(const KeptDatabase &kept, const TaskRecord &task);

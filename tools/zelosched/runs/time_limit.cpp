@@ -14,7 +14,7 @@ constexpr size_t kMostDigits = 6;  // of seconds eleven days, of hours a century
 
 struct Unit {
   char letter;
-  long seconds;
+  int64_t seconds;
 };
 constexpr Unit kUnits[] = {{'s', 1}, {'m', 60}, {'h', 3600}, {'d', 86400}};
 
@@ -51,7 +51,7 @@ std::optional<std::string> unquoted(std::string_view text) {
 
 }  // namespace
 
-std::optional<long> secondsOfLimit(std::string_view limit) {
+std::optional<int64_t> secondsOfLimit(std::string_view limit) {
   if (limit.size() < 2 || limit.size() > kMostDigits + 1 || limit.front() == '0') {
     return std::nullopt;
   }
@@ -62,7 +62,7 @@ std::optional<long> secondsOfLimit(std::string_view limit) {
   const bool isNumber = std::all_of(digits.begin(), digits.end(),
                                     [](unsigned char c) { return std::isdigit(c) != 0; });
   if (!isNumber || unit == std::end(kUnits)) return std::nullopt;
-  long number = 0;
+  int64_t number = 0;
   std::from_chars(digits.data(), digits.data() + digits.size(), number);
   return number * unit->seconds;
 }
@@ -88,6 +88,6 @@ LimitedCommand takeApart(std::string_view stored) {
 
 bool isEndedByLimit(std::string_view stored, int exitCode, double seconds) {
   if (exitCode != kTimeLimitExit && exitCode != kTimeLimitKillExit) return false;
-  const std::optional<long> limit = secondsOfLimit(takeApart(stored).limit);
+  const std::optional<int64_t> limit = secondsOfLimit(takeApart(stored).limit);
   return limit && seconds >= static_cast<double>(*limit);
 }

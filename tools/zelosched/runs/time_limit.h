@@ -6,6 +6,7 @@
 // A command of exactly this form is shown as the command and its limit; every other one as it is.
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -16,7 +17,7 @@ struct LimitedCommand {
 };
 
 // Of a limit such as "90s", "30m", "2h" or "1d"; nothing for any other text.
-std::optional<long> secondsOfLimit(std::string_view limit);
+std::optional<int64_t> secondsOfLimit(std::string_view limit);
 
 // The stored command; as it is when the limit is empty.
 std::string storedCommand(const LimitedCommand &limited);

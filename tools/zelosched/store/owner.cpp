@@ -35,7 +35,7 @@ const std::optional<std::string> &nameOf(uid_t uid) {
 
 std::optional<uid_t> findUser(const std::string &nameOrNumber) {
   if (const passwd *entry = getpwnam(nameOrNumber.c_str())) return entry->pw_uid;
-  const std::optional<long> number = parseNumber(nameOrNumber);
+  const std::optional<int64_t> number = parseNumber(nameOrNumber);
   if (!number || *number < 0 || *number > UINT32_MAX) return std::nullopt;
   const auto uid = static_cast<uid_t>(*number);
   if (!userExists(uid)) return std::nullopt;

@@ -26,11 +26,11 @@ bool isUnreadable(const ZELO_SCHED_TASK &task) {
   return isEnabled(task) && !unreadableFieldsOf(task).empty();
 }
 
-bool isStored(long id) {
+bool isStored(int64_t id) {
   return findTask(id) != nullptr;
 }
 
-bool hasStoredCronLine(long id) {
+bool hasStoredCronLine(int64_t id) {
   const Task stored = findTask(id);
   return stored != nullptr && hasCronLine(*stored);
 }
@@ -63,7 +63,7 @@ std::string unreadableTask(const TaskList &list) {
   return "";
 }
 
-void requireReadableTasks(std::optional<long> changedId) {
+void requireReadableTasks(std::optional<int64_t> changedId) {
   requireTasksAreBack();
   const TaskList list;
   // Of several, each is mended beside the others.

@@ -6,6 +6,7 @@
 #include <zelosched.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <string>
 
@@ -25,7 +26,7 @@ void removeTask(const ZELO_SCHED_TASK &task);
 std::string unreadableTask(const TaskList &list);
 
 // There is no such task, or the one that is to be changed is one. Throws Failure.
-void requireReadableTasks(std::optional<long> changedId = std::nullopt);
+void requireReadableTasks(std::optional<int64_t> changedId = std::nullopt);
 
 // A task's line, which is added where the stored task had none.
 bool hasCronLine(const ZELO_SCHED_TASK &task);

@@ -112,7 +112,7 @@ class AsideDirectory {
   }
 
   std::string path_;
-  unsigned long count_ = 0;
+  uint64_t count_ = 0;
 };
 
 // SQLite would believe what is beside the database, were it opened by another program.

@@ -69,18 +69,18 @@ Task newTask(int32_t backend) {
   return std::make_unique<TaskRecord>(*made);
 }
 
-Task findTask(long id) {
+Task findTask(int64_t id) {
   if (id < 0 || id > INT32_MAX) return nullptr;
   Task task = std::make_unique<TaskRecord>();
   forgetError();
-  if (ZELOSchedTaskGetByID(id, task.get()) == 0) {
+  if (ZELOSchedTaskGetByID(static_cast<long>(id), task.get()) == 0) {
     return task->State == ZELO_SCHED_STATE_NOT_EXISTED ? nullptr : std::move(task);
   }
   if (QLIBCErrGet() == kNotFound) return nullptr;
   throw failedTo("read task " + std::to_string(id));
 }
 
-Task loadTask(long id) {
+Task loadTask(int64_t id) {
   Task task = findTask(id);
   if (task == nullptr) throw Failure("there is no task " + std::to_string(id));
   return task;

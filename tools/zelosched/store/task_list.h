@@ -4,6 +4,7 @@
 #include <zelosched.h>
 
 #include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -16,10 +17,10 @@ using Task = std::unique_ptr<TaskRecord>;
 Task newTask(int32_t backend);
 
 // The stored task; null when there is none of that id. Throws Failure.
-Task findTask(long id);
+Task findTask(int64_t id);
 
 // findTask, for which an id without a task is a Failure too.
-Task loadTask(long id);
+Task loadTask(int64_t id);
 
 class TaskList {
  public:

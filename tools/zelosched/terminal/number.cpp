@@ -2,9 +2,9 @@
 
 #include <charconv>
 
-std::optional<long> parseNumber(std::string_view text) {
+std::optional<int64_t> parseNumber(std::string_view text) {
   const char *end = text.data() + text.size();
-  long number = 0;
+  int64_t number = 0;
   const auto [parsed, error] = std::from_chars(text.data(), end, number);
   if (error != std::errc{} || parsed != end) return std::nullopt;
   return number;

@@ -12,7 +12,7 @@
 namespace {
 
 constexpr size_t kUsualColumns = 80;
-constexpr long kMostColumns = 10000;
+constexpr int64_t kMostColumns = 10000;
 
 const char *variable(const char *name) {
   const char *value = std::getenv(name);
@@ -27,7 +27,7 @@ bool isTerminal() {
 
 std::optional<size_t> terminalColumns() {
   if (!isTerminal()) return std::nullopt;
-  const std::optional<long> told = parseNumber(variable("COLUMNS"));
+  const std::optional<int64_t> told = parseNumber(variable("COLUMNS"));
   if (told && *told > 0 && *told <= kMostColumns) return static_cast<size_t>(*told);
   winsize size{};
   const bool known = ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0;

@@ -1,0 +1,15 @@
+/* Of two signals the emulator hands on the second, where that one ends it. 0 where it is the first. */
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+int main(void) {
+  int status = 0;
+  const pid_t pid = fork();
+  if (pid == 0) return pause();
+  usleep(100000);
+  kill(pid, SIGHUP);
+  kill(pid, SIGKILL);
+  waitpid(pid, &status, 0);
+  return !(WIFSIGNALED(status) && WTERMSIG(status) == SIGHUP);
+}

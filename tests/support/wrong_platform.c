@@ -1,0 +1,503 @@
+/*
+ * To be preloaded into examples/platform_check: a platform that breaks one contract, the one that
+ * WRONG_PLATFORM names as the check names it ("QLIBCExec: the exit status").
+ */
+#include <dlfcn.h>
+#include <signal.h>
+#include <stdarg.h>
+#include <stdlib.h>
+#include <string.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <zelocore.h>
+#include <zelosdk.h>
+
+static int wrong(const char *fault) {
+  const char *wanted = getenv("WRONG_PLATFORM");
+  return wanted != NULL && strcmp(wanted, fault) == 0;
+}
+
+/* The function that this one stands in for, as `real`. */
+#define REAL(name)                      \
+  static __typeof__(&name) real = NULL; \
+  if (real == NULL) *(void **)&real = dlsym(RTLD_NEXT, #name)
+
+#define WRONG(result, fault) \
+  if (wrong(fault)) return result
+
+static void set_mode(const char *path, mode_t mode) {
+  if (chmod(path, mode) != 0) abort();
+}
+
+/* ---- the error record ---- */
+
+void QLIBCErrSetEx(int code, const char *szFile, int line) {
+  REAL(QLIBCErrSetEx);
+  if (szFile == NULL && wrong("QLIBCErrSetEx: no file counts as an empty one")) szFile = "none";
+  real(code, szFile, line);
+}
+
+static int asked;
+
+int QLIBCErrGet(void) {
+  REAL(QLIBCErrGet);
+  WRONG(asked++ == 0 ? 1 : real(), "QLIBCErrGet: 0 at start");
+  WRONG(0, "QLIBCErrGet: the code last set");
+  return real();
+}
+
+const char *QLIBCErrorGetFile(void) {
+  REAL(QLIBCErrorGetFile);
+  WRONG("x", "QLIBCErrorGetFile: empty at start");
+  WRONG("b.c", "QLIBCErrorGetFile: a copy of the file last set");
+  return real();
+}
+
+int QLIBCErrorGetLine(void) {
+  REAL(QLIBCErrorGetLine);
+  WRONG(1, "QLIBCErrorGetLine: 0 at start");
+  WRONG(0, "QLIBCErrorGetLine: the line last set");
+  return real();
+}
+
+/* ---- hashes and lists ---- */
+
+static int removed; /* everything, from a hash */
+
+PSZHASH QLIBCSzHashAlloc(int capacity) {
+  REAL(QLIBCSzHashAlloc);
+  WRONG(capacity < 0 ? NULL : real(capacity),
+        "QLIBCSzHashAlloc: an empty hash, whatever the capacity");
+  return real(capacity);
+}
+
+int QLIBCSzHashSetValue(PSZHASH *ppHash, const char *szKey, const char *szValue) {
+  static const char *given; /* not copied */
+  int result = 0;
+  REAL(QLIBCSzHashSetValue);
+  if (szKey == NULL) WRONG(0, "QLIBCSzHashSetValue: null is refused");
+  if (szKey != NULL) {
+    const int is_there = QLIBCSzHashGetValue(*ppHash, szKey) != NULL;
+    if (is_there) {
+      WRONG(0, "QLIBCSzHashSetValue: a value is replaced");
+      WRONG(0, "QLIBPluginSetArgByInt: an argument can be set again");
+    }
+    if (strcmp(szKey, "KEY") == 0 && wrong("QLIBCSzHashSetValue: keys differ in case"))
+      szKey = "key";
+    if (strcmp(szKey, "key 500") == 0) WRONG(-1, "QLIBCSzHashSetValue: the hash grows");
+    if (strcmp(szKey, "a") == 0 && removed)
+      WRONG(-1, "QLIBCHashRemoveAll: the hash can be filled again");
+    if (wrong("QLIBCSzHashSetValue: key and value are copied")) szValue = given = "x";
+  }
+  (void)given;
+  result = real(ppHash, szKey, szValue);
+  WRONG(1, "QLIBCSzHashSetValue: 0");
+  if (wrong("QLIBCSzHashSetValue: a success leaves the error record alone"))
+    QLIBCErrSetEx(7, "", 0);
+  return result;
+}
+
+const char *QLIBCSzHashGetValue(PSZHASH pHash, const char *szKey) {
+  REAL(QLIBCSzHashGetValue);
+  if (strcmp(szKey, "none") == 0 &&
+      wrong("QLIBCSzHashGetValue: null for a key that is not there, which is no error")) {
+    QLIBCErrSetEx(0x2000, "", 0);
+  }
+  return real(pHash, szKey);
+}
+
+void QLIBCHashRemoveAll(PSZHASH pHash) {
+  REAL(QLIBCHashRemoveAll);
+  removed = 1;
+  if (!wrong("QLIBCHashRemoveAll: no entry is left")) real(pHash);
+}
+
+int QLIBCSzHashEnumKey(PSZHASH pHash, PSZLIST *ppList) {
+  REAL(QLIBCSzHashEnumKey);
+  const int count = real(pHash, ppList);
+  WRONG(count - 1, "QLIBCSzHashEnumKey: every key once, and how many");
+  return count;
+}
+
+void QLIBCSzHashFree(PSZHASH pHash) {
+  REAL(QLIBCSzHashFree);
+  if (pHash == NULL && wrong("QLIBCSzHashFree: null is allowed")) abort();
+  real(pHash);
+}
+
+PSZLIST QLIBCSzListAlloc(int capacity) {
+  REAL(QLIBCSzListAlloc);
+  WRONG(capacity < 0 ? NULL : real(capacity),
+        "QLIBCSzListAlloc: an empty list, whatever the capacity");
+  return real(capacity);
+}
+
+int QLIBCSzListPush(PSZLIST *ppList, const char *szText) {
+  REAL(QLIBCSzListPush);
+  if (wrong("QLIBCSzListPush: the text is copied")) szText = "xext";
+  if (strcmp(szText, "more") == 0) WRONG(1, "QLIBCSzListCount: how many texts there are");
+  const int count = real(ppList, szText);
+  WRONG(0, "QLIBCSzListPush: the number of texts then");
+  return count;
+}
+
+int QLIBCSzListCount(PSZLIST pList) {
+  REAL(QLIBCSzListCount);
+  if (pList == NULL) WRONG(-1, "QLIBCSzListCount: 0 for null");
+  return real(pList);
+}
+
+const char *QLIBCSzListGet(PSZLIST pList, int index) {
+  REAL(QLIBCSzListGet);
+  if (index == 999) WRONG(real(pList, 0), "QLIBCSzListGet: the texts in their order");
+  if (index < 0) WRONG("", "QLIBCSzListGet: null where there is none");
+  return real(pList, index);
+}
+
+int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList) {
+  REAL(QLIBCStrSep);
+  const int count = real(szText, szSep, ppList);
+  WRONG(count + 1, "QLIBCStrSep: the pieces that are not empty, appended");
+  return count;
+}
+
+void QLIBCSzListFree(PSZLIST pList) {
+  REAL(QLIBCSzListFree);
+  if (pList == NULL && wrong("QLIBCSzListFree: null is allowed")) abort();
+  real(pList);
+}
+
+/* ---- section files ---- */
+
+int QLIBCFileExist(const char *szPath) {
+  REAL(QLIBCFileExist);
+  const int exists = real(szPath);
+  if (szPath == NULL) WRONG(1, "QLIBCFileExist: 0 for null");
+  if (szPath != NULL && !exists) WRONG(1, "QLIBCFileExist: 0 for what is not there");
+  if (exists) WRONG(0, "QLIBCFileExist: 1 for what is there");
+  return exists;
+}
+
+int QLIBCFileTouch(const char *szPath) {
+  struct stat found;
+  REAL(QLIBCFileTouch);
+  if (lstat(szPath, &found) != 0) {
+    WRONG(0, "QLIBCFileTouch: an empty file is made");
+  } else if (S_ISLNK(found.st_mode) && wrong("QLIBCFileTouch: a symbolic link is not followed")) {
+    return QLIBCExec("/bin/sh", "-c", "echo >\"$1\"", "sh", szPath, NULL);
+  } else if (wrong("QLIBCFileTouch: a file that is there keeps what is in it")) {
+    return truncate(szPath, 0);
+  }
+  return real(szPath);
+}
+
+int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
+  REAL(QLIBCFileEnumSection);
+  const int before = QLIBCSzListCount(*ppList);
+  int count = real(szPath, ppList);
+  if (count < 0 && QLIBCErrGet() == QLIBC_ERR_OPEN) {
+    WRONG(0, "QLIBCFileEnumSection: a file that is not there is told");
+  }
+  if (count < 0 && QLIBCErrGet() == QLIBC_ERR_IO) {
+    WRONG(0, "QLIBCFileEnumSection: a file that is cut off is told");
+  }
+  if (count == 2 && (wrong("QLIBCFileEnumSection: the names in the order of the file") ||
+                     wrong("QLIBCFileSetSection: the order stays"))) {
+    char *first = strdup(QLIBCSzListGet(*ppList, before));
+    char *second = strdup(QLIBCSzListGet(*ppList, before + 1));
+    QLIBCSzListFree(*ppList);
+    *ppList = QLIBCSzListAlloc(2);
+    QLIBCSzListPush(ppList, second);
+    QLIBCSzListPush(ppList, first);
+    free(first);
+    free(second);
+  }
+  return count;
+}
+
+int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHash) {
+  REAL(QLIBCFileGetSection);
+  if (wrong("QLIBCFileGetSection: keys that the hash has already stay"))
+    QLIBCHashRemoveAll(*ppHash);
+  const int found = real(szPath, szSection, ppHash);
+  if (found < 0) WRONG(0, "QLIBCFileGetSection: a file that is not there is told");
+  if (found == 0) WRONG(1, "QLIBCFileGetSection: 0 when there is no such section");
+  WRONG(found > 0 ? 2 : found, "QLIBCFileGetSection: 1 when the section was read");
+  if (found > 0) {
+    if (wrong("QLIBCFileGetSection: its values, with quotes and without")) {
+      QLIBCSzHashSetValue(ppHash, "key", "\"two\"");
+    }
+    if (strcmp(szSection, "2") == 0 &&
+        wrong("QLIBCFileAddSection: every byte but zero reads back")) {
+      QLIBCSzHashSetValue(ppHash, "bytes", "\x01\x02");
+    }
+  }
+  return found;
+}
+
+int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int flags) {
+  REAL(QLIBCFileAddSection);
+  if (access(szPath, F_OK) != 0) WRONG(0, "QLIBCFileAddSection: 1, and the file is made");
+  if (strcmp(szSection, "2") == 0 && wrong("QLIBCFileAddSection: the other sections stay"))
+    unlink(szPath);
+  const int result = real(szPath, szSection, pHash, flags);
+  if (result < 0 && QLIBCErrGet() == QLIBC_ERR_BAD_PARAMETER) {
+    WRONG(1, "QLIBCFileAddSection: a section that is there is refused");
+  }
+  if (result < 0 && QLIBCErrGet() == QLIBC_ERR_IO) {
+    WRONG(1, "QLIBCFileAddSection: a file that is cut off is not built on");
+  }
+  return result;
+}
+
+int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PSZHASH pHash,
+                        int reserved) {
+  struct stat before;
+  REAL(QLIBCFileSetSection);
+  if (stat(szPath, &before) != 0) abort();
+  if (wrong("QLIBCFileSetSection: the file is replaced as a whole")) {
+    QLIBCExec("/bin/sh", "-c", "ln \"$1\" \"$1.was\"", "sh", szPath,
+              NULL); /* its inode, to be used again */
+  }
+  if (wrong("QLIBCFileSetSection: no key of before is left")) {
+    QLIBCFileGetSection(szPath, szSection, &pHash);
+  }
+  const int result = real(szPath, szSection, flags, pHash, reserved);
+  if (result == 1) {
+    if (wrong("QLIBCFileSetSection: the mode stays")) set_mode(szPath, 0600);
+    WRONG(2, "QLIBCFileSetSection: 1 when it was replaced");
+    if (wrong("QLIBCFileSetSection: the file is replaced as a whole")) {
+      static const char put_back[] = "cat \"$1\" >\"$1.was\" && mv \"$1.was\" \"$1\"";
+      QLIBCExec("/bin/sh", "-c", put_back, "sh", szPath, NULL);
+    }
+  }
+  if (result == 0)
+    WRONG(1, "QLIBCFileSetSection: 0 when there is no such section, and nothing is written");
+  return result;
+}
+
+int QLIBCFileRemoveSection(const char *szPath, const char *szSection) {
+  REAL(QLIBCFileRemoveSection);
+  WRONG(1, "QLIBCFileRemoveSection: that section and no other is gone");
+  const int result = real(szPath, szSection);
+  if (result == 1) WRONG(0, "QLIBCFileRemoveSection: 1 when it was removed");
+  if (result == 0) WRONG(1, "QLIBCFileRemoveSection: 0 when there is none");
+  return result;
+}
+
+int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue, int flags) {
+  REAL(QLIBCFileSetLine);
+  const int is_there = access(szPath, F_OK) == 0;
+  if (!is_there && szValue == NULL) WRONG(1, "QLIBCFileSetLine: 0 when there is nothing to remove");
+  if (!is_there && szValue != NULL) WRONG(0, "QLIBCFileSetLine: a value without a file is refused");
+  if (strcmp(szKey, "key") == 0 && szValue != NULL &&
+      wrong("QLIBCFileSetLine: the first line with the key is replaced")) {
+    szKey = "key too";
+  }
+  if (strcmp(szKey, "none") == 0)
+    WRONG(0, "QLIBCFileSetLine: where no line has it, one is appended");
+  if (is_there && szValue == NULL) {
+    WRONG(0, "QLIBCFileSetLine: without a value the line is removed");
+    if (strcmp(szPath, "/etc/crontab") == 0)
+      WRONG(1, "QLIBCFileSetLine: the line goes from the crontab");
+  }
+  if (szValue != NULL && strchr(szValue, '\n') != NULL) {
+    WRONG(1, "QLIBCFileSetLine: a value with a line feed is refused");
+  }
+  const int result = real(szPath, szKey, szValue, flags);
+  if (result == 1 && wrong("QLIBCFileSetLine: the mode stays")) set_mode(szPath, 0600);
+  return result;
+}
+
+/* ---- processes ---- */
+
+int QLIBCExec(const char *szProgram, ...) {
+  const char *arguments[8] = {NULL};
+  va_list list;
+  int i = 0;
+  REAL(QLIBCExec);
+  va_start(list, szProgram);
+  for (i = 0; i < 7 && (arguments[i] = va_arg(list, const char *)) != NULL; ++i) {
+  }
+  va_end(list);
+  if (i == 4 && wrong("QLIBCExec: arguments arrive as they are")) arguments[3] = "a";
+  const int result = real(szProgram, arguments[0], arguments[1], arguments[2], arguments[3],
+                          arguments[4], (char *)NULL);
+  if (result == 7) {
+    WRONG(7 << 8, "QLIBCExec: the exit status");
+    if (signal(SIGCHLD, SIG_IGN) == SIG_IGN)
+      WRONG(-1, "QLIBCExec: the exit status for a caller who ignores his children");
+    signal(SIGCHLD, SIG_DFL);
+  }
+  if (result == -1) WRONG(127, "QLIBCExec: -1 when the program cannot be started");
+  return result;
+}
+
+int QLIBCProcForkChildNoWait(void) {
+  REAL(QLIBCProcForkChildNoWait);
+  WRONG(fork() > 0, "QLIBCProcForkChildNoWait: there is no child to wait for");
+  const int result = real();
+  if (result == 1) WRONG(2, "QLIBCProcForkChildNoWait: 1 for the caller");
+  if (result == 0 && wrong("QLIBCProcForkChildNoWait: 0 for the child, which runs")) _exit(0);
+  return result;
+}
+
+int QLIBCProcAlive(pid_t pid) {
+  siginfo_t ended;
+  REAL(QLIBCProcAlive);
+  const int is_alive = real(pid);
+  if (is_alive) WRONG(0, "QLIBCProcAlive: 1 for this process");
+  if (!is_alive) {
+    const int is_zombie = waitid(P_PID, (id_t)pid, &ended, WEXITED | WNOWAIT | WNOHANG) == 0;
+    if (is_zombie) WRONG(1, "QLIBCProcAlive: 0 for one that nobody has waited for yet");
+    if (!is_zombie) WRONG(1, "QLIBCProcAlive: 0 for one that is gone");
+  }
+  return is_alive;
+}
+
+/* ---- plugins ---- */
+
+static int ints; /* set so far */
+
+int QLIBPluginInit(const char *szPlugin, const char *szAction, void **ppContext) {
+  REAL(QLIBPluginInit);
+  if (wrong("QLIBPluginSetArg: a plugin is told the action, the stage and the arguments"))
+    szAction = "";
+  const int result = real(szPlugin, szAction, ppContext);
+  WRONG(-1, "QLIBPluginInit: 0, and the first word is not null");
+  return result;
+}
+
+int QLIBPluginSetArg(void **ppContext, const char *szKey, const char *szValue) {
+  REAL(QLIBPluginSetArg);
+  WRONG(1, "QLIBPluginSetArg: 0");
+  return real(ppContext, szKey, szValue);
+}
+
+int QLIBPluginSetArgByInt(void **ppContext, const char *szKey, int value) {
+  REAL(QLIBPluginSetArgByInt);
+  WRONG(1, "QLIBPluginSetArgByInt: 0");
+  if (ints++ > 0) WRONG(0, "QLIBPluginSetArgByInt: an argument can be set again");
+  return real(ppContext, szKey, value);
+}
+
+int QLIBPluginAction(int stage, void **ppContext) {
+  REAL(QLIBPluginAction);
+  const int result = real(stage, ppContext);
+  const int has_plugins = access("/usr/zelo/libexec/plugins/platform_check.d", F_OK) == 0;
+  if (!has_plugins) WRONG(-1, "QLIBPluginAction: 0 without plugins");
+  if (has_plugins && result == 0) WRONG(1, "QLIBPluginAction: 0 when every plugin succeeds");
+  if (result < 0) WRONG(0, "QLIBPluginAction: below 0 when one fails");
+  return result;
+}
+
+int QLIBPluginExit(void **ppContext) {
+  REAL(QLIBPluginExit);
+  WRONG(0, "QLIBPluginExit: 0, and the first word is null");
+  return real(ppContext);
+}
+
+/* ---- users and Base64 ---- */
+
+int ZELOUserGetByUID(uid_t uid, PZELOUSER *ppUser) {
+  REAL(ZELOUserGetByUID);
+  const int result = real(uid, ppUser);
+  if (result == 0) {
+    WRONG(1, "ZELOUserGetByUID: 0, and the user");
+    if (wrong("ZELOUserGetByUID: his name, ids, home directory and shell")) (*ppUser)->gid = 1;
+  }
+  if (result < 0) WRONG(0, "ZELOUserGetByUID: a user who is not there is told");
+  return result;
+}
+
+void ZELOUserFree(PZELOUSER pUser) {
+  REAL(ZELOUserFree);
+  if (pUser == NULL && wrong("ZELOUserFree: null is allowed")) abort();
+  real(pUser);
+}
+
+int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, int reserved) {
+  REAL(SzBase64EncodeFull);
+  if (cbSrc == 0) WRONG(0, "SzBase64EncodeFull: an empty source is an empty text");
+  const int result = real(src, cbSrc, dst, cbDst, reserved);
+  if (result == 0) WRONG(1, "SzBase64EncodeFull: 0 where there is no room");
+  if (result == 1 && cbSrc == 4)
+    WRONG(0, "SzBase64EncodeFull: 1, and a text that ends with a zero byte");
+  if (result == 1 && cbSrc > 200 && wrong("SzBase64EncodeFull: one line, however long"))
+    dst[76] = '\n';
+  return result;
+}
+
+int ZELOEncodingBase64Decode(const char *src, size_t cbSrc, char *dst, size_t *pcbDst) {
+  REAL(ZELOEncodingBase64Decode);
+  const size_t room = *pcbDst;
+  if (memchr(src, '\n', cbSrc) != NULL)
+    WRONG(0, "ZELOEncodingBase64Decode: white space is passed over");
+  if (memchr(src, '*', cbSrc) != NULL)
+    WRONG(1, "ZELOEncodingBase64Decode: 0 for another character");
+  const int result = real(src, cbSrc, dst, pcbDst);
+  if (result == 0 && room == 255) WRONG(1, "ZELOEncodingBase64Decode: 0 where there is no room");
+  if (result == 1 && *pcbDst == 256 && wrong("ZELOEncodingBase64Decode: 1, and every byte"))
+    dst[200] = 0;
+  return result;
+}
+
+/* ---- power times and the crontab ---- */
+
+int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries) {
+  REAL(ZELOAutoPowerConfGet);
+  const int count = real(list, capacity, pEntries);
+  if (list > ZELO_AUTOPOWER_OFF)
+    WRONG(0, "ZELOAutoPowerConfGet: a list that does not exist is refused");
+  if (count == 2 && wrong("ZELOAutoPowerConfGet: what was set, and how many"))
+    pEntries[1].minute = 0;
+  if (capacity == 1) WRONG(2, "ZELOAutoPowerConfGet: no more than there is room for");
+  return count;
+}
+
+int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries) {
+  REAL(ZELOAutoPowerConfSet);
+  if (count == 0 && list == ZELO_AUTOPOWER_ON)
+    WRONG(0, "ZELOAutoPowerConfSet: a list can be emptied");
+  const int result = real(list, count, pEntries);
+  if (list > ZELO_AUTOPOWER_OFF)
+    WRONG(0, "ZELOAutoPowerConfSet: a list that does not exist is refused");
+  if (result < 0 && list == ZELO_AUTOPOWER_ON)
+    WRONG(0, "ZELOAutoPowerConfSet: an hour of 24 is refused");
+  if (result == 0) WRONG(1, "ZELOAutoPowerConfSet: 0");
+  if (count == 2 && wrong("ZELOAutoPowerConfSet: the other list stays"))
+    real(ZELO_AUTOPOWER_OFF, 0, NULL);
+  return result;
+}
+
+int ZELOAutoPoweronSet(void) {
+  REAL(ZELOAutoPoweronSet);
+  WRONG(-1, "ZELOAutoPoweronSet: 0 when no time is wanted");
+  return real();
+}
+
+int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
+  static const char crontab[] = "/etc/crontab";
+  ZELO_SCHEDULE given = *pSchedule;
+  REAL(ZELOScheduleSet);
+  if (given.hour > 23) WRONG(0, "ZELOScheduleSet: an hour of 24 is refused");
+  if (given.weekdays == 0 && wrong("ZELOScheduleSet: no line without a weekday"))
+    given.weekdays = 127;
+  if (given.weekdays != 0)
+    WRONG(0, "ZELOScheduleSet: a line of the time that runs the command as root");
+  const int result = real(&given, enabled);
+  if (result == 0 && given.weekdays != 0) {
+    if (wrong("ZELOScheduleSet: every other line stays")) {
+      QLIBCExec("/bin/sh", "-c", "sed -i 1d /etc/crontab", NULL);
+    }
+    if (wrong("ZELOScheduleSet: owner and mode stay")) set_mode(crontab, 0600);
+  }
+  return result;
+}
+
+int ZELOUpdateCrontab(const char *szCommand, int stop, int reload) {
+  REAL(ZELOUpdateCrontab);
+  WRONG(-1, "ZELOUpdateCrontab: 0 when nothing is to be told");
+  return real(szCommand, stop, reload);
+}
