@@ -543,13 +543,14 @@ bool Keeper::save(bool isEnd) {
   try {
     const KeptDatabase kept(KeptDatabase::kChange, kHistoryPatience);
     Transaction transaction(kept);
-    if (task_ && !run_.generation) run_.generation = generationOf(kept, *task_);
     RunFilter filter;
     filter.run = run_.run;
     const std::vector<KeptRun> known =
         run_.run != 0 ? runsOf(kept, filter) : std::vector<KeptRun>();
     if (!known.empty()) run_.stopAsked = known.front().stopAsked;
+    // What the history gives it, a number or a generation, it has when that is committed.
     KeptRun written = run_;
+    if (task_ && !written.generation) written.generation = generationOf(kept, *task_);
     if (isEnd) {
       judgeEnd(task_ ? task_->Command : "", run_.stopAsked.has_value(), &written);
       written.isTold = true;
