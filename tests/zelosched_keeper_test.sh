@@ -209,6 +209,15 @@ ends_what_is_left_past_the_limit() {
     is_gone "$(cat "$SCRATCH/ran")"
 }
 
+# The time in which it waits is none of its own, and that from its start until it was seen is.
+counts_the_limit_from_the_start_after_waiting() {
+  clean
+  add "$HOLD" --app X --app-overlap no
+  add "sleep 1000" --app X --app-overlap no --time-limit 1s
+  start 1
+  z run 2 >/dev/null && go && ended_as "$TIME_LIMIT" && run_is "1 1" "duration >= 1, duration < 10"
+}
+
 its_own_exit_code_before_the_limit_is_a_failure() {
   clean
   add "timeout --kill-after=30s 2h sh -c 'exit 124'"
@@ -235,6 +244,7 @@ check "an interrupt cancels what waits, and asks nothing" an_interrupt_cancels_w
 check "each end is told from the others" says_how_each_run_ended
 check "an owner who is gone is a run that did not start" an_owner_who_is_gone_is_told_as_not_started
 check "past its time limit nothing of a run goes on" ends_what_is_left_past_the_limit
+check "nor when it waited before" counts_the_limit_from_the_start_after_waiting
 check "before the limit the same exit code is a failure" its_own_exit_code_before_the_limit_is_a_failure
 check "a clock that is set back changes no duration" measures_by_a_clock_that_nobody_sets
 
