@@ -209,6 +209,15 @@ ends_what_is_left_past_the_limit() {
     is_gone "$(cat "$SCRATCH/ran")"
 }
 
+# The time in which it waits is none of its own, and that from its start until it was seen is.
+counts_the_limit_from_the_start_after_waiting() {
+  clean
+  add "$HOLD" --app X --app-overlap no
+  add "sleep 1000" --app X --app-overlap no --time-limit 1s
+  start 1
+  z run 2 >/dev/null && go && ended_as "$TIME_LIMIT" && run_is "1 1" "duration >= 1, duration < 10"
+}
+
 its_own_exit_code_before_the_limit_is_a_failure() {
   clean
   add "timeout --kill-after=30s 2h sh -c 'exit 124'"
@@ -235,6 +244,7 @@ check "an interrupt cancels what waits, and asks nothing" an_interrupt_cancels_w
 check "each end is told from the others" says_how_each_run_ended
 check "an owner who is gone is a run that did not start" an_owner_who_is_gone_is_told_as_not_started
 check "past its time limit nothing of a run goes on" ends_what_is_left_past_the_limit
+check "nor when it waited before" counts_the_limit_from_the_start_after_waiting
 check "before the limit the same exit code is a failure" its_own_exit_code_before_the_limit_is_a_failure
 check "a clock that is set back changes no duration" measures_by_a_clock_that_nobody_sets
 
@@ -441,6 +451,26 @@ HOLD
   ended_as "$FINISHED" && run_is 1000000 output_bytes
 }
 
+# What a keeper could not commit is not there: neither is the task that it was about to note.
+a_run_is_its_tasks_own_after_a_commit_that_failed() {
+  clean
+  add 'exit 1' --name one
+  add 'exit 2' --name two
+  kept "DELETE FROM task" # as if another program had made them
+  python3 - "$KEPT" "$STARTER" <<'READ' || return 1
+import sqlite3, subprocess, sys, time
+reader = sqlite3.connect(sys.argv[1], isolation_level=None)
+reader.execute("BEGIN")
+reader.execute("SELECT count(*) FROM run").fetchall()
+for task in "2", "1":
+    subprocess.run([sys.argv[2], "--run", "id=" + task, "--now"], timeout=60, check=True)
+time.sleep(1)
+reader.execute("COMMIT")
+READ
+  until_is "1 one 1|2 two 2" kept "SELECT group_concat(words, '|') FROM (SELECT task.task || ' ' || name || ' ' || exit_code AS words
+    FROM run JOIN task USING(generation) ORDER BY run.task)"
+}
+
 the_history_can_be_unmounted_while_a_command_runs() {
   clean
   mkdir /usr/zelo/var
@@ -472,6 +502,7 @@ check "and where its file is no database" runs_without_its_record no_database
 check "and where that is of a later version" runs_without_its_record later_version
 check "and where there is no room" runs_without_its_record no_room
 check "nor does it wait for a history that is locked" a_run_does_not_wait_for_a_locked_history
+check "a run is its own task's after a commit that failed" a_run_is_its_tasks_own_after_a_commit_that_failed
 check "the history can be unmounted while a command runs" the_history_can_be_unmounted_while_a_command_runs
 check "two hundred runs at once are all written, once" two_hundred_runs_at_once_are_all_written
 

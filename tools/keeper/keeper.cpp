@@ -69,6 +69,13 @@ double seconds() {
   return static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec) * kNano;
 }
 
+// By the clock above, and never later than it began: a tick is the time before it.
+std::optional<double> beganAt(pid_t pid) {
+  const unsigned long long ticks = statOf(pid).started;
+  if (ticks == 0) return std::nullopt;
+  return static_cast<double>(ticks) / static_cast<double>(sysconf(_SC_CLK_TCK));
+}
+
 // ---- what the caller learns ---------------------------------------------------------------------
 
 struct Report {
@@ -451,11 +458,16 @@ void Keeper::reap() {
 // The command has begun when the run's process has a child. Its row would say so too; but whoever
 // reads the status database just when the run writes it delays the run by up to a second.
 void Keeper::lookWhetherItRuns() {
-  if (!hasChild(static_cast<pid_t>(run_.process.pid))) {
+  const std::vector<pid_t> commands = childrenOf(static_cast<pid_t>(run_.process.pid));
+  if (commands.empty()) {
     if (seconds() - began_ > kWaitsAfter && seconds() >= nextTurnLook_) lookForTurn();
     return;
   }
-  if (processFile_ < 0) started_ = hasWaited_ ? seconds() : began_;
+  if (processFile_ < 0) {
+    const double now = seconds();
+    const double began = beganAt(commands.front()).value_or(hasWaited_ ? now : began_);
+    started_ = std::clamp(began, std::min(began_, now), now);
+  }
   run_.state = RunState::kRunning;
   run_.start = time(nullptr);  // until its row is read
   isDirty_ = true;
@@ -543,13 +555,14 @@ bool Keeper::save(bool isEnd) {
   try {
     const KeptDatabase kept(KeptDatabase::kChange, kHistoryPatience);
     Transaction transaction(kept);
-    if (task_ && !run_.generation) run_.generation = generationOf(kept, *task_);
     RunFilter filter;
     filter.run = run_.run;
     const std::vector<KeptRun> known =
         run_.run != 0 ? runsOf(kept, filter) : std::vector<KeptRun>();
     if (!known.empty()) run_.stopAsked = known.front().stopAsked;
+    // What the history gives it, a number or a generation, it has when that is committed.
     KeptRun written = run_;
+    if (task_ && !written.generation) written.generation = generationOf(kept, *task_);
     if (isEnd) {
       judgeEnd(task_ ? task_->Command : "", run_.stopAsked.has_value(), &written);
       written.isTold = true;
