@@ -4,7 +4,7 @@
 #   scripts/cross-root tests/qemu/run_tests.sh TARGET [NAME...]      all programs, by default
 #
 # Left out is what the emulator cannot do, as tests/qemu/cannot.txt says. $BUILD_DIR is that of the machine's
-# own build; the programs are those of $BUILD_DIR/cross/TARGET.
+# own build; the programs are those of $BUILD_DIR/cross/TARGET. $PAGE_SIZE is another size of pages than 4096.
 set -euo pipefail
 
 here=$(cd "$(dirname "$0")" && pwd -P)
@@ -17,7 +17,7 @@ case $target in
   armhf) emulator=qemu-arm-static ;;
   s390x) emulator=qemu-s390x-static ;;
 esac
-export EMULATOR="$here/emulate.py $emulator"
+export EMULATOR="$here/emulate.py $emulator${PAGE_SIZE:+ -p $PAGE_SIZE}"
 export TIMES_SLOWER=5
 
 # The first column of a row is a program or a test of one, the second the programs that show the reason.

@@ -53,6 +53,7 @@ static int save(ZELO_SCHED_TASK *task) {
   return saved;
 }
 
+/* Disabled, as not every machine has a clock that can be armed. */
 static int save_power_time(const char *args, uint32_t hour) {
   ZELO_SCHED_TASK *task = ZELOSchedTaskAlloc();
   if (task == NULL) return -1;
@@ -62,6 +63,7 @@ static int save_power_time(const char *args, uint32_t hour) {
   snprintf(task->AppArgs, sizeof task->AppArgs, "%s", args);
   snprintf(task->Week, sizeof task->Week, "1010101");
   task->Type = ZELO_SCHED_TYPE_WEEKLY;
+  task->State = ZELO_SCHED_STATE_DISABLED;
   task->RunHour = hour;
   task->RunMin = 59;
   return save(task);
