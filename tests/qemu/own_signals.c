@@ -1,4 +1,5 @@
-/* What the emulated C library ignores in a command, 32 and 33, are other signals there. 0 where they are not. */
+/* What the emulated C library ignores in a command, 32 and 33, are other signals there. 0 where
+ * they are not. */
 #include <stdlib.h>
 
 int main(void) {
