@@ -111,9 +111,32 @@ status_is_valid() {
   { z status --json || true; } | is_valid status
 }
 
+history_is_valid() {
+  clean
+  add --daily 08:30 --name fails --owner nobody -- 'echo "größe"; exit 3'
+  add --daily 08:30 --name bytes -- 'printf "a\377b"'
+  add --daily 08:30 --name long -- 'i=0; while [ $i -lt 20000 ]; do echo "größer $i"; i=$((i + 1)); done'
+  z run fails bytes long --wait >/dev/null 2>&1 || true
+  z history --json | is_valid runs && z history --json --failed | is_valid runs &&
+    same "$(z history --json | of '[(r["task_name"], r["outcome"], r["exit_code"]) for r in top["runs"]][::-1]')" \
+      "[('fails', 'failed', 3), ('bytes', 'finished', 0), ('long', 'finished', 0)]"
+}
+
+log_is_valid() {
+  local name
+  for name in fails bytes long; do z log "$name" --json | is_valid log || return 1; done
+  same "$(z log fails --json | of '[top["output"][k] for k in ("head", "tail", "left_out_bytes", "encoding")], top["run"]["outcome"]')" \
+    "['größe\n', None, 0, 'utf-8'] failed" &&
+    same "$(z log bytes --json | of 'top["output"]["head"], top["output"]["encoding"]')" "Yf9i base64" &&
+    same "$(z log long --json | of 'top["output"]["encoding"], top["output"]["left_out_bytes"] > 100000,
+      len((top["output"]["head"] + top["output"]["tail"]).encode()) + top["output"]["left_out_bytes"] == top["run"]["output_bytes"]')" \
+      "utf-8 True True"
+}
+
 nothing_is_valid() {
   clean
   z list --json | is_valid tasks && z list --power --json | is_valid tasks && z next --json | is_valid coming_runs &&
+    z history --json | is_valid runs &&
     z power list --json | is_valid power_times && z export | is_valid file
 }
 
@@ -422,6 +445,8 @@ check "what 'next' tells, too" next_is_valid
 check "what 'power list' tells, too" power_list_is_valid
 check "what 'export' writes, too" export_is_valid
 check "what 'status' tells, too" status_is_valid
+check "what 'history' tells, too" history_is_valid
+check "what 'log' tells, whatever was printed" log_is_valid
 check "and where there is nothing to tell" nothing_is_valid
 check "tasks that other programs have saved are told by it" what_others_saved_is_valid
 check "what is wrong with a task is told" tells_problems

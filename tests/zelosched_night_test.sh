@@ -32,7 +32,7 @@ in_a_minute() {
 }
 
 tell_by() {
-  mkdir -p -m 0755 /etc/zelosched/run-ended.d
+  install -d -m 0755 /etc/zelosched /etc/zelosched/run-ended.d
   cat >/etc/zelosched/run-ended.d/note <<'NOTE'
 #!/bin/sh
 echo "$ZELO_RUN_TASK_NAME $ZELO_RUN_OUTCOME $ZELO_RUN_EXIT_CODE: $(cat "$ZELO_RUN_OUTPUT")" >>/run/night_test.told

@@ -190,7 +190,7 @@ edit_by_hand() {
 # many_tasks COUNT: each minute of the hour in turn
 many_tasks() {
   add --daily 08:30 -- true
-  grep = "$STORE" >"$SCRATCH/keys"
+  grep '=' "$STORE" >"$SCRATCH/keys"
   for ((id = 1; id <= $1; id++)); do
     echo "[$id]"
     sed "s/^id=.*/id=\"$id\"/; s/^run min=.*/run min=\"$((id % 60))\"/" "$SCRATCH/keys"

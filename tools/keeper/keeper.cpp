@@ -60,6 +60,7 @@ constexpr double kSaveAtEnd = 60;     // seconds in which the end of a run is to
 constexpr double kFirstWait = 3;      // seconds: nobody waits for a shorter time
 constexpr double kDrain = 60.0 * 60;  // seconds
 constexpr double kGrace = 10;         // seconds
+constexpr int kMostKills = 1000;      // of what starts new processes as fast as it is killed
 
 double seconds() {
   timespec now{};
@@ -145,6 +146,8 @@ int makePipe() {
   int ends[2];
   if (pipe2(ends, O_CLOEXEC) != 0) return -1;
   fchmod(ends[1], kPipeMode);
+  // What was there a moment ago, the command may have read itself: it has the pipe for reading too.
+  fcntl(ends[0], F_SETFL, O_NONBLOCK);
   const std::string name = "/proc/self/fd/" + std::to_string(ends[1]);
   const int both = open(name.c_str(), O_RDWR | O_CLOEXEC);
   const int lent = both >= 0 ? both : ends[1];
@@ -313,7 +316,7 @@ bool Keeper::adopt(int64_t number) {
   const std::string output = "/proc/" + std::to_string(run_.process.pid) + "/fd/1";
   struct stat info {};
   if (stat(output.c_str(), &info) == 0 && S_ISFIFO(info.st_mode)) {
-    pipe_ = open(output.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY);
+    pipe_ = open(output.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK);
   }
   SettingsFaults faults;
   settings_ = readSettings(&faults);
@@ -397,6 +400,7 @@ size_t Keeper::readOnce(size_t most) {
     if (!isSaved_) passOn(std::string_view(buffer, static_cast<size_t>(count)));
     return static_cast<size_t>(count);
   }
+  if (count < 0 && errno == EAGAIN) return 0;
   close(pipe_);
   pipe_ = -1;
   return 0;
@@ -621,7 +625,10 @@ void Keeper::endWhatIsLeft() {
   left.signal(SIGTERM);
   const double until = seconds() + kGrace;
   while (left.look() > 0 && seconds() < until) pump(kLook);
-  left.killAll();
+  for (int i = 0; i < kMostKills && left.look() > 0; ++i) {
+    left.killAll();
+    pump(kFirstLook);
+  }
 }
 
 void Keeper::drain() {

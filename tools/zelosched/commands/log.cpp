@@ -1,12 +1,16 @@
 // zelosched log
+#include <json/json.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <cstring>
 #include <thread>
 
 #include "commands/command.h"
 #include "commands/options.h"
+#include "json/json_out.h"
+#include "json/run_json.h"
 #include "runs/history.h"
 #include "runs/history_keep.h"
 #include "runs/output_file.h"
@@ -17,7 +21,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"run", Option::kValue}, {"follow", Option::kNone, 'f'}};
+constexpr Option kOptions[] = {{"run", Option::kValue}, {"follow", Option::kNone, 'f'}, {"json"}};
 constexpr int64_t kMostRun = int64_t{1} << 62;
 constexpr std::chrono::milliseconds kPause(100);
 
@@ -76,37 +80,79 @@ void follow(const KeptRun &run, const OutputFile &file, RunOutput *output) {
   output->finish();
 }
 
+// Of a run that goes on, what it has printed so far.
+Output outputSoFar(const KeptRun &run) {
+  if (run.state != RunState::kEnded) {
+    const OutputFile file = OutputFile::open(run.process);
+    if (file.isOpen()) return file.contents();
+  }
+  if (const auto printed = outputOf(KeptDatabase(KeptDatabase::kRead), run.run)) return *printed;
+  const std::string number = std::to_string(run.run);
+  if (run.outputBytes > 0) {
+    throw Failure(counted(static_cast<size_t>(run.outputBytes), "byte") + " that run " + number +
+                  " printed are not kept any more");
+  }
+  if (run.keeper.pid == 0) {
+    throw Failure("what run " + number + " printed is not known: another program started it");
+  }
+  return {};
+}
+
+// Where bytes were left out, a character may have been cut in two: what is left of it is left out
+// too.
+Output withoutCutCharacters(Output printed) {
+  if (printed.leftOut == 0) return printed;
+  const auto isInside = [](char byte) {
+    return (static_cast<unsigned char>(byte) & 0xC0U) == 0x80U;
+  };
+  constexpr size_t kMostInside = 3;
+  const size_t atEnd = cutCharacterLength(printed.head);
+  size_t atBegin = 0;
+  while (atBegin < std::min(kMostInside, printed.tail.size()) && isInside(printed.tail[atBegin])) {
+    ++atBegin;
+  }
+  printed.head.resize(printed.head.size() - atEnd);
+  printed.tail.erase(0, atBegin);
+  printed.leftOut += static_cast<int64_t>(atEnd + atBegin);
+  return printed;
+}
+
+void printAsJson(const KeptRun &run, const Output &printed) {
+  const bool isText = isUtf8(printed.head) && isUtf8(printed.tail);
+  const auto encoded = [&](const std::string &bytes) {
+    return isText ? jsonTextOrNull(bytes) : jsonTextOrNull(base64(bytes));
+  };
+  Json::Value top = topObject();
+  top["run"] = jsonOf(run);
+  top["output"]["head"] = encoded(printed.head);
+  top["output"]["tail"] = encoded(printed.tail);
+  top["output"]["left_out_bytes"] = Json::Int64(printed.leftOut);
+  top["output"]["encoding"] = isText ? "utf-8" : "base64";
+  printTop(top);
+}
+
 int runLog(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   if (ids.size() > 1) throw UsageError("one task at a time");
+  if (arguments.has("follow") && arguments.has("json")) {
+    throw UsageError("'--follow' does not go with '--json'");
+  }
   const std::optional<int64_t> number = arguments.number("run", 1, kMostRun);
   if (geteuid() == 0) attempt([] { sweepRuns(); });
   const KeptRun run = chooseRun(ids.front(), number);
-  RunOutput output(-1);
-  if (run.state != RunState::kEnded) {
-    const OutputFile file = OutputFile::open(run.process);
-    if (file.isOpen()) {
-      if (arguments.has("follow")) {
-        follow(run, file, &output);
-      } else {
-        showOutput(file.contents(), &output);
-      }
-      requireWritten(output);
-      return kDone;
-    }
+  if (arguments.has("json")) {
+    printAsJson(run, withoutCutCharacters(outputSoFar(run)));
+    return kDone;
   }
-  const std::optional<Output> printed = outputOf(KeptDatabase(KeptDatabase::kRead), run.run);
-  if (printed) {
-    showOutput(*printed, &output);
-  } else if (run.outputBytes > 0) {
-    throw Failure(counted(static_cast<size_t>(run.outputBytes), "byte") + " that run " +
-                  std::to_string(run.run) + " printed are not kept any more");
-  } else if (run.keeper.pid == 0) {
-    throw Failure("what run " + std::to_string(run.run) +
-                  " printed is not known: another program "
-                  "started it");
+  RunOutput output(-1);
+  const OutputFile file =
+      run.state != RunState::kEnded ? OutputFile::open(run.process) : OutputFile();
+  if (arguments.has("follow") && file.isOpen()) {
+    follow(run, file, &output);
+  } else {
+    showOutput(outputSoFar(run), &output);
   }
   requireWritten(output);
   return kDone;
@@ -115,11 +161,12 @@ int runLog(int argc, char **argv) {
 }  // namespace
 
 const Command kLogCommand = {
-    "log", "ID [--run N] [--follow]", "show what a run printed",
+    "log", "TASK [--run N] [--follow | --json]", "show what a run printed",
     "Shows what the last run of the task printed, or what it has printed so far. Of much\n"
     "output the beginning and the end are kept, and a line says how much is left out\n"
     "between them. On a terminal, control characters are made visible.\n"
     "\n"
     "  --run N                        that run, by its number in the history\n"
-    "  -f, --follow                   goes on until the run ends\n",
+    "  -f, --follow                   goes on until the run ends\n"
+    "  --json                         as JSON: see zelosched-json(5)\n",
     runLog};

@@ -149,12 +149,13 @@ int runMetrics(int argc, char **argv) {
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   if (geteuid() != 0) throw Failure("reading the runs takes root's rights");
+  const std::optional<std::string> path = arguments.value("output");
+  if (path && path->empty()) throw UsageError("'--output' takes the name of a file");
   const std::string text = allMetrics();
-  const std::string path = arguments.value("output", "");
-  if (path.empty()) {
+  if (!path) {
     std::fwrite(text.data(), 1, text.size(), stdout);
   } else {
-    placeFile(path, text, kMode);
+    placeFile(*path, text, kMode);
   }
   return kDone;
 }

@@ -28,6 +28,10 @@ void tell(const std::string &title, Stopped how) {
     case Stopped::kPartly:
       what = "stopped; processes that its command had left to themselves could not be found";
       break;
+    case Stopped::kNot:
+      throw Failure(title +
+                    " could not be ended: it starts new processes all the time, or waits for a "
+                    "device");
   }
   std::printf("%s %s\n", title.c_str(), what);
 }

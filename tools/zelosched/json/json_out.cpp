@@ -1,14 +1,18 @@
 #include "json/json_out.h"
 
 #include <json/json.h>
+#include <zelosdk.h>
 
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <unordered_map>
 #include <utility>
 
+#include "runs/moment_text.h"
 #include "sched_utf8.h"
+#include "terminal/failure.h"
 
 namespace {
 
@@ -163,23 +167,27 @@ Json::Value jsonText(std::string_view text) {
   return {out};
 }
 
+std::string base64(std::string_view bytes) {
+  constexpr size_t kGroup = 3;
+  constexpr size_t kEncodedGroup = 4;
+  std::string text((bytes.size() / kGroup + 1) * kEncodedGroup + 1, '\0');
+  if (SzBase64EncodeFull(bytes.data(), bytes.size(), text.data(), text.size(), 1) != 1) {
+    throw failedTo("encode bytes");
+  }
+  text.resize(std::strlen(text.c_str()));
+  return text;
+}
+
 Json::Value jsonTextOrNull(std::string_view text) {
   return text.empty() ? Json::Value() : jsonText(text);
 }
 
 Json::Value jsonTime(time_t moment) {
-  constexpr long kMinute = 60;
-  constexpr long kHour = 60 * kMinute;
   constexpr int kLastYear = 9999 - 1900;  // that can be written so
   tm fields{};
   localtime_r(&moment, &fields);
   if (fields.tm_year > kLastYear) return {};
-  char text[64];
-  const size_t length = std::strftime(text, sizeof text, "%Y-%m-%dT%H:%M:%S", &fields);
-  const long distance = std::labs(fields.tm_gmtoff);
-  std::snprintf(text + length, sizeof text - length, "%c%02ld:%02ld",
-                fields.tm_gmtoff < 0 ? '-' : '+', distance / kHour, distance % kHour / kMinute);
-  return {text};
+  return {momentText(moment)};
 }
 
 Json::Value topObject() {

@@ -18,6 +18,9 @@ bool isUtf8(std::string_view text);
 // The text as JSON can carry it: each byte that is no UTF-8 becomes U+FFFD.
 Json::Value jsonText(std::string_view text);
 
+// Of bytes that are no text. Throws Failure.
+std::string base64(std::string_view bytes);
+
 // Null for an empty one.
 Json::Value jsonTextOrNull(std::string_view text);
 

@@ -70,17 +70,6 @@ const NumberKey *numberKey(std::string_view key) {
   return found != std::end(kNumberKeys) ? found : nullptr;
 }
 
-std::string base64(std::string_view bytes) {
-  constexpr size_t kGroup = 3;
-  constexpr size_t kEncodedGroup = 4;
-  std::string text((bytes.size() / kGroup + 1) * kEncodedGroup + 1, '\0');
-  if (SzBase64EncodeFull(bytes.data(), bytes.size(), text.data(), text.size(), 1) != 1) {
-    throw failedTo("encode a command");
-  }
-  text.resize(std::strlen(text.c_str()));
-  return text;
-}
-
 // The text that a member of the doubly encoded form holds.
 bool decodeTwice(const Json::Value &member, std::string *text) {
   if (!member.isString()) return false;

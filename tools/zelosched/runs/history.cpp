@@ -153,6 +153,14 @@ void dropOutputs(const KeptDatabase &kept, int64_t task, const Settings &setting
   }
 }
 
+// By the clock of today.
+int64_t bornAt(const ProcessName &process) {
+  timespec up{};
+  clock_gettime(CLOCK_BOOTTIME, &up);
+  return static_cast<int64_t>(time(nullptr)) - static_cast<int64_t>(up.tv_sec) +
+         process.born / sysconf(_SC_CLK_TCK);
+}
+
 }  // namespace
 
 ProcessName processNamed(int64_t pid) {
@@ -164,6 +172,24 @@ bool isAlive(const ProcessName &process) {
   const ProcessStat stat = statOf(static_cast<pid_t>(process.pid));
   return stat.started == static_cast<unsigned long long>(process.born) && stat.state != 'Z' &&
          stat.state != 'X';
+}
+
+ProcessName processOf(const Run &row) {
+  constexpr int64_t kTolerance = 2;  // seconds, of two clocks and of their rounding
+  const ProcessName process = processNamed(row.pid);
+  const auto pid = static_cast<pid_t>(row.pid);
+  const bool isNamed = process.born != 0 && isOfRoot(pid);
+  return isNamed && bornAt(process) <= row.start + kTolerance ? process : ProcessName{row.pid, 0};
+}
+
+bool isKnown(const KeptDatabase &kept, const Run &row) {
+  Query query(kept,
+              "SELECT 1 FROM run WHERE start = ? AND status_id = ? AND pid = ?"
+              " AND task = ? AND app = ?");
+  query.with(row.start).with(row.statusId).with(row.pid).with(row.taskId).with(row.app);
+  const bool isThere = query.next();
+  if (isThere) query.next();
+  return isThere;
 }
 
 bool isBad(const RunRecord &run) {

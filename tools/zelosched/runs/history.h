@@ -11,6 +11,7 @@
 
 #include "runs/kept_database.h"
 #include "runs/run_record.h"
+#include "runs/runs.h"
 #include "runs/settings.h"
 
 // A process by what no other one of this boot ever has: its number and when it began, in the clock
@@ -24,6 +25,14 @@ struct ProcessName {
 bool isAlive(const ProcessName &process);
 // `born` is 0 where there is none.
 ProcessName processNamed(int64_t pid);
+
+// Of a row of the status database that says that it goes on, which has a number alone. `born` is 0
+// where the process cannot be the run's: it is younger, or has not root's saved user id, which a
+// run's process keeps as its way back.
+ProcessName processOf(const Run &row);
+
+// The history has the run of that row.
+bool isKnown(const KeptDatabase &kept, const Run &row);
 
 // With what only writers need to know.
 struct KeptRun : RunRecord {

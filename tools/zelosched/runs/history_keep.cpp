@@ -52,16 +52,6 @@ class Sweep {
   std::vector<int64_t> withoutKeeper_;
 };
 
-bool isKnown(const KeptDatabase &kept, const Run &row) {
-  Query query(kept,
-              "SELECT 1 FROM run WHERE start = ? AND status_id = ? AND pid = ?"
-              " AND task = ? AND app = ?");
-  query.with(row.start).with(row.statusId).with(row.pid).with(row.taskId).with(row.app);
-  const bool isThere = query.next();
-  if (isThere) query.next();
-  return isThere;
-}
-
 // Noted by its keeper, which reads the row at the end alone.
 std::vector<KeptRun> underWayOf(const KeptDatabase &kept, const Run &row, const std::string &boot) {
   RunFilter filter;
@@ -117,7 +107,7 @@ void Sweep::takeOver(const KeptDatabase &kept, const Run &row) {
   run.trigger = Trigger::kOther;
   takeStatus(row, &run);
   describe(&run);
-  if (run.state == RunState::kRunning) run.process = processNamed(row.pid);
+  if (run.state == RunState::kRunning) run.process = processOf(row);
   run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
   save(kept, &run);
 }

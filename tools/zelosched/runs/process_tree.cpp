@@ -13,8 +13,15 @@ namespace {
 // Whatever appears faster than it is found.
 constexpr int kMostRounds = 1000;
 
-int send(int file, int number) {
-  return static_cast<int>(syscall(SYS_pidfd_send_signal, file, number, nullptr, 0));
+// No descriptor is held from one call to the next: a run may have more processes than we may open
+// files.
+void send(pid_t pid, unsigned long long started, int number) {
+  const int file = static_cast<int>(syscall(SYS_pidfd_open, pid, 0));
+  if (file < 0) return;
+  if (statOf(pid).started == started) {
+    syscall(SYS_pidfd_send_signal, file, number, nullptr, 0);
+  }
+  close(file);
 }
 
 bool isEnded(const ProcessStat &stat) {
@@ -28,18 +35,6 @@ ProcessTree::ProcessTree(pid_t root, std::set<pid_t> spared)
 
 ProcessTree::ProcessTree(pid_t root, std::set<pid_t> spared, std::set<pid_t> passedOver)
     : root_(root), spared_(std::move(spared)), passedOver_(std::move(passedOver)) {}
-
-ProcessTree::~ProcessTree() {
-  for (const auto &[pid, held] : held_) close(held.file);
-}
-
-void ProcessTree::forget(pid_t pid) {
-  const auto found = held_.find(pid);
-  if (found == held_.end()) return;
-  close(found->second.file);
-  held_.erase(found);
-  signalled_.erase(pid);
-}
 
 size_t ProcessTree::look() {
   const std::map<pid_t, ProcessStat> all = processes();
@@ -59,27 +54,15 @@ size_t ProcessTree::look() {
     }
   }
   // One that its parent has left to somebody else is not below the root any more, but ours still.
-  for (auto held = held_.begin(); held != held_.end();) {
-    const auto found = all.find(held->first);
-    const bool isThere = found != all.end() && found->second.started == held->second.started &&
-                         !isEnded(found->second);
-    const pid_t pid = held->first;
-    ++held;
-    if (!isThere) forget(pid);
-  }
-  for (const pid_t pid : there) {
-    if (held_.count(pid) != 0) continue;
-    const int file = static_cast<int>(syscall(SYS_pidfd_open, pid, 0));
-    if (file < 0) continue;
-    // It may be another one by now.
-    const unsigned long long started = all.at(pid).started;
-    if (statOf(pid).started == started) {
-      held_[pid] = {file, started};
-    } else {
-      close(file);
-    }
-  }
-  return held_.size();
+  std::erase_if(found_, [&](const auto &known) {
+    const auto now = all.find(known.first);
+    const bool isThere =
+        now != all.end() && now->second.started == known.second && !isEnded(now->second);
+    if (!isThere) signalled_.erase(known.first);
+    return !isThere;
+  });
+  for (const pid_t pid : there) found_[pid] = all.at(pid).started;
+  return found_.size();
 }
 
 void ProcessTree::signal(int number) {
@@ -91,9 +74,9 @@ void ProcessTree::signal(int number) {
 size_t ProcessTree::signalNew(int number) {
   look();
   size_t count = 0;
-  for (const auto &[pid, held] : held_) {
+  for (const auto &[pid, started] : found_) {
     if (!signalled_.insert(pid).second) continue;
-    send(held.file, number);
+    send(pid, started, number);
     ++count;
   }
   return count;

@@ -6,16 +6,14 @@
 #include <map>
 #include <set>
 
-// A process is held by a descriptor, so that no signal meets another one that has got its number.
+// A process is known by its number and by when it was started, so that no signal meets another one
+// that has got its number. Each call throws Failure where the processes cannot be listed.
 class ProcessTree {
  public:
   // Those below `root`, without it, without `spared` ones and what is below these.
   explicit ProcessTree(pid_t root, std::set<pid_t> spared = {});
   // Without these, but with what is below them.
   ProcessTree(pid_t root, std::set<pid_t> spared, std::set<pid_t> passedOver);
-  ~ProcessTree();
-  ProcessTree(const ProcessTree &) = delete;
-  ProcessTree &operator=(const ProcessTree &) = delete;
 
   // How many there are by now.
   size_t look();
@@ -27,15 +25,9 @@ class ProcessTree {
   void killAll();
 
  private:
-  struct Held {
-    int file;
-    unsigned long long started;
-  };
-  void forget(pid_t pid);
-
   pid_t root_;
   std::set<pid_t> spared_;
   std::set<pid_t> passedOver_;
-  std::map<pid_t, Held> held_;
+  std::map<pid_t, unsigned long long> found_;  // and when each was started
   std::set<pid_t> signalled_;
 };

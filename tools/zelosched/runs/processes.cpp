@@ -7,10 +7,12 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstring>
 #include <optional>
 #include <sstream>
 #include <string>
 
+#include "terminal/failure.h"
 #include "terminal/number.h"
 
 namespace {
@@ -50,7 +52,7 @@ ProcessStat statOf(pid_t pid) {
 std::map<pid_t, ProcessStat> processes() {
   std::map<pid_t, ProcessStat> found;
   DIR *directory = opendir("/proc");
-  if (directory == nullptr) return found;
+  if (directory == nullptr) throw Failure(std::string("cannot read /proc: ") + strerror(errno));
   while (const dirent *entry = readdir(directory)) {
     const std::optional<int64_t> pid = parseNumber(entry->d_name);
     if (!pid) continue;

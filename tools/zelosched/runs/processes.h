@@ -12,9 +12,10 @@ struct ProcessStat {
 };
 
 ProcessStat statOf(pid_t pid);
+// Of all. Throws Failure.
 std::map<pid_t, ProcessStat> processes();
 
-// Ours.
+// Ours. Throws Failure.
 std::map<pid_t, ProcessStat> children();
 
 bool hasChild(pid_t pid);

@@ -20,6 +20,8 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 constexpr std::chrono::milliseconds kPause(10);
+constexpr std::chrono::milliseconds kPatience(2000);
+constexpr int kMostKills = 1000;     // of what starts new processes as fast as it is killed
 constexpr int kStatusPatience = 20;  // milliseconds: it may hold the lock, stopped as it is
 
 // A process, held so that its number cannot become another one's.
@@ -67,8 +69,17 @@ bool hasRow(pid_t pid) {
                      [&](const Run &run) { return run.pid == pid; });
 }
 
+// While its command runs, the owner may stop the run's own process, which would not go on then.
+void endOwn(const Held &own) {
+  own.send(SIGCONT);
+  if (own.waitForEnd(kPatience)) return;
+  own.send(SIGKILL);
+  own.waitForEnd(kPatience);
+}
+
 Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds grace) {
   const Clock::time_point until = Clock::now() + grace;
+  own.send(SIGCONT);
   tree->signal(SIGTERM);
   while (Clock::now() < until) {
     const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(until - Clock::now());
@@ -77,12 +88,20 @@ Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds gr
     tree->signalNew(SIGTERM);
     if (isOver && tree->look() == 0) return Stopped::kEnded;
   }
-  while (tree->look() > 0 || !own.waitForEnd(std::chrono::milliseconds(0))) {
+  for (int i = 0; i < kMostKills && tree->look() > 0; ++i) {
     tree->killAll();
-    own.waitForEnd(kPause * 5);
-    if (tree->look() == 0 && Clock::now() - until > std::chrono::seconds(10)) break;
+    own.waitForEnd(kPause);
   }
-  return Stopped::kKilled;
+  if (!own.waitForEnd(kPatience)) endOwn(own);
+  const bool isOver = own.waitForEnd(std::chrono::milliseconds(0)) && tree->look() == 0;
+  return isOver ? Stopped::kKilled : Stopped::kNot;
+}
+
+// Of such a row the history knows better: a run whose process was killed leaves one that says that
+// it goes on, and its number may be another process's by now.
+bool isInHistory(const Run &row) {
+  const KeptDatabase kept(KeptDatabase::kRead);
+  return kept.isThere() && isKnown(kept, row);
 }
 
 }  // namespace
@@ -117,8 +136,7 @@ Stopped stopRun(const KeptRun &run, std::chrono::milliseconds grace) {
     return endTree(&tree, own, grace);
   }
   ProcessTree tree(pid);
-  endTree(&tree, own, grace);
-  return Stopped::kPartly;
+  return endTree(&tree, own, grace) == Stopped::kNot ? Stopped::kNot : Stopped::kPartly;
 }
 
 std::vector<KeptRun> runsToStop(int64_t task) {
@@ -129,18 +147,15 @@ std::vector<KeptRun> runsToStop(int64_t task) {
   std::vector<KeptRun> runs;
   attempt([&] { runs = keptRuns(filter); });
   std::erase_if(runs, [](const KeptRun &run) { return !isAlive(run.process); });
-  // Those that the history does not have.
   for (const Run &row : RunDatabase().running()) {
-    const bool isKnown = std::any_of(
-        runs.begin(), runs.end(), [&](const KeptRun &run) { return run.process.pid == row.pid; });
-    if (isKnown || row.taskId != task) continue;
+    if (row.taskId != task || isInHistory(row)) continue;
     KeptRun run;
     run.task = row.taskId;
     run.statusId = row.statusId;
-    run.process = processNamed(row.pid);
+    run.process = processOf(row);
     run.start = row.start;
     run.state = RunState::kRunning;
-    runs.push_back(std::move(run));
+    if (isAlive(run.process)) runs.push_back(std::move(run));
   }
   return runs;
 }

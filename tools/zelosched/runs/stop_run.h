@@ -9,10 +9,11 @@
 // Ends a run that still waits for its turn. False when its command has begun, or it is over.
 bool cancelWaiting(const ProcessName &process);
 
-enum class Stopped { kCancelled, kEnded, kKilled, kWasOver, kPartly };
+enum class Stopped { kCancelled, kEnded, kKilled, kWasOver, kPartly, kNot };
 
 // Waits until it is over. The request is noted already. kKilled: something of it had to be killed
 // after `grace`. kPartly: without a keeper, what has left the run's own processes is not found.
+// kNot: something of it could not be ended. Throws Failure where the processes cannot be listed.
 Stopped stopRun(const KeptRun &run, std::chrono::milliseconds grace);
 
 // Notes for the runs under way of that task that somebody wants them ended, and gives them. A
