@@ -34,6 +34,7 @@
 #include "runs/runs.h"
 #include "runs/settings.h"
 #include "runs/status_row.h"
+#include "runs/stop_run.h"
 #include "runs/task_notes.h"
 #include "store/owner.h"
 #include "store/task_list.h"
@@ -222,6 +223,7 @@ class Keeper {
   void lookWhetherItRuns();
   void lookForTurn();
   void readStatus();
+  bool isCancelled() const;
   void measure();
   bool save(bool isEnd);
   void saveWhenDue();
@@ -531,12 +533,20 @@ void Keeper::readStatus() {
     run_.outcome = Outcome::kLost;
   } else {
     if (!isKilled && !hasWaited_) lookForTurn();
-    run_.outcome = isKilled     ? Outcome::kCancelled
-                   : hasWaited_ ? Outcome::kGaveUp
-                                : Outcome::kNotStarted;
+    run_.outcome = isCancelled() ? Outcome::kCancelled
+                   : isKilled    ? Outcome::kLost
+                   : hasWaited_  ? Outcome::kGaveUp
+                                 : Outcome::kNotStarted;
   }
   run_.state = RunState::kEnded;
   if (row || hasBegun) measure();
+}
+
+// By 'stop', by a removal of its task, or by whoever waited for it.
+bool Keeper::isCancelled() const {
+  const bool isByUs =
+      waitStatus_ && WIFSIGNALED(*waitStatus_) && WTERMSIG(*waitStatus_) == kSignalOfCancelling;
+  return isByUs || run_.stopAsked.has_value();
 }
 
 void Keeper::measure() {
@@ -631,9 +641,11 @@ void Keeper::tellPrograms() {
 
 // ---- afterwards
 
-// Past its time limit nothing of a run goes on.
+// Past its time limit nothing of a run goes on, nor when somebody has killed its process: what it
+// has started could neither be seen then nor stopped, and the next run would start beside it.
 void Keeper::endWhatIsLeft() {
-  if (run_.outcome != Outcome::kTimeLimit || processFile_ >= 0) return;
+  const bool isToEnd = run_.outcome == Outcome::kTimeLimit || run_.outcome == Outcome::kLost;
+  if (!isToEnd || processFile_ >= 0) return;
   ProcessTree left(getpid(), {teller_});
   left.signal(SIGTERM);
   const double until = seconds() + kGrace;
