@@ -512,6 +512,7 @@ static void check_called_plugins(void) {
   unlink(plugin);
   rmdir(plugins);
   rmdir(parent);
+  rmdir("/usr/zelo/libexec");
   unlink(file);
 }
 

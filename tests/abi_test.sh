@@ -2,7 +2,8 @@
 # The library's binary interface is the one that is checked in: the exported names, and the layout of
 # every type that a caller can see. CONTRIBUTING.md says how to take a change of it in.
 #
-#   tests/abi_test.sh --update    writes tests/exported_names.txt and tests/abi/*.xml anew
+#   tests/abi_test.sh --update    writes tests/exported_names.txt and tests/abi/*.xml anew; of other
+#                                 processors those that are built (scripts/build --target)
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -24,11 +25,11 @@ exported_names() {
   nm -D --defined-only --with-symbol-versions "$LIBRARY" | awk '$2 != "A" { print $3 }' | sort
 }
 
-# Types that only the library sees are no part of it, nor are places in the source.
+# write_baseline LIBRARY FILE: Types that only the library sees are no part of it, nor are places in the source.
 write_baseline() {
   abidw --headers-dir "$HEADERS" --drop-private-types --exported-interfaces-only --no-show-locs \
-    --no-corpus-path --no-comp-dir-path --no-elf-needed "$LIBRARY" |
-    sed "s|path='[^']*/libzeloscheduler/|path='|" >"$1"
+    --no-corpus-path --no-comp-dir-path --no-elf-needed "$1" |
+    sed "s|path='[^']*/libzeloscheduler/|path='|" >"$2"
 }
 
 has_no_difference() {
@@ -44,7 +45,11 @@ finds_a_change() {
 if [[ ${1:-} == --update ]]; then
   exported_names >"$NAMES"
   mkdir -p "$(dirname "$BASELINE")"
-  write_baseline "$BASELINE"
+  write_baseline "$LIBRARY" "$BASELINE"
+  for target in arm64:aarch64-linux-gnu armhf:arm-linux-gnueabihf; do
+    other=$BUILD_DIR/cross/${target%%:*}/lib/libzeloscheduler.so.4
+    if [[ -e $other ]]; then write_baseline "$other" "$here/abi/libzeloscheduler.so.4-${target#*:}.xml"; fi
+  done
   exit
 fi
 

@@ -1,6 +1,7 @@
 // The program that cron starts.
 #include <gtest/gtest.h>
 
+#include <climits>
 #include <ctime>
 
 #include "failing_calls.h"
@@ -77,11 +78,11 @@ TEST_F(ZeloschedtaskTest, ATaskThatStartsLaterIsSilentlyNotRun) {
 }
 
 TEST_F(ZeloschedtaskTest, AnUnknownTaskIsReportedOnOneLineWithTheErrorRecord) {
-  for (const char *id : {"7", "-5", "9223372036854775807"}) {
-    const Outcome outcome = runTask(std::string("id=") + id);
+  for (const std::string &id : {std::string("7"), std::string("-5"), std::to_string(LONG_MAX)}) {
+    const Outcome outcome = runTask("id=" + id);
     EXPECT_EQ(outcome.status, 1);
     EXPECT_EQ(outcome.out, "");
-    const std::string start = std::string("zeloschedtask: cannot run task ") + id + ": 0x";
+    const std::string start = "zeloschedtask: cannot run task " + id + ": 0x";
     EXPECT_EQ(outcome.err.substr(0, start.size()), start);
     EXPECT_EQ(linesOf(outcome.err).size(), 1U);
     EXPECT_TRUE(outcome.err.find(".cpp:") != std::string::npos) << outcome.err;

@@ -1,4 +1,5 @@
-/* Of two signals the emulator hands on the second, where that one ends it. 0 where it is the first. */
+/* Of two signals the emulator hands on the second, where that one ends it. 0 where it is the first.
+ */
 #include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>

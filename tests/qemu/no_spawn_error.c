@@ -1,4 +1,5 @@
-/* The emulator starts what is not there: its vfork is a fork, so the child cannot tell. 0 where it can. */
+/* The emulator starts what is not there: its vfork is a fork, so the child cannot tell. 0 where it
+ * can. */
 #include <spawn.h>
 
 int main(void) {

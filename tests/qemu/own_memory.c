@@ -1,8 +1,8 @@
-/* What the kernel counts as memory of a process is the emulator's. 0 where it is below 16 MiB. */
+/* What the kernel counts as memory of a process is the emulator's. 0 where it is below 8 MiB. */
 #include <stdio.h>
 
 int main(void) {
   long pages = 0;
   FILE *stream = fopen("/proc/self/statm", "r");
-  return stream == 0 || fscanf(stream, "%*d %ld", &pages) != 1 || pages * 4096 > (16 << 20);
+  return stream == 0 || fscanf(stream, "%*d %ld", &pages) != 1 || pages * 4096 > (8 << 20);
 }

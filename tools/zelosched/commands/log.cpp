@@ -37,6 +37,7 @@ KeptRun chooseRun(int64_t id, std::optional<int64_t> number) {
     filter.run = number;
   } else {
     filter.task = id;
+    filter.until = static_cast<int64_t>(time(nullptr));  // later ones are of a clock that was wrong
   }
   filter.limit = 1;
   const std::vector<KeptRun> runs = keptRuns(filter);

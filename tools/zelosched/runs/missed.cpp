@@ -187,18 +187,20 @@ std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &li
   return found;
 }
 
-void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task) {
+void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task, Acknowledged what) {
   Transaction transaction(kept);
-  Query note(
-      kept,
-      "INSERT OR REPLACE INTO acknowledged(generation, moment)"
-      " SELECT generation, ?1 FROM task WHERE removed IS NULL AND (?2 IS NULL OR task = ?2)");
-  note.with(epoch()).with(task).run();
+  Query note(kept,
+             "INSERT INTO acknowledged(generation, moment, run) SELECT generation, ?1,"
+             " iif(?3, (SELECT coalesce(max(run), 0) FROM run), 0)"
+             " FROM task WHERE removed IS NULL AND (?2 IS NULL OR task = ?2)"
+             " ON CONFLICT DO UPDATE SET moment = excluded.moment, run = max(run, excluded.run)");
+  note.with(epoch()).with(task).with(what == Acknowledged::kAll ? int64_t{1} : int64_t{0}).run();
   transaction.commit();
 }
 
-int64_t acknowledgedAt(const KeptDatabase &kept, int64_t generation) {
-  Query query(kept, "SELECT moment FROM acknowledged WHERE generation = ?");
-  query.with(generation);
-  return query.next() ? query.number(0) : 0;
+bool isAcknowledged(const KeptDatabase &kept, const KeptRun &run) {
+  if (!run.generation) return false;
+  Query query(kept, "SELECT run FROM acknowledged WHERE generation = ?");
+  query.with(*run.generation);
+  return query.next() && query.number(0) >= run.run;
 }

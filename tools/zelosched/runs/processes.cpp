@@ -108,11 +108,15 @@ bool isOver(pid_t pid) {
   return statOf(std::to_string(pid)).state == 'Z';
 }
 
+bool isOfSameProgram(pid_t pid, pid_t other) {
+  struct stat one = {};
+  struct stat two = {};
+  const auto programOf = [](pid_t process) { return "/proc/" + std::to_string(process) + "/exe"; };
+  if (stat(programOf(pid).c_str(), &one) != 0) return errno == EACCES || errno == EPERM;
+  return stat(programOf(other).c_str(), &two) == 0 && one.st_dev == two.st_dev &&
+         one.st_ino == two.st_ino;
+}
+
 bool isOfOurProgram(pid_t pid) {
-  struct stat ours = {};
-  struct stat theirs = {};
-  const std::string directory = "/proc/" + std::to_string(pid);
-  if (stat((directory + "/exe").c_str(), &theirs) != 0) return errno == EACCES || errno == EPERM;
-  return stat("/proc/self/exe", &ours) == 0 && ours.st_dev == theirs.st_dev &&
-         ours.st_ino == theirs.st_ino;
+  return isOfSameProgram(pid, getpid());
 }

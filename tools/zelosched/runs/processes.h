@@ -31,6 +31,7 @@ bool isOfRoot(pid_t pid);
 // other. A set-uid program that a command has started is of root too. True also where we may not
 // look, as in a container without CAP_SYS_PTRACE.
 bool isOfOurProgram(pid_t pid);
+bool isOfSameProgram(pid_t pid, pid_t other);
 
 // Whether it has ended, and waits for its parent to ask how. It has no program any more.
 bool isOver(pid_t pid);

@@ -1,0 +1,159 @@
+#!/bin/bash
+# The other processors: built without a warning, tested by their emulators, and what one has stored is
+# read alike by the others. In the long form (ZELO_SOAK_FACTOR) all programs, and all of the product.
+#
+# Functions are called by check, and what is in single quotes is for another shell:
+# shellcheck disable=SC2016,SC2317
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+root=$(cd "$here/.." && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+
+readonly WORK=$BUILD_DIR/processors_test
+readonly TARGETS=(arm64 armhf)
+readonly OTHER_ORDER=s390x # big-endian; of the product what stores and reads
+declare -rA EMULATORS=([arm64]=qemu-aarch64-static [armhf]=qemu-arm-static [s390x]=qemu-s390x-static)
+# What has to do with the width of numbers, the sign of characters, and the order of bytes; and one program
+# each that works with processes, the tools and the database.
+readonly FORMS=(schedule_test zelocore_section_file_test sched_parm_table_test sched_task_convert_test
+  sched_task_convert_to_json_string_test backend_zeloautopower_test zelosdk_test)
+readonly SHORT=("${FORMS[@]}" zelocore_proc_test sched_date_test sched_task_run_test zeloschedtask_test
+  zelosched_task_json_test zelosched_coming_runs_test)
+readonly LONG_FORMS=("${FORMS[@]}" zelocore_err_test zelocore_szhash_test hash_round_trip_property_test
+  sched_task_save_from_json_string_test accessors_test sched_record_test power_platform_test
+  zelosched_task_json_test)
+# Programs that map files or ask for the size of a page: SQLite's, and those of the store.
+readonly WITH_PAGES=(sched_db_vfs_test store_reader_test sched_shared_names_test)
+export JOBS=${JOBS:-2} PROGRAMS_AT_ONCE=2
+umask 022
+mkdir -p "$WORK"
+
+if ((EUID != 0)) || ! grep -q '^ *0 *0 ' /proc/self/uid_map 2>/dev/null && [[ -e /proc/self/uid_map ]]; then
+  skip "other processors are built for and tested" "only root can make a root for their compilers"
+  finish
+fi
+
+# quietly COMMAND...: shows the end of what it prints when it fails
+quietly() {
+  "$@" >"$WORK/log" 2>&1 || { tail -n 40 "$WORK/log"; return 1; }
+}
+
+builds() {
+  quietly "$root/scripts/build" --target "$@" && ! grep -i 'warning:' "$WORK/log"
+}
+
+# Shows how many passed.
+passes() {
+  local status=0
+  "$root/scripts/cross-root" "$here/qemu/run_tests.sh" "$@" >"$WORK/log" 2>&1 || status=$?
+  grep -E '^(FAILED|    |skip)' "$WORK/log" || true
+  echo "# $1: $(tail -n 1 "$WORK/log")"
+  return "$status"
+}
+
+# But for one that the emulator breaks (no_spawn_error).
+platform_is_right() {
+  "$root/scripts/cross-root" "$root/scripts/sandbox" "${EMULATORS[$1]}" "$BUILD_DIR/cross/$1/tests/platform_check" \
+    --system >"$WORK/log" || true
+  same "$(grep -v '^ok ' "$WORK/log")" "not ok QLIBCExec: -1 when the program cannot be started" &&
+    test "$(grep -c '^ok ' "$WORK/log")" -ge 100
+}
+
+# in_sandbox_of TARGET COMMANDS: with $print and $save as this processor's program; "own" is the machine
+in_sandbox_of() {
+  local target=$1 commands=$2 program=$BUILD_DIR/cross/$1/tests/stored_forms
+  if [[ $target == own ]]; then
+    "$root/scripts/sandbox" bash -c "forms() { '$BUILD_DIR/tests/stored_forms' \"\$1\"; }; cd $WORK; $commands"
+  else
+    "$root/scripts/cross-root" "$root/scripts/sandbox" \
+      bash -c "forms() { ${EMULATORS[$target]} $program \"\$1\"; }; cd $WORK; $commands"
+  fi
+}
+
+readonly STORED=/usr/zelo/etc
+
+stores() {
+  in_sandbox_of "$1" "mkdir -p $1 && forms save && cp $STORED/scheduled_tasks $STORED/power_sched.conf $1 &&
+    forms print >$1/printed" >"$WORK/log" 2>&1 || { cat "$WORK/log"; return 1; }
+}
+
+stores_the_same() {
+  local file
+  for file in scheduled_tasks power_sched.conf printed; do cmp "$WORK/own/$file" "$WORK/$1/$file" || return 1; done
+}
+
+reads_what_stored() {
+  in_sandbox_of "$1" "cp $2/power_sched.conf $STORED && cp $2/scheduled_tasks $STORED &&
+    install -m 0644 $2/scheduled_tasks /tmp/scheduled_tasks && forms print | cmp - $2/printed"
+}
+
+reasons() {
+  sed -n 's/^[A-Z].* \([a-z_]*\)$/\1/p' "$here/qemu/cannot.txt" | sort -u
+  echo no_subreaper
+}
+
+# The machine can what the emulator cannot.
+is_shown() {
+  local name=qemu_$1 target
+  "$BUILD_DIR/tests/$name" || { echo "$1 fails here"; return 1; }
+  for target in "${TARGETS[@]}"; do
+    ! "$root/scripts/cross-root" "${EMULATORS[$target]}" "$BUILD_DIR/cross/$target/tests/$name" ||
+      { echo "$1 succeeds under ${EMULATORS[$target]}"; return 1; }
+  done
+}
+
+same_interface() {
+  local target=$1 library=$BUILD_DIR/cross/$1/lib/libzeloscheduler.so.4
+  same "$(nm -D --defined-only --with-symbol-versions "$library" | awk '$2 != "A" { print $3 }' | LC_ALL=C sort)" \
+    "$(cat "$here/exported_names.txt")" && compgen -G "$here/abi/*-$2.xml" >/dev/null &&
+    abidiff --exported-interfaces-only "$here"/abi/*-"$2".xml "$library"
+}
+
+# A segment that is aligned for pages of 64 KiB is so for smaller ones.
+with_pages() {
+  quietly "$root/scripts/cross-root" env PAGE_SIZE="$1" "$here/qemu/run_tests.sh" arm64 "${WITH_PAGES[@]}"
+}
+
+fits_pages_of_64_kib() {
+  local file
+  for file in "$BUILD_DIR/cross/$1"/lib/*.so "$BUILD_DIR/cross/$1"/bin/*; do
+    ! readelf -lW "$file" | awk '$1 == "LOAD" { print $NF }' | grep -v '^0x10000$' || { echo "$file"; return 1; }
+  done
+}
+
+check "a root with the compilers of all is made" quietly "$root/scripts/cross-root"
+mapfile -t shown <<<"$(reasons)"
+tools=(zelosched zeloschedtask take-names stored_forms demo_tasks platform_check "${shown[@]/#/qemu_}")
+for target in "${TARGETS[@]}"; do
+  if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then
+    check "$target: everything is built" builds "$target"
+    check "$target: every program that the emulator can run passes" passes "$target"
+  else
+    check "$target: the product and some tests are built" builds "$target" "${tools[@]}" "${SHORT[@]}"
+    check "$target: these pass" passes "$target" "${SHORT[@]}"
+  fi
+  check "$target: our platform keeps its contracts" platform_is_right "$target"
+done
+# Debian's own libraries of armhf are for pages of 4 KiB.
+check "arm64: it fits pages of 64 KiB" fits_pages_of_64_kib arm64
+if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then
+  check "arm64: with pages of 16 and 64 KiB the store and the database work" eval \
+    'with_pages 16384 && with_pages 65536'
+fi
+check "arm64: the interface is the checked-in one" same_interface arm64 aarch64-linux-gnu
+check "armhf: the interface is the checked-in one" same_interface armhf arm-linux-gnueabihf
+for reason in "${shown[@]}"; do check "what the emulators cannot do is shown: $reason" is_shown "$reason"; done
+
+names=("${FORMS[@]}")
+if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then names=("${LONG_FORMS[@]}"); fi
+check "$OTHER_ORDER: what stores and reads is built" builds "$OTHER_ORDER" stored_forms "${names[@]}"
+check "$OTHER_ORDER: its tests pass" passes "$OTHER_ORDER" "${names[@]}"
+check "this machine stores tasks and power times" stores own
+for target in "${TARGETS[@]}" "$OTHER_ORDER"; do
+  check "$target stores the same bytes, ids and texts" eval "stores $target && stores_the_same $target"
+  check "$target reads what this machine stored" reads_what_stored "$target" own
+  check "this machine reads what $target stored" reads_what_stored own "$target"
+done
+finish

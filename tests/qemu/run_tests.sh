@@ -1,0 +1,54 @@
+#!/bin/bash
+# Runs test programs of another processor by its emulator, in the root that scripts/cross-root makes:
+#
+#   scripts/cross-root tests/qemu/run_tests.sh TARGET [NAME...]      all programs, by default
+#
+# Left out is what the emulator cannot do, as tests/qemu/cannot.txt says. $BUILD_DIR is that of the machine's
+# own build; the programs are those of $BUILD_DIR/cross/TARGET. $PAGE_SIZE is another size of pages than 4096.
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+root=$(cd "$here/../.." && pwd -P)
+target=$1
+shift
+export BUILD_DIR=$BUILD_DIR/cross/$target
+case $target in
+  arm64) emulator=qemu-aarch64-static ;;
+  armhf) emulator=qemu-arm-static ;;
+  s390x) emulator=qemu-s390x-static ;;
+esac
+export EMULATOR="$here/emulate.py $emulator${PAGE_SIZE:+ -p $PAGE_SIZE}"
+export TIMES_SLOWER=5
+
+# The first column of a row is a program or a test of one, the second the programs that show the reason.
+tests_left_out() {
+  sed -n 's/^\([A-Za-z/]*[.*][^ ]*\) .*/\1/p' "$here/cannot.txt" | tr '\n' ':'
+}
+
+programs() {
+  local name
+  awk '$1 == "gtest" { print $2 }' "$BUILD_DIR/test-programs" | while read -r name; do
+    if ! grep -q "^$name " "$here/cannot.txt"; then echo "$name"; fi
+  done
+}
+
+# Other processes start these by name, which only the machine's own programs can be. Mounts are private
+# here, and so is what stands in the place of the programs.
+wrap_tools() {
+  local tool
+  mkdir -p "$BUILD_DIR/bin.$target"
+  mount -n --bind "$BUILD_DIR/bin" "$BUILD_DIR/bin.$target"
+  mount -n -t tmpfs -o mode=0755 tools "$BUILD_DIR/bin"
+  for tool in "$BUILD_DIR/bin.$target"/*; do
+    echo "#!/bin/sh
+exec $emulator -0 \"\$0\" $tool \"\$@\"" >"$BUILD_DIR/bin/${tool##*/}"
+    chmod 755 "$BUILD_DIR/bin/${tool##*/}"
+  done
+}
+
+GTEST_FILTER=-$(tests_left_out)
+export GTEST_FILTER
+wrap_tools
+names=("$@")
+if ((${#names[@]} == 0)); then mapfile -t names <<<"$(programs)"; fi
+exec "$root/scripts/run-tests" "${names[@]}"
