@@ -192,7 +192,7 @@ void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
     run.outcome = Outcome::kLost;
     run.state = RunState::kEnded;
   }
-  if (run.trigger == Trigger::kOther) run.isTold = run.outcome != Outcome::kLost;
+  if (run.trigger == Trigger::kOther && !run.isTold) run.isTold = run.outcome != Outcome::kLost;
   // What its keeper had read by the time when that was killed.
   OutputFile printed = OutputFile::open(run.process);
   run.outputBytes = std::max(run.outputBytes, printed.total());
