@@ -49,7 +49,8 @@ Task loadRemovable(int64_t id, const RemoveRules &rules) {
 }
 
 // A run that waits for its turn must not begin when the task is gone: neither one from before, nor
-// one that read the task just then. What goes on is looked after when others may change tasks again.
+// one that read the task just then. What goes on is looked after when others may change tasks
+// again.
 void removeAndCancel(const ZELO_SCHED_TASK &task) {
   const int before = attempt([&] { cancelWaitingOf(task); });
   removeTask(task);

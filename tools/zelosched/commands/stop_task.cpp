@@ -67,9 +67,10 @@ void cancelWaitingOf(const TaskRecord &task) {
     filter.underWay = true;
     runs = keptRuns(filter);
   } catch (const Failure &failure) {
-    throw Failure(std::string("whether a run of it waits for its turn, and may still start, cannot be "
-                              "told: ") +
-                  failure.what());
+    throw Failure(
+        std::string("whether a run of it waits for its turn, and may still start, cannot be "
+                    "told: ") +
+        failure.what());
   }
   std::erase_if(runs, [](const KeptRun &run) {
     return run.state != RunState::kWaiting || !isAlive(run.process);

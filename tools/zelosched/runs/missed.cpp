@@ -71,6 +71,22 @@ std::vector<Span> unjudgedSpans(const KeptDatabase &kept) {
   return spans;
 }
 
+// In which the machine was on, as far as is known.
+std::vector<Span> spansUp(const KeptDatabase &kept, int64_t now) {
+  std::vector<Span> spans;
+  const std::string current = bootId();
+  Query query(kept, "SELECT boot, began, seen FROM boot");
+  while (query.next()) {
+    spans.push_back({query.number(1), query.text(0) == current ? now : query.number(2)});
+  }
+  return spans;
+}
+
+bool isIn(const std::vector<Span> &spans, time_t moment) {
+  return std::any_of(spans.begin(), spans.end(),
+                     [&](const Span &span) { return moment >= span.from && moment < span.until; });
+}
+
 // Up to which moment a time that was passed over counts as missed.
 int64_t judgedUntil(const KeptDatabase &kept, int64_t now) {
   const std::optional<Boot> boot = bootOf(kept, bootId());
@@ -83,6 +99,7 @@ class Judge {
   Judge(const KeptDatabase &kept, const TaskList &list, int64_t since, int64_t now)
       : off_(list),
         unjudged_(unjudgedSpans(kept)),
+        up_(spansUp(kept, now)),
         notes_(taskNotes(kept)),
         lastRun_(kept, "SELECT max(moment) FROM run WHERE generation = ? AND moment <= ?"),
         acknowledged_(kept, "SELECT moment FROM acknowledged WHERE generation = ?"),
@@ -117,11 +134,9 @@ class Judge {
   void judge(const LocalMinute &minute, MissedTask *missed) const {
     const std::optional<time_t> due = momentOf(minute);
     if (!due) return;
-    const bool isUnjudged = std::any_of(unjudged_.begin(), unjudged_.end(), [&](const Span &span) {
-      return *due >= span.from && *due < span.until;
-    });
-    if (isUnjudged) return;
-    if (off_.isOffAt(minute)) {
+    if (isIn(unjudged_, *due)) return;
+    // Somebody may have switched it on between its power times.
+    if (off_.isOffAt(minute) && !isIn(up_, *due)) {
       ++missed->planned;
     } else {
       ++missed->times;
@@ -131,6 +146,7 @@ class Judge {
 
   PlannedOff off_;
   std::vector<Span> unjudged_;
+  std::vector<Span> up_;
   std::map<int64_t, TaskNote> notes_;
   Query lastRun_;
   Query acknowledged_;
