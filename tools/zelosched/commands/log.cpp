@@ -30,7 +30,8 @@ std::string leftOutLine(int64_t bytes) {
   return "\n[" + std::to_string(bytes) + " bytes are left out here]\n";
 }
 
-// The one that was asked for, or the last one of the task.
+// The one that was asked for, or the last one of the task that has started: one that waits for its
+// turn, or was cancelled then, has printed nothing.
 KeptRun chooseRun(int64_t id, std::optional<int64_t> number) {
   RunFilter filter;
   if (number) {
@@ -39,9 +40,13 @@ KeptRun chooseRun(int64_t id, std::optional<int64_t> number) {
     filter.task = id;
     filter.until = static_cast<int64_t>(time(nullptr));  // later ones are of a clock that was wrong
   }
-  filter.limit = 1;
+  constexpr int64_t kMostWaiting = 50;
+  filter.limit = kMostWaiting;
   const std::vector<KeptRun> runs = keptRuns(filter);
-  if (!runs.empty() && runs.front().task == id) return runs.front();
+  const auto started = std::find_if(runs.begin(), runs.end(),
+                                    [](const KeptRun &run) { return run.start.has_value(); });
+  const auto chosen = started != runs.end() ? started : runs.begin();
+  if (chosen != runs.end() && chosen->task == id) return *chosen;
   if (number) {
     throw Failure("task " + std::to_string(id) + " has no run " + std::to_string(*number));
   }
