@@ -173,9 +173,11 @@ zeloscheduler-tools -rw-r--r-- root:root usr/share/bash-completion/completions/z
 zeloscheduler-tools -rw-r--r-- root:root usr/share/fish/vendor_completions.d/zelosched.fish
 zeloscheduler-tools -rw-r--r-- root:root usr/share/lintian/overrides/zeloscheduler-tools
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man5/zelosched-json.5.gz
+zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man5/zelosched.conf.5.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zelosched.8.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zeloschedtask.8.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/zelosched/zelosched-1.schema.json
+zeloscheduler-tools -rwxr-xr-x root:root usr/share/zelosched/mail-on-failure
 zeloscheduler-tools -rw-r--r-- root:root usr/share/zsh/vendor-completions/_zelosched
 zeloscheduler-tools -rwxr-xr-x root:root etc/init.d/zelosched-restore
 zeloscheduler-tools -rwxr-xr-x root:root usr/sbin/zelosched
@@ -328,7 +330,7 @@ readonly STARTED_AT='
   stat -c "%a %U" /tmp/scheduled_tasks /tmp/zeloschedtask
   zelosched run "$(cat /task)" --wait >/dev/null && echo ran
   systemctl is-active zelosched-history.timer
-  systemctl start zelosched-history && zelosched history --json | grep -c finished
+  systemctl start zelosched-history && zelosched history "$(cat /task)" --json | grep -c finished
   systemctl is-active zelosched-catch-up
   zelosched run "$(cat /task)" --wait >/dev/null && echo ran'
 
