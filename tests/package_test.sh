@@ -337,9 +337,10 @@ kept_runs() {
   in_root zelosched history "$(cat "$ROOT/task")" | grep -c finished || true
 }
 
-# As if the machine had been off for hours.
+# As if the machine had been off for hours, and the tasks had been there before.
 was_off() {
-  in_root sqlite3 /usr/zelo/var/history.sqlite "UPDATE up SET boot = 'another', seen = seen - 10000"
+  in_root sqlite3 /usr/zelo/var/history.sqlite "DELETE FROM boot; UPDATE run SET moment = moment - 10000;
+    UPDATE task SET changed = changed - 10000 WHERE name = 'Catch up'"
 }
 
 readonly NAMES=(/tmp/scheduled_tasks /tmp/zeloschedtask /tmp/lock /tmp/lock/lock_sched_run

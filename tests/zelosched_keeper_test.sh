@@ -209,6 +209,15 @@ ends_what_is_left_past_the_limit() {
     is_gone "$(cat "$SCRATCH/ran")"
 }
 
+# The time in which it waits is none of its own, and that from its start until it was seen is.
+counts_the_limit_from_the_start_after_waiting() {
+  clean
+  add "$HOLD" --app X --app-overlap no
+  add "sleep 1000" --app X --app-overlap no --time-limit 1s
+  start 1
+  z run 2 >/dev/null && go && ended_as "$TIME_LIMIT" && run_is "1 1" "duration >= 1, duration < 10"
+}
+
 its_own_exit_code_before_the_limit_is_a_failure() {
   clean
   add "timeout --kill-after=30s 2h sh -c 'exit 124'"
@@ -235,6 +244,7 @@ check "an interrupt cancels what waits, and asks nothing" an_interrupt_cancels_w
 check "each end is told from the others" says_how_each_run_ended
 check "an owner who is gone is a run that did not start" an_owner_who_is_gone_is_told_as_not_started
 check "past its time limit nothing of a run goes on" ends_what_is_left_past_the_limit
+check "nor when it waited before" counts_the_limit_from_the_start_after_waiting
 check "before the limit the same exit code is a failure" its_own_exit_code_before_the_limit_is_a_failure
 check "a clock that is set back changes no duration" measures_by_a_clock_that_nobody_sets
 
@@ -262,6 +272,36 @@ follows_what_goes_on() {
   start 1
   z log 1 --follow >"$SCRATCH/out" &
   until_is first cat "$SCRATCH/out" && go && wait $! && same "$(cat "$SCRATCH/out")" $'first\nlast'
+}
+
+# Nobody but who follows looks after the run.
+follows_a_run_whose_keeper_is_killed() {
+  clean
+  add "echo first; $HOLD; echo last"
+  start 1
+  until_is 1 kept "SELECT state FROM run"
+  local killed
+  killed=$(keeper_of)
+  z log 1 --follow >"$SCRATCH/out" &
+  until_is first cat "$SCRATCH/out" && kill -9 "$killed" && is_gone "$killed" && go &&
+    wait $! && same "$(head -n 1 "$SCRATCH/out")" first && ended_as "$FINISHED"
+}
+
+# As by an interrupt of its terminal, and a pager that waits does the same.
+a_reader_who_stands_still_holds_up_no_keeper() {
+  clean
+  add "echo \$PPID >$SCRATCH/begun; exec yes" --time-limit 1s
+  timeout --foreground 60 "$ZELOSCHED" run 1 --output >"$SCRATCH/out" 2>"$SCRATCH/err" &
+  local waiting=$! reader
+  read -r run_process <"$SCRATCH/begun"
+  reader=$(pgrep -P "$waiting")
+  kill -STOP "$reader"
+  ended_as "$TIME_LIMIT" || return 1
+  kill -CONT "$reader"
+  wait "$waiting"
+  # All of it comes when it reads again.
+  same "$(cat "$SCRATCH/err")" "zelosched: task 1 (Task 1) ended by its time limit" && run_is "$(stat -c %s "$SCRATCH/out")" output_bytes &&
+    is_gone_by_name
 }
 
 a_command_may_end_its_process_group() {
@@ -342,6 +382,8 @@ zelosched: /etc/zelosched.conf, line 3: 'runs-days' has no '=': the usual value 
 check "of much output the ends are kept" keeps_the_ends_of_much_output
 check "ten gigabytes fill nothing" is_not_filled_by_ten_gigabytes
 check "what goes on is followed to its end" follows_what_goes_on
+check "also when its keeper is killed" follows_a_run_whose_keeper_is_killed
+check "a reader who stands still holds up no keeper" a_reader_who_stands_still_holds_up_no_keeper
 check "a command may end its process group" a_command_may_end_its_process_group
 check "what reads its own output harms nobody" what_reads_its_own_output_harms_nobody
 check "a run may close its output at once" a_run_may_close_its_output
@@ -424,6 +466,26 @@ no_database() { head -c 9000 /dev/zero | tr '\0' x >"$KEPT"; }
 later_version() { kept "PRAGMA user_version = 99"; }
 no_room() { mount -n -t tmpfs -o mode=0755,size=4k var /usr/zelo/var; }
 
+# start_without_room: and then there is some
+start_without_room() {
+  clean
+  mkdir -p /usr/zelo/var
+  mount -n -t tmpfs -o mode=0755,size=4k var /usr/zelo/var
+  add "$HOLD; echo said" 2>/dev/null
+  start 1
+  until_is 0 stat -c %s "$KEPT" && mount -n -o remount,size=10m /usr/zelo/var && z history >/dev/null
+}
+
+stops_a_run_that_the_sweep_has_found() {
+  start_without_room && z stop 1 >/dev/null && ended_as "$STOPPED" &&
+    run_is "1 1 1" "count(*), started_by, stop_asked IS NOT NULL"
+}
+
+a_run_is_written_once_there_is_room() {
+  start_without_room && run_is "1 1 1" "count(*), started_by, keeper <> 0" && go && ended_as "$FINISHED" &&
+    same "$(z log 1)" said && run_is 1 "count(*)"
+}
+
 a_run_does_not_wait_for_a_locked_history() {
   clean
   add "$HOLD; head -c 1000000 /dev/zero; echo ran >$SCRATCH/ran"
@@ -439,6 +501,47 @@ while not os.path.exists(sys.argv[3] + "/ran"):
 held.execute("COMMIT")
 HOLD
   ended_as "$FINISHED" && run_is 1000000 output_bytes
+}
+
+# What a keeper could not commit is not there: neither is the task that it was about to note.
+a_run_is_its_tasks_own_after_a_commit_that_failed() {
+  clean
+  add 'exit 1' --name one
+  add 'exit 2' --name two
+  kept "DELETE FROM task" # as if another program had made them
+  python3 - "$KEPT" "$STARTER" <<'READ' || return 1
+import sqlite3, subprocess, sys, time
+reader = sqlite3.connect(sys.argv[1], isolation_level=None)
+reader.execute("BEGIN")
+reader.execute("SELECT count(*) FROM run").fetchall()
+for task in "2", "1":
+    subprocess.run([sys.argv[2], "--run", "id=" + task, "--now"], timeout=60, check=True)
+time.sleep(1)
+reader.execute("COMMIT")
+READ
+  until_is "1 one 1|2 two 2" kept "SELECT group_concat(words, '|') FROM (SELECT task.task || ' ' || name || ' ' || exit_code AS words
+    FROM run JOIN task USING(generation) ORDER BY run.task)"
+}
+
+# The sweep writes it when there is room again, and it alone tells of it.
+an_end_without_room_is_left_to_the_sweep() {
+  clean
+  mkdir -p /usr/zelo/var /etc/zelosched/run-ended.d
+  mount -n -t tmpfs -o mode=0755,size=1m var /usr/zelo/var
+  printf '#!/bin/sh\necho "$ZELO_RUN $ZELO_RUN_OUTCOME $(tail -n 1 "$ZELO_RUN_OUTPUT")" >>%s/told\n' "$SCRATCH" >/etc/zelosched/run-ended.d/tell
+  chmod 0755 /etc/zelosched/run-ended.d/tell
+  add "$HOLD; sleep 1000 & echo said; exit 9"
+  start 1
+  until_is 1 kept "SELECT state FROM run"
+  local keeper
+  keeper=$(keeper_of)
+  dd if=/dev/zero of=/usr/zelo/var/fill bs=1k 2>/dev/null || true
+  go
+  is_gone "$keeper" && run_is "1 0" "state, told" || return 1
+  rm /usr/zelo/var/fill
+  z history --keep >/dev/null
+  ended_as "$FAILED" && same "$(z log 1)" said && until_is "1 failed said" cat "$SCRATCH/told" && sleep 0.3 &&
+    same "$(cat "$SCRATCH/told")" "1 failed said" && same "$(ls /run/zelosched)" "" && pkill -x sleep && is_gone_by_name
 }
 
 the_history_can_be_unmounted_while_a_command_runs() {
@@ -471,7 +574,11 @@ check "a run takes place without a directory for the history" runs_without_its_r
 check "and where its file is no database" runs_without_its_record no_database
 check "and where that is of a later version" runs_without_its_record later_version
 check "and where there is no room" runs_without_its_record no_room
+check "it is stopped when the sweep alone has found it" stops_a_run_that_the_sweep_has_found
+check "and is written while it goes on, once there is room" a_run_is_written_once_there_is_room
 check "nor does it wait for a history that is locked" a_run_does_not_wait_for_a_locked_history
+check "a run is its own task's after a commit that failed" a_run_is_its_tasks_own_after_a_commit_that_failed
+check "an end for which there is no room is left to the sweep, and told once" an_end_without_room_is_left_to_the_sweep
 check "the history can be unmounted while a command runs" the_history_can_be_unmounted_while_a_command_runs
 check "two hundred runs at once are all written, once" two_hundred_runs_at_once_are_all_written
 

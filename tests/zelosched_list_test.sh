@@ -62,7 +62,7 @@ readonly HISTORY=/usr/zelo/var/history.sqlite
 started_at_nine() {
   until [[ $(sqlite3 "$HISTORY" "SELECT count(*) FROM run WHERE state = 2 AND told = 0") == 0 ]]; do sleep 0.01; done
   sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET timestamp = $(date -u -d '2026-11-22 09:00' +%s)"
-  sqlite3 "$HISTORY" "UPDATE run SET start = $(date -u -d '2026-11-22 09:00' +%s),
+  sqlite3 "$HISTORY" "UPDATE run SET start = $(date -u -d '2026-11-22 09:00' +%s), moment = $(date -u -d '2026-11-22 09:00' +%s),
     ended = iif(state = 2, $(date -u -d '2026-11-22 09:00' +%s), NULL)"
 }
 

@@ -1,7 +1,8 @@
 /*
- * Where long has 32 bits, the product and its tests are built with 64 bits for times and for places in
- * files, and the C library has other symbols for those calls: what a test defines as stat is
- * __stat64_time64. The tests' dlsym comes here, so that what they pass a call on to is of the same kind.
+ * Where long has 32 bits, the product and its tests are built with 64 bits for times and for places
+ * in files, and the C library has other symbols for those calls: what a test defines as stat is
+ * __stat64_time64. The tests' dlsym comes here, so that what they pass a call on to is of the same
+ * kind.
  */
 #undef dlsym
 #include <dlfcn.h>

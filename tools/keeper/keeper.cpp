@@ -34,6 +34,7 @@
 #include "runs/runs.h"
 #include "runs/settings.h"
 #include "runs/status_row.h"
+#include "runs/stop_run.h"
 #include "runs/task_notes.h"
 #include "store/owner.h"
 #include "store/task_list.h"
@@ -56,6 +57,7 @@ constexpr int kStatusPatience = 50;  // milliseconds: the pipe must not fill up 
 constexpr int kLastPatience = 10000;
 constexpr std::chrono::milliseconds kHistoryPatience(50);
 constexpr double kSavePause = 0.2;    // seconds
+constexpr double kRetryPause = 5;     // seconds, where it cannot be written at all
 constexpr double kSaveAtEnd = 60;     // seconds in which the end of a run is to be written
 constexpr double kFirstWait = 3;      // seconds: nobody waits for a shorter time
 constexpr double kDrain = 60.0 * 60;  // seconds
@@ -67,6 +69,18 @@ double seconds() {
   clock_gettime(CLOCK_BOOTTIME, &now);
   constexpr double kNano = 1e-9;
   return static_cast<double>(now.tv_sec) + static_cast<double>(now.tv_nsec) * kNano;
+}
+
+int millisecondsUntil(double moment) {
+  constexpr double kMilli = 1000;
+  return static_cast<int>(std::max(moment - seconds(), 0.0) * kMilli) + 1;
+}
+
+// By the clock above, and never later than it began: a tick is the time before it.
+std::optional<double> beganAt(pid_t pid) {
+  const unsigned long long ticks = statOf(pid).started;
+  if (ticks == 0) return std::nullopt;
+  return static_cast<double>(ticks) / static_cast<double>(sysconf(_SC_CLK_TCK));
 }
 
 // ---- what the caller learns ---------------------------------------------------------------------
@@ -210,15 +224,21 @@ class Keeper {
   size_t readOnce(size_t most);
   void passRest();
   void passOn(std::string_view bytes);
+  void copyOn();
+  void closeCopy();
+  bool isCopyHeldUp() const { return !uncopied_.empty(); }
   void tell(const std::string &line);
   void reap();
   void lookWhetherItRuns();
   void lookForTurn();
   void readStatus();
+  bool isCancelled() const;
   void measure();
   bool save(bool isEnd);
   void saveWhenDue();
   void saveEnd();
+  bool isLeftToSweep() const { return !isStored_ && run_.run != 0; }
+  void judge(KeptRun *run) const;
   void logEnd() const;
   void tellPrograms();
   void endWhatIsLeft();
@@ -229,6 +249,7 @@ class Keeper {
   KeptRun run_;
   Task task_;
   OutputFile output_;
+  std::string uncopied_;  // what the reader of the copy has not taken yet
   int pipe_ = -1;
   int signals_ = -1;
   int processFile_ = -1;  // of one that is no child
@@ -245,12 +266,15 @@ class Keeper {
   double nextSave_ = 0;
   bool isGivenUp_ = false;
   bool isRecovered_ = false;
-  bool isSaved_ = false;
+  bool isSaved_ = false;   // as far as that could be done
+  bool isStored_ = false;  // its end is in the history
   pid_t teller_ = 0;
 };
 
 void Keeper::start(int report) {
   leaveCaller({report, order_.tellTo, order_.copyTo});
+  // Nobody else writes there.
+  if (order_.copyTo >= 0) fcntl(order_.copyTo, F_SETFL, O_NONBLOCK);
   prctl(PR_SET_CHILD_SUBREAPER, 1);
   openlog("zeloschedtask", LOG_PID, LOG_CRON);
   forgetError();
@@ -353,7 +377,7 @@ void Keeper::keep() {
     saveWhenDue();
     malloc_trim(0);
     const bool isSettled = run_.state != RunState::kWaiting && (!isDirty_ || isGivenUp_);
-    pump(isSettled ? -1 : pause_);
+    pump(!isSettled ? pause_ : isDirty_ ? millisecondsUntil(nextSave_) : -1);
     pause_ = std::min(2 * pause_, kLook);
   }
   ended_ = seconds();
@@ -364,10 +388,12 @@ void Keeper::keep() {
   logEnd();
   tell(endLine(run_));
   if (order_.tellTo >= 0) close(order_.tellTo);
-  if (order_.copyTo >= 0) close(order_.copyTo);
-  order_.tellTo = order_.copyTo = -1;
-  tellPrograms();
-  output_.remove();
+  order_.tellTo = -1;
+  copyOn();
+  if (!isLeftToSweep()) {
+    tellPrograms();
+    output_.remove();
+  }
   output_ = OutputFile();
   task_.reset();
   endWhatIsLeft();
@@ -379,15 +405,29 @@ void Keeper::keep() {
 void Keeper::passOn(std::string_view bytes) {
   output_.append(bytes);
   run_.outputBytes += static_cast<int64_t>(bytes.size());
-  while (order_.copyTo >= 0 && !bytes.empty()) {
-    const ssize_t count = write(order_.copyTo, bytes.data(), bytes.size());
+  if (order_.copyTo < 0) return;
+  uncopied_ += bytes;
+  copyOn();
+}
+
+void Keeper::copyOn() {
+  while (isCopyHeldUp()) {
+    const ssize_t count = write(order_.copyTo, uncopied_.data(), uncopied_.size());
     if (count >= 0) {
-      bytes.remove_prefix(static_cast<size_t>(count));
+      uncopied_.erase(0, static_cast<size_t>(count));
+    } else if (errno == EAGAIN) {
+      return;
     } else if (errno != EINTR) {  // nobody wants it any more
-      close(order_.copyTo);
-      order_.copyTo = -1;
+      closeCopy();
     }
   }
+  if (isSaved_) closeCopy();  // nothing comes any more
+}
+
+void Keeper::closeCopy() {
+  uncopied_ = std::string();
+  if (order_.copyTo >= 0) close(order_.copyTo);
+  order_.copyTo = -1;
 }
 
 size_t Keeper::readOnce(size_t most) {
@@ -417,13 +457,18 @@ void Keeper::passRest() {
   }
 }
 
-// Waits so long for something to happen, and takes it.
+// Waits so long for something to happen, and takes it. While the reader of the copy takes nothing,
+// the run has to wait when its pipe is full, as in a shell's pipeline; its keeper does not.
 void Keeper::pump(int milliseconds) {
-  pollfd wanted[] = {
-      {pipe_, POLLIN, 0}, {signals_, POLLIN, 0}, {isOver_ ? -1 : processFile_, POLLIN, 0}};
+  const bool isRead = !isCopyHeldUp() || isSaved_;
+  pollfd wanted[] = {{isRead ? pipe_ : -1, POLLIN, 0},
+                     {signals_, POLLIN, 0},
+                     {isOver_ ? -1 : processFile_, POLLIN, 0},
+                     {isCopyHeldUp() ? order_.copyTo : -1, POLLOUT, 0}};
   if (poll(wanted, std::size(wanted), milliseconds) <= 0) return;
   if (wanted[1].revents != 0) reap();
   if (wanted[2].revents != 0) isOver_ = true;
+  if (wanted[3].revents != 0) copyOn();
   if (wanted[0].revents != 0) readOnce(kMostAtOnce);
 }
 
@@ -451,11 +496,16 @@ void Keeper::reap() {
 // The command has begun when the run's process has a child. Its row would say so too; but whoever
 // reads the status database just when the run writes it delays the run by up to a second.
 void Keeper::lookWhetherItRuns() {
-  if (!hasChild(static_cast<pid_t>(run_.process.pid))) {
+  const std::vector<pid_t> commands = childrenOf(static_cast<pid_t>(run_.process.pid));
+  if (commands.empty()) {
     if (seconds() - began_ > kWaitsAfter && seconds() >= nextTurnLook_) lookForTurn();
     return;
   }
-  if (processFile_ < 0) started_ = hasWaited_ ? seconds() : began_;
+  if (processFile_ < 0) {
+    const double now = seconds();
+    const double began = beganAt(commands.front()).value_or(hasWaited_ ? now : began_);
+    started_ = std::clamp(began, std::min(began_, now), now);
+  }
   run_.state = RunState::kRunning;
   run_.start = time(nullptr);  // until its row is read
   isDirty_ = true;
@@ -519,12 +569,20 @@ void Keeper::readStatus() {
     run_.outcome = Outcome::kLost;
   } else {
     if (!isKilled && !hasWaited_) lookForTurn();
-    run_.outcome = isKilled     ? Outcome::kCancelled
-                   : hasWaited_ ? Outcome::kGaveUp
-                                : Outcome::kNotStarted;
+    run_.outcome = isCancelled() ? Outcome::kCancelled
+                   : isKilled    ? Outcome::kLost
+                   : hasWaited_  ? Outcome::kGaveUp
+                                 : Outcome::kNotStarted;
   }
   run_.state = RunState::kEnded;
   if (row || hasBegun) measure();
+}
+
+// By 'stop', by a removal of its task, or by whoever waited for it.
+bool Keeper::isCancelled() const {
+  const bool isByUs =
+      waitStatus_ && WIFSIGNALED(*waitStatus_) && WTERMSIG(*waitStatus_) == kSignalOfCancelling;
+  return isByUs || run_.stopAsked.has_value();
 }
 
 void Keeper::measure() {
@@ -539,19 +597,34 @@ void Keeper::measure() {
 
 // ---- what is written
 
+// Where the sweep has found the run before its keeper could write it: its row becomes the keeper's,
+// with what others have noted there. 0 for none.
+int64_t numberBySweep(const KeptDatabase &kept, const KeptRun &run) {
+  Query query(kept,
+              "SELECT run FROM run WHERE state < 2 AND pid = ?1 AND task = ?2 AND boot = ?3"
+              " AND pid_born = ?4 AND keeper = 0 UNION ALL"
+              " SELECT run FROM run WHERE start = ?5 AND status_id = ?6 AND pid = ?1 AND task = ?2"
+              " AND app = ?7 AND keeper = 0");
+  query.with(run.process.pid).with(run.task).with(run.boot).with(run.process.born);
+  query.with(run.start).with(run.statusId).with(run.app);
+  return query.next() ? query.number(0) : 0;
+}
+
 bool Keeper::save(bool isEnd) {
   try {
     const KeptDatabase kept(KeptDatabase::kChange, kHistoryPatience);
     Transaction transaction(kept);
-    if (task_ && !run_.generation) run_.generation = generationOf(kept, *task_);
-    RunFilter filter;
-    filter.run = run_.run;
-    const std::vector<KeptRun> known =
-        run_.run != 0 ? runsOf(kept, filter) : std::vector<KeptRun>();
-    if (!known.empty()) run_.stopAsked = known.front().stopAsked;
+    // What the history gives it, a number or a generation, it has when that is committed.
     KeptRun written = run_;
+    if (written.run == 0) written.run = numberBySweep(kept, written);
+    RunFilter filter;
+    filter.run = written.run;
+    const std::vector<KeptRun> known =
+        written.run != 0 ? runsOf(kept, filter) : std::vector<KeptRun>();
+    if (!known.empty()) run_.stopAsked = written.stopAsked = known.front().stopAsked;
+    if (task_ && !written.generation) written.generation = generationOf(kept, *task_);
     if (isEnd) {
-      judgeEnd(task_ ? task_->Command : "", run_.stopAsked.has_value(), &written);
+      judge(&written);
       written.isTold = true;
     }
     saveRun(kept, &written);
@@ -563,12 +636,15 @@ bool Keeper::save(bool isEnd) {
     if (run_.run != written.run) tell("run " + std::to_string(written.run));
     run_ = written;
     isDirty_ = false;
+    isGivenUp_ = false;
+    isStored_ = isEnd;
     return true;
   } catch (const DatabaseBusy &failure) {
     nextSave_ = seconds() + kSavePause;
     if (isEnd && seconds() - ended_ > kSaveAtEnd) {
       syslog(LOG_WARNING, "%s: the run of task %ld is not recorded", failure.what(),
              static_cast<long>(run_.task));
+      judge(&run_);
       return true;
     }
     return false;
@@ -578,15 +654,22 @@ bool Keeper::save(bool isEnd) {
              static_cast<long>(run_.task), isEnd ? "" : " yet");
     }
     isGivenUp_ = true;
-    if (isEnd) judgeEnd(task_ ? task_->Command : "", run_.stopAsked.has_value(), &run_);
+    nextSave_ = seconds() + kRetryPause;
+    if (isEnd) judge(&run_);
     return true;
   }
 }
 
-void Keeper::saveWhenDue() {
-  if (isDirty_ && !isGivenUp_ && seconds() >= nextSave_) save(false);
+void Keeper::judge(KeptRun *run) const {
+  judgeEnd(task_ ? task_->Command : "", run->stopAsked.has_value(), run);
 }
 
+void Keeper::saveWhenDue() {
+  if (isDirty_ && seconds() >= nextSave_) save(false);
+}
+
+// What cannot be written is left to the sweep, with what it printed, and with the telling: it
+// writes the end of each run that is in the history and whose keeper is gone.
 void Keeper::saveEnd() {
   while (!save(true)) pump(kLook);
   isSaved_ = true;
@@ -609,6 +692,7 @@ void Keeper::tellPrograms() {
   teller_ = fork();
   if (teller_ != 0) return;
   if (pipe_ >= 0) close(pipe_);
+  closeCopy();
   sigset_t none;
   sigemptyset(&none);
   sigprocmask(SIG_SETMASK, &none, nullptr);
@@ -618,9 +702,11 @@ void Keeper::tellPrograms() {
 
 // ---- afterwards
 
-// Past its time limit nothing of a run goes on.
+// Past its time limit nothing of a run goes on, nor when somebody has killed its process: what it
+// has started could neither be seen then nor stopped, and the next run would start beside it.
 void Keeper::endWhatIsLeft() {
-  if (run_.outcome != Outcome::kTimeLimit || processFile_ >= 0) return;
+  const bool isToEnd = run_.outcome == Outcome::kTimeLimit || run_.outcome == Outcome::kLost;
+  if (!isToEnd || processFile_ >= 0) return;
   ProcessTree left(getpid(), {teller_});
   left.signal(SIGTERM);
   const double until = seconds() + kGrace;
@@ -631,11 +717,13 @@ void Keeper::endWhatIsLeft() {
   }
 }
 
+// The sweep leaves a run alone while its keeper is there, which another process is not.
 void Keeper::drain() {
+  if (isLeftToSweep() && fork() > 0) return;
   const double until = seconds() + kDrain;
   malloc_trim(0);
-  while (pipe_ >= 0 && seconds() < until) {
-    pump(static_cast<int>((until - seconds()) * 1000) + 1);
+  while ((pipe_ >= 0 || isCopyHeldUp()) && seconds() < until) {
+    pump(millisecondsUntil(until));
   }
 }
 

@@ -52,20 +52,17 @@ class RunCheck {
 
   void judgeLastRuns(const KeptDatabase &kept) {
     bool isWell = true;
-    for (const KeptRun &run : lastRuns(kept)) {
+    for (const KeptRun &run : lastRuns(kept, LastRun::kEnded)) {
       const TaskRecord *const task = enabledTask(run.task);
-      const bool isMeant = run.outcome == Outcome::kStopped || run.outcome == Outcome::kCancelled;
-      if (task == nullptr || !isBad(run) || isMeant) continue;
+      if (task == nullptr || !isBad(run)) continue;
       const int64_t moment = run.start ? *run.start : run.queued.value_or(run.end.value_or(0));
-      const bool isAcknowledged =
-          run.generation && acknowledgedAt(kept, *run.generation) >= run.end.value_or(moment);
+      const bool isKnown = isAcknowledged(kept, run);
       isWell = false;
       const std::string id = std::to_string(task->ID);
-      add(isAcknowledged ? Severity::kOk : Severity::kWarning,
+      add(isKnown ? Severity::kOk : Severity::kWarning,
           run.outcome == Outcome::kGaveUp ? "gave-up" : "failed-run", *task,
           resultInWords(run) + " at " + momentInWords(moment) +
-              (isAcknowledged ? " (acknowledged)"
-                              : ": 'zelosched log " + id + "' shows what it printed"));
+              (isKnown ? " (acknowledged)" : ": 'zelosched log " + id + "' shows what it printed"));
     }
     if (isWell) findings_.push_back({Severity::kOk, "failed-run", "no task's last run failed"});
   }
@@ -104,6 +101,7 @@ class RunCheck {
     if (seconds > kDay) return true;
     RunFilter filter;
     filter.task = run.task;
+    filter.limit = 2 * kRunsCompared;  // some of them may not have run
     std::vector<double> durations;
     for (const KeptRun &before : runsOf(kept, filter)) {
       if (before.state == RunState::kEnded && before.duration) {
@@ -133,7 +131,7 @@ class RunCheck {
       std::string text =
           title +
           (run.state == RunState::kWaiting ? " waits for its turn since " : " is running since ") +
-          momentInWords(since) + " as process " + std::to_string(run.process.pid);
+          momentInWords(since);
       if (isTooLong) {
         text += ", which is unusually long: 'zelosched log --follow " + std::to_string(run.task) +
                 "' shows what it prints, 'zelosched stop " + std::to_string(run.task) + "' ends it";

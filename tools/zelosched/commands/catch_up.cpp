@@ -48,7 +48,7 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
     request.isDisabledSkipped = true;
     const StartedRun run(*missed.task, request);
     // The run may have to wait for its turn, unrecorded so far.
-    acknowledge(KeptDatabase(KeptDatabase::kChange), missed.task->ID);
+    acknowledge(KeptDatabase(KeptDatabase::kChange), missed.task->ID, Acknowledged::kMissed);
   }
   std::printf("%s was due at %s: %s\n", titleOf(*missed.task).c_str(),
               minuteText(localMinute(missed.due)).c_str(),

@@ -128,7 +128,9 @@ std::string dayInBrief(const LocalMinute &minute, const LocalMinute &now) {
   constexpr int kYear = 365;
   if ((minute.day - now.day).count() >= kYear) return dayText(minute);
   const std::chrono::year_month_day date(minute.day);
-  return std::to_string(unsigned{date.day()}) + " " + kMonths[unsigned{date.month()} - 1];
+  const auto day = static_cast<unsigned>(date.day());
+  const auto month = static_cast<unsigned>(date.month());
+  return std::to_string(day) + " " + kMonths[month - 1];
 }
 
 // "Mon 08:30", or the day of one that is a week away: it is the first of that day, whose time the

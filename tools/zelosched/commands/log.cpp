@@ -24,6 +24,7 @@ namespace {
 constexpr Option kOptions[] = {{"run", Option::kValue}, {"follow", Option::kNone, 'f'}, {"json"}};
 constexpr int64_t kMostRun = int64_t{1} << 62;
 constexpr std::chrono::milliseconds kPause(100);
+constexpr std::chrono::seconds kSweepPause(1);
 
 std::string leftOutLine(int64_t bytes) {
   return "\n[" + std::to_string(bytes) + " bytes are left out here]\n";
@@ -36,6 +37,7 @@ KeptRun chooseRun(int64_t id, std::optional<int64_t> number) {
     filter.run = number;
   } else {
     filter.task = id;
+    filter.until = static_cast<int64_t>(time(nullptr));  // later ones are of a clock that was wrong
   }
   filter.limit = 1;
   const std::vector<KeptRun> runs = keptRuns(filter);
@@ -47,11 +49,22 @@ KeptRun chooseRun(int64_t id, std::optional<int64_t> number) {
   throw Failure(titleOf(*task) + " has not run yet");
 }
 
-bool isUnderWay(int64_t number) {
+bool isUnderWay(int64_t number, ProcessName *keeper) {
   RunFilter filter;
   filter.run = number;
   filter.underWay = true;
-  return !keptRuns(filter).empty();
+  const std::vector<KeptRun> runs = keptRuns(filter);
+  if (!runs.empty()) *keeper = runs.front().keeper;
+  return !runs.empty();
+}
+
+// Without its keeper nobody says that a run has ended.
+void sweepWithoutKeeper(const ProcessName &keeper) {
+  if (geteuid() != 0 || isAlive(keeper)) return;
+  try {
+    sweepRuns();
+  } catch (const Failure &) {  // the next time, perhaps
+  }
 }
 
 void requireWritten(const RunOutput &output) {
@@ -67,6 +80,8 @@ void showOutput(const Output &printed, RunOutput *output) {
 
 void follow(const KeptRun &run, const OutputFile &file, RunOutput *output) {
   int64_t shown = 0;
+  ProcessName keeper = run.keeper;
+  auto nextSweep = std::chrono::steady_clock::now();
   for (bool isLast = false;; std::this_thread::sleep_for(kPause)) {
     int64_t lost = 0;
     const int64_t total = file.total();
@@ -75,7 +90,11 @@ void follow(const KeptRun &run, const OutputFile &file, RunOutput *output) {
     output->show(bytes);
     shown = std::max(total, shown + lost + static_cast<int64_t>(bytes.size()));
     if (isLast || !output->fault().empty()) break;
-    isLast = !isUnderWay(run.run);
+    if (std::chrono::steady_clock::now() >= nextSweep) {
+      sweepWithoutKeeper(keeper);
+      nextSweep = std::chrono::steady_clock::now() + kSweepPause;
+    }
+    isLast = !isUnderWay(run.run, &keeper);
   }
   output->finish();
 }

@@ -49,35 +49,42 @@ Task loadRemovable(int64_t id, const RemoveRules &rules) {
 }
 
 // A run that waits for its turn must not begin when the task is gone: neither one from before, nor
-// one that read the task just then.
-void removeAndTell(const ZELO_SCHED_TASK &task, const RemoveRules &rules) {
-  const std::string title = titleOf(task);
-  cancelWaitingOf(task);
+// one that read the task just then. What goes on is looked after when others may change tasks
+// again.
+void removeAndCancel(const ZELO_SCHED_TASK &task) {
+  const int before = attempt([&] { cancelWaitingOf(task); });
   removeTask(task);
-  std::printf("%s removed\n", title.c_str());
+  std::printf("%s removed\n", titleOf(task).c_str());
   cancelWaitingOf(task);
-  if (rules.stops) {
-    stopTask(task.ID, "a run of it");
-  } else {
-    tellOfRunsOf(task);
-  }
+  if (before != kDone) throw Failure("a run of it that waited may start all the same");
 }
 
 // The lock is not held while an answer is waited for.
-void askAndRemove(int64_t id, const RemoveRules &rules) {
-  const Task task = loadRemovable(id, rules);
+Task askAndRemove(int64_t id, const RemoveRules &rules) {
+  Task task = loadRemovable(id, rules);
   if (!isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");
   const ChangeLock lock;
   if (!isSame(*task, *loadTask(id))) {
     throw Failure(titleOf(*task) + " stays: it has been changed meanwhile");
   }
-  removeAndTell(*task, rules);
+  removeAndCancel(*task);
+  return task;
+}
+
+Task removeUnasked(int64_t id, const RemoveRules &rules) {
+  const ChangeLock lock;
+  Task task = loadRemovable(id, rules);
+  removeAndCancel(*task);
+  return task;
 }
 
 void removeOne(int64_t id, const RemoveRules &rules) {
-  if (!rules.isSure) return askAndRemove(id, rules);
-  const ChangeLock lock;
-  removeAndTell(*loadRemovable(id, rules), rules);
+  const Task task = rules.isSure ? removeUnasked(id, rules) : askAndRemove(id, rules);
+  if (rules.stops) {
+    stopTask(task->ID, "a run of it");
+  } else {
+    tellOfRunsOf(*task);
+  }
 }
 
 }  // namespace

@@ -80,10 +80,11 @@ int acknowledgeAll(const Arguments &arguments) {
   sweepRuns();  // which notes the tasks that nobody has looked at so far
   const KeptDatabase kept(KeptDatabase::kChange);
   if (arguments.operands().empty()) {
-    acknowledge(kept, std::nullopt);
+    acknowledge(kept, std::nullopt, Acknowledged::kAll);
     return kDone;
   }
-  for (const int64_t id : parseIds(arguments.operands())) acknowledge(kept, loadTask(id)->ID);
+  for (const int64_t id : parseIds(arguments.operands()))
+    acknowledge(kept, loadTask(id)->ID, Acknowledged::kAll);
   return kDone;
 }
 

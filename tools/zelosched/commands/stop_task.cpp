@@ -60,12 +60,23 @@ void tellOfRunsOf(const TaskRecord &task) {
 
 void cancelWaitingOf(const TaskRecord &task) {
   if (geteuid() != 0 || isPower(task)) return;
-  attempt([&] {
-    std::vector<KeptRun> runs = runsToStop(task.ID);
-    std::erase_if(runs, [](const KeptRun &run) { return run.state != RunState::kWaiting; });
-    if (!runs.empty()) noteStop(&runs);
-    for (const KeptRun &run : runs) {
-      if (cancelWaiting(run.process)) tell("a run of it", Stopped::kCancelled);
-    }
+  std::vector<KeptRun> runs;
+  try {
+    RunFilter filter;
+    filter.task = task.ID;
+    filter.underWay = true;
+    runs = keptRuns(filter);
+  } catch (const Failure &failure) {
+    throw Failure(
+        std::string("whether a run of it waits for its turn, and may still start, cannot be "
+                    "told: ") +
+        failure.what());
+  }
+  std::erase_if(runs, [](const KeptRun &run) {
+    return run.state != RunState::kWaiting || !isAlive(run.process);
   });
+  if (!runs.empty()) noteStop(&runs);
+  for (const KeptRun &run : runs) {
+    if (cancelWaiting(run.process)) tell("a run of it", Stopped::kCancelled);
+  }
 }

@@ -79,14 +79,16 @@ constexpr const char *kDays[kDaysOfWeek] = {"sun", "mon", "tue", "wed", "thu", "
 
 // ---- writing --------------------------------------------------------------------------------
 
-std::string formatted(const char *format, uint32_t a, uint32_t b, uint32_t c = 0) {
+std::string clockText(uint32_t hour, uint32_t minute) {
   char text[64];
-  std::snprintf(text, sizeof text, format, a, b, c);
+  std::snprintf(text, sizeof text, "%02u:%02u", hour, minute);
   return text;
 }
 
 std::string dateText(uint32_t year, uint32_t month, uint32_t day) {
-  return formatted("%04u-%02u-%02u", year, month, day);
+  char text[64];
+  std::snprintf(text, sizeof text, "%04u-%02u-%02u", year, month, day);
+  return text;
 }
 
 bool dateExists(uint32_t year, uint32_t month, uint32_t day) {
@@ -129,7 +131,7 @@ Json::Value daysOf(const ZELO_SCHED_TASK &task) {
 Json::Value scheduleOf(const ZELO_SCHED_TASK &task) {
   Json::Value schedule(Json::objectValue);
   schedule["type"] = typeName(task);
-  schedule["at"] = formatted("%02u:%02u", task.RunHour, task.RunMin);
+  schedule["at"] = clockText(task.RunHour, task.RunMin);
   if (task.Type == ZELO_SCHED_TYPE_ONCE) {
     schedule["date"] = dateText(task.StartYear, task.StartMonth, task.StartDay);
   } else {
@@ -648,7 +650,7 @@ Json::Value powerTimeOf(const ZELO_SCHED_TASK &task, const std::optional<LocalMi
   object["power"] = directionOf(task);
   object["enabled"] = isEnabled(task);
   object["days"] = daysOf(task);
-  object["at"] = formatted("%02u:%02u", task.RunHour, task.RunMin);
+  object["at"] = clockText(task.RunHour, task.RunMin);
   object["next"] = minuteOrNull(next);
   return object;
 }

@@ -31,8 +31,7 @@ constexpr char kUpdate[] =
 
 // The sweep's row of the same run.
 constexpr char kGiveWay[] =
-    "DELETE FROM run WHERE start = ? AND status_id = ? AND pid = ? AND task = ? AND app = ?"
-    " AND run <> ?";
+    "DELETE FROM run WHERE start = ? AND status_id = ? AND pid = ? AND task = ? AND run <> ?";
 
 template <class Enum>
 Enum enumOf(int64_t number, Enum last) {
@@ -117,6 +116,7 @@ std::string conditionOf(const KeptDatabase &kept, const RunFilter &filter,
   }
   if (filter.run) add(" AND run = ?", *filter.run);
   if (filter.since) add(" AND moment >= ?", *filter.since);
+  if (filter.until) add(" AND moment <= ?", *filter.until);
   if (filter.failed) {
     condition += " AND state = 2 AND outcome <> ";
     condition += std::to_string(static_cast<int>(Outcome::kFinished));
@@ -183,10 +183,8 @@ ProcessName processOf(const Run &row) {
 }
 
 bool isKnown(const KeptDatabase &kept, const Run &row) {
-  Query query(kept,
-              "SELECT 1 FROM run WHERE start = ? AND status_id = ? AND pid = ?"
-              " AND task = ? AND app = ?");
-  query.with(row.start).with(row.statusId).with(row.pid).with(row.taskId).with(row.app);
+  Query query(kept, "SELECT 1 FROM run WHERE start = ? AND status_id = ? AND pid = ? AND task = ?");
+  query.with(row.start).with(row.statusId).with(row.pid).with(row.taskId);
   const bool isThere = query.next();
   if (isThere) query.next();
   return isThere;
@@ -211,13 +209,20 @@ std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter) {
   return runs;
 }
 
-std::vector<KeptRun> lastRuns(const KeptDatabase &kept) {
+std::vector<KeptRun> lastRuns(const KeptDatabase &kept, LastRun which) {
   std::vector<KeptRun> runs;
   if (!kept.isThere()) return runs;
-  Query query(kept, "SELECT " COLUMNS
-                    " FROM run WHERE run IN (SELECT (SELECT run FROM run WHERE"
-                    " run.generation = task.generation ORDER BY moment DESC, run DESC LIMIT 1)"
-                    " FROM task WHERE removed IS NULL)");
+  const std::string ended = " AND state = 2 AND outcome NOT IN (" +
+                            std::to_string(static_cast<int>(Outcome::kStopped)) + ", " +
+                            std::to_string(static_cast<int>(Outcome::kCancelled)) + ")";
+  const std::string sql =
+      "SELECT " COLUMNS
+      " FROM run WHERE run IN (SELECT (SELECT run FROM run WHERE"
+      " run.generation = task.generation AND moment <= ?" +
+      (which == LastRun::kEnded ? ended : "") +
+      " ORDER BY moment DESC, run DESC LIMIT 1) FROM task WHERE removed IS NULL)";
+  Query query(kept, sql.c_str());
+  query.with(static_cast<int64_t>(time(nullptr)));
   while (query.next()) runs.push_back(runOf(query));
   return runs;
 }
@@ -238,7 +243,7 @@ void saveRun(const KeptDatabase &kept, KeptRun *run) {
   if (run->start && run->statusId) {
     Query giveWay(kept, kGiveWay);
     giveWay.with(*run->start).with(*run->statusId).with(run->process.pid).with(run->task);
-    giveWay.with(run->app).with(run->run).run();
+    giveWay.with(run->run).run();
   }
   if (!run->generation) run->generation = generationOf(kept, run->task);
   if (run->run != 0) {

@@ -49,16 +49,20 @@ struct RunFilter {
   std::optional<int64_t> task;  // its runs, without those of a removed one that had its id
   std::optional<int64_t> run;
   std::optional<int64_t> since;  // moments
-  bool failed = false;           // those alone that did not end well
-  bool underWay = false;         // those alone that have not ended
-  int64_t limit = -1;            // none for a negative one
+  std::optional<int64_t> until;
+  bool failed = false;    // those alone that did not end well
+  bool underWay = false;  // those alone that have not ended
+  int64_t limit = -1;     // none for a negative one
 };
 
 // Newest first. Each of these throws Failure.
 std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter);
 
-// The last run of each task of today: one row a task, however many runs there are.
-std::vector<KeptRun> lastRuns(const KeptDatabase &kept);
+// The last run of each task of today: one row a task, however many runs there are; the last of all,
+// or of those that have ended and that nobody has stopped or cancelled. One in the future was
+// recorded by a clock that was wrong.
+enum class LastRun { kOfAll, kEnded };
+std::vector<KeptRun> lastRuns(const KeptDatabase &kept, LastRun which = LastRun::kOfAll);
 
 // How many runs ended in which way.
 std::map<Outcome, int64_t> countByOutcome(const KeptDatabase &kept);

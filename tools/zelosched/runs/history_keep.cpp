@@ -70,17 +70,31 @@ bool isProcessAlive(const KeptRun &run) {
          isAlive(processNamed(run.process.pid));
 }
 
+// The column of the status database takes a name that reads as a number for one: 007 is 7 there.
+bool isSameApp(const std::string &app, const std::string &recorded) {
+  if (app == recorded) return true;
+  char *end = nullptr;
+  const double number = std::strtod(app.c_str(), &end);
+  char *endOfRecorded = nullptr;
+  const double numberRecorded = std::strtod(recorded.c_str(), &endOfRecorded);
+  return !app.empty() && *end == '\0' && !recorded.empty() && *endOfRecorded == '\0' &&
+         std::abs(number - numberRecorded) <= 0;
+}
+
 const TaskRecord *Sweep::taskOf(const KeptRun &run) const {
   const auto &tasks = list_.tasks();
   const auto found = std::find_if(tasks.begin(), tasks.end(), [&](const TaskRecord *task) {
-    return task->ID == run.task && task->App == run.app;
+    return task->ID == run.task && isSameApp(task->App, run.app);
   });
   return found == tasks.end() ? nullptr : *found;
 }
 
 void Sweep::describe(KeptRun *run) const {
   const TaskRecord *const task = taskOf(*run);
-  if (task != nullptr) run->taskName = task->Name;
+  if (task == nullptr) return;
+  run->taskName = task->Name;
+  run->app = task->App;
+  run->owner = userName(task->Owner);
 }
 
 void Sweep::save(const KeptDatabase &kept, KeptRun *run) {
@@ -108,6 +122,7 @@ void Sweep::takeOver(const KeptDatabase &kept, const Run &row) {
   takeStatus(row, &run);
   describe(&run);
   if (run.state == RunState::kRunning) run.process = processOf(row);
+  // Of runs that other programs have started only what nobody else sees is told.
   run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
   save(kept, &run);
 }
@@ -177,6 +192,7 @@ void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
     run.outcome = Outcome::kLost;
     run.state = RunState::kEnded;
   }
+  if (run.trigger == Trigger::kOther && !run.isTold) run.isTold = run.outcome != Outcome::kLost;
   // What its keeper had read by the time when that was killed.
   OutputFile printed = OutputFile::open(run.process);
   run.outputBytes = std::max(run.outputBytes, printed.total());
@@ -271,9 +287,20 @@ void tellOfMissedRuns() {
   for (const RunRecord &record : untold) tellOfMissed(record);
 }
 
+void forgetUntold() {
+  const KeptDatabase kept(KeptDatabase::kRead);
+  if (!kept.isThere()) return;
+  takeUntold(kept);
+  takeUntoldMissed(kept, TaskList(TaskList::Unreadable::kIsLeftOut));
+}
+
 // What an administrator's programs need, such as a mailer, the unit of the sweep does not have.
 void haveRunsToldOf() {
-  if (!isAnybodyToBeTold()) return;
+  // Whoever is to be told from now on need not hear of what was long before.
+  if (!isAnybodyToBeTold()) {
+    forgetUntold();
+    return;
+  }
   if (isUnit()) {
     startDetached(ownProgram(), {"history", "--tell"});
   } else {

@@ -56,7 +56,8 @@ constexpr char kSchema[] =
     // `began`: when the machine was started, by the clock of the last look.
     "CREATE TABLE boot(boot TEXT PRIMARY KEY, started INTEGER, began INTEGER NOT NULL,"
     " seen INTEGER NOT NULL, clock_from INTEGER, clock_until INTEGER) WITHOUT ROWID;"
-    "CREATE TABLE acknowledged(generation INTEGER PRIMARY KEY, moment INTEGER NOT NULL);"
+    "CREATE TABLE acknowledged(generation INTEGER PRIMARY KEY, moment INTEGER NOT NULL,"
+    " run INTEGER NOT NULL);"
     "PRAGMA user_version = 2;";
 
 // The numbers in the last two are RunState, Outcome and Trigger of run_record.h. Of the runs of

@@ -71,6 +71,22 @@ std::vector<Span> unjudgedSpans(const KeptDatabase &kept) {
   return spans;
 }
 
+// In which the machine was on, as far as is known.
+std::vector<Span> spansUp(const KeptDatabase &kept, int64_t now) {
+  std::vector<Span> spans;
+  const std::string current = bootId();
+  Query query(kept, "SELECT boot, began, seen FROM boot");
+  while (query.next()) {
+    spans.push_back({query.number(1), query.text(0) == current ? now : query.number(2)});
+  }
+  return spans;
+}
+
+bool isIn(const std::vector<Span> &spans, time_t moment) {
+  return std::any_of(spans.begin(), spans.end(),
+                     [&](const Span &span) { return moment >= span.from && moment < span.until; });
+}
+
 // Up to which moment a time that was passed over counts as missed.
 int64_t judgedUntil(const KeptDatabase &kept, int64_t now) {
   const std::optional<Boot> boot = bootOf(kept, bootId());
@@ -83,6 +99,7 @@ class Judge {
   Judge(const KeptDatabase &kept, const TaskList &list, int64_t since, int64_t now)
       : off_(list),
         unjudged_(unjudgedSpans(kept)),
+        up_(spansUp(kept, now)),
         notes_(taskNotes(kept)),
         lastRun_(kept, "SELECT max(moment) FROM run WHERE generation = ? AND moment <= ?"),
         acknowledged_(kept, "SELECT moment FROM acknowledged WHERE generation = ?"),
@@ -117,11 +134,9 @@ class Judge {
   void judge(const LocalMinute &minute, MissedTask *missed) const {
     const std::optional<time_t> due = momentOf(minute);
     if (!due) return;
-    const bool isUnjudged = std::any_of(unjudged_.begin(), unjudged_.end(), [&](const Span &span) {
-      return *due >= span.from && *due < span.until;
-    });
-    if (isUnjudged) return;
-    if (off_.isOffAt(minute)) {
+    if (isIn(unjudged_, *due)) return;
+    // Somebody may have switched it on between its power times.
+    if (off_.isOffAt(minute) && !isIn(up_, *due)) {
       ++missed->planned;
     } else {
       ++missed->times;
@@ -131,6 +146,7 @@ class Judge {
 
   PlannedOff off_;
   std::vector<Span> unjudged_;
+  std::vector<Span> up_;
   std::map<int64_t, TaskNote> notes_;
   Query lastRun_;
   Query acknowledged_;
@@ -187,18 +203,20 @@ std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &li
   return found;
 }
 
-void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task) {
+void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task, Acknowledged what) {
   Transaction transaction(kept);
-  Query note(
-      kept,
-      "INSERT OR REPLACE INTO acknowledged(generation, moment)"
-      " SELECT generation, ?1 FROM task WHERE removed IS NULL AND (?2 IS NULL OR task = ?2)");
-  note.with(epoch()).with(task).run();
+  Query note(kept,
+             "INSERT INTO acknowledged(generation, moment, run) SELECT generation, ?1,"
+             " iif(?3, (SELECT coalesce(max(run), 0) FROM run), 0)"
+             " FROM task WHERE removed IS NULL AND (?2 IS NULL OR task = ?2)"
+             " ON CONFLICT DO UPDATE SET moment = excluded.moment, run = max(run, excluded.run)");
+  note.with(epoch()).with(task).with(what == Acknowledged::kAll ? int64_t{1} : int64_t{0}).run();
   transaction.commit();
 }
 
-int64_t acknowledgedAt(const KeptDatabase &kept, int64_t generation) {
-  Query query(kept, "SELECT moment FROM acknowledged WHERE generation = ?");
-  query.with(generation);
-  return query.next() ? query.number(0) : 0;
+bool isAcknowledged(const KeptDatabase &kept, const KeptRun &run) {
+  if (!run.generation) return false;
+  Query query(kept, "SELECT run FROM acknowledged WHERE generation = ?");
+  query.with(*run.generation);
+  return query.next() && query.number(0) >= run.run;
 }

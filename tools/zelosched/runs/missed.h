@@ -7,6 +7,7 @@
 #include <optional>
 #include <vector>
 
+#include "runs/history.h"
 #include "runs/kept_database.h"
 #include "store/task_list.h"
 
@@ -34,9 +35,9 @@ struct MissedTask {
 // Throws Failure.
 std::vector<MissedTask> missedTasks(const KeptDatabase &kept, const TaskList &list, time_t since);
 
-// From now on nothing is told of what became of the runs of this task, or of all, so far.
-// Throws Failure.
-void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task);
+// What somebody has taken note of, and is warned of no more: missed times, or also the runs so far.
+enum class Acknowledged { kMissed, kAll };
 
-// When that was last said of a task; 0 when it never was.
-int64_t acknowledgedAt(const KeptDatabase &kept, int64_t generation);
+// Of this task, or of all. Throws Failure.
+void acknowledge(const KeptDatabase &kept, std::optional<int64_t> task, Acknowledged what);
+bool isAcknowledged(const KeptDatabase &kept, const KeptRun &run);

@@ -188,9 +188,9 @@ void run(const std::string &program, const Environment &environment) {
   const pid_t pid = start(program, environment);
   if (pid == 0) return;
   const bool isDone = waitForEnd(pid);
-  // What it has left running in its group ends too; the group lives on as long as its leader has
-  // not been waited for.
-  kill(-pid, SIGKILL);
+  // With all its group, which lives on as long as its leader has not been waited for. What a
+  // program that ended in time has left in the background, such as a delivery, goes on.
+  if (!isDone) kill(-pid, SIGKILL);
   int status = 0;
   while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
   }

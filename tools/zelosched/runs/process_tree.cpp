@@ -36,6 +36,12 @@ ProcessTree::ProcessTree(pid_t root, std::set<pid_t> spared)
 ProcessTree::ProcessTree(pid_t root, std::set<pid_t> spared, std::set<pid_t> passedOver)
     : root_(root), spared_(std::move(spared)), passedOver_(std::move(passedOver)) {}
 
+// A keeper's child that tells of the end of its run, with the programs below it.
+bool ProcessTree::isOfKeeper(pid_t pid) const {
+  return !passedOver_.empty() && passedOver_.count(pid) == 0 && isOfRoot(pid) &&
+         isOfSameProgram(pid, root_);
+}
+
 size_t ProcessTree::look() {
   const std::map<pid_t, ProcessStat> all = processes();
   std::multimap<pid_t, pid_t> childrenOf;
@@ -49,6 +55,7 @@ size_t ProcessTree::look() {
     for (auto child = first; child != last; ++child) {
       const pid_t pid = child->second;
       if (spared_.count(pid) != 0 || pid == getpid()) continue;
+      if (parent == root_ && isOfKeeper(pid)) continue;
       pending.push_back(pid);
       if (passedOver_.count(pid) == 0 && !isEnded(all.at(pid))) there.insert(pid);
     }

@@ -12,7 +12,8 @@ class ProcessTree {
  public:
   // Those below `root`, without it, without `spared` ones and what is below these.
   explicit ProcessTree(pid_t root, std::set<pid_t> spared = {});
-  // Without these, but with what is below them.
+  // Of a keeper: without the run's own process, but with what is below it, and without what the
+  // keeper has started to tell of the run's end.
   ProcessTree(pid_t root, std::set<pid_t> spared, std::set<pid_t> passedOver);
 
   // How many there are by now.
@@ -25,6 +26,8 @@ class ProcessTree {
   void killAll();
 
  private:
+  bool isOfKeeper(pid_t pid) const;
+
   pid_t root_;
   std::set<pid_t> spared_;
   std::set<pid_t> passedOver_;

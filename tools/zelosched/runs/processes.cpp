@@ -68,13 +68,27 @@ std::map<pid_t, ProcessStat> children() {
   return found;
 }
 
-bool hasChild(pid_t pid) {
+std::vector<pid_t> childrenOf(pid_t pid) {
+  std::vector<pid_t> found;
   const std::string number = std::to_string(pid);
   const std::string list = "/proc/" + number + "/task/" + number + "/children";
-  if (access(list.c_str(), F_OK) == 0) return !textOf(list).empty();
+  if (access(list.c_str(), F_OK) == 0) {
+    std::istringstream numbers(textOf(list));
+    for (pid_t child; numbers >> child;) found.push_back(child);
+    return found;
+  }
   const std::map<pid_t, ProcessStat> all = processes();
-  return std::any_of(all.begin(), all.end(),
-                     [&](const auto &process) { return process.second.parent == pid; });
+  for (const auto &[child, stat] : all) {
+    if (stat.parent == pid) found.push_back(child);
+  }
+  std::stable_sort(found.begin(), found.end(), [&](pid_t one, pid_t other) {
+    return all.at(one).started < all.at(other).started;
+  });
+  return found;
+}
+
+bool hasChild(pid_t pid) {
+  return !childrenOf(pid).empty();
 }
 
 bool isOfRoot(pid_t pid) {
@@ -94,11 +108,15 @@ bool isOver(pid_t pid) {
   return statOf(std::to_string(pid)).state == 'Z';
 }
 
+bool isOfSameProgram(pid_t pid, pid_t other) {
+  struct stat one = {};
+  struct stat two = {};
+  const auto programOf = [](pid_t process) { return "/proc/" + std::to_string(process) + "/exe"; };
+  if (stat(programOf(pid).c_str(), &one) != 0) return errno == EACCES || errno == EPERM;
+  return stat(programOf(other).c_str(), &two) == 0 && one.st_dev == two.st_dev &&
+         one.st_ino == two.st_ino;
+}
+
 bool isOfOurProgram(pid_t pid) {
-  struct stat ours = {};
-  struct stat theirs = {};
-  const std::string directory = "/proc/" + std::to_string(pid);
-  if (stat((directory + "/exe").c_str(), &theirs) != 0) return errno == EACCES || errno == EPERM;
-  return stat("/proc/self/exe", &ours) == 0 && ours.st_dev == theirs.st_dev &&
-         ours.st_ino == theirs.st_ino;
+  return isOfSameProgram(pid, getpid());
 }

@@ -4,11 +4,12 @@
 #include <sys/types.h>
 
 #include <map>
+#include <vector>
 
 struct ProcessStat {
   char state = '\0';  // as ps shows it
   pid_t parent = 0;
-  unsigned long long started = 0;
+  unsigned long long started = 0;  // in clock ticks since the boot; 0 of one that is not there
 };
 
 ProcessStat statOf(pid_t pid);
@@ -18,6 +19,8 @@ std::map<pid_t, ProcessStat> processes();
 // Ours. Throws Failure.
 std::map<pid_t, ProcessStat> children();
 
+// Those of another process, in the order in which they began.
+std::vector<pid_t> childrenOf(pid_t pid);
 bool hasChild(pid_t pid);
 
 // What a command leaves behind becomes ours, and may be older than the next run's process. But it
@@ -28,6 +31,7 @@ bool isOfRoot(pid_t pid);
 // other. A set-uid program that a command has started is of root too. True also where we may not
 // look, as in a container without CAP_SYS_PTRACE.
 bool isOfOurProgram(pid_t pid);
+bool isOfSameProgram(pid_t pid, pid_t other);
 
 // Whether it has ended, and waits for its parent to ask how. It has no program any more.
 bool isOver(pid_t pid);

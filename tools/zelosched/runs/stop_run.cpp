@@ -98,10 +98,16 @@ Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds gr
 }
 
 // Of such a row the history knows better: a run whose process was killed leaves one that says that
-// it goes on, and its number may be another process's by now.
+// it goes on, and its number may be another process's by now, of another run even.
 bool isInHistory(const Run &row) {
   const KeptDatabase kept(KeptDatabase::kRead);
-  return kept.isThere() && isKnown(kept, row);
+  if (!kept.isThere()) return false;
+  RunFilter filter;
+  filter.underWay = true;
+  const std::vector<KeptRun> underWay = runsOf(kept, filter);
+  return isKnown(kept, row) ||
+         std::any_of(underWay.begin(), underWay.end(),
+                     [&](const KeptRun &run) { return run.process.pid == row.pid; });
 }
 
 }  // namespace
@@ -114,9 +120,9 @@ bool cancelWaiting(const ProcessName &process) {
     if (!own.send(SIGSTOP) || !hasStopped(pid)) break;
     try {
       if (hasChild(pid) || hasRow(pid)) break;
-      own.send(SIGKILL);
-      own.waitForEnd(std::chrono::seconds(10));
-      return true;
+      own.send(i == 0 ? kSignalOfCancelling : SIGKILL);
+      own.send(SIGCONT);
+      if (own.waitForEnd(i == 0 ? kPause * 20 : std::chrono::milliseconds(10000))) return true;
     } catch (const Failure &) {  // it was just about to write its row
       own.send(SIGCONT);
       std::this_thread::sleep_for(kPause);

@@ -2,9 +2,13 @@
 #pragma once
 
 #include <chrono>
+#include <csignal>
 #include <cstdint>
 
 #include "runs/history.h"
+
+// By which the keeper tells a run that was cancelled from one that somebody else has killed.
+inline constexpr int kSignalOfCancelling = SIGUSR2;
 
 // Ends a run that still waits for its turn. False when its command has begun, or it is over.
 bool cancelWaiting(const ProcessName &process);
