@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <climits>
 #include <cstdio>
 #include <cstring>
 #include <ctime>
@@ -620,6 +621,20 @@ class AddRecordTest : public StatusDatabaseTest {
   }
   ZELO_SCHED_TASK task_ = {};
 };
+
+// Where long has 32 bits, the caller gets the last time that it can say.
+TEST_F(AddRecordTest, ARunBefore1970AndAfter2038HasItsTime) {
+  for (const int64_t start : {int64_t{-86400}, int64_t{2147483648}, int64_t{4294967297}}) {
+    support::setClock(static_cast<time_t>(start));
+    task_.ID += 1;
+    EXPECT_EQ(ZELOSchedDBAddRecord(db(), &task_, nullptr), 0);
+    EXPECT_EQ(support::statusRows().back().timestamp, start);
+    long told = 0;
+    int code = 0;
+    EXPECT_EQ(ZELOSchedDBGetStatusByTaskID(db(), task_.ID, &told, &code, nullptr, 0), 1);
+    EXPECT_EQ(told, std::min<int64_t>(start, LONG_MAX));
+  }
+}
 
 TEST_F(AddRecordTest, ItsArgumentsAreNeeded) {
   EXPECT_EQ(ZELOSchedDBAddRecord(nullptr, nullptr, nullptr), -1);

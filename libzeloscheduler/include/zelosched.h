@@ -38,6 +38,12 @@
  *     process such a name is a failure (0x0900). A program with a "/tmp" of its
  *     own (systemd's PrivateTmp, a container) must not use the library: it would
  *     write a crontab for tasks that cron's machine does not have.
+ * 11. Width. No record and no call depends on the width of time_t or off_t: a
+ *     program may be built with any. Where long has 32 bits (armhf), ids as
+ *     arguments and the times that ZELOSchedDBGetStatusByTaskID gives have so
+ *     many: a run after January 2038 is given LONG_MAX, while the database and
+ *     all else have its time. ZELO_SCHED_STATUS.timestamp has 32 bits everywhere
+ *     and is filled by no call.
  */
 #ifndef ZELOSCHED_H
 #define ZELOSCHED_H
