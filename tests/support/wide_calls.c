@@ -9,10 +9,6 @@
 #include <stddef.h>
 #include <string.h>
 
-#if __SIZEOF_LONG__ > 4
-#error "only where long has 32 bits"
-#endif
-
 static const struct {
   const char *name;
   const char *symbol;
