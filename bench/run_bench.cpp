@@ -11,9 +11,14 @@
 #include <zelocore.h>
 #include <zelosched.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
+#include <iterator>
+#include <sstream>
+#include <string>
 #include <vector>
 
 #include "support/row.h"
@@ -138,6 +143,38 @@ void runWithoutKeeper() {
   awaitCommand();
 }
 
+// Empty when there is none.
+std::string contentsOf(const std::string &path) {
+  std::ifstream file(path);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
+
+// 0 for a process that has ended.
+size_t anonymousBytes(const std::string &process) {
+  constexpr char kLabel[] = "Anonymous:";
+  constexpr size_t kKiB = 1024;
+  const std::string memory = contentsOf("/proc/" + process + "/smaps_rollup");
+  const size_t place = memory.find(kLabel);
+  if (place == std::string::npos) return 0;
+  return std::stoul(memory.substr(place + strlen(kLabel))) * kKiB;
+}
+
+// What is left of zeloschedtask when that has ended is the keeper, a child of ours then.
+size_t memoryOfKeeper() {
+  awaitAll();
+  startProgram({ZELO_BIN_DIR "/zeloschedtask", "--run", "id=1", "--now"});
+  while (!isRunning()) {
+  }
+  const std::string self = std::to_string(getpid());
+  std::istringstream children(contentsOf("/proc/self/task/" + self + "/children"));
+  size_t most = 0;
+  for (std::string child; children >> child;) most = std::max(most, anonymousBytes(child));
+  orDie(most > 0, "finding the keeper");
+  awaitCommand();
+  awaitAll();
+  return most;
+}
+
 // This program, as what starts a run without a keeper.
 __attribute__((constructor)) void startWhenAsked(int argc, char **argv) {
   if (argc == 2 && strcmp(argv[1], kWithoutKeeper) == 0) {
@@ -152,6 +189,9 @@ void makeRows() {
   prctl(PR_SET_CHILD_SUBREAPER, 1);
   Row("zeloschedtask to the command", Work{runWithKeeper, nullptr, awaitAll})
       .atMost(1.3, "the same without a keeper", Work{runWithoutKeeper, nullptr, awaitAll});
+  Row("anonymous memory of a keeper", Footprint{memoryOfKeeper}).atMost(1, "1 MiB", Footprint{[] {
+                                                                          return size_t{1} << 20;
+                                                                        }});
   Row("ZELOSchedTaskRun to the command", Work{run, nullptr, awaitEnd})
       .atMost(2, "fork, /bin/sh -c true", Work{forkShell, nullptr, awaitEnd})
       .atMost(1.3, "two forks, the record, the owner, the shell",

@@ -61,8 +61,8 @@ check "creating is compared with the copies and the crontab" prints_rows create 
 check "the next trigger time is compared with the clock's calls" prints_rows trigger 10
 check "JSON is compared with JsonCpp alone" prints_rows json 3
 check "recording a run is compared with the statements alone" prints_rows status 1
-check "a run is compared with a shell that is forked" prints_rows run 2
-check "commands are compared with the library's list" prints_rows command 4
+check "a run is compared with a shell that is forked" prints_rows run 4
+check "commands are compared with the library's list" prints_rows command 5
 check "a list's memory is compared with its records and file" prints_rows memory 4
 check "the benchmarks of a program are listed" lists_benchmarks
 check "a filter that leaves no row whole is refused" refuses_half_a_row
