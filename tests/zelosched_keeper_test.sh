@@ -361,6 +361,17 @@ keeps_no_more_than_is_set() {
     fails_saying "3893 bytes that run 3 printed are not kept any more" z log 1 --run 3
 }
 
+keeps_no_more_than_is_set_of_all_tasks() {
+  clean
+  printf 'output-total = 2K\nruns-total = 4\n' >/etc/zelosched.conf
+  add 'seq 250'
+  add 'seq 250'
+  local i
+  for i in 1 2 3; do z run --wait 1 2 >/dev/null; done
+  same "$(kept "SELECT group_concat(run), sum(size) FROM output")" "5,6 1784" || return 1
+  z history --keep && same "$(kept "SELECT group_concat(run) FROM run")" 3,4,5,6
+}
+
 keeps_none_on_a_disk_that_is_nearly_full() {
   clean
   echo 'output-free = 100%' >/etc/zelosched.conf
@@ -390,6 +401,7 @@ check "a run may close its output at once" a_run_may_close_its_output
 check "an owner may open his output by its name" an_owner_writes_to_stderr_by_name
 check "a daemon that holds the pipe is read on, and is not the run's" a_daemon_does_not_keep_a_run_from_ending
 check "no more is kept than is set" keeps_no_more_than_is_set
+check "nor of all tasks together" keeps_no_more_than_is_set_of_all_tasks
 check "no output is kept on a disk that is nearly full" keeps_none_on_a_disk_that_is_nearly_full
 check "a setting that is wrong is told, and changes nothing" tells_of_a_setting_that_is_wrong
 

@@ -233,6 +233,31 @@ mails_no_success_but_the_first_again() {
   same "$(mails)" 2
 }
 
+# In words of at most 75 bytes, none of which ends within a character.
+long_names_stay_whole() {
+  put_sendmail
+  local name
+  name=$(printf 'größe€%.0s' {1..20})
+  add 'exit 3' --name "$name"
+  run 1
+  same "$(shown | sed -n 1p)" "root | scheduled task 1 ($name) failed with exit code 3 | 6" || return 1
+  python3 -c 'import base64, re, sys
+for word in re.findall(rb"=\?UTF-8\?B\?.*?\?=", open(sys.argv[1], "rb").read()):
+    assert len(word) <= 75, word
+    base64.b64decode(word[10:-2]).decode()' "$SCRATCH"/mail.*
+}
+
+says_what_became_of_it() {
+  put_sendmail
+  add 'kill -9 $$'
+  add 'exec sleep 100' --time-limit 1s
+  run 1
+  same "$(shown | sed -n 1p)" "root | scheduled task 1 (Task 1) killed by signal 9 | 6" || return 1
+  rm "$SCRATCH"/mail.*
+  run 2
+  same "$(shown | sed -n 1p)" "root | scheduled task 2 (Task 2) ended by its time limit | 6"
+}
+
 no_name_becomes_a_header() {
   put_sendmail
   add 'exit 3'
@@ -249,5 +274,7 @@ check "a failure is mailed to the owner" mails_the_owner
 check "or to a fixed address" mails_a_fixed_address
 check "not again within an hour for the same task" not_again_within_an_hour
 check "a success is mailed when it is the first again" mails_no_success_but_the_first_again
+check "a long name stays whole, in words as a header wants them" long_names_stay_whole
+check "how a run ended is said as elsewhere" says_what_became_of_it
 check "no name becomes a header" no_name_becomes_a_header
 finish

@@ -1,9 +1,9 @@
 /*
  * To be preloaded into a program: the clock stands where FAKE_TIME (seconds since
  * the epoch) says, the machine was started FAKE_UPTIME seconds before that (or, when
- * it is not set, at the beginning of November 2026), and with FAKE_PATIENCE set,
- * waiting takes no time: sleeps return at once, and each look at the monotonic clock
- * finds it ten seconds later.
+ * it is not set, when FAKE_STARTED says, or at the beginning of November 2026), and
+ * with FAKE_PATIENCE set, waiting takes no time: sleeps return at once, and each look
+ * at the monotonic clock finds it ten seconds later.
  */
 #include <dlfcn.h>
 #include <stdlib.h>
@@ -22,10 +22,11 @@ time_t time(time_t *result) {
 
 /* The first look at it finds this; it goes on from there. */
 static time_t fake_uptime(const char *fake) {
-  const time_t kStarted = 1793491200; /* 2026-11-01 */
   const char *uptime = getenv("FAKE_UPTIME");
-  return uptime != NULL ? (time_t)strtoll(uptime, NULL, 10)
-                        : (time_t)strtoll(fake, NULL, 10) - kStarted;
+  const char *started = getenv("FAKE_STARTED");
+  if (uptime != NULL) return (time_t)strtoll(uptime, NULL, 10);
+  if (started == NULL) started = "1793491200"; /* 2026-11-01 */
+  return (time_t)strtoll(fake, NULL, 10) - (time_t)strtoll(started, NULL, 10);
 }
 
 int clock_gettime(clockid_t clock, struct timespec *now) {

@@ -203,6 +203,14 @@ boot() {
   cat /proc/sys/kernel/random/uuid >"$SCRATCH/boot_id"
 }
 
+# come_up MOMENT: with the tasks put back then.
+come_up() {
+  boot
+  FAKE_STARTED=$(($(date -u -d "$1" +%s) - 40))
+  export FAKE_STARTED
+  at "$1" restore >/dev/null
+}
+
 # Not even root can move a directory away on which something is mounted. Until it is let go.
 hold() {
   rm -rf "$1"
@@ -375,8 +383,7 @@ readonly ADDED="2026-11-20 01:00:10" OFF="2026-11-20 01:00:20" ON="2026-11-20 08
 readonly LATER="2026-11-20 08:05"
 go_off() {
   at "$OFF" history --keep
-  boot
-  at "$ON" restore >/dev/null
+  come_up "$ON"
 }
 
 missed() {
@@ -389,6 +396,13 @@ before() {
 
 one_task() {
   before --daily 02:30 --name one -- true
+}
+
+# program_to_tell NAME COMMANDS: what is run when a run has ended.
+program_to_tell() {
+  install -d -m 0755 /etc/zelosched /etc/zelosched/run-ended.d
+  printf '#!/bin/sh\n%s\n' "$2" >"/etc/zelosched/run-ended.d/$1"
+  chmod 0755 "/etc/zelosched/run-ended.d/$1"
 }
 
 # What status says of the runs at a moment.

@@ -2,6 +2,10 @@
 
 #include <algorithm>
 
+std::string sentenceOf(const Finding &finding) {
+  return finding.remedy.empty() ? finding.text : finding.text + ": " + finding.remedy;
+}
+
 const char *nameOf(Severity severity) {
   constexpr const char *kNames[] = {"ok", "unknown", "warning", "critical"};
   return kNames[static_cast<size_t>(severity)];

@@ -15,11 +15,15 @@ enum class Severity {
 struct Finding {
   Severity severity;
   const char *kind;  // a word by which programs tell it from others
-  std::string text;  // a sentence, with what helps against it
+  std::string text;  // a sentence, which may end with what helps against it
   int64_t task = 0;  // whose it is, when it is one task's
   std::string taskName = {};
+  std::string remedy = {};  // what helps against it, where that stands apart
 };
 using Findings = std::vector<Finding>;
+
+// With the remedy.
+std::string sentenceOf(const Finding &finding);
 
 // "ok", "unknown", "warning" or "critical".
 const char *nameOf(Severity severity);

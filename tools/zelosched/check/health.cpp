@@ -4,6 +4,7 @@
 #include <functional>
 
 #include "check/copies_check.h"
+#include "check/notice_findings.h"
 #include "check/run_findings.h"
 #include "check/system_check.h"
 #include "check/task_findings.h"
@@ -44,8 +45,9 @@ class Examination {
 
 Findings examineHealth() {
   Examination examination;
-  for (const auto check : {checkCron, checkProgram, checkCopies, checkLastGoodCopy,
-                           checkCrontabLength, checkTmp, checkSharedNames, checkTurns}) {
+  for (const auto check :
+       {checkCron, checkProgram, checkCopies, checkLastGoodCopy, checkCrontabLength, checkTmp,
+        checkSharedNames, checkTurns, checkNotices, checkSettings}) {
     examination.make(check);
   }
   examination.make([&] {

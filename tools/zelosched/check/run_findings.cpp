@@ -15,6 +15,9 @@
 
 namespace {
 
+constexpr char kFailedRun[] = "failed-run";
+constexpr char kGaveUp[] = "gave-up";
+constexpr char kMissedRun[] = "missed-run";
 constexpr int64_t kDay = int64_t{24} * 60 * 60;  // seconds
 constexpr int64_t kMinute = 60;
 
@@ -22,6 +25,18 @@ using Tasks = std::map<int64_t, const TaskRecord *>;
 
 std::string momentInWords(int64_t moment) {
   return minuteText(localMinute(moment));
+}
+
+const char *whyMissed(MachineThen machine) {
+  switch (machine) {
+    case MachineThen::kOff:
+      return ", as the machine was off";
+    case MachineThen::kOn:
+      return ", though the machine was on";
+    case MachineThen::kMaybeOn:
+      break;
+  }
+  return "";
 }
 
 class RunCheck {
@@ -40,8 +55,9 @@ class RunCheck {
   }
 
  private:
-  void add(Severity severity, const char *kind, const TaskRecord &task, const std::string &text) {
-    findings_.push_back({severity, kind, titleOf(task) + " " + text, task.ID, task.Name});
+  void add(Severity severity, const char *kind, const TaskRecord &task, const std::string &text,
+           const std::string &remedy = "") {
+    findings_.push_back({severity, kind, titleOf(task) + " " + text, task.ID, task.Name, remedy});
   }
 
   // Of a task that is still there and enabled; one that was disabled worries nobody.
@@ -60,11 +76,11 @@ class RunCheck {
       isWell = false;
       const std::string id = std::to_string(task->ID);
       add(isKnown ? Severity::kOk : Severity::kWarning,
-          run.outcome == Outcome::kGaveUp ? "gave-up" : "failed-run", *task,
-          resultInWords(run) + " at " + momentInWords(moment) +
-              (isKnown ? " (acknowledged)" : ": 'zelosched log " + id + "' shows what it printed"));
+          run.outcome == Outcome::kGaveUp ? kGaveUp : kFailedRun, *task,
+          resultInWords(run) + " at " + momentInWords(moment) + (isKnown ? " (acknowledged)" : ""),
+          isKnown ? "" : "'zelosched log " + id + "' shows what it printed");
     }
-    if (isWell) findings_.push_back({Severity::kOk, "failed-run", "no task's last run failed"});
+    if (isWell) findings_.push_back({Severity::kOk, kFailedRun, "no task's last run failed"});
   }
 
   void judgeMissed(const KeptDatabase &kept) {
@@ -76,12 +92,11 @@ class RunCheck {
         const std::string id = std::to_string(task.ID);
         const std::string times =
             missed.times > 1 ? ", the last of " + std::to_string(missed.times) + " times," : "";
-        add(Severity::kWarning, "missed-run", task,
-            "was due at " + momentInWords(missed.due) + times +
-                " and did not run: 'zelosched run " + id +
-                "' runs it now, 'zelosched status "
-                "--acknowledge " +
-                id + "' takes note of it");
+        add(Severity::kWarning, kMissedRun, task,
+            "was due at " + momentInWords(missed.due) + times + " and did not run" +
+                whyMissed(missed.machine),
+            "'zelosched run " + id + "' runs it now, 'zelosched status --acknowledge " + id +
+                "' takes note of it");
       }
       if (missed.planned > 0) {
         add(Severity::kOk, "planned-off", task,
@@ -91,7 +106,7 @@ class RunCheck {
                 " while the machine was off by its power times");
       }
     }
-    if (isWell) findings_.push_back({Severity::kOk, "missed-run", "no run was missed"});
+    if (isWell) findings_.push_back({Severity::kOk, kMissedRun, "no run was missed"});
   }
 
   // Five times as long as such a run usually takes, or a day.
@@ -156,4 +171,9 @@ Findings checkRuns(const TaskList &list) {
   }
   sweepRuns(list);
   return RunCheck(list).make();
+}
+
+bool isAboutPastRun(const Finding &finding) {
+  const std::string_view kind = finding.kind;
+  return kind == kFailedRun || kind == kGaveUp || kind == kMissedRun;
 }

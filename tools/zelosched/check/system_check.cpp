@@ -12,6 +12,7 @@
 #include <iterator>
 #include <optional>
 
+#include "runs/settings.h"
 #include "store/change_lock.h"
 #include "store/shared_names.h"
 #include "store/store_files.h"
@@ -121,6 +122,16 @@ Findings checkSharedNames() {
     findings.push_back({Severity::kOk, "names",
                         "what was in the way of ours in /tmp was moved to " + directory +
                             ": look at it and delete it"});
+  }
+  return findings;
+}
+
+Findings checkSettings() {
+  SettingsFaults faults;
+  readSettings(&faults);
+  Findings findings;
+  for (const std::string &fault : faults) {
+    findings.push_back({Severity::kWarning, "settings", fault + ": the usual value holds"});
   }
   return findings;
 }

@@ -8,5 +8,8 @@ Findings checkProgram();
 Findings checkTmp();
 Findings checkSharedNames();
 
+// Whether each line of /etc/zelosched.conf can be read.
+Findings checkSettings();
+
 // Whether somebody keeps changes of tasks waiting. It takes up to two seconds when one does.
 Findings checkTurns();

@@ -135,16 +135,16 @@ int runHistory(int argc, char **argv) {
 }  // namespace
 
 const Command kHistoryCommand = {
-    "history", "[ID] [--failed] [--since TIME] [--task ID] [--limit N] [--json] | --keep",
+    "history", "[TASK] [--failed] [--since TIME] [--task TASK] [--limit N] [--json] | --keep",
     "list the runs and how they ended",
     "Lists the runs of all tasks, or of one, the latest first: when each began, how long it\n"
     "took, its number, by which 'zelosched log' shows what it printed, its task, and how it\n"
     "ended. Runs that are under way or wait for their turn are among them.\n"
     "\n"
-    "  --failed                       only those that did not end well\n"
+    "  --failed                       only those that ended otherwise than finished\n"
     "  --since TIME                   only those since then, such as 2026-12-24, 18:30,\n"
     "                                 '2026-12-24 18:30', or 12h and 2d for so long ago\n"
-    "  --task ID                      only those of this task, as ID alone does\n"
+    "  --task TASK                    only those of this task, as TASK alone does\n"
     "  -n, --limit N                  how many runs; 50\n"
     "  --json                         a JSON object\n"
     "  --keep                         lists nothing, but takes over what other programs have\n"

@@ -85,6 +85,16 @@ void addLastRuns(const LastRuns &runs, MetricsText *text) {
   }
 }
 
+void addSuccesses(const KeptDatabase &kept, const TaskList &list, MetricsText *text) {
+  text->begin("zelosched_task_last_success_timestamp_seconds", "When a task last finished well.");
+  const std::map<int64_t, int64_t> successes = lastSuccesses(kept);
+  for (const TaskRecord *task : list.tasks()) {
+    const auto success = successes.find(task->ID);
+    if (success == successes.end()) continue;
+    text->add(labelsOf(*task), static_cast<double>(success->second));
+  }
+}
+
 void addMissed(const KeptDatabase &kept, const TaskList &list, MetricsText *text) {
   text->begin("zelosched_task_missed_runs",
               "Times at which a task was due and did not run, since it last ran.");
@@ -105,6 +115,7 @@ void addRuns(const TaskList &list, MetricsText *text) {
   const KeptDatabase kept(KeptDatabase::kRead);
   const Snapshot snapshot(kept);
   addLastRuns(lastRunsOf(kept, list), text);
+  addSuccesses(kept, list, text);
   addMissed(kept, list, text);
   addOutcomes(kept, text);
 }
@@ -165,8 +176,9 @@ int runMetrics(int argc, char **argv) {
 const Command kMetricsCommand = {
     "metrics", "[--output FILE]", "print what a monitoring system collects",
     "Prints as OpenMetrics text: tasks by their state, of each task the start, duration, exit\n"
-    "code and outcome of its last run, its next run and the runs that it missed, the runs of\n"
-    "the history by their outcome, and what 'zelosched status' finds.\n"
+    "code and outcome of its last run, when it last finished well, its next run and the runs\n"
+    "that it missed, the runs of the history by their outcome, and what 'zelosched status'\n"
+    "finds.\n"
     "\n"
     "  -o, --output FILE              into the file, which is replaced as a whole\n",
     runMetrics};

@@ -200,7 +200,7 @@ int runRun(int argc, char **argv) {
 }  // namespace
 
 const Command kRunCommand = {
-    "run", "ID... [--wait] [--output] [--force]", "run tasks now",
+    "run", "TASK... [--wait] [--output] [--force]", "run tasks now",
     "Runs the tasks now, whatever their times say and also when they are disabled, with\n"
     "the limits, the locale and the time zone that cron gives them. A run waits for others\n"
     "that must not overlap with it, as always, and it is said for which.\n"

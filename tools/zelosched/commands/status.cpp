@@ -5,10 +5,10 @@
 #include <cstdio>
 
 #include "check/health.h"
+#include "check/run_findings.h"
 #include "commands/command.h"
 #include "commands/options.h"
 #include "json/json_out.h"
-#include "runs/history_keep.h"
 #include "runs/missed.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
@@ -50,7 +50,7 @@ void print(const Findings &findings, bool isQuiet) {
     if (isQuiet && finding.severity == Severity::kOk) continue;
     const char *const start = colour ? colourOf(finding.severity) : "";
     std::printf("%s%-8s%s  %s\n", start, nameOf(finding.severity), *start != '\0' ? "\033[0m" : "",
-                printable(finding.text).c_str());
+                printable(sentenceOf(finding)).c_str());
   }
 }
 
@@ -58,7 +58,7 @@ Json::Value jsonOf(const Finding &finding) {
   Json::Value object;
   object["severity"] = nameOf(finding.severity);
   object["kind"] = finding.kind;
-  object["text"] = jsonText(finding.text);
+  object["text"] = jsonText(sentenceOf(finding));
   object["task"] = finding.task != 0 ? Json::Value(Json::Int64(finding.task)) : Json::Value();
   object["task_name"] = jsonTextOrNull(finding.taskName);
   return object;
@@ -72,19 +72,29 @@ void printAsJson(const Findings &findings) {
   printTop(whole);
 }
 
-int acknowledgeAll(const Arguments &arguments) {
-  if (arguments.has("quiet") || arguments.has("json")) {
-    throw UsageError("'--acknowledge' prints nothing, and takes neither '--quiet' nor '--json'");
+// Of one task, or of all.
+void acknowledgeWarnings(const Findings &findings, std::optional<int64_t> task, bool isQuiet) {
+  acknowledge(KeptDatabase(KeptDatabase::kChange), task, Acknowledged::kAll);
+  for (const Finding &finding : findings) {
+    if (isQuiet || finding.severity != Severity::kWarning || !isAboutPastRun(finding)) continue;
+    if (task && finding.task != *task) continue;
+    std::printf("acknowledged: %s\n", printable(finding.text).c_str());
   }
+}
+
+int acknowledgeAll(const Arguments &arguments) {
+  if (arguments.has("json")) throw UsageError("'--acknowledge' does not take '--json'");
   if (geteuid() != 0) throw Failure("acknowledging takes root's rights");
-  sweepRuns();  // which notes the tasks that nobody has looked at so far
-  const KeptDatabase kept(KeptDatabase::kChange);
+  // Which also notes the tasks that nobody has looked at so far.
+  const Findings findings = checkRuns(TaskList(TaskList::Unreadable::kIsLeftOut));
+  const bool isQuiet = arguments.has("quiet");
   if (arguments.operands().empty()) {
-    acknowledge(kept, std::nullopt, Acknowledged::kAll);
+    acknowledgeWarnings(findings, std::nullopt, isQuiet);
     return kDone;
   }
-  for (const int64_t id : parseIds(arguments.operands()))
-    acknowledge(kept, loadTask(id)->ID, Acknowledged::kAll);
+  for (const int64_t id : parseIds(arguments.operands())) {
+    acknowledgeWarnings(findings, loadTask(id)->ID, isQuiet);
+  }
   return kDone;
 }
 
@@ -105,18 +115,20 @@ int runStatus(int argc, char **argv) {
 }  // namespace
 
 const Command kStatusCommand = {
-    "status", "[--quiet] [--json] | --acknowledge [TASK...]", "say whether all is well",
+    "status", "[--quiet] [--json | --acknowledge [TASK...]]", "say whether all is well",
     "Prints a line for each check, the worst first: whether cron is running, whether the\n"
     "program that it starts is there and root's, whether the copies of the tasks agree,\n"
     "whether /tmp is root's and sticky and no other user is in the way of runs there, whether\n"
     "a process keeps changes waiting, whether each task can be read, whether the crontab is in\n"
     "step with them and short enough for cron, whether an enabled task has a fault, whether\n"
     "power times can take effect, whose last run failed or gave up, which tasks were due and\n"
-    "did not run, and which are running, and unusually long.\n"
+    "did not run, which are running, and unusually long, whether somebody is told of failed\n"
+    "runs, and whether /etc/zelosched.conf can be read.\n"
     "\n"
     "  -q, --quiet                    only what is not well\n"
     "  --json                         as JSON: see zelosched-json(5)\n"
-    "  --acknowledge                  warn no more of the runs so far of these tasks, or of all\n"
+    "  --acknowledge                  warn no more of the runs so far of these tasks, or of\n"
+    "                                 all, and say of which\n"
     "\n"
     "Exit status: 0 all is well, 1 something is wrong, 3 this user may not see all of it,\n"
     "4 tasks do not run at all.\n",

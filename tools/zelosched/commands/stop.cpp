@@ -33,7 +33,7 @@ int runStop(int argc, char **argv) {
 }  // namespace
 
 const Command kStopCommand = {
-    "stop", "ID... [--grace SECONDS]", "end the runs of tasks that go on or wait",
+    "stop", "TASK... [--grace SECONDS]", "end the runs of tasks that go on or wait",
     "Ends the runs of the tasks that are under way: one that waits for its turn does not\n"
     "start; of one that goes on, every process gets SIGTERM, also those that its command\n"
     "has put into the background or into a session of their own, and what is left after 10\n"

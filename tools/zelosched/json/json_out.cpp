@@ -92,8 +92,11 @@ class Writer {
       case Json::stringValue:
         out_ += quoted(value.asString());
         return;
+      case Json::realValue:  // seconds, of which nobody measures less than thousandths
+        out_ += Json::valueToString(value.asDouble(), 3, Json::PrecisionType::decimalPlaces);
+        return;
       default:
-        out_ += value.asString();  // a number, true or false
+        out_ += value.asString();  // an integer, true or false
     }
   }
 

@@ -161,6 +161,38 @@ int64_t bornAt(const ProcessName &process) {
          process.born / sysconf(_SC_CLK_TCK);
 }
 
+// Whatever the clock says, of each task the newest stay, and never more than the total.
+void dropRuns(const KeptDatabase &kept, const Settings &settings) {
+  Query(kept,
+        "DELETE FROM run WHERE state = 2 AND run IN (SELECT run FROM (SELECT run, moment,"
+        " row_number() OVER (PARTITION BY task ORDER BY moment DESC, run DESC) AS place FROM run)"
+        " WHERE place > ? AND moment < ?)")
+      .with(settings.runsOfTask)
+      .with(static_cast<int64_t>(time(nullptr)) - settings.runsDays * kDay)
+      .run();
+  Query(kept,
+        "DELETE FROM run WHERE state = 2 AND (moment, run) <= (SELECT moment, run FROM run"
+        " ORDER BY moment DESC, run DESC LIMIT 1 OFFSET ?)")
+      .with(settings.runsTotal)
+      .run();
+}
+
+// Removed ones, with what was noted of them, when no run is left that may be theirs.
+void dropTasks(const KeptDatabase &kept, const Settings &settings) {
+  const int64_t dropped = Query(kept,
+                                "DELETE FROM task WHERE removed < ?"
+                                " AND NOT EXISTS (SELECT 1 FROM run WHERE run.task = task.task)")
+                              .with(static_cast<int64_t>(time(nullptr)) - settings.runsDays * kDay)
+                              .run();
+  if (dropped == 0) return;
+  for (const char *sql :
+       {"DELETE FROM notice WHERE generation NOT IN (SELECT generation FROM task)",
+        "DELETE FROM acknowledged WHERE generation NOT IN"
+        " (SELECT generation FROM task)"}) {
+    Query(kept, sql).run();
+  }
+}
+
 }  // namespace
 
 ProcessName processNamed(int64_t pid) {
@@ -227,6 +259,18 @@ std::vector<KeptRun> lastRuns(const KeptDatabase &kept, LastRun which) {
   return runs;
 }
 
+std::map<int64_t, int64_t> lastSuccesses(const KeptDatabase &kept) {
+  std::map<int64_t, int64_t> moments;
+  if (!kept.isThere()) return moments;
+  Query query(kept,
+              "SELECT task, (SELECT coalesce(ended, moment) FROM run WHERE"
+              " run.generation = task.generation AND outcome = ? ORDER BY moment DESC LIMIT 1)"
+              " AS success FROM task WHERE removed IS NULL AND success IS NOT NULL");
+  query.with(static_cast<int64_t>(Outcome::kFinished));
+  while (query.next()) moments[query.number(0)] = query.number(1);
+  return moments;
+}
+
 std::map<Outcome, int64_t> countByOutcome(const KeptDatabase &kept) {
   std::map<Outcome, int64_t> counts;
   if (!kept.isThere()) return counts;
@@ -279,20 +323,9 @@ std::optional<Output> outputOf(const KeptDatabase &kept, int64_t run) {
   return Output{query.text(0), query.text(1), query.number(2)};
 }
 
-// Whatever the clock says, of each task the newest stay, and never more than the total.
 void dropOldRuns(const KeptDatabase &kept, const Settings &settings) {
-  Query(kept,
-        "DELETE FROM run WHERE state = 2 AND run IN (SELECT run FROM (SELECT run, moment,"
-        " row_number() OVER (PARTITION BY task ORDER BY moment DESC, run DESC) AS place FROM run)"
-        " WHERE place > ? AND moment < ?)")
-      .with(settings.runsOfTask)
-      .with(static_cast<int64_t>(time(nullptr)) - settings.runsDays * kDay)
-      .run();
-  Query(kept,
-        "DELETE FROM run WHERE state = 2 AND (moment, run) <= (SELECT moment, run FROM run"
-        " ORDER BY moment DESC, run DESC LIMIT 1 OFFSET ?)")
-      .with(settings.runsTotal)
-      .run();
+  dropRuns(kept, settings);
+  dropTasks(kept, settings);
 }
 
 bool noteTold(const KeptDatabase &kept, std::string_view kind, int64_t generation, int64_t moment) {

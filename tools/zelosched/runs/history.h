@@ -64,6 +64,9 @@ std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter);
 enum class LastRun { kOfAll, kEnded };
 std::vector<KeptRun> lastRuns(const KeptDatabase &kept, LastRun which = LastRun::kOfAll);
 
+// When a task of today last finished well, by its id.
+std::map<int64_t, int64_t> lastSuccesses(const KeptDatabase &kept);
+
 // How many runs ended in which way.
 std::map<Outcome, int64_t> countByOutcome(const KeptDatabase &kept);
 
@@ -89,7 +92,7 @@ void saveOutput(const KeptDatabase &kept, const KeptRun &run, const Output &outp
                 const Settings &settings);
 std::optional<Output> outputOf(const KeptDatabase &kept, int64_t run);
 
-// Drops what the settings no longer keep.
+// Drops what the settings no longer keep, and what is known of removed tasks without a run.
 void dropOldRuns(const KeptDatabase &kept, const Settings &settings);
 
 // True for the one caller that is to tell of it: of a run ("missed" and the like), at a moment. In

@@ -15,6 +15,7 @@ namespace {
 constexpr int64_t kMinute = 60;          // seconds
 constexpr int64_t kGrace = 2 * kMinute;  // in which cron's program may still begin
 constexpr int64_t kClockMoved = 2 * kMinute;
+constexpr int64_t kBetweenLooks = 11 * kMinute;  // of the sweep, which is late by a minute at most
 
 int64_t uptime() {
   timespec up{};
@@ -71,11 +72,11 @@ std::vector<Span> unjudgedSpans(const KeptDatabase &kept) {
   return spans;
 }
 
-// In which the machine was on, as far as is known.
+// In which the machine was on, as far as is known, in their order.
 std::vector<Span> spansUp(const KeptDatabase &kept, int64_t now) {
   std::vector<Span> spans;
   const std::string current = bootId();
-  Query query(kept, "SELECT boot, began, seen FROM boot");
+  Query query(kept, "SELECT boot, began, seen FROM boot ORDER BY began");
   while (query.next()) {
     spans.push_back({query.number(1), query.text(0) == current ? now : query.number(2)});
   }
@@ -85,6 +86,16 @@ std::vector<Span> spansUp(const KeptDatabase &kept, int64_t now) {
 bool isIn(const std::vector<Span> &spans, time_t moment) {
   return std::any_of(spans.begin(), spans.end(),
                      [&](const Span &span) { return moment >= span.from && moment < span.until; });
+}
+
+// Between two boots it was off, but for the minutes after the last look at the first of them.
+MachineThen machineAt(const std::vector<Span> &up, time_t moment) {
+  if (isIn(up, moment)) return MachineThen::kOn;
+  const auto isOff = [&](const Span &before, const Span &after) {
+    return moment >= before.until + kBetweenLooks && moment < after.from;
+  };
+  return std::adjacent_find(up.begin(), up.end(), isOff) == up.end() ? MachineThen::kMaybeOn
+                                                                     : MachineThen::kOff;
 }
 
 // Up to which moment a time that was passed over counts as missed.
@@ -141,6 +152,7 @@ class Judge {
     } else {
       ++missed->times;
       missed->due = *due;
+      missed->machine = machineAt(up_, *due);
     }
   }
 

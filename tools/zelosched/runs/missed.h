@@ -21,10 +21,14 @@ void markMachineUp(bool isStarting);
 // The tasks could not be put back into /tmp, or nobody tried so far.
 bool areTasksLost();
 
+// While a time passed. Nobody looks at the machine more often than every ten minutes.
+enum class MachineThen { kMaybeOn, kOn, kOff };
+
 struct MissedTask {
   const TaskRecord *task;
   time_t due = 0;  // the latest of its times that it missed; 0 when there are none but planned ones
-  size_t times = 0;    // so many of them
+  MachineThen machine = MachineThen::kMaybeOn;  // at that time
+  size_t times = 0;                             // so many of them
   size_t planned = 0;  // beside those, as the machine was off by its power times
 };
 

@@ -18,12 +18,16 @@
 #include <cstring>
 
 #include "runs/moment_text.h"
+#include "store/place_file.h"
+#include "terminal/failure.h"
 #include "terminal/text.h"
 
 namespace {
 
 constexpr char kDirectory[] = "/etc/zelosched/run-ended.d";
 constexpr std::chrono::milliseconds kPatience(30000);
+constexpr char kRunDirectory[] = "/run/zelosched";
+constexpr char kFaults[] = "/run/zelosched/notices";
 constexpr char kOutputPattern[] = "/run/zelosched/told.XXXXXX";
 
 // Nobody else can change it, or what it leads to: the directory is root's too.
@@ -31,32 +35,53 @@ bool isRootsAlone(const struct stat &info) {
   return info.st_uid == 0 && (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
 }
 
-std::vector<std::string> programs() {
-  std::vector<std::string> found;
-  struct stat directory {};
-  if (stat(kDirectory, &directory) != 0) return found;
-  if (!isRootsAlone(directory)) {
-    syslog(LOG_WARNING, "%s is not root's alone: nobody is told", kDirectory);
-    return found;
-  }
-  DIR *const entries = opendir(kDirectory);
-  if (entries == nullptr) return found;
+bool isBackup(const std::string &name) {
+  return name.front() == '.' || name.back() == '~';
+}
+
+std::vector<std::string> namesIn(const char *directory) {
+  std::vector<std::string> names;
+  DIR *const entries = opendir(directory);
+  if (entries == nullptr) return names;
   while (const dirent *entry = readdir(entries)) {
-    const std::string name = entry->d_name;
-    if (name.front() == '.' || name.back() == '~') continue;
-    const std::string path = std::string(kDirectory) + "/" + name;
-    struct stat info {};
-    if (stat(path.c_str(), &info) != 0 || !S_ISREG(info.st_mode)) continue;
-    if ((info.st_mode & S_IXUSR) == 0) continue;
-    if (isRootsAlone(info)) {
-      found.push_back(path);
-    } else {
-      syslog(LOG_WARNING, "%s is not root's alone: it is not run", printable(path).c_str());
-    }
+    if (!isBackup(entry->d_name)) names.emplace_back(entry->d_name);
   }
   closedir(entries);
-  std::sort(found.begin(), found.end());
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+// Those that can be told; of the others a line in the system log.
+std::vector<std::string> programs() {
+  std::vector<std::string> found;
+  for (const NoticeProgram &program : noticePrograms()) {
+    if (program.fault.empty()) {
+      found.push_back(program.path);
+    } else {
+      syslog(LOG_WARNING, "%s %s", printable(program.path).c_str(), program.fault.c_str());
+    }
+  }
   return found;
+}
+
+// Where it stands how a program failed; /run is empty when the machine starts.
+std::string markOf(const std::string &program) {
+  return kFaults + program.substr(program.rfind('/'));
+}
+
+void noteFault(const std::string &program, const std::string &fault) {
+  if (fault.empty()) {
+    unlink(markOf(program).c_str());
+    return;
+  }
+  syslog(LOG_WARNING, "%s %s", printable(program).c_str(), fault.c_str());
+  mkdir(kRunDirectory, S_IRWXU);
+  mkdir(kFaults, S_IRWXU);
+  try {
+    placeFile(markOf(program), fault + "\n", S_IRUSR | S_IWUSR);
+  } catch (const Failure &failure) {
+    syslog(LOG_WARNING, "%s", failure.what());
+  }
 }
 
 // What was printed, with a line in place of what was not kept. Gone with the object.
@@ -68,7 +93,7 @@ class OutputOnDisk {
       text += "\n[" + std::to_string(output.leftOut) + " bytes are left out here]\n";
     }
     text += output.tail;
-    mkdir("/run/zelosched", S_IRWXU);
+    mkdir(kRunDirectory, S_IRWXU);
     const int file = mkostemp(path_, O_CLOEXEC);
     if (file < 0) {
       path_[0] = '\0';
@@ -141,7 +166,8 @@ Environment environmentOf(const RunRecord &run, const char *outputPath, bool isR
   return all;
 }
 
-pid_t start(const std::string &program, Environment environment) {
+// 0, and why, when it could not be started.
+pid_t start(const std::string &program, Environment environment, std::string *fault) {
   posix_spawnattr_t attributes;
   posix_spawn_file_actions_t actions;
   posix_spawnattr_init(&attributes);
@@ -166,8 +192,7 @@ pid_t start(const std::string &program, Environment environment) {
   posix_spawn_file_actions_destroy(&actions);
   posix_spawnattr_destroy(&attributes);
   if (error == 0) return pid;
-  syslog(LOG_WARNING, "%s could not be started: %s", printable(program).c_str(),
-         std::strerror(error));
+  *fault = std::string("could not be started: ") + std::strerror(error);
   return 0;
 }
 
@@ -184,9 +209,17 @@ bool waitForEnd(pid_t pid) {
   return ready != 0;
 }
 
-void run(const std::string &program, const Environment &environment) {
-  const pid_t pid = start(program, environment);
-  if (pid == 0) return;
+std::string faultOf(int status) {
+  if (WIFSIGNALED(status)) return "was ended by signal " + std::to_string(WTERMSIG(status));
+  if (WEXITSTATUS(status) == 0) return "";
+  return "failed with exit code " + std::to_string(WEXITSTATUS(status));
+}
+
+// How it failed; empty when it did not.
+std::string faultOfRun(const std::string &program, const Environment &environment) {
+  std::string fault;
+  const pid_t pid = start(program, environment, &fault);
+  if (pid == 0) return fault;
   const bool isDone = waitForEnd(pid);
   // With all its group, which lives on as long as its leader has not been waited for. What a
   // program that ended in time has left in the background, such as a delivery, goes on.
@@ -194,14 +227,37 @@ void run(const std::string &program, const Environment &environment) {
   int status = 0;
   while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
   }
-  if (!isDone) {
-    syslog(LOG_WARNING, "%s was ended after 30 seconds", printable(program).c_str());
-  } else if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) {
-    syslog(LOG_WARNING, "%s failed", printable(program).c_str());
-  }
+  return isDone ? faultOf(status) : "was ended after 30 seconds";
+}
+
+void run(const std::string &program, const Environment &environment) {
+  noteFault(program, faultOfRun(program, environment));
 }
 
 }  // namespace
+
+std::vector<NoticeProgram> noticePrograms() {
+  struct stat directory {};
+  if (stat(kDirectory, &directory) != 0) return {};
+  if (!isRootsAlone(directory)) return {{kDirectory, "is not root's alone: nobody is told"}};
+  std::vector<NoticeProgram> found;
+  for (const std::string &name : namesIn(kDirectory)) {
+    const std::string path = std::string(kDirectory) + "/" + name;
+    struct stat info {};
+    if (stat(path.c_str(), &info) != 0 || !S_ISREG(info.st_mode)) continue;
+    if ((info.st_mode & S_IXUSR) == 0) continue;
+    found.push_back({path, isRootsAlone(info) ? "" : "is not root's alone: it is not run"});
+  }
+  return found;
+}
+
+std::string lastFaultOf(const NoticeProgram &program) {
+  const std::string mark = markOf(program.path);
+  if (access(mark.c_str(), F_OK) != 0) return "";
+  std::string fault = contentsOf(mark);
+  while (!fault.empty() && fault.back() == '\n') fault.pop_back();
+  return fault;
+}
 
 bool isAnybodyToBeTold() {
   return !programs().empty();

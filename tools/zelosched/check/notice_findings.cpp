@@ -1,0 +1,51 @@
+#include "check/notice_findings.h"
+
+#include <unistd.h>
+
+#include "runs/notices.h"
+
+namespace {
+
+constexpr char kMailProgram[] = "/mail-on-failure";
+constexpr char kMailer[] = "/usr/sbin/sendmail";
+
+Findings warningOf(const std::string &text) {
+  return {{Severity::kWarning, "notice", text}};
+}
+
+// What keeps it from telling anybody; empty when nothing is known to.
+std::string faultOf(const NoticeProgram &program) {
+  if (!program.fault.empty()) return program.fault;
+  if (program.path.ends_with(kMailProgram) && access(kMailer, X_OK) != 0) {
+    return std::string("has no ") + kMailer + ": nobody is mailed: install a mail transfer agent";
+  }
+  const std::string last = lastFaultOf(program);
+  return last.empty() ? "" : last + " when it was last told of a run";
+}
+
+}  // namespace
+
+Findings checkNotices() {
+  if (geteuid() != 0) {
+    return {{Severity::kUnknown, "notice",
+             "whether somebody is told of failed runs, only root may see"}};
+  }
+  Findings findings;
+  std::string told;
+  for (const NoticeProgram &program : noticePrograms()) {
+    const std::string fault = faultOf(program);
+    if (!fault.empty()) {
+      const Findings warning = warningOf(program.path + " " + fault);
+      findings.insert(findings.end(), warning.begin(), warning.end());
+    } else {
+      told += (told.empty() ? "" : ", ") + program.path.substr(program.path.rfind('/') + 1);
+    }
+  }
+  if (!findings.empty()) return findings;
+  if (told.empty()) {
+    return {{Severity::kOk, "notice",
+             "nobody is told of failed runs: 'Who is told' in zelosched(8) says how"
+             " to switch mail on"}};
+  }
+  return {{Severity::kOk, "notice", "of failed runs is told: " + told}};
+}
