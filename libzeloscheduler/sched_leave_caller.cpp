@@ -162,8 +162,7 @@ bool closeCallersDescriptors() {
          closeDescriptors(kept + 1, kLastDescriptor);
 }
 
-// ---- signals and scheduling
-// -----------------------------------------------------------------------
+// ---- signals and scheduling ----------------------------------------------------------------
 
 void resetSignals() {
   struct sigaction action = {};

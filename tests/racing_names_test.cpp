@@ -41,8 +41,7 @@ std::string scratchName(pid_t pid) {
   return "/tmp/scheduled_tasks.tmp." + std::to_string(pid);
 }
 
-// ---- what he has
-// ---------------------------------------------------------------------------------
+// ---- what he has ------------------------------------------------------------------------------
 
 // A store with a task of his for root, and a database in which every task is running.
 void makeHisStore(const std::string &path) {
@@ -133,8 +132,7 @@ class Rival {
   pid_t pid_;
 };
 
-// ---- what root does
-// ------------------------------------------------------------------------------
+// ---- what root does ---------------------------------------------------------------------------
 
 std::string textOf(const std::string &path) {
   struct stat info = {};
