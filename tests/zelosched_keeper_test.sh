@@ -137,6 +137,7 @@ shows_a_run_that_waits_and_for_whom() {
   start 1
   same "$(z run 1)" "task 1 (long) waits for task 1 (long) to end" || return 1
   run_is "0 0" "state, outcome" && [[ $(z history | sed -n 2p) == *"waits for its turn"*long ]] || return 1
+  [[ $(z list) == *"running for"* ]] || { z list; return 1; }
   local process
   process=$(kept "SELECT pid FROM run WHERE state = 0")
   z stop 1 >/dev/null

@@ -50,7 +50,11 @@ LatestRuns latestRuns(const TaskList &list) {
     for (KeptRun &run : lastRuns(kept)) latest.ofEach[run.task] = std::move(run);
     RunFilter underWay;
     underWay.underWay = true;
-    for (const KeptRun &run : runsOf(kept, underWay)) latest.running.insert(run.task);
+    for (KeptRun &run : runsOf(kept, underWay)) {
+      latest.running.insert(run.task);
+      // The one that goes on for longest: later ones wait for it.
+      if (run.state == RunState::kRunning) latest.ofEach[run.task] = std::move(run);
+    }
     latest.isKnown = true;
   } catch (const Failure &failure) {
     latest = {};
