@@ -8,6 +8,7 @@
 #include "schedule_days.h"
 #include "schedule_due.h"
 #include "schedule_runs.h"
+#include "schedule_shift.h"
 
 namespace support {
 namespace {
@@ -100,6 +101,40 @@ TEST_F(ScheduleTest, TheWeekIsAMaskAndAList) {
   const Task task = taskOf({.week = "1000011"});
   EXPECT_EQ(schedWeekdayMaskOf(*task), 0b1100001U);
   EXPECT_STREQ(schedWeekdayListOf(*task).text, "0,5,6");
+}
+
+std::vector<uint32_t> minutesOfDay(const Task &task) {
+  std::vector<uint32_t> minutes;
+  for (const uint32_t hour : schedHoursOf(*task)) minutes.push_back(hour * 60 + task->RunMin);
+  return minutes;
+}
+
+// Whatever the hours: each run comes so much later, none is lost, and none leaves its day.
+TEST_F(ScheduleTest, AShiftMovesEveryRunOfADay) {
+  for (const uint32_t repeat : {0U, 1U, 2U, 5U, 12U, 23U, 24U}) {
+    for (uint32_t hour = 0; hour < 24; ++hour) {
+      for (uint32_t last = hour; last < 24; ++last) {
+        for (const uint32_t minute : {0U, 30U, 59U}) {
+          const auto taken = [&] {
+            return taskOf({.hour = hour, .minute = minute, .repeat = repeat, .last = last});
+          };
+          const Task task = taken();
+          const uint32_t most = schedMostShift(*task);
+          for (const uint32_t shift : {0U, 1U, most / 2, most}) {
+            if (shift > most) continue;
+            std::vector<uint32_t> wanted = minutesOfDay(task);
+            for (uint32_t &run : wanted) run += shift;
+            const Task shifted = taken();
+            schedShift(shifted.get(), shift);
+            ASSERT_EQ(minutesOfDay(shifted), wanted)
+                << hour << ":" << minute << " every " << repeat << " until " << last;
+            ASSERT_LT(wanted.back(), 24U * 60);
+          }
+          EXPECT_EQ(minutesOfDay(task).back() + most, 24U * 60 - 1);
+        }
+      }
+    }
+  }
 }
 
 }  // namespace

@@ -277,7 +277,7 @@ tells_every_fault() {
     "$PYTHON" - "$member" >"$SCRATCH/file" <<'PY'
 import json, sys
 task = {"name": "n", "owner": "root", "schedule": {"type": "daily", "at": "08:30"}, "command": "true"}
-top = {"version": 1, "tasks": [dict(task, schedule=dict(task["schedule"])), task]}
+top = {"version": 1, "tasks": [dict(task, name="other", schedule=dict(task["schedule"])), task]}
 exec(sys.argv[1])
 print(json.dumps(top))
 PY
@@ -308,10 +308,10 @@ task["app"] = "Bob's"|tasks[1]: the application 'Bob's' has an apostrophe, with 
 task["app_args"] = []|tasks[1].app_args: must be a text, not []
 task["action"] = True|tasks[1].action: must be a text, not true
 del task["owner"]|tasks[1].owner: is missing
-task["owner"] = "no such"|tasks[1].owner: there is no user 'no such': write the name of one that 'getent passwd' lists
-task["owner"] = 4000000000|tasks[1].owner: there is no user 4000000000: write the name of one that 'getent passwd' lists
-task["owner"] = 4294967296|tasks[1].owner: there is no user 4294967296: write the name of one that 'getent passwd' lists
-task["owner"] = -1|tasks[1].owner: there is no user -1: write the name of one that 'getent passwd' lists
+task["owner"] = "no such"|tasks[1].owner: there is no user 'no such', the owner of 'n': write the name of one that 'getent passwd' lists
+task["owner"] = 4000000000|tasks[1].owner: there is no user 4000000000, the owner of 'n': write the name of one that 'getent passwd' lists
+task["owner"] = 4294967296|tasks[1].owner: there is no user 4294967296, the owner of 'n': write the name of one that 'getent passwd' lists
+task["owner"] = -1|tasks[1].owner: there is no user -1, the owner of 'n': write the name of one that 'getent passwd' lists
 task["enabled"] = "yes"|tasks[1].enabled: must be true or false, not 'yes'
 del task["command"]|tasks[1].command: is missing
 task["command"] = " \n"|tasks[1].command: there is no command
@@ -420,6 +420,7 @@ an_import_that_does_not_fit_saves_nothing() {
   add --daily 08:30 --name one -- true
   add --daily 08:30 --name two -- true
   z export >"$SCRATCH/file"
+  z remove --yes one two >/dev/null
   local before present
   present=$(wc -l </etc/crontab)
   yes '#' | head -n "$((9799 - present))" >>/etc/crontab

@@ -119,6 +119,18 @@ times() {
   echo "$object]"
 }
 
+# file_of OBJECT...: a file of these tasks
+file_of() {
+  local IFS=,
+  echo "{\"version\": 1, \"tasks\": [$*]}"
+}
+
+# set_of TIME: a file of two tasks, the one at that time
+set_of() {
+  file_of '{"name": "Backup", "app": "backup", "owner": "root", "schedule": {"type": "daily", "at": "'"$1"'"}, "command": "true"}' \
+    '{"name": "Mail", "owner": "nobody", "schedule": {"type": "weekly", "days": ["mon", "fri"], "at": "08:00", "every_hours": 2, "until_hour": 18}, "command": "true"}'
+}
+
 # the_object [SED SCRIPT]: the one task of an export, as a member of an array
 the_object() {
   sed '1d;$d' "$1" | sed "${2:-}"

@@ -39,7 +39,8 @@ void printHelp() {
       "\n"
       "zelosched COMMAND --help tells more of a command; zelosched --version tells the version.\n"
       "\n"
-      "Exit status: 0 done, 1 failed, 2 the arguments are wrong; of 'status' also 3 and 4.\n",
+      "Exit status: 0 done, 1 failed, 2 the arguments are wrong; of 'status' and\n"
+      "'apply' also others.\n",
       stdout);
 }
 

@@ -8,6 +8,7 @@
 #include "runs/coming_runs.h"
 #include "store/change_lock.h"
 #include "store/save.h"
+#include "store/stagger.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
 #include "terminal/schedule_text.h"
@@ -15,7 +16,8 @@
 
 namespace {
 
-constexpr Option kOptions[] = {TASK_OPTIONS, {"disabled"}, {"quiet", Option::kNone, 'q'}};
+constexpr Option kOptions[] = {
+    TASK_OPTIONS, {"disabled"}, {"stagger", Option::kValue}, {"quiet", Option::kNone, 'q'}};
 
 void announce(const ZELO_SCHED_TASK &task) {
   const std::optional<LocalMinute> next = nextRun(task, localMinute(time(nullptr)));
@@ -29,11 +31,16 @@ int runAdd(int argc, char **argv) {
   arguments.requireNoOperands();
   if (!hasSchedule(arguments)) throw UsageError("when? Give --daily 08:30, say");
   if (!arguments.afterDashes()) throw UsageError("what? Give the command after '--'");
+  const auto window = arguments.value("stagger");
+  if (window && !arguments.has("name")) {
+    throw UsageError("'--stagger' goes by the task's name: add --name");
+  }
   const ChangeLock lock;
   const Task task = newTask(ZELO_SCHED_BACKEND_SCHEDULE);
   applyTaskOptions(arguments, task.get());
   if (arguments.has("disabled")) task->State = ZELO_SCHED_STATE_DISABLED;
   requireHarmless(*task);
+  if (window) stagger(minutesOfWindow(*window), task.get());
   const std::string past = pastSchedule(*task, time(nullptr));
   if (!past.empty()) throw Failure("not saved: " + past);
   createTask(task.get());
@@ -55,5 +62,7 @@ const Command kAddCommand = {
     "\n"
     "Also:\n"
     "  --disabled                     save it, but do not run it until it is enabled\n"
+    "  --stagger 30m                  at a minute of so many, from its time on: always the\n"
+    "                                 same one for this machine, application and name\n"
     "  -q, --quiet                    print the id and nothing else\n",
     runAdd};

@@ -40,6 +40,7 @@ extern const Command kSyncCommand;
 extern const Command kRestoreCommand;
 extern const Command kCatchUpCommand;
 extern const Command kPowerCommand;
-extern const Command kImportCommand;
 extern const Command kExportCommand;
+extern const Command kApplyCommand;
+extern const Command kImportCommand;
 extern const Command kCompletionCommand;

@@ -27,6 +27,7 @@ constexpr Words kWords[] = {
     {"weekly", "mon tue wed thu fri sat sun weekdays weekend all"},
     {"time-limit", "30m 2h 1d none"},
     {"every", "1h 2h off"},
+    {"stagger", "15m 30m 1h 2h"},
 };
 constexpr char kOwner[] = "owner";  // whose value is a user
 constexpr char kShells[] = "bash zsh fish";

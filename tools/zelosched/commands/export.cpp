@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstring>
+#include <utility>
 
 #include "commands/command.h"
 #include "commands/for_each_id.h"
@@ -46,15 +47,13 @@ void requireExportable(const ZELO_SCHED_TASK &task) {
 }
 
 // By the key of a task, so that a later export of the same tasks is the same text.
+std::pair<std::string, std::string> keyOf(const Json::Value &object) {
+  const Json::Value &app = object["app"];
+  return {app.isString() ? app.asString() : "", object["name"].asString()};
+}
+
 bool isBefore(const Json::Value &a, const Json::Value &b) {
-  const auto textOf = [](const Json::Value &object, const char *name) {
-    return object[name].isString() ? object[name].asString() : "";
-  };
-  for (const char *name : {"app", "name"}) {
-    const int order = textOf(a, name).compare(textOf(b, name));
-    if (order != 0) return order < 0;
-  }
-  return false;
+  return keyOf(a) < keyOf(b);
 }
 
 class Export {
@@ -78,12 +77,21 @@ class Export {
     return status;
   }
 
-  void finish() {
-    if (isWire_) return;
+  // The exit status.
+  int finish() {
+    if (isWire_) return kDone;
     std::stable_sort(tasks_.begin(), tasks_.end(), isBefore);
+    int status = kDone;
+    for (size_t i = 1; i < tasks_.size(); ++i) {
+      if (isBefore(tasks_[i - 1], tasks_[i])) continue;
+      status = complain("'" + keyOf(tasks_[i]).second +
+                        "' is the name of several tasks of one application, which 'zelosched "
+                        "apply' cannot tell apart: rename or remove one of them");
+    }
     Json::Value top = topObject();
     top["tasks"] = jsonList(tasks_);
     printIndented(top);
+    return status;
   }
 
  private:
@@ -101,15 +109,14 @@ int runExport(int argc, char **argv) {
   } else {
     status = forEachId(parseIds(arguments.operands()), [&](int64_t id) { out.add(*loadTask(id)); });
   }
-  out.finish();
-  return status;
+  return std::max(status, out.finish());
 }
 
 }  // namespace
 
 const Command kExportCommand = {
     "export", "[TASK...] [--wire]", "write tasks as JSON",
-    "Writes all tasks, or those that are named, as JSON for 'zelosched import': by their\n"
+    "Writes all tasks, or those that are named, as JSON for 'zelosched apply': by their\n"
     "applications and names, without ids and power times. zelosched-json(5) describes it. A\n"
     "task with a text that is not UTF-8 is left out, which is told, and the exit status is 1.\n"
     "\n"

@@ -2,58 +2,27 @@
 #include <json/json.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <memory>
 
 #include "check/task_check.h"
+#include "commands/apply_tasks.h"
 #include "commands/command.h"
 #include "commands/options.h"
-#include "json/json_in.h"
-#include "json/task_json.h"
 #include "json/wire_json.h"
 #include "store/change_lock.h"
 #include "store/power_room.h"
 #include "store/save.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
+#include "terminal/input.h"
 #include "terminal/text.h"
 
 namespace {
 
-constexpr Option kOptions[] = {{"wire"}, {"new"}};
-constexpr char kStandardInput[] = "-";
+constexpr Option kOptions[] = {{"wire"}, {"new"}, {"force"}};
 constexpr char kNoTask[] = "there is no task to import";
-constexpr size_t kMegabyte = size_t{1} << 20;
-constexpr size_t kMostBytes = 16 * kMegabyte;
-
-struct CloseFile {
-  void operator()(FILE *file) const {
-    if (file != stdin) std::fclose(file);
-  }
-};
-
-std::string readAll(const std::string &path) {
-  const std::unique_ptr<FILE, CloseFile> file(
-      path == kStandardInput ? stdin : std::fopen(path.c_str(), "re"));
-  if (file == nullptr) {
-    throw Failure("cannot open " + printable(path) + ": " + std::strerror(errno));
-  }
-  std::string text;
-  char buffer[65536];
-  for (size_t count; (count = std::fread(buffer, 1, sizeof buffer, file.get())) > 0;) {
-    text.append(buffer, count);
-    if (text.size() > kMostBytes) {
-      throw Failure(printable(path) + " is larger than " + std::to_string(kMostBytes / kMegabyte) +
-                    " MB: divide it");
-    }
-  }
-  if (std::ferror(file.get()) != 0) {
-    throw Failure("cannot read " + printable(path) + ": " + std::strerror(errno));
-  }
-  return text;
-}
 
 // ---- the library's own form -----------------------------------------------------------------
 
@@ -157,53 +126,37 @@ int importWire(const std::string &text, bool areNew) {
   return status;
 }
 
-// ---- the vocabulary -------------------------------------------------------------------------
-
-std::vector<Task> newTasks(const std::string &text) {
-  JsonFaults faults;
-  std::vector<Task> tasks;
-  for (const TaskText &taskText : taskTextsOf(text, &faults)) {
-    tasks.push_back(newTask(ZELO_SCHED_BACKEND_SCHEDULE));
-    fillTask(taskText, tasks.back().get(), &faults);
-  }
-  if (faults.empty()) return tasks;
-  complainOf(faults);
-  throw Failure("nothing was imported, because of " + counted(faults.size(), "fault"));
-}
-
-int importTasks(const std::string &text) {
-  const ChangeLock lock;
-  const std::vector<Task> tasks = newTasks(text);
-  requireSavable(tasks, true);
-  int status = kDone;
-  if (tasks.empty()) std::puts(kNoTask);
-  for (size_t i = 0; i < tasks.size(); ++i) {
-    const int saved = attempt([&] { save(tasks[i].get(), true); });
-    status = std::max(status, saved);
-  }
-  return status;
-}
+// ---- the command ----------------------------------------------------------------------------
 
 int runImport(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
   if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
   if (arguments.has("new") && !arguments.has("wire")) throw UsageError("'--new' is for --wire");
-  const std::string text = readAll(arguments.operands().front());
-  return arguments.has("wire") ? importWire(text, arguments.has("new")) : importTasks(text);
+  if (arguments.has("force") && arguments.has("wire")) {
+    throw UsageError("'--force' is not for --wire");
+  }
+  const std::string text = readInput(arguments.operands().front());
+  if (arguments.has("wire")) return importWire(text, arguments.has("new"));
+  ApplyRules rules;
+  rules.undone = "nothing was imported";
+  rules.insists = arguments.has("force");
+  return applyTasks(text, rules);
 }
 
 }  // namespace
 
 const Command kImportCommand = {
-    "import", "FILE|- [--wire [--new]]", "save new tasks from JSON",
-    "Adds the tasks of a JSON text, as 'zelosched export' writes it; zelosched-json(5) tells\n"
-    "what can stand in it. Each becomes a new task.\n"
+    "import", "FILE|- [--force] | --wire [--new]", "save the tasks of an export",
+    "Saves the tasks of a file that 'zelosched export' wrote, as 'zelosched apply' does: one of\n"
+    "a known application and name is changed, any other is created, and none is removed.\n"
     "\n"
     "When one of them cannot be saved, none is, and every fault is told with its place. Nor\n"
     "is any when all together would make /etc/crontab longer than cron reads.\n"
     "At most 16 MB and 10000 tasks are read at once.\n"
     "\n"
+    "  --force                        even if its application hides a task, or does not let\n"
+    "                                 it be changed\n"
     "  --wire                         the form of the library's JSON calls instead: an array,\n"
     "                                 one object, or an object a line, also of plain texts\n"
     "                                 and numbers. A task overwrites the stored one of its id\n"

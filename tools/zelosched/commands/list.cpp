@@ -88,7 +88,7 @@ class Choice {
 
   bool has(const ZELO_SCHED_TASK &task) const {
     if (isPower(task) && !arguments_.has("power")) return false;
-    if (task.Listable != 1 && !arguments_.has("all")) return false;
+    if (!isListed(task) && !arguments_.has("all")) return false;
     if (!isEnabled(task) && arguments_.has("enabled")) return false;
     if (owner_ && task.Owner != *owner_) return false;
     if (arguments_.has("failed") && !hasFailed(task)) return false;

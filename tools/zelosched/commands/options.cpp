@@ -107,6 +107,14 @@ std::string Arguments::value(std::string_view option, const char *otherwise) con
   return value(option).value_or(otherwise);
 }
 
+std::vector<std::string> Arguments::values(std::string_view option) const {
+  std::vector<std::string> found;
+  for (const auto &[name, value] : given_) {
+    if (name == option) found.push_back(value);
+  }
+  return found;
+}
+
 std::optional<int64_t> Arguments::number(std::string_view option, int64_t least,
                                          int64_t most) const {
   const std::optional<std::string> text = value(option);

@@ -34,6 +34,8 @@ class Arguments {
   // the option was not given.
   std::optional<std::string> value(std::string_view option) const;
   std::string value(std::string_view option, const char *otherwise) const;
+  // Each one, of an option that can be given several times.
+  std::vector<std::string> values(std::string_view option) const;
   // A whole number from `least` to `most`.
   std::optional<int64_t> number(std::string_view option, int64_t least, int64_t most) const;
   const std::vector<std::string> &operands() const { return operands_; }

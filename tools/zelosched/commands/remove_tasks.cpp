@@ -48,15 +48,8 @@ Task loadRemovable(int64_t id, const RemoveRules &rules) {
   return task;
 }
 
-// A run that waits for its turn must not begin when the task is gone: neither one from before, nor
-// one that read the task just then. What goes on is looked after when others may change tasks
-// again.
-void removeAndCancel(const ZELO_SCHED_TASK &task) {
-  const int before = attempt([&] { cancelWaitingOf(task); });
-  removeTask(task);
+void tellRemoved(const ZELO_SCHED_TASK &task) {
   std::printf("%s removed\n", titleOf(task).c_str());
-  cancelWaitingOf(task);
-  if (before != kDone) throw Failure("a run of it that waited may start all the same");
 }
 
 // The lock is not held while an answer is waited for.
@@ -67,14 +60,14 @@ Task askAndRemove(int64_t id, const RemoveRules &rules) {
   if (!isSame(*task, *loadTask(id))) {
     throw Failure(titleOf(*task) + " stays: it has been changed meanwhile");
   }
-  removeAndCancel(*task);
+  removeAndCancel(*task, removeTask, tellRemoved);
   return task;
 }
 
 Task removeUnasked(int64_t id, const RemoveRules &rules) {
   const ChangeLock lock;
   Task task = loadRemovable(id, rules);
-  removeAndCancel(*task);
+  removeAndCancel(*task, removeTask, tellRemoved);
   return task;
 }
 
@@ -88,6 +81,15 @@ void removeOne(int64_t id, const RemoveRules &rules) {
 }
 
 }  // namespace
+
+void removeAndCancel(const ZELO_SCHED_TASK &task, const TaskStep &remove, const TaskStep &tell,
+                     FILE *to) {
+  const int before = attempt([&] { cancelWaitingOf(task, to); });
+  remove(task);
+  tell(task);
+  cancelWaitingOf(task, to);
+  if (before != kDone) throw Failure("a run of it that waited may start all the same");
+}
 
 int removeTasks(const std::vector<int64_t> &ids, const RemoveRules &rules) {
   if (!rules.isSure && isatty(STDIN_FILENO) != 1) {

@@ -10,7 +10,7 @@
 
 namespace {
 
-void tell(const std::string &title, Stopped how) {
+void tell(const std::string &title, Stopped how, FILE *to) {
   const char *what = "";
   switch (how) {
     case Stopped::kCancelled:
@@ -33,7 +33,7 @@ void tell(const std::string &title, Stopped how) {
                     " could not be ended: it starts new processes all the time, or waits for a "
                     "device");
   }
-  std::printf("%s %s\n", title.c_str(), what);
+  std::fprintf(to, "%s %s\n", title.c_str(), what);
 }
 
 }  // namespace
@@ -42,23 +42,23 @@ size_t stopTask(int64_t id, const std::string &title, std::chrono::seconds grace
   std::vector<KeptRun> runs = runsToStop(id);
   if (runs.empty()) return 0;
   noteStop(&runs);
-  for (const KeptRun &run : runs) tell(title, stopRun(run, grace));
+  for (const KeptRun &run : runs) tell(title, stopRun(run, grace), stdout);
   return runs.size();
 }
 
-void tellOfRunsOf(const TaskRecord &task) {
+void tellOfRunsOf(const TaskRecord &task, FILE *to) {
   if (geteuid() != 0 || isPower(task)) return;
   attempt([&] {
     for (const KeptRun &run : runsToStop(task.ID)) {
-      std::printf("a run of it %s: 'zelosched stop %d' ends it\n",
-                  run.state == RunState::kWaiting ? "waits for its turn, and will start"
-                                                  : "is under way, and goes on",
-                  task.ID);
+      std::fprintf(to, "a run of it %s: 'zelosched stop %d' ends it\n",
+                   run.state == RunState::kWaiting ? "waits for its turn, and will start"
+                                                   : "is under way, and goes on",
+                   task.ID);
     }
   });
 }
 
-void cancelWaitingOf(const TaskRecord &task) {
+void cancelWaitingOf(const TaskRecord &task, FILE *to) {
   if (geteuid() != 0 || isPower(task)) return;
   std::vector<KeptRun> runs;
   try {
@@ -77,6 +77,6 @@ void cancelWaitingOf(const TaskRecord &task) {
   });
   if (!runs.empty()) noteStop(&runs);
   for (const KeptRun &run : runs) {
-    if (cancelWaiting(run.process)) tell("a run of it", Stopped::kCancelled);
+    if (cancelWaiting(run.process)) tell("a run of it", Stopped::kCancelled, to);
   }
 }

@@ -3,6 +3,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <cstdio>
 #include <string>
 
 #include "store/task_list.h"
@@ -13,9 +14,9 @@ inline constexpr std::chrono::seconds kUsualGrace(10);
 // Failure.
 size_t stopTask(int64_t id, const std::string &title, std::chrono::seconds grace = kUsualGrace);
 
-// "It is running, and goes on" and the like: on standard output, for a task that was disabled or
-// removed. Nothing when nothing of it is under way.
-void tellOfRunsOf(const TaskRecord &task);
+// "It is running, and goes on" and the like, for a task that was disabled or removed. Nothing when
+// nothing of it is under way.
+void tellOfRunsOf(const TaskRecord &task, FILE *to = stdout);
 
 // Ends those that wait for their turn: a removed task must not begin to run. Told too.
-void cancelWaitingOf(const TaskRecord &task);
+void cancelWaitingOf(const TaskRecord &task, FILE *to = stdout);

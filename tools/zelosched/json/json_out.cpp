@@ -19,15 +19,32 @@ namespace {
 constexpr char kReplacement[] = "\xEF\xBF\xBD";
 
 // The order in which people read them; others come behind, by their names.
-constexpr const char *kOrder[] = {
-    "version",     "severity",   "kind",      "text",    "id",           "run",
-    "task",        "name",       "task_name", "app",     "app_name",     "app_args",
-    "action",      "owner",      "owner_uid", "power",   "enabled",      "schedule",
-    "type",        "date",       "days",      "month",   "day",          "at",
-    "every_hours", "until_hour", "from",      "command", "time_limit",   "overlap",
-    "trigger",     "due",        "queued",    "start",   "end",          "duration_seconds",
-    "state",       "outcome",    "exit_code", "signal",  "output_bytes", "ui",
-    "next_run",    "last_run",   "running",   "problems"};
+constexpr const char *kOrder[] = {"version",      "dry_run",
+                                  "severity",     "kind",
+                                  "text",         "id",
+                                  "run",          "task",
+                                  "name",         "task_name",
+                                  "app",          "app_name",
+                                  "app_args",     "action",
+                                  "change",       "owner",
+                                  "owner_uid",    "power",
+                                  "enabled",      "schedule",
+                                  "type",         "date",
+                                  "days",         "month",
+                                  "day",          "at",
+                                  "every_hours",  "until_hour",
+                                  "from",         "command",
+                                  "time_limit",   "overlap",
+                                  "trigger",      "due",
+                                  "queued",       "start",
+                                  "end",          "duration_seconds",
+                                  "state",        "outcome",
+                                  "exit_code",    "signal",
+                                  "output_bytes", "ui",
+                                  "next_run",     "last_run",
+                                  "running",      "problems",
+                                  "member",       "before",
+                                  "after",        "differences"};
 
 size_t rankOf(const std::string &name) {
   static const auto ranks = [] {
@@ -37,18 +54,6 @@ size_t rankOf(const std::string &name) {
   }();
   const auto found = ranks.find(name);
   return found == ranks.end() ? ranks.size() : found->second;
-}
-
-std::vector<std::string> namesOf(const Json::Value &object) {
-  std::vector<std::pair<size_t, std::string>> ranked;
-  for (std::string &name : object.getMemberNames()) {
-    const size_t rank = rankOf(name);
-    ranked.emplace_back(rank, std::move(name));
-  }
-  std::sort(ranked.begin(), ranked.end());
-  std::vector<std::string> names;
-  for (auto &[rank, name] : ranked) names.push_back(std::move(name));
-  return names;
 }
 
 // Nothing that could upset a terminal: all beyond ASCII is escaped.
@@ -149,6 +154,18 @@ void printList(const Json::Value &list) {
 }
 
 }  // namespace
+
+std::vector<std::string> namesOf(const Json::Value &object) {
+  std::vector<std::pair<size_t, std::string>> ranked;
+  for (std::string &name : object.getMemberNames()) {
+    const size_t rank = rankOf(name);
+    ranked.emplace_back(rank, std::move(name));
+  }
+  std::sort(ranked.begin(), ranked.end());
+  std::vector<std::string> names;
+  for (auto &[rank, name] : ranked) names.push_back(std::move(name));
+  return names;
+}
 
 bool isUtf8(std::string_view text) {
   while (!text.empty()) {

@@ -30,6 +30,9 @@ Json::Value jsonTime(time_t moment);
 // {"version": 1}, to which lists are added.
 Json::Value topObject();
 
+// The members of an object in the order in which people read them.
+std::vector<std::string> namesOf(const Json::Value &object);
+
 Json::Value jsonList(const std::vector<Json::Value> &values);
 
 // To the standard output: the values of the lists of a top object on a line each.

@@ -525,12 +525,18 @@ void readSchedule(const Json::Value &value, const std::string &place, JsonFaults
   members.finish();
 }
 
+// In a file of many tasks their places are hard to count.
+std::string ownedText(Members *members) {
+  const Json::Value *name = members->find(kName.name);
+  return name != nullptr && name->isString() ? ", the owner of " + quotedText(*name) : "";
+}
+
 void readOwner(Members *members, ZELO_SCHED_TASK *task) {
   const Json::Value *value = members->require("owner");
   if (value == nullptr) return;
   std::optional<uid_t> uid;
   if (value->isString()) {
-    uid = findUser(value->asString());
+    uid = findUserByName(value->asString());
   } else if (value->isUInt64() && value->asUInt64() <= UINT32_MAX) {
     const auto number = static_cast<uid_t>(value->asUInt64());
     if (userExists(number)) uid = number;
@@ -538,7 +544,7 @@ void readOwner(Members *members, ZELO_SCHED_TASK *task) {
   if (uid) {
     task->Owner = *uid;
   } else {
-    members->faultOf("owner", "there is no user " + quotedText(*value) +
+    members->faultOf("owner", "there is no user " + quotedText(*value) + ownedText(members) +
                                   ": write the name of one that 'getent passwd' lists");
   }
 }
@@ -692,6 +698,14 @@ std::vector<TaskText> taskTextsOf(const std::string &text, JsonFaults *faults) {
   }
   top.finish();
   return tasks;
+}
+
+void setTimes(const ZELO_SCHED_TASK &task, TaskText *text) {
+  Json::Value &schedule = text->object["schedule"];
+  schedule["at"] = clockText(task.RunHour, task.RunMin);
+  if (task.RepeatHour != 0 && schedule.isMember("until_hour") && !schedule["until_hour"].isNull()) {
+    schedule["until_hour"] = task.LastWorkHour;
+  }
 }
 
 void fillTask(const TaskText &text, ZELO_SCHED_TASK *task, JsonFaults *faults) {

@@ -45,6 +45,9 @@ struct TaskText {
 // The tasks of a file, whose top object is looked at. Throws Failure for what is no JSON at all.
 std::vector<TaskText> taskTextsOf(const std::string &text, JsonFaults *faults);
 
+// Puts the times of the day of that task in place of those that the text has.
+void setTimes(const ZELO_SCHED_TASK &task, TaskText *text);
+
 // Sets what the text names, on the defaults or on a stored task. Members that are absent keep what
 // the task has; another kind of schedule, or another day of it, takes the start date away. Without
 // a fault the task is fit to be saved.

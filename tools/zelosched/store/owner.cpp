@@ -33,8 +33,13 @@ const std::optional<std::string> &nameOf(uid_t uid) {
 
 }  // namespace
 
+std::optional<uid_t> findUserByName(const std::string &name) {
+  const passwd *entry = getpwnam(name.c_str());
+  return entry != nullptr ? std::optional<uid_t>(entry->pw_uid) : std::nullopt;
+}
+
 std::optional<uid_t> findUser(const std::string &nameOrNumber) {
-  if (const passwd *entry = getpwnam(nameOrNumber.c_str())) return entry->pw_uid;
+  if (const auto uid = findUserByName(nameOrNumber)) return uid;
   const std::optional<int64_t> number = parseNumber(nameOrNumber);
   if (!number || *number < 0 || *number > UINT32_MAX) return std::nullopt;
   const auto uid = static_cast<uid_t>(*number);

@@ -9,6 +9,9 @@
 // The user of that name, else of that number; nothing when there is neither.
 std::optional<uid_t> findUser(const std::string &nameOrNumber);
 
+// The user of that name.
+std::optional<uid_t> findUserByName(const std::string &name);
+
 bool userExists(uid_t uid);
 
 // The user's name, or the number of one that has none.

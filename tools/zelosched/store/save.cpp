@@ -22,10 +22,6 @@ void requireUnlike(const ZELO_SCHED_TASK &task) {
   room.take(task);
 }
 
-bool isUnreadable(const ZELO_SCHED_TASK &task) {
-  return isEnabled(task) && !unreadableFieldsOf(task).empty();
-}
-
 bool isStored(int64_t id) {
   return findTask(id) != nullptr;
 }
@@ -53,6 +49,10 @@ void requireHarmless(const ZELO_SCHED_TASK &task) {
     sentences += (i == 0 ? "" : "\nzelosched: not saved: ") + harms[i];
   }
   throw Failure(sentences);
+}
+
+bool isUnreadable(const ZELO_SCHED_TASK &task) {
+  return isEnabled(task) && !unreadableFieldsOf(task).empty();
 }
 
 std::string unreadableTask(const TaskList &list) {
@@ -95,12 +95,7 @@ void createTask(ZELO_SCHED_TASK *task) {
     requireReadableTasks();
     requireCronRoom(hasCronLine(*task) ? 1 : 0);
   }
-  forgetError();
-  if (ZELOSchedTaskCreate(task) < 0) {
-    throwFailedChange(failedTo("save the task"),
-                      [&] { return isPower(*task) && isStored(powerId(*task)); });
-  }
-  noteCreated(*task);
+  storeNew(task);
   requireCrontabInStep();
 }
 
@@ -111,6 +106,27 @@ void editTask(ZELO_SCHED_TASK *task) {
     requireReadableTasks(task->ID);
     if (hasCronLine(*task) && !hasStoredCronLine(task->ID)) requireCronRoom(1);
   }
+  storeChanged(task);
+  requireCrontabInStep();
+}
+
+void removeTask(const ZELO_SCHED_TASK &task) {
+  // The lines of power times are others, which no task can harm.
+  if (!isPower(task)) requireReadableTasks(task.ID);
+  storeRemoved(task);
+  requireCrontabInStep();
+}
+
+void storeNew(ZELO_SCHED_TASK *task) {
+  forgetError();
+  if (ZELOSchedTaskCreate(task) < 0) {
+    throwFailedChange(failedTo("save the task"),
+                      [&] { return isPower(*task) && isStored(powerId(*task)); });
+  }
+  noteCreated(*task);
+}
+
+void storeChanged(ZELO_SCHED_TASK *task) {
   forgetError();
   if (ZELOSchedTaskEdit(task) < 0) {
     throwFailedChange(failedTo("save " + titleOf(*task)),
@@ -118,28 +134,28 @@ void editTask(ZELO_SCHED_TASK *task) {
   }
   if (isPower(*task)) task->ID = powerId(*task);
   noteEdited(*task);
-  requireCrontabInStep();
 }
 
-void removeTask(const ZELO_SCHED_TASK &task) {
-  // The lines of power times are others, which no task can harm.
-  if (!isPower(task)) requireReadableTasks(task.ID);
+void storeRemoved(const ZELO_SCHED_TASK &task) {
   forgetError();
   if (ZELOSchedTaskRemove(task.ID) < 0) {
     throwFailedChange(failedTo("remove " + titleOf(task)),
                       [&] { return isPower(task) && !isStored(task.ID); });
   }
   noteRemoved(task);
-  requireCrontabInStep();
+}
+
+std::string crontabFault(const TaskList &list) {
+  // As long as one is kept out of it, the crontab cannot be in step.
+  if (!unreadableTask(list).empty()) return "";
+  const std::vector<std::string> differences = crontabDifferences(list.tasks());
+  return differences.empty() ? "" : differences.front();
 }
 
 void requireCrontabInStep() {
-  const TaskList list;
-  // As long as one is kept out of it, the crontab cannot be in step.
-  if (!unreadableTask(list).empty()) return;
-  const std::vector<std::string> differences = crontabDifferences(list.tasks());
-  if (differences.empty()) return;
-  throw Failure("the tasks are saved, but cron does not know them all: " + differences.front() +
+  const std::string fault = crontabFault(TaskList());
+  if (fault.empty()) return;
+  throw Failure("the tasks are saved, but cron does not know them all: " + fault +
                 " (the system log says why; 'zelosched sync' tries again)");
 }
 

@@ -21,8 +21,17 @@ void createTask(ZELO_SCHED_TASK *task);
 void editTask(ZELO_SCHED_TASK *task);
 void removeTask(const ZELO_SCHED_TASK &task);
 
-// A sentence on an enabled task with a field that cron cannot read; nothing when there is none.
-// Each change writes the lines of all tasks, and for such a one cron may pass over all of them.
+// The steps of these alone, for several changes that are checked before the first of them and after
+// the last.
+void storeNew(ZELO_SCHED_TASK *task);
+void storeChanged(ZELO_SCHED_TASK *task);
+void storeRemoved(const ZELO_SCHED_TASK &task);
+
+// An enabled task with a field that cron cannot read. Each change writes the lines of all tasks,
+// and for such a one cron may pass over all of them.
+bool isUnreadable(const ZELO_SCHED_TASK &task);
+
+// A sentence on such a task; nothing when there is none.
 std::string unreadableTask(const TaskList &list);
 
 // There is no such task, or the one that is to be changed is one. Throws Failure.
@@ -34,7 +43,11 @@ bool hasCronLine(const ZELO_SCHED_TASK &task);
 // So many more lines leave the crontab short enough for cron. Throws Failure.
 void requireCronRoom(size_t lines);
 
-// The crontab is in step with the store, where no task is kept out of it. Throws Failure.
+// In which way the crontab is not in step with the store, where no task is kept out of it; nothing
+// when it is.
+std::string crontabFault(const TaskList &list);
+
+// It is in step. Throws Failure.
 void requireCrontabInStep();
 
 // What the application allows by hand, unless the administrator insists. Throws Failure.

@@ -106,6 +106,10 @@ bool isEnabled(const TaskRecord &task) {
   return task.State == ZELO_SCHED_STATE_ENABLED;
 }
 
+bool isListed(const TaskRecord &task) {
+  return task.Listable == 1;
+}
+
 bool isPower(const TaskRecord &task) {
   return task.Backend == ZELO_SCHED_BACKEND_AUTOPOWER;
 }

@@ -41,6 +41,7 @@ class TaskList {
 };
 
 bool isEnabled(const TaskRecord &task);
+bool isListed(const TaskRecord &task);
 bool isPower(const TaskRecord &task);
 const char *stateName(const TaskRecord &task);
 const char *typeName(const TaskRecord &task);

@@ -1,0 +1,196 @@
+#!/bin/bash
+# 'zelosched apply', by which many machines are kept alike: what it does and tells, that it takes turns
+# with others, and what is left when it fails or is killed at any step.
+#
+# Functions are called by check:
+# shellcheck disable=SC2317
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+# shellcheck source=tests/support/zelosched_test.sh
+. "$here/support/zelosched_test.sh"
+
+readonly PYTHON=/usr/bin/python3 # which has Debian's jsonschema
+readonly FAIL=$BUILD_DIR/tests/fail_step.so
+
+# ---- helpers --------------------------------------------------------------------------------
+
+# many COUNT [COMMAND]: a file of so many tasks
+many() {
+  "$PYTHON" -c 'import json, sys
+print(json.dumps({"version": 1, "tasks": [
+    {"name": f"Task number {i}", "app": "fleet", "owner": "root", "command": sys.argv[2],
+     "schedule": {"type": "daily", "at": f"{i // 60 % 24:02}:{i % 60:02}"}} for i in range(int(sys.argv[1]))]}))' \
+    "$1" "${2:-/usr/local/bin/collect --all}"
+}
+
+is_valid() {
+  "$PYTHON" "$here/support/json_schema.py" "$@"
+}
+
+# milliseconds COMMAND...: of the processor, that of what it starts counted
+milliseconds() {
+  "$PYTHON" -c 'import resource, subprocess, sys
+subprocess.run(sys.argv[1:], check=True, stdout=subprocess.DEVNULL)
+used = resource.getrusage(resource.RUSAGE_CHILDREN)
+print(int((used.ru_utime + used.ru_stime) * 1000))' "$@"
+}
+
+crontab_fits() {
+  { z status || true; } >said
+  grep -q '^ok .*crontab is in step' said || { cat said; return 1; }
+}
+
+# ---- JSON -----------------------------------------------------------------------------------
+
+what_it_tells_is_valid() {
+  local options
+  clean
+  add --daily 08:30 --name old --app backup -- true
+  for options in --dry-run "--dry-run --diff" --diff --diff ""; do
+    set_of 02:30 >set.json
+    # shellcheck disable=SC2086
+    { z apply set.json --json --prune --app backup $options || true; } >out
+    is_valid changes <out || { echo "$options"; return 1; }
+  done
+}
+
+# ---- turns ----------------------------------------------------------------------------------
+
+two_applies_take_turns() {
+  local i
+  clean
+  for i in 1 2; do many 20 "true $i" >"set$i"; done
+  for i in 1 2 1 2 1 2; do z apply "set$i" >"told$i" & done
+  wait
+  z export >out
+  # Each as a whole, so that all tasks are of the one that was last.
+  same "$("$PYTHON" -c 'import json; t = json.load(open("out"))["tasks"]; print(len(t), len({x["command"] for x in t}))')" "20 1" &&
+    same "$(task_lines)" 20 && crontab_fits
+}
+
+an_apply_and_others_take_turns() {
+  local i
+  clean
+  many 20 >set.json
+  z apply set.json >told &
+  for i in {1..5}; do add --daily 08:30 --name "own $i" -- true & done
+  wait
+  z apply set.json >told &
+  for i in {1..5}; do z edit "own $i" --app-args "$i" >/dev/null & done
+  wait
+  same "$(z list --all --json | json 'len(tasks), sum(t["app_args"] is not None for t in tasks)')" "25 5" &&
+    same "$(grep -c unchanged told)" 20 && crontab_fits
+}
+
+# It looks at the tasks when it has its turn, not before.
+what_changed_while_it_waited_is_seen() {
+  clean
+  set_of 02:30 >set.json
+  z apply set.json >told
+  hold_lock /run/zelosched.lock
+  "$ZELOSCHED" apply set.json >told &
+  local apply=$!
+  until readlink "/proc/$apply/fd/"* | grep -q zelosched.lock; do :; done
+  edit_by_hand 's/^run min="30"/run min="31"/' # as another program does
+  kill "$held"
+  wait "$apply"
+  same "$(head -1 told)" "task 1 (Backup) changed"
+}
+
+# ---- steps that fail ------------------------------------------------------------------------
+
+# A removal, a change, a creation, and one that stays.
+before_and_after() {
+  clean
+  file_of "$(one removed 01:00)" "$(one changed 02:00)" "$(one same 03:00)" >old
+  file_of "$(one changed 04:00)" "$(one same 03:00)" "$(one created 05:00)" >new
+  z apply new --prune --app fleet >/dev/null
+  z export >exported.new
+  clean
+  z apply old >/dev/null
+  z export >exported.old
+  tar -cPf kept.tar "$STORE" "$PERSISTENT" "$LAST_GOOD" "$KEPT" /etc/crontab
+}
+
+one() {
+  echo '{"name": "'"$1"'", "app": "fleet", "owner": "root", "schedule": {"type": "daily", "at": "'"$2"'"}, "command": "true"}'
+}
+
+as_before() {
+  rm -f "$STORE"* /usr/zelo/etc/* /usr/zelo/var/*
+  tar -xPf kept.tar
+}
+
+# is_old_or_new: each task that is stored, whatever became of the others
+is_old_or_new() {
+  "$PYTHON" - <<'PY'
+import json, subprocess, os
+def tasks(path):
+    with open(path) as file: return {t["name"]: t for t in json.load(file)["tasks"]}
+old, new, now = (tasks("exported." + name) for name in ("old", "new", "now"))
+for name in old.keys() | new.keys() | now.keys():
+    assert now.get(name) in (old.get(name), new.get(name)), name
+PY
+}
+
+# fails_at_every_step ERROR
+fails_at_every_step() {
+  local step bad=0
+  before_and_after
+  for ((step = 1; step < 5000; step++)); do
+    as_before
+    rm -f mark
+    FAIL_STEP=$step FAIL_ERROR=$1 FAIL_MARK=$SCRATCH/mark LD_PRELOAD=$FAIL \
+      try z apply new --prune --app fleet
+    if [[ ! -e mark ]]; then break; fi
+    if [[ $1 != kill && $status != 0 && $status != 1 ]]; then
+      echo "step $step: status $status"
+      bad=1
+    fi
+    if ! z export >exported.now 2>export.err || ! is_old_or_new; then
+      echo "step $step: torn"
+      cat export.err
+      bad=1
+    fi
+    # What it says is done is done.
+    if [[ $1 != kill && $status == 0 ]]; then
+      cmp -s exported.now exported.new || { echo "step $step: not done, and not told"; bad=1; }
+    fi
+    try z apply new --prune --app fleet
+    { [[ $status == 0 ]] && z export | cmp -s - exported.new && same "$(task_lines)" 3; } ||
+      { echo "step $step: a second apply: $err"; bad=1; }
+    ((bad == 0)) || return 1
+  done
+  echo "# $1: $((step - 1)) steps"
+  ((step > 100))
+}
+
+# ---- cost -----------------------------------------------------------------------------------
+
+is_quick() {
+  local first again
+  clean
+  many 250 >set.json
+  first=$(milliseconds "$ZELOSCHED" apply set.json)
+  again=$(milliseconds "$ZELOSCHED" apply set.json)
+  echo "# 250 tasks from nothing in $first ms, unchanged in $again ms"
+  ((first <= 5000 && again <= 100))
+}
+
+start_zelosched_tests
+transcripts zelosched_apply.txt
+check "what it tells as JSON is what the schema says" what_it_tells_is_valid
+check "several applies take turns, each as a whole" two_applies_take_turns
+check "and so do an apply and those that add and edit" an_apply_and_others_take_turns
+check "what changed while it waited is seen" what_changed_while_it_waited_is_seen
+check "killed at any step, each task is old or new, and a second apply completes it" fails_at_every_step kill
+check "where any step fails once, it is told, and a second apply completes it" fails_at_every_step 5
+if grep -q -e __asan_init -e __gcov_ "$ZELOSCHED"; then
+  skip "250 tasks take their time at most" "this build watches each call"
+else
+  check "250 tasks take their time at most" is_quick
+fi
+finish
