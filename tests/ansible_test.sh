@@ -16,8 +16,9 @@ readonly SCRATCH=/run/fleet
 readonly ROOT=$here/..
 readonly MACHINES="11 12 13"
 
-if ! command -v ansible-playbook >/dev/null || [[ ! -x /usr/sbin/sshd ]]; then
-  skip "many machines are managed" "ansible-core or openssh-server is not installed"
+sshd=$(daemon openssh-server /usr/sbin/sshd)
+if ! command -v ansible-playbook >/dev/null || [[ ! -x $sshd ]]; then
+  skip "many machines are managed" "scripts/deps installs ansible-core and sshd"
   finish
 fi
 if ((EUID != 0)) || [[ $(awk '{ print $3 }' /proc/self/uid_map) == 1 ]]; then
@@ -62,7 +63,7 @@ CONFIG
 
 start_machine() {
   rm -f "$SCRATCH/$1.up"
-  "$ROOT/scripts/sandbox" "$here/support/machine.sh" "$1" "$SCRATCH" &
+  "$ROOT/scripts/sandbox" "$here/support/machine.sh" "$1" "$SCRATCH" "$sshd" &
   eval "machine_$1=$!"
   until [[ -e $SCRATCH/$1.up ]]; do kill -0 "$!"; done
 }

@@ -31,7 +31,7 @@ start_exporter() {
   directory=$(sed -n 's/^ConditionPathIsDirectory=//p' "$UNIT")
   mount -n -t tmpfs collected /var/lib/prometheus
   mkdir -p "$directory"
-  prometheus-node-exporter --collector.disable-defaults --collector.textfile \
+  "$(daemon prometheus-node-exporter /usr/bin/prometheus-node-exporter)" --collector.disable-defaults --collector.textfile \
     --collector.textfile.directory="$directory" --web.listen-address="$ADDRESS" >exporter.log 2>&1 &
   exporter=$!
   until scrape >/dev/null 2>&1; do
