@@ -234,6 +234,39 @@ machines_begin_at_times_of_their_own() {
   is "$(of 'sorted(s["changed"] for s in stats.values())')" "[0, 0]"
 }
 
+# ---- without Ansible ------------------------------------------------------------------------
+
+a_file_over_ssh_does_it_too() {
+  local number status told=""
+  a_set 04:30 Weekly >set.json
+  for number in 11 12; do
+    status=0
+    on "$number" zelosched apply - --prune --app backup --dry-run <set.json >/dev/null || status=$?
+    told+="$status "
+    on "$number" zelosched apply - --prune --app backup <set.json >/dev/null || told+="failed "
+    status=0
+    on "$number" zelosched apply - --prune --app backup --dry-run <set.json >/dev/null || status=$?
+    told+="$status "
+  done
+  same "$told$(tasks_of 12)" "3 0 3 0 Nightly@04:30 Weekly@03:00"
+}
+
+# The script of the package in the documentation.
+a_package_of_the_set_does_it_too() {
+  a_set 04:45 >set.json
+  sed -n '/^    #!\/bin\/sh/,/^    fi/s/^    //p' "$ROOT/docs/fleet.md" |
+    sed "s,/usr/share/our-tasks/set.json,/run/set.json," >postinst
+  grep -q stagger postinst || return 1
+  on 12 'cat >/run/set.json' <set.json && on 12 sh -s triggered <postinst >told &&
+    same "$(cat told)$(tasks_of 12)" "Nightly@04:30 Weekly@03:00" || return 1
+  on 12 sh -s configure <postinst >told && on 12 sh -s configure <postinst >again &&
+    same "$(sort told again)" "$(sort <<<"task 2 (Weekly) removed
+task 1 (Nightly) changed
+task 1 (Nightly) unchanged")"
+}
+
+# ---- the module for one task ----------------------------------------------------------------
+
 # one_task OPTIONS [MODE...]: by the module for one
 one_task() {
   status=0
@@ -326,6 +359,8 @@ check "and has all when it is back" and_has_all_when_it_is_back
 check "a machine that refuses the set disturbs no other, and says why" a_machine_that_refuses_disturbs_no_other
 check "a machine without cron fails the play" a_machine_without_cron_fails_the_play
 check "machines begin at times of their own, always the same" machines_begin_at_times_of_their_own
+check "a file over ssh does the same" a_file_over_ssh_does_it_too
+check "and so does a package of the set, as the documentation has it" a_package_of_the_set_does_it_too
 check "one task comes, changes and goes" one_task_comes_changes_and_goes
 check "what is wrong with a task is told" faults_are_told_by_the_module
 check "ansible-doc describes the modules" modules_are_described
