@@ -55,6 +55,7 @@ share/bash-completion/completions/zelosched
 share/fish/vendor_completions.d/zelosched.fish
 share/zelosched/mail-on-failure
 share/zelosched/zelosched-1.schema.json
+share/zelosched/zelosched.rules.yml
 share/zeloscheduler/take_lines_out
 share/zeloscheduler/zeloschedtask.stand-in
 share/zsh/vendor-completions/_zelosched

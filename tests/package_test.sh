@@ -178,6 +178,7 @@ zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zelosched.8.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/man/man8/zeloschedtask.8.gz
 zeloscheduler-tools -rw-r--r-- root:root usr/share/zelosched/zelosched-1.schema.json
 zeloscheduler-tools -rwxr-xr-x root:root usr/share/zelosched/mail-on-failure
+zeloscheduler-tools -rw-r--r-- root:root usr/share/zelosched/zelosched.rules.yml
 zeloscheduler-tools -rw-r--r-- root:root usr/share/zsh/vendor-completions/_zelosched
 zeloscheduler-tools -rwxr-xr-x root:root etc/init.d/zelosched-restore
 zeloscheduler-tools -rwxr-xr-x root:root usr/sbin/zelosched

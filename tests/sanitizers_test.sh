@@ -21,9 +21,12 @@ build() {
     { tail -50 "$BUILD_DIR/sanitized.log"; return 1; }
 }
 
-# Debian's cron, where scripts/deps has unpacked it.
-lend_cron() {
-  if [[ -e $BUILD_DIR/cron ]]; then ln -sfn "$BUILD_DIR/cron" "$SANITIZED/cron"; fi
+# Daemons that scripts/deps has unpacked.
+lend_daemons() {
+  local daemon
+  for daemon in cron openssh-server prometheus-node-exporter; do
+    if [[ -e $BUILD_DIR/$daemon ]]; then ln -sfn "$BUILD_DIR/$daemon" "$SANITIZED/$daemon"; fi
+  done
 }
 
 programs() {
@@ -35,7 +38,7 @@ programs() {
 # sanitizers' own.
 run_tests() {
   local log=$SANITIZED/tests.log
-  lend_cron
+  lend_daemons
   local -a names
   mapfile -t names <<<"$(programs)"
   BUILD_DIR=$SANITIZED PROGRAMS_AT_ONCE=1 ZELO_SOAK_FACTOR=${ZELO_SOAK_FACTOR:-0.1} UBSAN_OPTIONS=print_stacktrace=1 \

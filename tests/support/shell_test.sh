@@ -20,6 +20,11 @@ skip() {
   echo "skip - $1 ($2)"
 }
 
+# daemon PACKAGE PROGRAM: that of the machine, or the one that scripts/deps has unpacked
+daemon() {
+  if [[ -x $2 ]]; then echo "$2"; else echo "$BUILD_DIR/$1$2"; fi
+}
+
 # Compares two texts and shows both when they differ.
 same() {
   [[ $1 == "$2" ]] || { printf 'wanted: %s\ngot:    %s\n' "$2" "$1"; return 1; }

@@ -36,6 +36,11 @@ const TaskRecord &taskOf(const ApplyStep &step) {
   return step.after != nullptr ? *step.after : *step.before;
 }
 
+// As long as it has no number.
+std::string titleOfNew(const TaskRecord &task) {
+  return "a task (" + printable(task.Name) + ")";
+}
+
 // Of each step a line, or in the end one object of them all.
 class Report {
  public:
@@ -83,8 +88,7 @@ class Report {
  private:
   void print(const ApplyStep &step, const std::vector<MemberDifference> &differences) const {
     const bool isNew = step.change == Change::kCreated && rules_.isDryRun;
-    const TaskRecord &task = taskOf(step);
-    const std::string title = isNew ? "a task (" + printable(task.Name) + ")" : titleOf(task);
+    const std::string title = isNew ? titleOfNew(*step.after) : titleOf(taskOf(step));
     const bool isPlan = rules_.isDryRun && step.change != Change::kUnchanged;
     std::printf("%s %s%s\n", title.c_str(), isPlan ? "would be " : "", nameOf(step.change));
     for (const MemberDifference &difference : differences) {
@@ -125,10 +129,18 @@ FILE *streamForRuns(const ApplyRules &rules) {
   return rules.isJson ? stderr : stdout;
 }
 
+void create(TaskRecord *task) {
+  try {
+    storeNew(task);
+  } catch (const Failure &failure) {
+    throw Failure(titleOfNew(*task) + ": " + failure.what());
+  }
+}
+
 void take(const ApplyStep &step, const ApplyRules &rules, Report *report) {
   switch (step.change) {
     case Change::kCreated:
-      storeNew(step.after.get());
+      create(step.after.get());
       break;
     case Change::kChanged:
       storeChanged(step.after.get());

@@ -147,7 +147,7 @@ int runImport(int argc, char **argv) {
 }  // namespace
 
 const Command kImportCommand = {
-    "import", "FILE|- [--force] | --wire [--new]", "save the tasks of an export",
+    "import", "FILE|- [--force | --wire [--new]]", "save the tasks of an export",
     "Saves the tasks of a file that 'zelosched export' wrote, as 'zelosched apply' does: one of\n"
     "a known application and name is changed, any other is created, and none is removed.\n"
     "\n"

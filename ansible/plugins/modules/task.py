@@ -1,0 +1,208 @@
+#!/usr/bin/python
+from __future__ import absolute_import, division, print_function
+
+__metaclass__ = type
+
+DOCUMENTATION = r"""
+module: task
+short_description: Look after one scheduled task
+description:
+  - Creates, changes or removes one scheduled task, which is known by its application and its name.
+  - What is not given stays as it is on the machine, or is the default of a new task.
+  - For many tasks, M(zelo.scheduler.tasks) is quicker, and removes those that are no longer wanted.
+version_added: 4.0.0
+options:
+  name:
+    description: Its name, which lists show.
+    type: str
+    required: true
+  app:
+    description: The application that it belongs to.
+    type: str
+    default: ''
+  state:
+    description: Whether there is to be such a task.
+    type: str
+    choices: [present, absent]
+    default: present
+  owner:
+    description: The name of the user under whose rights it runs.
+    type: str
+  schedule:
+    description:
+      - When it runs, in the words of zelosched-json(5), which the examples show.
+      - Write times in quotes, as YAML takes C(10:30) for a number.
+    type: dict
+  command:
+    description: What the shell runs.
+    type: str
+  time_limit:
+    description: A run that goes on for longer is ended, such as C(90s), C(30m), C(2h) or C(1d). Empty for no limit.
+    type: str
+  enabled:
+    description: Whether it runs at its times.
+    type: bool
+  overlap:
+    description: Whether a run may overlap others, C(task) of the same task, C(app) of its application.
+    type: dict
+    suboptions:
+      task:
+        description: Another run of the same task.
+        type: bool
+      app:
+        description: Runs of other tasks of the same application.
+        type: bool
+  app_name:
+    description: The name of the application for lists.
+    type: str
+  app_args:
+    description: A text for the application.
+    type: str
+  action:
+    description: What the task does, for display.
+    type: str
+  ui:
+    description: How user interfaces show and offer it, in the words of zelosched-json(5).
+    type: dict
+  stagger:
+    description:
+      - Spreads the times over so many minutes or hours, such as C(30m) or C(2h), by the machine and the task, so that
+        many machines do not begin at once. The same machine always gets the same times.
+    type: str
+  force:
+    description: Also changes and removes a task that its application hides or protects.
+    type: bool
+    default: false
+  executable:
+    description: The program, where it is not in the usual place.
+    type: path
+attributes:
+  check_mode:
+    description: Can run in C(check_mode) and predict what would be changed, without changing anything.
+    support: full
+  diff_mode:
+    description: Tells what changes, member by member, in diff mode.
+    support: full
+author:
+  - zeloscheduler maintainers (@zeloscheduler)
+seealso:
+  - module: zelo.scheduler.tasks
+notes:
+  - Changing tasks takes the rights of root.
+"""
+
+EXAMPLES = r"""
+- name: A backup every night
+  zelo.scheduler.task:
+    name: Nightly backup
+    app: backup
+    owner: backup
+    schedule: {type: daily, at: "02:30"}
+    command: /usr/local/bin/backup --all
+    time_limit: 2h
+  become: true
+
+- name: No backup any more
+  zelo.scheduler.task:
+    name: Nightly backup
+    app: backup
+    state: absent
+  become: true
+"""
+
+RETURN = r"""
+changes:
+  description: What became of the task; empty when it is absent and was.
+  returned: always
+  type: list
+  elements: dict
+  contains:
+    id:
+      description: The number of the task on the machine; null of one that is not created yet.
+      type: int
+    name:
+      description: Its name.
+      type: str
+    app:
+      description: Its application; null where it has none.
+      type: str
+    change:
+      description: C(created), C(changed), C(unchanged) or C(removed).
+      type: str
+  sample: [{"id": 1, "name": "Nightly backup", "app": "backup", "change": "created"}]
+"""
+
+import json
+
+from ansible.module_utils.basic import AnsibleModule
+from ansible_collections.zelo.scheduler.plugins.module_utils.zelosched import COMMON_OPTIONS, apply_tasks, call
+
+MEMBERS = {
+    "owner": {"type": "str"},
+    "schedule": {"type": "dict"},
+    "command": {"type": "str"},
+    "time_limit": {"type": "str"},
+    "enabled": {"type": "bool"},
+    "overlap": {"type": "dict", "options": {"task": {"type": "bool"}, "app": {"type": "bool"}}},
+    "app_name": {"type": "str"},
+    "app_args": {"type": "str"},
+    "action": {"type": "str"},
+    "ui": {"type": "dict"},
+}
+
+
+def described(params):
+    """The task, with the members that are given."""
+    task = {name: params[name] for name in MEMBERS if params[name] is not None}
+    task["name"] = params["name"]
+    task["app"] = params["app"]
+    if "overlap" in task:
+        task["overlap"] = {name: flag for name, flag in task["overlap"].items() if flag is not None}
+    if task.get("time_limit") == "":
+        task["time_limit"] = None
+    return task
+
+
+def remove(module):
+    name, app = module.params["name"], module.params["app"]
+    tasks = json.loads(call(module, ["list", "--all", "--json"]))["tasks"]
+    found = [t for t in tasks if t["name"] == name and (t["app"] or "") == app]
+    if len(found) > 1:
+        module.fail_json(msg="tasks %s have this name and application: remove them by their numbers"
+                         % " and ".join(str(t["id"]) for t in found))
+    if not found:
+        return {"changed": False, "changes": []}
+    force = ["--force"] if module.params["force"] else []
+    if module.check_mode:
+        if not force and not found[0]["ui"]["can_delete"]:
+            module.fail_json(msg="the application of task %d (%s) does not let it be removed by hand"
+                             % (found[0]["id"], name))
+    else:
+        call(module, ["remove", "--yes"] + force + [str(found[0]["id"])])
+    change = {"id": found[0]["id"], "name": name, "app": found[0]["app"], "change": "removed"}
+    result = {"changed": True, "changes": [change]}
+    if module._diff:
+        result["diff"] = {"before": json.dumps(found[0], indent=2, ensure_ascii=False) + "\n", "after": ""}
+    return result
+
+
+def main():
+    options = dict(
+        COMMON_OPTIONS,
+        name={"type": "str", "required": True},
+        app={"type": "str", "default": ""},
+        state={"type": "str", "choices": ["present", "absent"], "default": "present"},
+        **MEMBERS
+    )
+    module = AnsibleModule(
+        argument_spec=options,
+        required_if=[("state", "present", ("owner", "schedule", "command"))],
+        supports_check_mode=True,
+    )
+    if module.params["state"] == "absent":
+        module.exit_json(**remove(module))
+    module.exit_json(**apply_tasks(module, [described(module.params)]))
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,123 @@
+#!/usr/bin/python
+from __future__ import absolute_import, division, print_function
+
+__metaclass__ = type
+
+DOCUMENTATION = r"""
+module: tasks
+short_description: Make a set of scheduled tasks be as it is described
+description:
+  - Creates and changes scheduled tasks until they are as the set says, by one C(zelosched apply) for the whole set.
+  - A task is known by its application and its name. What the set does not say of a task stays as it is on the
+    machine, or is the default of a new task.
+  - When one task of the set cannot be saved, nothing is changed, and every fault is told.
+version_added: 4.0.0
+options:
+  tasks:
+    description:
+      - The tasks, in the words of zelosched-json(5). Of each, C(name), C(owner), C(schedule) and C(command) must be
+        given.
+      - Write times in quotes, as YAML takes C(10:30) for a number.
+      - The tasks of a file that C(zelosched export) wrote are C((lookup('file', 'set.json') | from_json).tasks).
+    type: list
+    elements: dict
+    required: true
+  prune:
+    description:
+      - Applications of which every task that the set lacks is removed.
+      - An empty text stands for the tasks that belong to no application.
+    type: list
+    elements: str
+    default: []
+  stagger:
+    description:
+      - Spreads the times over so many minutes or hours, such as C(30m) or C(2h), by the machine and the task, so that
+        many machines do not begin at once. The same machine always gets the same times.
+    type: str
+  force:
+    description:
+      - Also changes and removes tasks that their application hides or protects.
+    type: bool
+    default: false
+  executable:
+    description:
+      - The program, where it is not in the usual place.
+    type: path
+attributes:
+  check_mode:
+    description: Can run in C(check_mode) and predict what would be changed, without changing anything.
+    support: full
+  diff_mode:
+    description: Tells what changes, member by member, in diff mode.
+    support: full
+author:
+  - zeloscheduler maintainers (@zeloscheduler)
+seealso:
+  - module: zelo.scheduler.task
+notes:
+  - Changing tasks takes the rights of root.
+"""
+
+EXAMPLES = r"""
+- name: The tasks of the backup, and no others of it
+  zelo.scheduler.tasks:
+    prune: [backup]
+    stagger: 30m
+    tasks:
+      - name: Nightly backup
+        app: backup
+        owner: backup
+        schedule: {type: daily, at: "02:30"}
+        command: /usr/local/bin/backup --all
+        time_limit: 2h
+      - name: Check the backup
+        app: backup
+        owner: backup
+        schedule: {type: weekly, days: [sun], at: "12:00"}
+        command: /usr/local/bin/backup --verify
+  become: true
+
+- name: A set that was exported from another machine
+  zelo.scheduler.tasks:
+    tasks: "{{ (lookup('file', 'set.json') | from_json).tasks }}"
+  become: true
+"""
+
+RETURN = r"""
+changes:
+  description: What became of each task, also of those that stayed as they were.
+  returned: always
+  type: list
+  elements: dict
+  contains:
+    id:
+      description: The number of the task on the machine; null of one that is not created yet.
+      type: int
+    name:
+      description: Its name.
+      type: str
+    app:
+      description: Its application; null where it has none.
+      type: str
+    change:
+      description: C(created), C(changed), C(unchanged), C(removed) or C(failed).
+      type: str
+  sample: [{"id": 1, "name": "Nightly backup", "app": "backup", "change": "created"}]
+"""
+
+from ansible.module_utils.basic import AnsibleModule
+from ansible_collections.zelo.scheduler.plugins.module_utils.zelosched import COMMON_OPTIONS, apply_tasks
+
+
+def main():
+    options = dict(
+        COMMON_OPTIONS,
+        tasks={"type": "list", "elements": "dict", "required": True},
+        prune={"type": "list", "elements": "str", "default": []},
+    )
+    module = AnsibleModule(argument_spec=options, supports_check_mode=True)
+    module.exit_json(**apply_tasks(module, module.params["tasks"], module.params["prune"]))
+
+
+if __name__ == "__main__":
+    main()

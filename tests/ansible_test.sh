@@ -1,0 +1,369 @@
+#!/bin/bash
+# Many machines from one place: the Ansible collection, by Debian's Ansible over ssh, against three
+# machines, each of which is a sandbox with an sshd.
+#
+# Functions are called by check:
+# shellcheck disable=SC2317
+set -euo pipefail
+
+here=$(cd "$(dirname "$0")" && pwd -P)
+# shellcheck source=tests/support/own_network.sh
+. "$here/support/own_network.sh"
+# shellcheck source=tests/support/shell_test.sh
+. "$here/support/shell_test.sh"
+
+readonly SCRATCH=/run/fleet
+readonly ROOT=$here/..
+readonly MACHINES="11 12 13"
+
+sshd=$(daemon openssh-server /usr/sbin/sshd)
+if ! command -v ansible-playbook >/dev/null || [[ ! -x $sshd ]]; then
+  skip "many machines are managed" "scripts/deps installs ansible-core and sshd"
+  finish
+fi
+if ((EUID != 0)) || [[ $(awk '{ print $3 }' /proc/self/uid_map) == 1 ]]; then
+  skip "many machines are managed" "sshd needs more users than this sandbox has"
+  finish
+fi
+
+# ---- machines -------------------------------------------------------------------------------
+
+prepare() {
+  mkdir -p "$SCRATCH"
+  cd "$SCRATCH"
+  ssh-keygen -q -t ed25519 -N '' -f key
+  ssh-keygen -q -t ed25519 -N '' -f host_key
+  local number
+  for number in $MACHINES; do echo "127.0.0.$number $(cat host_key.pub)" >>known_hosts; done
+  # What the tests need of Ansible, and nothing of the user's.
+  export HOME=$SCRATCH ANSIBLE_HOME=$SCRATCH/ansible ANSIBLE_CONFIG=$SCRATCH/ansible.cfg
+  export ANSIBLE_COLLECTIONS_PATH=$SCRATCH/collections LC_ALL=C.UTF-8
+  mkdir -p collections/ansible_collections/zelo
+  cp -r "$ROOT/ansible" collections/ansible_collections/zelo/scheduler
+  mkdir callbacks
+  cp "$here/support/ansible_told.py" callbacks
+  cat >ansible.cfg <<CONFIG
+[defaults]
+remote_tmp = /run/ansible
+interpreter_python = /usr/bin/python3
+nocows = true
+stdout_callback = ansible_told
+callback_plugins = $SCRATCH/callbacks
+[ssh_connection]
+ssh_args = -F none -i $SCRATCH/key -o UserKnownHostsFile=$SCRATCH/known_hosts -o ControlMaster=auto -o ControlPersist=60
+pipelining = true
+CONFIG
+  {
+    echo "[all]"
+    for number in $MACHINES; do echo "machine$number ansible_host=127.0.0.$number"; done
+    echo "[all:vars]"
+    echo "ansible_user=root"
+  } >inventory
+}
+
+start_machine() {
+  rm -f "$SCRATCH/$1.up"
+  "$ROOT/scripts/sandbox" "$here/support/machine.sh" "$1" "$SCRATCH" "$sshd" &
+  eval "machine_$1=$!"
+  until [[ -e $SCRATCH/$1.up ]]; do kill -0 "$!"; done
+}
+
+stop_machine() {
+  local process=machine_$1
+  kill -KILL "${!process}" # which takes all of the sandbox with it
+  wait "${!process}" 2>/dev/null || true
+}
+
+# on NUMBER COMMAND...
+on() {
+  local number=$1
+  shift
+  timeout 60 ssh -F none -i "$SCRATCH/key" -o UserKnownHostsFile="$SCRATCH/known_hosts" "root@127.0.0.$number" "$@"
+}
+
+# ---- playing --------------------------------------------------------------------------------
+
+# play [OPTION...]: the example, without its packages, for the set in set.json; keeps $status and out.json
+play() {
+  status=0
+  timeout 100 ansible-playbook -i inventory collections/ansible_collections/zelo/scheduler/playbooks/fleet.yml \
+    --skip-tags packages -e set="$SCRATCH/set.json" -e '{"applications": ["backup"]}' "$@" \
+    >out.json 2>err || status=$?
+}
+
+# of EXPRESSION: `hosts` has what each task of the play gave on each machine, `stats` the sums
+of() {
+  python3 -c 'import json, sys
+with open("out.json") as file: hosts, stats = json.load(file).values()
+def changes(host): return [(c["name"], c["change"]) for c in hosts[host]["The tasks are those of the set"]["changes"]]
+print(eval(sys.argv[1]))' "$1"
+}
+
+# is OPERATION...: compares, and shows what Ansible said when they differ
+is() {
+  same "$@" || { head -c 4000 out.json err; return 1; }
+}
+
+# a_set TIME [NAME...]: one backup that payroll owns and as many as are named
+a_set() {
+  python3 - "$@" <<'PY'
+import json, sys
+def task(name, at): return {"name": name, "app": "backup", "owner": "payroll", "command": "true",
+                            "schedule": {"type": "daily", "at": at}}
+print(json.dumps({"version": 1, "tasks": [task("Nightly", sys.argv[1]), *(task(n, "03:00") for n in sys.argv[2:])]}))
+PY
+}
+
+# The names and times of the tasks of a machine
+tasks_of() {
+  on "$1" zelosched export | python3 -c 'import json, sys
+print(*sorted(t["name"] + "@" + t["schedule"]["at"] for t in json.load(sys.stdin)["tasks"]))'
+}
+
+each_has() {
+  local number
+  for number in $MACHINES; do same "$(tasks_of "$number")" "$1" || return 1; done
+}
+
+check_mode_predicts_the_first_play() {
+  a_set 02:30 Weekly >set.json
+  play --check --diff
+  is "$status $(of '[changes(h) for h in sorted(hosts)]')" \
+    "0 [$(printf "[('Nightly', 'created'), ('Weekly', 'created')], %.0s" 1 2 | sed 's/, $//'), [('Nightly', 'created'), ('Weekly', 'created')]]" &&
+    is "$(of '{(h, s["changed"]) for h, s in stats.items()} == {("machine%d" % n, 1) for n in (11, 12, 13)}')" True &&
+    is "$(of '"command: \"true\"" in hosts["machine11"]["The tasks are those of the set"]["diff"][0]["after"]')" True &&
+    each_has ""
+}
+
+the_first_play_changes() {
+  play
+  is "$status $(of 'sorted(s["changed"] for s in stats.values())')" "0 [1, 1, 1]" &&
+    is "$(of 'changes("machine12")')" "[('Nightly', 'created'), ('Weekly', 'created')]" &&
+    each_has "Nightly@02:30 Weekly@03:00"
+}
+
+# Whatever its number is there.
+an_owner_is_the_same_person_everywhere() {
+  local number
+  for number in $MACHINES; do
+    same "$(on "$number" zelosched list --json | python3 -c 'import json, sys
+print({(t["owner"], t["owner_uid"]) for t in json.load(sys.stdin)["tasks"]})')" "{('payroll', $((2000 + number)))}" || return 1
+  done
+}
+
+the_second_play_changes_nothing() {
+  play --diff
+  is "$status $(of 'sorted(s["changed"] for s in stats.values())')" "0 [0, 0, 0]" &&
+    is "$(of 'changes("machine13")')" "[('Nightly', 'unchanged'), ('Weekly', 'unchanged')]"
+}
+
+a_machine_that_differs_alone_is_changed() {
+  on 12 zelosched edit Nightly --daily 05:00 >/dev/null
+  play --check --diff
+  is "$(of 'sorted((h, s["changed"]) for h, s in stats.items())')" "[('machine11', 0), ('machine12', 1), ('machine13', 0)]" &&
+    is "$(of '{n: hosts["machine12"]["The tasks are those of the set"]["diff"][0][n] for n in ("before", "after")}')" \
+      "{'before': 'schedule.at: \"05:00\"\\n', 'after': 'schedule.at: \"02:30\"\\n'}" || return 1
+  play
+  is "$(of 'sorted((h, s["changed"]) for h, s in stats.items())')" "[('machine11', 0), ('machine12', 1), ('machine13', 0)]" &&
+    each_has "Nightly@02:30 Weekly@03:00"
+}
+
+others_keep_their_own_and_the_set_loses_one() {
+  local number
+  for number in $MACHINES; do on "$number" zelosched add --daily 01:00 --name own -- true >/dev/null; done
+  a_set 02:30 >set.json
+  play --check
+  is "$(of 'changes("machine11")')" "[('Weekly', 'removed'), ('Nightly', 'unchanged')]" &&
+    each_has "Nightly@02:30 Weekly@03:00 own@01:00" || return 1
+  play
+  is "$status $(of 'changes("machine13")')" "0 [('Weekly', 'removed'), ('Nightly', 'unchanged')]" &&
+    each_has "Nightly@02:30 own@01:00"
+}
+
+an_unreachable_machine_disturbs_no_other() {
+  stop_machine 12
+  a_set 02:45 >set.json
+  play
+  is "$((status != 0)) $(of 'sorted((h, s["unreachable"], s["changed"]) for h, s in stats.items())')" \
+    "1 [('machine11', 0, 1), ('machine12', 1, 0), ('machine13', 0, 1)]" &&
+    same "$(tasks_of 11) $(tasks_of 13)" "Nightly@02:45 own@01:00 Nightly@02:45 own@01:00"
+}
+
+# It comes up without any task, as a new one does.
+and_has_all_when_it_is_back() {
+  start_machine 12
+  play
+  is "$status $(of 'sorted((h, s["changed"]) for h, s in stats.items())')" "0 [('machine11', 0), ('machine12', 1), ('machine13', 0)]" &&
+    same "$(tasks_of 12)" "Nightly@02:45"
+}
+
+a_machine_that_refuses_disturbs_no_other() {
+  on 11 "sed -i /^payroll:/d /etc/passwd"
+  a_set 02:50 >set.json
+  play
+  is "$((status != 0)) $(of 'sorted((h, s["failures"], s["changed"]) for h, s in stats.items())')" \
+    "1 [('machine11', 1, 0), ('machine12', 0, 1), ('machine13', 0, 1)]" &&
+    is "$(of 'hosts["machine11"]["The tasks are those of the set"]["msg"].splitlines()')" \
+      "[\"tasks[0].owner: there is no user 'payroll', the owner of 'Nightly': write the name of one that 'getent passwd' lists\", 'nothing was applied, because of 1 fault']" &&
+    same "$(tasks_of 11)" "Nightly@02:45 own@01:00"
+  local is_right=$?
+  on 11 "echo payroll:x:2011:65534::/:/bin/sh >>/etc/passwd"
+  return "$is_right"
+}
+
+a_machine_without_cron_fails_the_play() {
+  play
+  is "$status" 0 || return 1
+  # shellcheck disable=SC2016
+  on 13 'kill $(cat /run/crond.pid)'
+  play
+  is "$((status != 0)) $(of 'sorted((h, s["failures"]) for h, s in stats.items())')" \
+    "1 [('machine11', 0), ('machine12', 0), ('machine13', 1)]" &&
+    is "$(of '"cron is not running" in hosts["machine13"]["Tasks run"]["stdout"]')" True
+}
+
+machines_begin_at_times_of_their_own() {
+  a_set 02:30 >set.json
+  play --limit machine11,machine12 -e stagger=2h
+  is "$status" 0 || return 1
+  local first second
+  first=$(tasks_of 11) second=$(tasks_of 12)
+  [[ $first == *Nightly@0[234]* && $second == *Nightly@0[234]* && ${first%% *} != "${second%% *}" ]] ||
+    { echo "$first, $second"; return 1; }
+  play --limit machine11,machine12 -e stagger=2h
+  is "$(of 'sorted(s["changed"] for s in stats.values())')" "[0, 0]"
+}
+
+# ---- without Ansible ------------------------------------------------------------------------
+
+a_file_over_ssh_does_it_too() {
+  local number status told=""
+  a_set 04:30 Weekly >set.json
+  for number in 11 12; do
+    status=0
+    on "$number" zelosched apply - --prune --app backup --dry-run <set.json >/dev/null || status=$?
+    told+="$status "
+    on "$number" zelosched apply - --prune --app backup <set.json >/dev/null || told+="failed "
+    status=0
+    on "$number" zelosched apply - --prune --app backup --dry-run <set.json >/dev/null || status=$?
+    told+="$status "
+  done
+  same "$told$(tasks_of 12)" "3 0 3 0 Nightly@04:30 Weekly@03:00"
+}
+
+# The script of the package in the documentation.
+a_package_of_the_set_does_it_too() {
+  a_set 04:45 >set.json
+  sed -n '/^    #!\/bin\/sh/,/^    fi/s/^    //p' "$ROOT/docs/fleet.md" |
+    sed "s,/usr/share/our-tasks/set.json,/run/set.json," >postinst
+  grep -q stagger postinst || return 1
+  on 12 'cat >/run/set.json' <set.json && on 12 sh -s triggered <postinst >told &&
+    same "$(cat told)$(tasks_of 12)" "Nightly@04:30 Weekly@03:00" || return 1
+  on 12 sh -s configure <postinst >told && on 12 sh -s configure <postinst >again &&
+    same "$(sort told again)" "$(sort <<<"task 2 (Weekly) removed
+task 1 (Nightly) changed
+task 1 (Nightly) unchanged")"
+}
+
+# ---- the module for one task ----------------------------------------------------------------
+
+# one_task OPTIONS [MODE...]: by the module for one
+one_task() {
+  status=0
+  timeout 100 ansible -i inventory machine11 -m zelo.scheduler.task -a "$1" "${@:2}" >out.txt 2>&1 || status=$?
+}
+
+one_task_comes_changes_and_goes() {
+  local present='{"name": "Alone", "app": "mail", "owner": "root", "command": "true", "time_limit": "2h", "schedule": {"type": "daily", "at": "08:30"}}'
+  local step options wanted mode
+  while IFS='|' read -r step mode options wanted; do
+    # shellcheck disable=SC2086
+    one_task "$options" $mode
+    if [[ $wanted == refused && $status == 0 ]] ||
+      { [[ $wanted != refused ]] && ! grep -q "\"changed\": $wanted" out.txt; }; then
+      echo "$step:"
+      cat out.txt
+      return 1
+    fi
+  done <<STEPS
+predicted|--check|$present|true
+created||$present|true
+unchanged||$present|false
+enabled is not compared||{"name": "Alone", "app": "mail", "owner": "root", "command": "true", "schedule": {"type": "daily", "at": "08:30"}}|false
+changed||{"name": "Alone", "app": "mail", "owner": "root", "command": "true", "time_limit": "", "enabled": "no", "schedule": {"type": "daily", "at": "08:30"}}|true
+going is predicted|--check|{"name": "Alone", "app": "mail", "state": "absent"}|true
+another application's stays||{"name": "Alone", "state": "absent"}|false
+gone||{"name": "Alone", "app": "mail", "state": "absent"}|true
+gone already||{"name": "Alone", "app": "mail", "state": "absent"}|false
+a protected one||{"name": "Alone", "owner": "root", "command": "true", "schedule": {"type": "daily", "at": "08:30"}, "ui": {"can_delete": false}}|true
+its refusal is predicted|--check|{"name": "Alone", "state": "absent"}|refused
+it stays||{"name": "Alone", "state": "absent"}|refused
+unless one insists||{"name": "Alone", "state": "absent", "force": true}|true
+STEPS
+}
+
+faults_are_told_by_the_module() {
+  one_task '{"name": "n", "owner": "root", "command": "true", "schedule": {"type": "daily", "at": 630}}'
+  if [[ $status == 0 ]] || ! grep -q 'tasks\[0\].schedule.at: 630 is no time of day' out.txt; then
+    cat out.txt
+    return 1
+  fi
+}
+
+modules_are_described() {
+  local module
+  for module in task tasks; do
+    if ! ansible-doc "zelo.scheduler.$module" >out.txt 2>&1 || ! grep -q 'EXAMPLES' out.txt ||
+      ! grep -q 'RETURN VALUES' out.txt; then
+      cat out.txt
+      return 1
+    fi
+  done
+}
+
+# Every option that a module takes is described, and no other.
+descriptions_are_whole() {
+  /usr/bin/python3 - collections/ansible_collections/zelo/scheduler/plugins/modules/*.py <<'PY'
+import importlib.util, sys
+sys.path.insert(0, "collections")
+import yaml
+from unittest import mock
+for path in sys.argv[1:]:
+    spec = importlib.util.spec_from_file_location("module", path)
+    module = importlib.util.module_from_spec(spec)
+    spec.loader.exec_module(module)
+    documented = yaml.safe_load(module.DOCUMENTATION)["options"]
+    with mock.patch.object(module, "AnsibleModule", side_effect=KeyboardInterrupt) as made:
+        try:
+            module.main()
+        except KeyboardInterrupt:
+            pass
+    taken = made.call_args.kwargs["argument_spec"]
+    assert documented.keys() == taken.keys(), (path, documented.keys() ^ taken.keys())
+    for name, option in taken.items():
+        for key in ("type", "default", "choices", "elements", "required"):
+            assert documented[name].get(key) == option.get(key), (path, name, key)
+PY
+}
+
+prepare
+for number in $MACHINES; do start_machine "$number"; done
+check "check mode predicts what the first play does" check_mode_predicts_the_first_play
+check "the first play changes all machines" the_first_play_changes
+check "an owner is the same person on each, whatever his number" an_owner_is_the_same_person_everywhere
+check "the second play changes nothing" the_second_play_changes_nothing
+check "a machine that differs is changed, and no other" a_machine_that_differs_alone_is_changed
+check "a task that leaves the set is removed everywhere, and no other" others_keep_their_own_and_the_set_loses_one
+check "an unreachable machine disturbs no other" an_unreachable_machine_disturbs_no_other
+check "and has all when it is back" and_has_all_when_it_is_back
+check "a machine that refuses the set disturbs no other, and says why" a_machine_that_refuses_disturbs_no_other
+check "a machine without cron fails the play" a_machine_without_cron_fails_the_play
+check "machines begin at times of their own, always the same" machines_begin_at_times_of_their_own
+check "a file over ssh does the same" a_file_over_ssh_does_it_too
+check "and so does a package of the set, as the documentation has it" a_package_of_the_set_does_it_too
+check "one task comes, changes and goes" one_task_comes_changes_and_goes
+check "what is wrong with a task is told" faults_are_told_by_the_module
+check "ansible-doc describes the modules" modules_are_described
+check "and each of their options as it is" descriptions_are_whole
+for number in $MACHINES; do stop_machine "$number"; done
+finish
