@@ -5,6 +5,7 @@
 #include "check/task_check.h"
 #include "commands/command.h"
 #include "commands/task_options.h"
+#include "json/task_input.h"
 #include "runs/coming_runs.h"
 #include "store/change_lock.h"
 #include "store/save.h"
@@ -15,7 +16,8 @@
 
 namespace {
 
-constexpr Option kOptions[] = {TASK_OPTIONS, {"disabled"}, {"quiet", Option::kNone, 'q'}};
+constexpr Option kOptions[] = {
+    TASK_OPTIONS, {"stdin"}, {"disabled"}, {"quiet", Option::kNone, 'q'}};
 
 void announce(const ZELO_SCHED_TASK &task) {
   const std::optional<LocalMinute> next = nextRun(task, localMinute(time(nullptr)));
@@ -27,11 +29,14 @@ void announce(const ZELO_SCHED_TASK &task) {
 int runAdd(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoOperands();
-  if (!hasSchedule(arguments)) throw UsageError("when? Give --daily 08:30, say");
-  if (!arguments.afterDashes()) throw UsageError("what? Give the command after '--'");
+  requireOneSource(arguments);
+  const bool isRead = arguments.has("stdin");
+  if (!isRead && !hasSchedule(arguments)) throw UsageError("when? Give --daily 08:30, say");
+  if (!isRead && !arguments.afterDashes()) throw UsageError("what? Give the command after '--'");
   const ChangeLock lock;
   const Task task = newTask(ZELO_SCHED_BACKEND_SCHEDULE);
   applyTaskOptions(arguments, task.get());
+  if (isRead) fillFromInput(task.get());
   if (arguments.has("disabled")) task->State = ZELO_SCHED_STATE_DISABLED;
   requireHarmless(*task);
   const std::string past = pastSchedule(*task, time(nullptr));
@@ -54,6 +59,8 @@ const Command kAddCommand = {
     "\n" TASK_OPTIONS_HELP
     "\n"
     "Also:\n"
+    "  --stdin                        the whole task as JSON (zelosched-json(5)) from the\n"
+    "                                 standard input, in place of options and command\n"
     "  --disabled                     save it, but do not run it until it is enabled\n"
     "  -q, --quiet                    print the id and nothing else\n",
     runAdd};
