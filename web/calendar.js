@@ -69,7 +69,9 @@ export class CalendarView {
     if (this.shown === key) return;
     this.shown = key;
     const minutes = (wall) => (wall.getTime() - first) / 60000;
-    const runs = all.filter((run) => run.due).map((run) => ({ ...run, wall: moment(run.due).wall }));
+    const last = first + DAYS * DAY; // of the seventh day; in seven days from now there are runs of the eighth
+    const runs = all.filter((run) => run.due).map((run) => ({ ...run, wall: moment(run.due).wall }))
+      .filter((run) => run.wall.getTime() < last);
     const events = runs.filter((run) => run.power).map((run) => ({ at: minutes(run.wall), power: run.power }));
     const bands = offTimes(events, DAYS * HOURS * 60, false);
     const isOff = (at) => bands.some(({ from, to }) => from <= at && at < to);
@@ -83,16 +85,16 @@ export class CalendarView {
     const hourNow = now.getUTCHours();
     fill(this.grid, this.hours(), ...[...Array(DAYS).keys()].map((day) =>
       this.day(new Date(first + day * DAY), day, cells, bands, hourNow)));
-    fill(this.note, this.summary(runs.filter((run) => !run.power)));
+    fill(this.note, this.summary(runs.filter((run) => !run.power), all.length >= MOST));
     this.legend.hidden = bands.length === 0;
   }
 
-  summary(runs) {
+  summary(runs, areMore) {
     if (runs.length === 0) return _("No task runs in the coming seven days.");
     const missed = runs.filter((run) => run.isOff).length;
     const count = format(ngettext("$0 run", "$0 runs", runs.length), runs.length);
     const sentences = [missed === 0 ? count + "." : format(_("$0, $1 of them while the machine is off."), count, missed)];
-    if (runs.length >= MOST) sentences.push(_("There are more than are shown here."));
+    if (areMore) sentences.push(_("There are more than are shown here."));
     return sentences.join(" ");
   }
 

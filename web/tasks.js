@@ -93,18 +93,19 @@ function lastCell(cell) {
 function switchCell(mayChange) {
   return (cell) => {
     let shown = null;
+    let isBusy = false;
     const box = el("input", { type: "checkbox", role: "switch" });
     box.addEventListener("change", async () => {
-      box.disabled = true;
+      isBusy = true;
       const isDone = await setEnabled(shown, box.checked);
-      box.disabled = !mayChange();
+      isBusy = false;
       if (!isDone) box.checked = shown.enabled;
     });
     cell.append(box);
     return (task) => {
       shown = task;
-      if (!box.matches(":disabled") || !mayChange()) box.disabled = !mayChange();
-      if (box.checked !== task.enabled) box.checked = task.enabled;
+      box.disabled = !mayChange();
+      if (!isBusy) box.checked = task.enabled;
       setAttribute(box, "aria-label", format(_("$0 is switched on"), visible(task.name).slice(0, 200)));
     };
   };
