@@ -16,7 +16,7 @@ function decoded(text, encoding) {
 export class Output {
   constructor(run) {
     this.run = run;
-    this.text = el("pre", { class: "output", tabindex: "0", "aria-label": _("Output") });
+    this.text = el("pre", { class: "output", tabindex: "0", role: "group", "aria-label": _("Output") });
     this.note = el("p", { class: "beside", role: "status" });
     this.element = el("div", { class: "output-of-run" }, this.text, this.note);
     this.stop = null;

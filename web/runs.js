@@ -22,7 +22,7 @@ class Row {
     this.age = el("span", { class: "beside" });
     this.outcome = el("span");
     this.duration = el("td", { class: "c-duration", "data-label": _("Duration") });
-    this.trigger = el("td", { class: "c-trigger", "data-label": _("Started") });
+    this.trigger = el("td", { class: "c-trigger", "data-label": _("Trigger") });
     this.toggle = button("", { class: "plain", "aria-expanded": "false" }, () => this.list.toggle(this.run));
     this.element = el("tr", {}, el("td", { class: "c-start", "data-label": _("Start") }, this.start, this.age), this.duration,
       el("td", { class: "c-outcome", "data-label": _("Outcome") }, this.outcome), this.trigger,
@@ -78,7 +78,7 @@ export class Runs {
     this.rows = new Map();
     this.wanted = null;
     this.body = el("tbody");
-    const heads = [_("Start"), _("Duration"), _("Outcome"), _("Started"), ""];
+    const heads = [_("Start"), _("Duration"), _("Outcome"), _("Trigger"), ""];
     this.element = el("div", { class: "table" }, el("table", {}, el("caption", { class: "unseen" }, _("Runs")),
       el("thead", {}, el("tr", {}, ...heads.map((head) => (head ? el("th", { scope: "col" }, head) : el("td"))))), this.body));
   }

@@ -3,7 +3,7 @@ import { el } from "./dom.js";
 import { Field, Group, check, select } from "./fields.js";
 import { monthText, wallNow, weekdayText } from "./moments.js";
 import { DAYS } from "./words.js";
-import { _ } from "./text.js";
+import { _, format } from "./text.js";
 
 function isoDay(wall) {
   return wall.toISOString().slice(0, 10);
@@ -43,7 +43,7 @@ export class ScheduleFields {
     this.date = new Field(_("Date"), el("input", { type: "date", value: given.date || tomorrow(), class: "short" }),
       { places: ["schedule.date"] });
     this.every = new Field(_("Repeat on that day"), select([["", _("No, one run")], ...[...Array(23).keys()]
-      .map((i) => [String(i + 1), i === 0 ? _("Every hour") : _("Every $0 hours").replace("$0", i + 1)])],
+      .map((i) => [String(i + 1), i === 0 ? _("Every hour") : format(_("Every $0 hours"), i + 1)])],
     given.every_hours ? String(given.every_hours) : ""), { places: ["schedule.every_hours"] });
     this.until = new Field(_("Until the hour"), select(hours(0, _("End of the day")),
       given.until_hour === null || given.until_hour === undefined || given.until_hour === 23 ? "" : String(given.until_hour)),

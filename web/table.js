@@ -1,15 +1,16 @@
-// A table whose rows stay the same elements as long as they are about the same thing, so that what
-// comes in from elsewhere takes away neither the focus nor a selection.
+// A table whose rows stay the same elements as long as they are shown, so that what comes in from
+// elsewhere takes away neither the focus nor a selection.
 import { button, el, fill, setAttribute } from "./dom.js";
 import { _, format } from "./text.js";
 
-const PAGE = 200; // rows shown at once: more are slow to lay out, and nobody reads them
+const PAGE = 100; // rows shown at once: more are slow to lay out, and nobody reads them
 
 // A column is {key, label, make(cell), isSortable}; make returns what shows a row in that cell.
 export class Table {
   constructor({ caption, columns, sorted }) {
     this.columns = columns;
-    this.rows = new Map();
+    this.rows = new Map(); // by their keys, in their order
+    this.spare = []; // making a row takes more time than filling it
     this.shown = PAGE;
     this.keyOf = (row) => row.id;
     this.heads = new Map();
@@ -48,24 +49,36 @@ export class Table {
     return { element, update: (row) => updates.forEach((update) => update(row, element)) };
   }
 
-  // From the first page on, where another choice of rows is shown.
-  rewind() {
+  // Another choice of rows: from the first page on, and in the elements as they stand, since the focus
+  // is where the choice is made, and filling rows takes less time than moving them.
+  showOthers(rows) {
     this.shown = PAGE;
+    const free = [...this.rows.values()];
+    this.showIn(rows, () => free.shift() || this.spare.pop() || this.makeRow());
   }
 
+  // The same rows as they are now.
   show(rows) {
+    const { rows: before } = this;
+    const keys = new Set(rows.slice(0, this.shown).map(this.keyOf));
+    const free = [...before].filter(([key]) => !keys.has(key)).map(([, built]) => built);
+    this.showIn(rows, (key) => before.get(key) || free.pop() || this.spare.pop() || this.makeRow());
+  }
+
+  showIn(rows, rowFor) {
     this.last = rows;
     const kept = new Map();
-    const elements = rows.slice(0, this.shown).map((row) => {
+    for (const row of rows.slice(0, this.shown)) {
       const key = this.keyOf(row);
-      const built = this.rows.get(key) || this.makeRow();
+      const built = rowFor(key);
       built.update(row);
       kept.set(key, built);
-      return built.element;
-    });
+    }
+    const used = new Set(kept.values());
+    this.spare.push(...[...this.rows.values()].filter((built) => !used.has(built)));
     this.rows = kept;
-    this.place(elements);
-    const left = rows.length - elements.length;
+    this.place([...kept.values()].map((built) => built.element));
+    const left = rows.length - kept.size;
     fill(this.more, left > 0 ? button(format(_("Show $0 more"), Math.min(left, PAGE)),
       { class: "secondary" }, () => this.showMore()) : null);
   }

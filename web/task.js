@@ -123,7 +123,7 @@ export class TaskView {
     this.factsShown = key;
     fill(this.facts,
       ...fact(_("Schedule"), scheduleText(task.schedule)),
-      ...fact(_("Command"), el("pre", { class: "command", tabindex: "0" }, visible(task.command))),
+      ...fact(_("Command"), el("pre", { class: "command", tabindex: "0", role: "group", "aria-label": _("Command") }, visible(task.command))),
       ...fact(_("Runs as"), el("bdi", {}, visible(task.owner))),
       ...fact(_("Time limit"), limitText(task.time_limit)),
       ...fact(_("Overlap"), overlapText(task.overlap)),

@@ -158,8 +158,7 @@ export class TasksView {
 
   choose(options) {
     Object.assign(this.options, options);
-    this.table.rewind();
-    this.showRows();
+    this.showRows(true);
     // Not at each key: the address is the browser's, and writing it takes longer than the table.
     window.clearTimeout(this.remembering);
     this.remembering = window.setTimeout(() => this.remember(), 300);
@@ -199,11 +198,13 @@ export class TasksView {
     return this.texts.get(task);
   }
 
-  showRows() {
+  showRows(areOthers = false) {
     const chosen = this.chosen();
     const all = this.model.tasks.filter((task) => task.ui.listable).length;
     this.table.showOrder(this.options.sort || "next", this.options.desc === "1");
-    this.table.show(sorted(chosen, this.options.sort || "next", this.options.desc === "1"));
+    const rows = sorted(chosen, this.options.sort || "next", this.options.desc === "1");
+    if (areOthers) this.table.showOthers(rows);
+    else this.table.show(rows);
     this.table.element.hidden = chosen.length === 0;
     setText(this.count, chosen.length === all ? format(ngettext("$0 task", "$0 tasks", all), all)
       : format(_("$0 of $1 tasks"), chosen.length, all));
@@ -242,6 +243,9 @@ export class TasksView {
   update() {
     this.texts = new Map();
     showAccess(this.access, this.model.mayChange);
+    this.health.element.hidden = !this.model.isLoaded;
+    this.list.hidden = !this.model.isLoaded;
+    if (!this.model.isLoaded) return;
     this.add.hidden = !this.model.mayChange;
     this.health.show(this.model);
     this.showApps();

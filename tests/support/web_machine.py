@@ -92,8 +92,27 @@ def add(*words, command="true"):
 
 def clean():
     library("clean")
+    shutil.copy(ROOT + "/packaging/zelo_poweroff_feasible_check", "/usr/zelo/bin")
     subprocess.run([BUILD + "/bin/zelosched", "restore"], check=False, stdout=subprocess.DEVNULL,
                    stderr=subprocess.DEVNULL)
+
+
+def thousand_tasks():
+    """Written into the store as it is, since adding them takes half a minute."""
+    add("--daily", "08:30", "--name", "NAME", "--app", "APP", command="COMMAND")
+    with open("/tmp/scheduled_tasks", encoding="utf-8") as file:
+        keys = [line for line in file.read().splitlines() if "=" in line and not line.startswith("#")]
+    lines = []
+    for i in range(1, 1001):
+        new = {"id": i, "name": f"Task {i} of {('photos', 'mail', 'music')[i % 3]}", "app": f"app{i % 20}",
+               "run hour": i % 24, "run min": i % 60}
+        lines.append(f"[{i}]")
+        lines += [f'{key}="{new[key]}"' if key in new else line
+                  for line in keys for key in [line.split("=")[0]]]
+    for path in ("/tmp/scheduled_tasks", "/usr/zelo/etc/scheduled_tasks", "/usr/zelo/etc/scheduled_tasks.last-good"):
+        with open(path, "w", encoding="utf-8") as file:
+            file.write("\n".join(lines) + "\n")
+    z("sync")
 
 
 # ---- cockpit --------------------------------------------------------------------------------
@@ -132,14 +151,21 @@ class Server:
         session = os.path.join(tools, "session")
         become = f"setpriv --reuid={user} --regid=65534 --clear-groups " if user else ""
         self.write(session, f"#!/bin/sh\nexec {become}cockpit-bridge\n")
-        environment = dict(os.environ, PATH=tools + ":" + os.environ["PATH"], HOME=WORK, LANG="C.UTF-8",
+        self.environment = dict(os.environ, PATH=tools + ":" + os.environ["PATH"], HOME=WORK, LANG="C.UTF-8",
                            XDG_DATA_DIRS=share + ":/usr/share", XDG_DATA_HOME=WORK + "/none", XDG_RUNTIME_DIR=WORK)
+        self.session = session
+        self.process = None
+        self.url = f"http://127.0.0.1:{self.port}/cockpit/@localhost/zelosched/index.html"
+        self.start()
+
+    def start(self):
+        """Anew: a session that nobody uses for a while ends, and with it the server's only one."""
+        self.stop()
         with open(os.path.join(WORK, f"ws.{self.port}.log"), "w", encoding="utf-8") as log:
             self.process = subprocess.Popen(
                 ["/usr/lib/cockpit/cockpit-ws", "--no-tls", "--address", "127.0.0.1", "--port", str(self.port),
-                 "--local-session=" + session], env=environment, stdout=log, stderr=log)
+                 "--local-session=" + self.session], env=self.environment, stdout=log, stderr=log)
         wait_for("cockpit-ws listens", lambda: is_listening(self.port))
-        self.url = f"http://127.0.0.1:{self.port}/cockpit/@localhost/zelosched/index.html"
 
     @staticmethod
     def write(path, text):
@@ -152,8 +178,10 @@ class Server:
             return file.read().splitlines()
 
     def stop(self):
-        self.process.terminate()
-        self.process.wait()
+        if self.process:
+            self.process.terminate()
+            self.process.wait()
+        self.process = None
 
 
 # ---- the browser ----------------------------------------------------------------------------
@@ -187,10 +215,10 @@ class Browser:
         self.driver.execute_cdp_cmd("Emulation.setEmulatedMedia", {"features": [
             {"name": "prefers-color-scheme", "value": "dark" if is_dark else "light"}]})
 
-    def open(self, url, path=""):
+    def open(self, server, path=""):
         """Loaded anew, also where only what follows the # differs."""
         self.driver.get("about:blank")
-        self.driver.get(url + "#/" + path)
+        self.driver.get(server.url + "#/" + path)
         wait_for("the page is there", lambda: self.find("nav a"))
 
     def script(self, text, *arguments):

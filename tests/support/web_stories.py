@@ -32,7 +32,7 @@ def fails(name):
 
 @story("without a task the page invites to the first one, and all is well")
 def first_task(browser, server):
-    browser.open(server.url)
+    browser.open(server)
     browser.see("There is no task yet")
     browser.see("All is well", ".health")
     browser.click("Add the first task")
@@ -46,7 +46,7 @@ def listed(browser, server):
     add("--weekly", "mon-fri", "08:15", "--every", "2h", "--until", "18", "--name", "Mail")
     add("--monthly", "31", "06:00", "--name", "Report", "--disabled")
     z("run", "Mail", "--wait")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("3 tasks")
     same(sorted(column(browser, "name")), ["Mail", "Nightly backup\nbackup", "Report"])
     text = browser.text("tbody")
@@ -60,7 +60,7 @@ def listed(browser, server):
 @story("a switch on the list switches the task")
 def switched(browser, server):
     add("--daily", "02:30", "--name", "Nightly backup")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("Nightly backup")
     wait_for("it can be switched", lambda: browser.find("tbody input[role=switch]").is_enabled())
     browser.find("tbody input[role=switch]").click()
@@ -75,7 +75,7 @@ def unwell(browser, server):
     add("--daily", "02:30", "--name", "Backup", command="echo no space left; exit 3")
     fails("Backup")
     os.rename("/var/run/crond.pid", "/var/run/crond.pid.kept")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("2 things need attention", ".health")
     rows = [one.text for one in browser.all(".findings li")]
     assert "Cron is not running" in rows[0] and "Critical" in rows[0], rows
@@ -84,7 +84,7 @@ def unwell(browser, server):
     browser.click("Show the run")
     browser.see("no space left", ".output")
     os.rename("/var/run/crond.pid.kept", "/var/run/crond.pid")
-    browser.open(server.url)
+    browser.open(server)
     browser.click("Take note")
     browser.see("All is well", ".health")
 
@@ -95,7 +95,7 @@ def filtered(browser, server):
     add("--daily", "03:30", "--name", "Backup of photos", "--app", "backup")
     add("--daily", "04:30", "--name", "Report", "--owner", "nobody", command="print-mail")
     fails("Backup of mail")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("3 tasks")
     search = browser.find("input[type=search]")
     search.send_keys("MAIL")
@@ -126,7 +126,7 @@ def ordered(browser, server):
     add("--monthly", "1", "06:00", "--name", "a10")
     add("--monthly", "1", "06:00", "--name", "a9")
     z("run", "a9", "--wait")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("4 tasks")
     same(column(browser, "name"), ["b", "a10", "a9", "C"])
     for label, wanted in (("Name", ["a9", "a10", "b", "C"]), ("Owner", ["b", "C", "a10", "a9"]),
@@ -155,7 +155,7 @@ def one_task(browser, server):
     z("run", "Bytes", "--wait")
     add("--daily", "08:00", "--name", "Much", command="seq 100000")
     z("run", "Much", "--wait")
-    browser.open(server.url)
+    browser.open(server)
     browser.click("Weekly")
     browser.see("Monday at 08:00")
     wait_for("five runs", lambda: len(browser.all(".coming li")) == 5)
@@ -169,19 +169,19 @@ def one_task(browser, server):
     browser.shown("td.c-output button")[1].click()
     browser.see("largo", ".output")
     assert "run=2" in browser.driver.current_url
-    browser.open(server.url, f"task/{task('Bytes')['id']}?run=4")
+    browser.open(server, f"task/{task('Bytes')['id']}?run=4")
     browser.see("a\ufffdb", ".output")
-    browser.open(server.url, f"task/{task('Much')['id']}?run=5")
+    browser.open(server, f"task/{task('Much')['id']}?run=5")
     browser.see("bytes are left out here", ".output")
     browser.see("100000", ".output")
-    browser.open(server.url, "task/99")
+    browser.open(server, "task/99")
     browser.see("There is no such task")
 
 
 @story("a run is started, watched while it prints, and stopped")
 def run_and_stop(browser, server):
     number = add("--daily", "02:30", "--name", "Long", command="echo first; sleep 1.5; echo second; sleep 60")
-    browser.open(server.url, f"task/{number}")
+    browser.open(server, f"task/{number}")
     browser.click("Run now")
     browser.see("Long was started")
     browser.see("first", ".output")
@@ -199,7 +199,7 @@ def run_and_stop(browser, server):
 def removed(browser, server):
     number = add("--daily", "02:30", "--name", "Old backup")
     add("--daily", "02:30", "--name", "Other")
-    browser.open(server.url, f"task/{number}")
+    browser.open(server, f"task/{number}")
     browser.click("Remove")
     browser.see("Remove Old backup?", "dialog")
     browser.dialog("Cancel")
@@ -230,7 +230,7 @@ def added(browser, server):
          {"type": "daily", "at": "02:30", "from": "2099-01-01"}),
     )
     for name, fields, wanted in kinds:
-        browser.open(server.url, "add")
+        browser.open(server, "add")
         browser.write("Name", name)
         browser.write("Command", "echo " + name)
         for label, value in fields.items():
@@ -244,7 +244,7 @@ def added(browser, server):
 
 @story("a weekly task is added with all there is to say, and changed again")
 def weekly(browser, server):
-    browser.open(server.url, "add")
+    browser.open(server, "add")
     browser.write("Name", "Weekly")
     browser.write("Command", "one\ntwo")
     browser.choose("When", "weekly")
@@ -275,7 +275,7 @@ def weekly(browser, server):
 
 @story("the form shows when the task would run while it is written, and saves nothing by that")
 def previewed(browser, server):
-    browser.open(server.url, "add")
+    browser.open(server, "add")
     wait_for("five runs", lambda: len(browser.all(".coming li")) == 5)
     browser.choose("When", "once")
     browser.choose("Date", "2099-12-24")
@@ -288,7 +288,7 @@ def previewed(browser, server):
 
 @story("what the tool refuses stands beside its field, and nothing that was typed is lost")
 def refused(browser, server):
-    browser.open(server.url, "add")
+    browser.open(server, "add")
     browser.choose("When", "once")
     browser.choose("Date", "2001-01-01")
     browser.write("Name", "Typed")
@@ -319,7 +319,7 @@ def refused(browser, server):
 @story("a form tells when its task has been changed elsewhere, and asks before it is left")
 def changed_elsewhere(browser, server):
     number = add("--daily", "02:30", "--name", "Shared")
-    browser.open(server.url, f"task/{number}/edit")
+    browser.open(server, f"task/{number}/edit")
     browser.see("Edit Shared")
     browser.write("Command", "mine")
     z("edit", str(number), "--daily", "05:30")
@@ -345,7 +345,7 @@ def calendar(browser, server):
         add("--daily", f"18:0{i}", "--name", f"Evening {i}")
     z("power", "add", "off", "--daily", "23:30")
     z("power", "add", "on", "--daily", "07:00")
-    browser.open(server.url, "calendar")
+    browser.open(server, "calendar")
     browser.see("Noon", ".calendar")
     same(len(browser.all("section.day")), 7)
     coming = json.loads(z("next", "--within", "7d", "--json"))["runs"]
@@ -370,7 +370,7 @@ def calendar(browser, server):
 
 @story("power times are added, changed, switched off and removed in the week by mouse and keyboard")
 def power(browser, server):
-    browser.open(server.url, "power")
+    browser.open(server, "power")
     browser.see("There is no power time")
     browser.shown(".cell")[7 * 23 + 0].click()  # Monday, 23 o'clock
     for day in ("Tuesday", "Wednesday", "Thursday", "Friday"):
@@ -429,7 +429,7 @@ def power(browser, server):
 
 @story("what is changed elsewhere shows within two seconds, also in another browser")
 def live(browser, server):
-    browser.open(server.url)
+    browser.open(server)
     browser.see("There is no task yet")
     slowest = 0
     for what, shown in ((lambda: add("--daily", "02:30", "--name", "From the shell", command="sleep 1"), "From the shell"),
@@ -447,7 +447,7 @@ def live(browser, server):
     slowest = max(slowest, time.monotonic() - begin)
     first = browser.driver.current_window_handle
     browser.driver.switch_to.new_window("window")
-    browser.open(server.url, "power")
+    browser.open(server, "power")
     browser.click("Add a power time")
     browser.dialog("Save")
     browser.see_not("There is no power time")
@@ -466,7 +466,7 @@ def live(browser, server):
 def undisturbed(browser, server):
     add("--daily", "02:30", "--name", "One")
     add("--daily", "03:30", "--name", "Two")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("2 tasks")
     browser.script("arguments[0].focus()", browser.all("tbody a.name")[1])
     add("--daily", "01:30", "--name", "Zero")
@@ -477,7 +477,7 @@ def undisturbed(browser, server):
 @story("a page that is hidden asks nothing, and asks when it is seen again")
 def hidden(browser, server):
     add("--daily", "02:30", "--name", "One")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("One")
     hide(browser, True)
     settle(server)
@@ -508,13 +508,365 @@ def settle(server):
 @story("times are the machine's, and the page says so where the browser's differ")
 def zones(browser, server):
     add("--daily", "02:30", "--name", "One")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("02:30", "tbody")
     browser.see_not("another time zone")
     browser.zone("Asia/Tokyo")
-    browser.open(server.url)
+    browser.open(server)
     browser.see("All times are the machine's (UTC+01:00). This browser is in another time zone (UTC+09:00).")
     assert "02:30" in column(browser, "next")[0], column(browser, "next")
+
+
+# ---- what is hostile, much, narrow, dark ----------------------------------------------------
+
+MARKUP = "<img src=x onerror='window.hacked=1'><script>window.hacked=1</script><b>\"bold\" & 'quoted'</b>"
+TURNED = "abc\u202efdp.exe\u2066 hidden\u200b"
+LONG = "W" * 4000
+HOSTILE = (MARKUP, TURNED, LONG)
+
+
+def is_harmless(browser):
+    """Nothing of it became an element, nothing turns the direction, and nothing makes the page wider."""
+    same(browser.script("return [window.hacked, document.querySelectorAll('img, b, main script').length]"), [None, 0])
+    text = browser.text("body")
+    assert not set(text) & set("\u202e\u2066\u200b\x1b"), text[:500]
+    for width in (1280, 360):
+        browser.size(width, 900)
+        same(browser.script("return document.documentElement.scrollWidth <= window.innerWidth"), True)
+
+
+@story("names, commands, output and errors of any kind are shown as text, wherever they show")
+def hostile(browser, server):
+    power_program = "/usr/zelo/bin/zelo_poweroff_feasible_check"
+    ids = []
+    for i, name in enumerate(HOSTILE):
+        ids.append(add("--daily", f"18:0{i}", "--name", name, "--app", "app" + name.replace("'", "")[:1000],
+                       "--app-name", name[:1000], "--action", name[:400],
+                       command=f"printf '%s\\n' \"$0 <i>no</i> \\033[31m\"; cat /run/hostile; exit 3"))
+    with open("/run/hostile", "w", encoding="utf-8") as file:
+        file.write("".join(HOSTILE) + "\x1b[31mred")
+    for number in ids:
+        fails(str(number))
+    assert not os.path.exists(power_program + ".none")
+    browser.open(server)
+    browser.see("3 things need attention")
+    browser.see("abc\\u202efdp.exe\\u2066 hidden\\u200b", "tbody")
+    browser.see("<b>\"bold\" & 'quoted'</b>", "tbody")
+    is_harmless(browser)
+    browser.size(1280, 900)
+    for i, number in enumerate(ids):
+        name = HOSTILE[i]
+        browser.open(server, f"task/{number}?run={i + 1}")
+        browser.see("\\u001b[31mred", ".output")
+        browser.see("<i>no</i>", ".output")
+        is_harmless(browser)
+        browser.size(1280, 900)
+        browser.click("Remove")
+        browser.see("Remove ", "dialog")
+        is_harmless(browser)
+        browser.size(1280, 900)
+        browser.dialog("Cancel")
+        browser.click("Run now")
+        browser.see("was started")
+        is_harmless(browser)
+        browser.size(1280, 900)
+        browser.open(server, f"task/{number}/edit")
+        browser.see("Edit ")
+        same(browser.field("Name").get_attribute("value"), name)
+        is_harmless(browser)
+        browser.size(1280, 900)
+        browser.click("Save")
+        browser.see("was saved")
+        is_harmless(browser)
+        browser.size(1280, 900)
+        same(json.loads(z("show", str(number), "--json"))["tasks"][0]["name"], name)
+    browser.open(server, "calendar")
+    browser.see("18:00", ".calendar")
+    is_harmless(browser)
+    # An error of the tool that quotes it.
+    browser.size(1280, 900)
+    browser.open(server, "add")
+    browser.write("Name", "x")
+    browser.write("Command", "true")
+    browser.click("More")
+    browser.set(browser.field("Application"), MARKUP)
+    browser.click("Add the task")
+    browser.see("has an apostrophe")
+    is_harmless(browser)
+
+
+@story("a thousand tasks are there soon, and the filter keeps up with typing")
+def thousand(browser, server):
+    thousand_tasks()
+    server.start()
+    watching = browser.driver.execute_cdp_cmd("Page.addScriptToEvaluateOnNewDocument", {"source": """
+        new MutationObserver((changes, observer) => {
+          if (!document.querySelector("tbody tr")) return;
+          observer.disconnect();
+          requestAnimationFrame(() => requestAnimationFrame(() => { window.firstTable = performance.now(); }));
+        }).observe(document, {childList: true, subtree: true});"""})
+    times = []
+    for _ in range(3):
+        browser.open(server)
+        browser.see("1000 tasks")
+        wait_for("the table is painted", lambda: browser.script("return window.firstTable"))
+        times.append(browser.script("""return window.firstTable -
+            performance.getEntriesByType("navigation")[0].loadEventEnd"""))
+        settle(server)
+    browser.driver.execute_cdp_cmd("Page.removeScriptToEvaluateOnNewDocument", watching)
+    typed = {}
+    for text in ("t", "ta", "tas", "task", "task 9", "task 99", "task 999", "task 99", "mail", "m", "") * 5:
+        typed.setdefault(text, []).append(browser.script("""
+            const [text] = arguments, field = document.querySelector("input[type=search]"), begin = performance.now();
+            field.value = text;
+            field.dispatchEvent(new Event("input", {bubbles: true}));
+            document.body.getBoundingClientRect();
+            return performance.now() - begin;""", text))
+    slowest = max(sorted(times_of_key)[len(times_of_key) // 2] for times_of_key in typed.values())
+    search = browser.find("input[type=search]")
+    for key in "task 77":
+        search.send_keys(key)
+    browser.see("19 of 1000 tasks")
+    print(f"# 1,000 tasks: first table after {sorted(times)[1] / 1000:.2f} s, a key in the filter takes at most"
+          f" {slowest:.0f} ms")
+    assert sorted(times)[1] <= 1500, times
+    assert slowest <= 50, typed
+    browser.set(search, "")
+    browser.see("Show 100 more")
+    browser.click("Show 100 more")
+    wait_for("200 rows", lambda: len(browser.all("tbody tr")) == 200)
+    browser.open(server, "calendar")
+    browser.see(" more", ".calendar")
+
+
+VIEWS = ("", "task/1?run=1", "add", "task/1/edit", "calendar", "power")
+
+
+def machine_with_all():
+    add("--daily", "02:30", "--name", "Nightly backup", "--owner", "nobody", "--app", "backup",
+        command="echo copying; echo disk full >&2; exit 3")
+    add("--weekly", "mon-fri", "08:15", "--every", "2h", "--until", "18", "--name", "Fetch mail")
+    add("--monthly", "31", "06:00", "--name", "Report", "--disabled")
+    z("power", "add", "off", "--weekly", "mon-fri", "23:00")
+    z("power", "add", "on", "--weekly", "mon-fri", "07:00")
+    fails("Nightly backup")
+    z("run", "Fetch mail", "--wait")
+
+
+def each_view(browser, server):
+    for view in VIEWS:
+        browser.open(server, view)
+        wait_for("the view is there", lambda: browser.script(
+            "return document.querySelector('main .cell, main .hour, main tbody tr, main form, main .note') !== null"))
+        settle(server)
+        yield view or "tasks"
+
+
+CONTRASTS = """
+  const channels = (text) => (text.match(/[0-9.]+/g) || []).map(Number);
+  const part = (value) => { const c = value / 255; return c <= 0.03928 ? c / 12.92 : ((c + 0.055) / 1.055) ** 2.4; };
+  const luminance = ([r, g, b]) => 0.2126 * part(r) + 0.7152 * part(g) + 0.0722 * part(b);
+  const behind = (element) => {
+    for (let one = element; one; one = one.parentElement) {
+      const colour = channels(getComputedStyle(one).backgroundColor);
+      if (colour.length === 3 || colour[3] === 1) return colour;
+    }
+    return [255, 255, 255];
+  };
+  const poor = [];
+  const walk = document.createTreeWalker(document.body, NodeFilter.SHOW_TEXT);
+  while (walk.nextNode()) {
+    const element = walk.currentNode.parentElement;
+    if (!walk.currentNode.textContent.trim() || !element.offsetParent || element.closest(":disabled, .past")) continue;
+    const [a, b] = [luminance(channels(getComputedStyle(element).color)), luminance(behind(element))];
+    const ratio = (Math.max(a, b) + 0.05) / (Math.min(a, b) + 0.05);
+    if (ratio < 4.5) poor.push(`${ratio.toFixed(1)} ${element.tagName}.${element.className}: ${element.textContent.slice(0, 40)}`);
+  }
+  return [...new Set(poor)];"""
+
+
+@story("all text can be told from what is behind it, in light and in dark style")
+def contrasts(browser, server):
+    machine_with_all()
+    for is_dark in (False, True):
+        browser.dark(is_dark)
+        for view in each_view(browser, server):
+            same((view, is_dark, browser.script(CONTRASTS)), (view, is_dark, []))
+
+
+@story("the page follows the style of Cockpit's shell")
+def follows_shell(browser, server):
+    browser.open(server)
+    browser.see("There is no task yet")
+    is_dark = "return document.documentElement.classList.contains('dark')"
+    same(browser.script(is_dark), False)
+    browser.script("""localStorage.setItem("shell:style", "dark");
+        window.dispatchEvent(new CustomEvent("cockpit-style", {detail: {style: "dark"}}))""")
+    same(browser.script(is_dark), True)
+    browser.open(server)
+    same(browser.script(is_dark), True)
+    browser.script("""localStorage.removeItem("shell:style")""")
+
+
+@story("everything that can be used has a name and a role, and every table its heads")
+def named_all(browser, server):
+    machine_with_all()
+    for view in each_view(browser, server):
+        for one in browser.all("details"):
+            browser.script("arguments[0].open = true", one)
+        for one in browser.shown("a, button, input, select, textarea, [tabindex='0'], summary"):
+            assert one.accessible_name.strip(), (view, one.get_attribute("outerHTML"))
+        same((view, browser.script("""return [...document.querySelectorAll("table")]
+            .filter((table) => !table.querySelector("th[scope=col]") || !(table.caption || table.getAttribute("aria-label"))).length""")),
+             (view, 0))
+        same(browser.script("return [document.querySelectorAll('h1').length, document.querySelectorAll('main').length,"
+                            " document.documentElement.lang]"), [1, 1, "en"])
+
+
+@story("no view is wider than 360 pixels, and all can be done there")
+def narrow(browser, server):
+    machine_with_all()
+    browser.size(360, 740)
+    for view in each_view(browser, server):
+        same((view, browser.script("return document.documentElement.scrollWidth")), (view, browser.script(
+            "return document.documentElement.clientWidth")))
+    browser.open(server, "add")
+    browser.write("Name", "On the phone")
+    browser.write("Command", "true")
+    browser.click("Add the task")
+    browser.see("On the phone was saved")
+    browser.click("Tasks")
+    browser.see("4 tasks")
+    same(task("On the phone")["enabled"], True)
+
+
+@story("a task is added, run, and removed by the keyboard alone")
+def by_keyboard(browser, server):
+    browser.open(server)
+    browser.see("There is no task yet")
+    browser.see("Add the first task")
+
+    def tab_to(name, most=40):
+        for _ in range(most):
+            browser.keys(Keys.TAB)
+            if browser.focused().accessible_name == name or browser.focused().text == name:
+                return
+        raise AssertionError(f"no {name!r} by the tab key")
+
+    tab_to("Add the first task")
+    browser.keys(Keys.ENTER)
+    browser.see("It would run")
+    same(browser.focused().accessible_name, "Name")
+    browser.keys("By keys", Keys.TAB, "echo typed")
+    tab_to("Add the task")
+    browser.keys(Keys.ENTER)
+    browser.see("By keys was saved")
+    tab_to("Run now")
+    browser.keys(Keys.SPACE)
+    browser.see("typed", ".output")
+    same([run["outcome"] for run in runs("By keys")], ["finished"])
+    same(browser.focused().text, "Run now")
+    tab_to("Remove")
+    browser.keys(Keys.ENTER)
+    browser.see("Remove By keys?", "dialog")
+    same(browser.focused().text, "Cancel")
+    browser.keys(Keys.ESCAPE)
+    same(len(tasks()), 1)
+    same(browser.focused().text, "Remove")
+    browser.keys(Keys.ENTER)
+    browser.see("Remove By keys?", "dialog")
+    browser.keys(Keys.SHIFT + Keys.TAB)
+    browser.keys(Keys.ENTER)
+    browser.see("There is no task yet")
+    same(tasks(), [])
+
+
+@story("without administrative access a user sees what he may, and is offered nothing that would fail")
+def limited(browser, server):
+    machine_with_all()
+    other = Server(user=65534)
+    try:
+        browser.open(other)
+        browser.see("Nightly backup")
+        browser.see("You see what every user may see")
+        browser.see("Nothing is known to be wrong", ".health")
+        browser.see("unknown", "tbody")
+        browser.see_not("Add a task")
+        same([one.is_enabled() for one in browser.all("input[role=switch]")], [False, False, False])
+        for view in each_view(browser, other):
+            offered = {one.text for one in browser.shown("main button")}
+            assert not offered & {"Run now", "Stop", "Edit", "Remove", "Switch off", "Save", "Add the task", "Change",
+                                  "Add a power time", "Take note"}, (view, offered)
+        browser.open(other, "task/1")
+        browser.see("Unknown without administrative access")
+        browser.see("Every day at 02:30")
+        browser.open(other, "power")
+        browser.find(".cell").click()
+        same(browser.shown("dialog"), [])
+        browser.click("Turn on administrative access")
+        browser.see("Administrative access", "dialog")
+        browser.find("dialog")
+    finally:
+        browser.driver.get("about:blank")
+        other.stop()
+
+
+@story("the policy of Cockpit stands: no script and no style of the page's own is inside it")
+def policy(browser, server):
+    with open(os.path.join(PAGE, "manifest.json"), encoding="utf-8") as file:
+        assert "content-security-policy" not in json.load(file)
+    machine_with_all()
+    for _ in each_view(browser, server):
+        same(browser.script("""return document.querySelectorAll("[style], style, script:not([src]), [onclick], [onload]").length"""), 0)
+    for name in sorted(os.listdir(PAGE)):
+        if name.endswith(".js") and not name.startswith("po."):
+            with open(os.path.join(PAGE, name), encoding="utf-8") as file:
+                found = re.findall(r"innerHTML|outerHTML|insertAdjacentHTML|document\.write|eval\(|new Function", file.read())
+            same((name, found), (name, []))
+
+
+@story("the page speaks German to who has chosen it in Cockpit, and all of it is translated")
+def german(browser, server):
+    machine_with_all()
+    browser.open(server)
+    browser.driver.add_cookie({"name": "CockpitLang", "value": "de-de"})
+    try:
+        browser.open(server)
+        browser.see("3 Aufgaben")
+        browser.see("Montag bis Freitag um 08:15, dann alle 2 Stunden bis 18:15")
+        browser.see("fehlgeschlagen mit Code 3")
+        browser.see("1 Sache braucht Aufmerksamkeit")
+        same(browser.script("return document.documentElement.lang"), "de")
+        browser.open(server, "calendar")
+        browser.see("Montag, ")
+        browser.open(server, "add")
+        browser.write("Name", "Nächtliche Sicherung")
+        browser.write("Befehl", "true")
+        browser.choose("Wann", "weekly")
+        browser.click("Aufgabe hinzufügen")
+        browser.see("Nächtliche Sicherung wurde gespeichert.")
+    finally:
+        browser.driver.delete_all_cookies()
+    same(task("Nächtliche Sicherung")["schedule"]["days"], ["mon", "tue", "wed", "thu", "fri"])
+
+
+@story("a task runs when its minute comes, by the real cron, and the page shows it")
+def real_cron(browser, server):
+    started = subprocess.Popen(["bash", "-c", f'. "{HERE}/start_cron.sh"; start_cron /run/cron.log; sleep 1000'])
+    wait_for("cron has started", lambda: os.path.exists("/run/cron.log") and "reboot" in open("/run/cron.log").read())
+    try:
+        minute = time.strftime("%Y-%m-%dT%H:%M", time.localtime(time.time() + 61 - time.time() % 60 + 1))
+        browser.open(server)
+        browser.see("There is no task yet")
+        add("--once", minute, "--name", "Soon", command="echo from cron")
+        browser.see("in less than a minute", "tbody")
+        wait_for("it has run", lambda: "finished" in browser.text("tbody"), 80)
+        browser.click("Soon")
+        wait_for("there is its run", lambda: browser.find("td.c-output button").click() or True)
+        browser.see("from cron", ".output")
+    finally:
+        started.terminate()
+    same([(run["trigger"], run["outcome"]) for run in runs("Soon")], [("schedule", "finished")])
 
 
 # ---- running them ---------------------------------------------------------------------------
@@ -533,6 +885,7 @@ def tell(function, browser, server):
     browser.zone("Europe/Berlin")
     browser.driver.get("about:blank")
     browser.errors()
+    server.start()
     try:
         function(browser, server)
         same(browser.errors(), [])

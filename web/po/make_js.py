@@ -15,9 +15,11 @@ import tempfile
 
 
 def catalog(msgfmt, source):
-    with tempfile.NamedTemporaryFile(suffix=".mo") as compiled:
-        subprocess.run([msgfmt, "--check", "-o", compiled.name, source], check=True)
-        return gettext.GNUTranslations(compiled)
+    with tempfile.TemporaryDirectory() as work:
+        compiled = os.path.join(work, "compiled.mo")
+        subprocess.run([msgfmt, "--check", "-o", compiled, source], check=True)
+        with open(compiled, "rb") as file:
+            return gettext.GNUTranslations(file)
 
 
 def plural_function(header):
