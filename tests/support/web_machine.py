@@ -230,8 +230,10 @@ class Browser:
     def all(self, selector):
         return self.driver.find_elements(By.CSS_SELECTOR, selector)
 
+    # In the browser, since a call for each element takes its time.
     def shown(self, selector):
-        return [one for one in self.all(selector) if one.is_displayed()]
+        return self.script("""return [...document.querySelectorAll(arguments[0])]
+            .filter((one) => one.checkVisibility({checkVisibilityCSS: true}))""", selector)
 
     def text(self, selector="main"):
         return self.script("const found = document.querySelector(arguments[0]); return found ? found.innerText : ''",
@@ -246,36 +248,26 @@ class Browser:
 
     def named(self, name, tags="button, a, summary"):
         """What is shown and has that text or label."""
-        for one in self.shown(tags):
-            if name in (one.text.strip(), one.get_attribute("aria-label")):
-                return one
-        raise NoSuchElementException(name)
+        found = self.script("""return [...document.querySelectorAll(arguments[1])].find((one) =>
+            one.checkVisibility({checkVisibilityCSS: true}) &&
+            [one.innerText.trim(), one.getAttribute("aria-label")].includes(arguments[0]))""", name, tags)
+        if not found:
+            raise NoSuchElementException(name)
+        return found
 
     def click(self, name, tags="button, a, summary"):
         wait_for(f"{name!r} can be clicked", lambda: self.named(name, tags).click() or True)
 
     def dialog(self, name):
         """A button of the dialog that is open."""
-        def press():
-            for one in self.shown("dialog button"):
-                if one.text.strip() == name:
-                    one.click()
-                    return True
-            return False
-        wait_for(f"{name!r} of the dialog can be clicked", press)
+        self.click(name, "dialog button")
 
     def field(self, label):
         """The field of that label."""
-        def look():
-            for one in self.shown("label, .label"):
-                if one.text.strip() != label:
-                    continue
-                if one.get_attribute("for"):
-                    return self.find("#" + one.get_attribute("for"))
-                inside = one.find_elements(By.CSS_SELECTOR, "input")
-                return inside[0] if inside else one.find_element(By.XPATH, "..")
-            return None
-        return wait_for(f"field {label!r}", look)
+        return wait_for(f"field {label!r}", lambda: self.script("""
+            const found = [...document.querySelectorAll("label, .label")].find((one) =>
+              one.checkVisibility({checkVisibilityCSS: true}) && one.innerText.trim() === arguments[0]);
+            return found && (found.htmlFor ? document.getElementById(found.htmlFor) : found.querySelector("input"))""", label))
 
     def write(self, label, text):
         field = self.field(label)

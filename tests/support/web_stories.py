@@ -498,11 +498,11 @@ def hide(browser, is_hidden):
 
 
 def settle(server):
-    """Until no call has come for half a second."""
+    """Until no call has come for a while."""
     before = -1
     while before != len(server.calls()):
         before = len(server.calls())
-        time.sleep(0.5)
+        time.sleep(0.25)
 
 
 @story("times are the machine's, and the page says so where the browser's differ")
