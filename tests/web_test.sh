@@ -16,5 +16,6 @@ start_zelosched_tests
 # The machine's own zone, which programs that cron starts have too.
 unset TZ
 ln -sf /usr/share/zoneinfo/Europe/Berlin /etc/localtime
+check "the texts for translators are up to date, and German is complete" "$here/../scripts/web-po" --check
 "$PYTHON" "$here/support/web_stories.py" "$@" || tests_failed=1
 finish

@@ -20,7 +20,7 @@ export function askForAccess() {
   const superuser = client.proxy("cockpit.Superuser", "/superuser");
   const fault = el("p", { class: "fault", role: "alert" });
   const fields = el("div", {}, el("p", { role: "status" }, _("One moment …")));
-  const dialog = openDialog(_("Administrative access"), fields, fault);
+  const dialog = openDialog(_("Administrative access"), fault, fields);
   dialog.addEventListener("close", () => {
     superuser.Stop();
     client.close();
@@ -43,12 +43,22 @@ export function askForAccess() {
     answer.focus();
   });
 
+  function showFault(text) {
+    if (!dialog.open) return;
+    fill(fields, el("div", { class: "actions" }, button(_("Close"), { class: "secondary" }, () => dialog.close())));
+    fill(fault, text);
+  }
+
+  function start(bridge) {
+    fill(fields, el("p", { role: "status" }, _("One moment …")));
+    superuser.Start(bridge).then(() => window.location.reload()).catch((error) => showFault(cockpit.message(error)));
+  }
+
+  // The first way is sudo, which the shell takes too.
   superuser.wait(() => {
-    superuser.Start("any").then(() => window.location.reload()).catch((error) => {
-      if (!dialog.open) return;
-      fill(fields, el("div", { class: "actions" }, button(_("Close"), { class: "secondary" }, () => dialog.close())));
-      fill(fault, cockpit.message(error));
-    });
+    const [first] = superuser.Bridges || [];
+    if (first) start(first);
+    else showFault(_("This machine gives you no administrative access."));
   });
 }
 

@@ -22,7 +22,7 @@ from selenium.webdriver.common.keys import Keys
 HERE = os.path.dirname(os.path.realpath(__file__))
 ROOT = os.path.dirname(os.path.dirname(HERE))
 BUILD = os.environ["BUILD_DIR"]
-PAGE = os.environ.get("WEB_PAGE", os.path.join(BUILD, "web"))
+PAGE = os.environ.get("WEB_PAGE", os.path.join(BUILD, "share/cockpit/zelosched"))
 WORK = "/run/web_test"
 PATIENCE = 15  # seconds; a machine with other work to do is slow
 
