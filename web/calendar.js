@@ -22,8 +22,9 @@ function runLink(run) {
 }
 
 function powerMark(run) {
-  return el("a", { class: "power-mark " + run.power, href: href(["power"]) }, timeText(run.wall), " ",
-    run.power === "on" ? _("Machine on") : _("Machine off"));
+  const title = run.power === "on" ? _("Machine on") : _("Machine off");
+  return el("a", { class: "power-mark " + run.power, href: href(["power"]), title }, timeText(run.wall), " ",
+    run.power === "on" ? _("On") : _("Off"));
 }
 
 export class CalendarView {

@@ -27,10 +27,13 @@ function inWords(time) {
 
 // ---- adding and changing --------------------------------------------------------------------
 
-function askForTime(time, day, hour) {
+const WEEKDAYS = [0, 1, 2, 3, 4];
+
+// Of a new one: on which days, and at which hour.
+function askForTime(time, newDays, hour) {
   const direction = new Field(_("The machine goes"), select([["off", _("off")], ["on", _("on")]], time ? time.power : "off"));
   direction.input.disabled = time !== null;
-  const boxes = DAYS.map((name, i) => check(weekdayText(i, "short"), time ? time.days.includes(name) : i === day));
+  const boxes = DAYS.map((name, i) => check(weekdayText(i, "short"), time ? time.days.includes(name) : newDays.includes(i)));
   boxes.forEach((box, i) => box.input.setAttribute("aria-label", weekdayText(i, "long")));
   const days = new Group(_("Days"), boxes.map((box) => box.element));
   const at = new Field(_("Time"), el("input", { type: "time", class: "short",
@@ -103,7 +106,7 @@ class Week {
   // Of several in an hour, each is in the table below.
   act(day, hour) {
     if (!this.mayChange) return;
-    askForTime(this.timesAt(day, hour)[0] || null, day, hour);
+    askForTime(this.timesAt(day, hour)[0] || null, [day], hour);
   }
 
   key(event, day, hour) {
@@ -172,7 +175,7 @@ function switchCell(mayChange) {
 function actionsCell(mayChange) {
   return (cell) => {
     let shown = null;
-    const edit = button(_("Change"), { class: "secondary small" }, () => askForTime(shown, 0, 0));
+    const edit = button(_("Change"), { class: "secondary small" }, () => askForTime(shown, [], 0));
     const remove = button(_("Remove"), { class: "secondary small" }, () => removeTime(shown));
     cell.append(edit, remove);
     return (time) => {
@@ -209,7 +212,7 @@ export class PowerView {
       { key: "enabled", label: _("On"), make: switchCell(mayChange) },
       { key: "actions", label: _("Actions"), make: actionsCell(mayChange) },
     ], sorted: () => {} });
-    this.add = button(_("Add a power time"), { class: "primary" }, () => askForTime(null, 0, 7));
+    this.add = button(_("Add a power time"), { class: "primary" }, () => askForTime(null, WEEKDAYS, 23));
     fill(root, this.access, el("h2", {}, _("When the machine goes on and off")), this.clock,
       el("section", { "aria-label": _("Power times") }, el("div", { class: "actions" }, this.add), this.none, this.table.element),
       el("p", { class: "beside" }, _("Choose an hour of the week to add a time there, or one that is there to change it.")),

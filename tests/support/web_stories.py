@@ -411,9 +411,6 @@ def power(browser, server):
     wait_for("it is on", lambda: [one["enabled"] for one in power_times()] == [True])
     # One that is refused: there is one alike.
     browser.click("Add a power time")
-    browser.choose("Time", "23:00")
-    for day in ("Tuesday", "Wednesday", "Thursday", "Friday"):
-        browser.click(day, "dialog input")
     browser.dialog("Save")
     wait_for("a fault", lambda: browser.text("dialog .fault[role=alert]"))
     browser.dialog("Cancel")
@@ -867,6 +864,69 @@ def real_cron(browser, server):
     finally:
         started.terminate()
     same([(run["trigger"], run["outcome"]) for run in runs("Soon")], [("schedule", "finished")])
+
+
+# ---- as a new owner would ---------------------------------------------------------------------
+
+
+@story("a new owner: back up every night, why did it fail, off at night, and what happens at the weekend")
+def new_owner(browser, server):
+    browser.open(server)
+    browser.click("Add the first task")
+    browser.write("Name", "Backup")
+    browser.write("Command", "echo no space left on the backup disk; exit 1")
+    browser.choose("Time", "02:30")
+    browser.click("Add the task")
+    browser.click("Run now")
+    browser.see("Last run: failed with code 1")
+    browser.click("Tasks")
+    browser.see("1 thing needs attention")
+    browser.click("Show the run")
+    browser.see("no space left on the backup disk", ".output")
+    browser.click("Power")
+    browser.click("Add a power time")
+    browser.dialog("Save")
+    browser.see("Monday to Friday at 23:00")
+    browser.click("Add a power time")
+    browser.choose("The machine goes", "on")
+    browser.choose("Time", "07:00")
+    browser.dialog("Save")
+    browser.see("Monday to Friday at 07:00")
+    browser.see("Its clock is armed")
+    same(sorted((one["power"], one["at"], len(one["days"])) for one in power_times()), [("off", "23:00", 5), ("on", "07:00", 5)])
+    browser.click("Calendar")
+    browser.see("of them while the machine is off")
+    # At night the machine is off now, so the backup is moved.
+    browser.click("Tasks")
+    browser.click("Backup")
+    browser.click("Edit")
+    browser.see("Edit Backup")
+    browser.choose("Time", "12:30")
+    browser.click("Save")
+    browser.see("Every day at 12:30")
+
+
+@story("pictures of each view are taken")
+def pictures(browser, server):
+    into = os.environ.get("WEB_PICTURES")
+    if not into:
+        return
+    os.makedirs(into, exist_ok=True)
+    machine_with_all()
+    add("--daily", "00:05", "--every", "1h", "--name", "Sync photos", "--app", "photos", "--app-name", "Photos",
+        command="sleep 0.$(date +%N | cut -c1); echo 3 new photos")
+    for _ in range(12):
+        z("run", "Sync photos", "--wait")
+    for name, view in (("tasks", ""), ("task", "task/4?run=14"), ("run", "task/1?run=1"), ("form", "task/2/edit"),
+                       ("calendar", "calendar"), ("power", "power")):
+        for style, width in (("light", 1100), ("dark", 1100), ("narrow", 360)):
+            browser.size(width, 640)
+            browser.dark(style == "dark")
+            browser.open(server, view)
+            wait_for("the view is there", lambda: browser.script("return document.querySelector('main .cell, main .hour, main tbody tr, main form') !== null"))
+            settle(server)
+            browser.size(width, min(1600, max(500, browser.script("return document.getElementById('page').scrollHeight"))))
+            browser.picture(os.path.join(into, f"{name}-{style}.png"))
 
 
 # ---- running them ---------------------------------------------------------------------------
