@@ -31,8 +31,12 @@ installed_files() {
   (cd "$PREFIX" && find . -type f -o -type l) | sed 's|^\./||' | grep -v '^share/man/' | sort
 }
 
+page() {
+  (cd "$here/../web" && printf 'share/cockpit/zelosched/%s\n' ./*.js index.html manifest.json style.css po.de.js) | sed 's|/\./|/|'
+}
+
 expected_files() {
-  sed "s|LIB|$lib|" <<'FILES' | sort
+  { page && sed "s|LIB|$lib|"; } <<'FILES' | sort
 LIB/cmake/zeloscheduler/zeloscheduler-config-version.cmake
 LIB/cmake/zeloscheduler/zeloscheduler-config.cmake
 LIB/cmake/zeloscheduler/zeloscheduler-targets-relwithdebinfo.cmake
@@ -53,6 +57,7 @@ sbin/zelosched
 sbin/zeloschedtask
 share/bash-completion/completions/zelosched
 share/fish/vendor_completions.d/zelosched.fish
+share/metainfo/cockpit-zelosched.metainfo.xml
 share/zelosched/mail-on-failure
 share/zelosched/zelosched-1.schema.json
 share/zelosched/zelosched.rules.yml

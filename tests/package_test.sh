@@ -11,6 +11,9 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 . "$here/support/shell_test.sh"
 
 checkout=$(cd "$here/.." && pwd -P)
+# shellcheck source=tests/support/web_package.sh
+. "$here/support/web_package.sh"
+
 readonly PACKAGES=(libzelocore libzelosdk libzeloscheduler4 libzeloscheduler-dev zeloscheduler-tools)
 readonly WORK=$BUILD_DIR/package_test
 readonly ROOT=$WORK/root
@@ -502,8 +505,8 @@ task_count() {
 
 trap leave_cgroup EXIT
 check "packages are built, and lintian finds no fault" quietly "$checkout/scripts/package" "$DEBS"
-check "they are the library, the platform, what builds on it, and the tools" \
-  same "$(deb_names)" "$(printf '%s\n' "${PACKAGES[@]}" | sort | tr '\n' ' ')"
+check "they are the library, the platform, what builds on it, the tools, and the page" \
+  same "$(deb_names)" "$(printf '%s\n' "${PACKAGES[@]}" "$PAGE_PACKAGE" | sort | tr '\n' ' ')"
 check "a small root is made" make_root_tar
 check "and unpacked" unpack_root
 copy_packages
@@ -613,5 +616,6 @@ check "and their lines" has_all_lines
 check "all are purged" purge_packages
 check "nothing is left at all" same "$(differences_from "$WORK/before")" ""
 check "the crontab is as it was before" cmp "$ROOT/etc/crontab" "$WORK/crontab"
+page_is_tested
 rm -rf --one-file-system "$ROOT"
 finish

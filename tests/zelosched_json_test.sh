@@ -93,6 +93,17 @@ next_is_valid() {
     same "$(at '2026-11-22 12:00' next --json --count 1 1 | of 'top["runs"][0]["due"]')" "2099-12-24T18:30:00+01:00"
 }
 
+preview_is_valid() {
+  clean
+  echo '{"version": 1, "tasks": [{"name": "n", "owner": "root", "command": "true", "schedule": {"type": "daily", "at": "08:30"}}]}' |
+    z next --preview --json | is_valid preview || return 1
+  { echo '{"version": 1, "tasks": [{}, {}], "x": 1}' | z next --preview --json || true; } | is_valid preview
+}
+
+owners_is_valid() {
+  z owners --json | is_valid owners
+}
+
 power_list_is_valid() {
   all_kinds
   z power list --json | is_valid power_times &&
@@ -443,6 +454,8 @@ check "what 'list' tells is what the schema says" list_is_valid
 check "what 'show' tells, too" show_is_valid
 check "and of a run that goes on" a_run_that_goes_on_is_valid
 check "what 'next' tells, too" next_is_valid
+check "what it tells of a task that is not saved" preview_is_valid
+check "what 'owners' tells" owners_is_valid
 check "what 'power list' tells, too" power_list_is_valid
 check "what 'export' writes, too" export_is_valid
 check "what 'status' tells, too" status_is_valid

@@ -61,7 +61,7 @@ json() {
   python3 -c "import json, sys
 tasks = json.load(sys.stdin)
 if 'version' in tasks and 'state' not in tasks:
-    tasks = sum((list for name, list in tasks.items() if name != 'version'), [])
+    tasks = sum((value for value in tasks.values() if isinstance(value, list)), [])
 print($1)"
 }
 

@@ -4,6 +4,7 @@
 #include <fstream>
 
 #include "store/power_room.h"
+#include "terminal/number.h"
 
 namespace {
 
@@ -15,11 +16,22 @@ bool isPowerOn(const ZELO_SCHED_TASK *task) {
 
 }  // namespace
 
+Alarm readAlarm() {
+  std::ifstream file(kWakeAlarm);
+  Alarm alarm;
+  alarm.isThere = static_cast<bool>(file);
+  std::string text;
+  alarm.isArmed = std::getline(file, text) && !text.empty();
+  if (alarm.isArmed) alarm.wakesAt = parseNumber(text);
+  return alarm;
+}
+
 std::string alarmFault(const TaskList &list) {
   if (std::none_of(list.tasks().begin(), list.tasks().end(), isPowerOn)) return "";
-  std::ifstream file(kWakeAlarm);
-  if (!file) return "the machine has no clock that could be armed: it will not go on by itself";
-  std::string alarm;
-  if (std::getline(file, alarm) && !alarm.empty()) return "";
+  const Alarm alarm = readAlarm();
+  if (!alarm.isThere) {
+    return "the machine has no clock that could be armed: it will not go on by itself";
+  }
+  if (alarm.isArmed) return "";
   return "the machine's clock is not armed for the next power-on time (the system log says why)";
 }

@@ -2,6 +2,7 @@
 
 #include <chrono>
 #include <cstring>
+#include <tuple>
 
 #include "runs/coming_runs.h"
 #include "schedule_cron.h"
@@ -235,4 +236,12 @@ std::string pastSchedule(const ZELO_SCHED_TASK &task, time_t now) {
   }
   return "the task would never run, as " + scheduleInWords(task).substr(strlen("once on ")) +
          " is over: write a later date";
+}
+
+bool isSameSchedule(const ZELO_SCHED_TASK &a, const ZELO_SCHED_TASK &b) {
+  const auto timesOf = [](const ZELO_SCHED_TASK &task) {
+    return std::tie(task.Type, task.StartYear, task.StartMonth, task.StartDay, task.RunHour,
+                    task.RunMin, task.RepeatHour, task.LastWorkHour);
+  };
+  return timesOf(a) == timesOf(b) && std::strncmp(a.Week, b.Week, sizeof a.Week) == 0;
 }

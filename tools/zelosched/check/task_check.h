@@ -24,3 +24,6 @@ std::vector<std::string> unreadableFieldsOf(const ZELO_SCHED_TASK &task);
 
 // A sentence when a task that runs once has no run after `now`, else nothing.
 std::string pastSchedule(const ZELO_SCHED_TASK &task, time_t now);
+
+// They run at the same times, whoever runs what.
+bool isSameSchedule(const ZELO_SCHED_TASK &a, const ZELO_SCHED_TASK &b);

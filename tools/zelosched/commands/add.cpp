@@ -5,19 +5,24 @@
 #include "check/task_check.h"
 #include "commands/command.h"
 #include "commands/task_options.h"
+#include "json/task_input.h"
 #include "runs/coming_runs.h"
 #include "store/change_lock.h"
 #include "store/save.h"
 #include "store/stagger.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
+#include "terminal/input.h"
 #include "terminal/schedule_text.h"
 #include "terminal/text.h"
 
 namespace {
 
-constexpr Option kOptions[] = {
-    TASK_OPTIONS, {"disabled"}, {"stagger", Option::kValue}, {"quiet", Option::kNone, 'q'}};
+constexpr Option kOptions[] = {TASK_OPTIONS,
+                               {"stdin"},
+                               {"disabled"},
+                               {"stagger", Option::kValue},
+                               {"quiet", Option::kNone, 'q'}};
 
 void announce(const ZELO_SCHED_TASK &task) {
   const std::optional<LocalMinute> next = nextRun(task, localMinute(time(nullptr)));
@@ -29,15 +34,20 @@ void announce(const ZELO_SCHED_TASK &task) {
 int runAdd(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoOperands();
-  if (!hasSchedule(arguments)) throw UsageError("when? Give --daily 08:30, say");
-  if (!arguments.afterDashes()) throw UsageError("what? Give the command after '--'");
+  requireOneSource(arguments);
+  const bool isRead = arguments.has("stdin");
+  if (!isRead && !hasSchedule(arguments)) throw UsageError("when? Give --daily 08:30, say");
+  if (!isRead && !arguments.afterDashes()) throw UsageError("what? Give the command after '--'");
   const auto window = arguments.value("stagger");
-  if (window && !arguments.has("name")) {
+  if (window && !isRead && !arguments.has("name")) {
     throw UsageError("'--stagger' goes by the task's name: add --name");
   }
+  // Before the others have to wait: who writes it may take his time.
+  const std::string text = isRead ? readInput(kStandardInput) : "";
   const ChangeLock lock;
   const Task task = newTask(ZELO_SCHED_BACKEND_SCHEDULE);
   applyTaskOptions(arguments, task.get());
+  if (isRead) fillFromText(text, task.get());
   if (arguments.has("disabled")) task->State = ZELO_SCHED_STATE_DISABLED;
   requireHarmless(*task);
   if (window) stagger(minutesOfWindow(*window), task.get());
@@ -61,6 +71,8 @@ const Command kAddCommand = {
     "\n" TASK_OPTIONS_HELP
     "\n"
     "Also:\n"
+    "  --stdin                        the whole task as JSON (zelosched-json(5)) from the\n"
+    "                                 standard input, in place of options and command\n"
     "  --disabled                     save it, but do not run it until it is enabled\n"
     "  --stagger 30m                  at a minute of so many, from its time on: always the\n"
     "                                 same one for this machine, application and name\n"

@@ -9,10 +9,10 @@
 #include "runs/coming_runs.h"
 #include "runs/history_keep.h"
 #include "runs/missed.h"
+#include "runs/span.h"
 #include "runs/start_run.h"
 #include "store/change_lock.h"
 #include "terminal/failure.h"
-#include "terminal/number.h"
 #include "terminal/text.h"
 
 namespace {
@@ -20,21 +20,8 @@ namespace {
 constexpr Option kOptions[] = {{"within", Option::kValue}, {"dry-run"}};
 constexpr char kUsualSpan[] = "12h";
 
-struct Unit {
-  char letter;
-  int64_t seconds;
-};
-constexpr Unit kUnits[] = {{'m', 60}, {'h', int64_t{60} * 60}, {'d', int64_t{24} * 60 * 60}};
-
-// "90m", "12h", "2d".
-int64_t parseSpan(const std::string &text) {
-  for (const Unit &unit : kUnits) {
-    if (text.empty() || text.back() != unit.letter) continue;
-    const std::optional<int64_t> count = parseNumber(text.substr(0, text.size() - 1));
-    if (count && *count > 0 && *count <= kMissedRemembered / unit.seconds) {
-      return *count * unit.seconds;
-    }
-  }
+int64_t secondsOf(const std::string &text) {
+  if (const std::optional<int64_t> seconds = parseSpan(text, kMissedRemembered)) return *seconds;
   throw UsageError("'--within' takes a time from 1m to 8d, such as 90m, 12h or 2d, not '" +
                    printable(text) + "'");
 }
@@ -56,7 +43,7 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
 }
 
 int catchUpAll(const std::string &span, bool isDryRun) {
-  const time_t since = time(nullptr) - parseSpan(span);
+  const time_t since = time(nullptr) - secondsOf(span);
   if (geteuid() == 0) sweepRuns();  // what other programs have run was not missed
   const TaskList list;
   std::vector<MissedTask> all = missedTasks(KeptDatabase(KeptDatabase::kRead), list, since);

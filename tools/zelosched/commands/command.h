@@ -39,6 +39,7 @@ extern const Command kStopCommand;
 extern const Command kSyncCommand;
 extern const Command kRestoreCommand;
 extern const Command kCatchUpCommand;
+extern const Command kOwnersCommand;
 extern const Command kPowerCommand;
 extern const Command kExportCommand;
 extern const Command kApplyCommand;

@@ -1,26 +1,34 @@
 // zelosched edit
 #include <cstdio>
+#include <cstring>
 #include <ctime>
+#include <memory>
 
 #include "check/task_check.h"
 #include "commands/command.h"
 #include "commands/task_options.h"
+#include "json/task_input.h"
 #include "store/change_lock.h"
 #include "store/save.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
+#include "terminal/input.h"
 #include "terminal/schedule_text.h"
 
 namespace {
 
-constexpr Option kOptions[] = {TASK_OPTIONS, {"force"}};
+constexpr Option kOptions[] = {TASK_OPTIONS, {"stdin"}, {"force"}};
 
-void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &task) {
+void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &before,
+                        const ZELO_SCHED_TASK &task) {
   const bool insists = arguments.has("force");
-  requirePermission(task, task.CanEditFromUI, "edited", insists);
-  if (arguments.has("name")) requirePermission(task, task.CanEditName, "renamed", insists);
-  if (arguments.has("owner")) {
-    requirePermission(task, task.CanEditOwner, "given another owner", insists);
+  const bool isRead = arguments.has("stdin");  // which names all, changed or not
+  requirePermission(before, before.CanEditFromUI, "edited", insists);
+  if (arguments.has("name") || (isRead && std::strcmp(before.Name, task.Name) != 0)) {
+    requirePermission(before, before.CanEditName, "renamed", insists);
+  }
+  if (arguments.has("owner") || (isRead && before.Owner != task.Owner)) {
+    requirePermission(before, before.CanEditOwner, "given another owner", insists);
   }
 }
 
@@ -28,13 +36,22 @@ int runEdit(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   if (ids.size() > 1) throw UsageError("one task at a time");
-  if (!hasTaskOption(arguments)) throw UsageError("what is to be changed?");
+  requireOneSource(arguments);
+  const bool isRead = arguments.has("stdin");
+  if (!isRead && !hasTaskOption(arguments)) throw UsageError("what is to be changed?");
+  const std::string text = isRead ? readInput(kStandardInput) : "";
   const ChangeLock lock;
-  const Task task = loadTask(ids.front());
+  const Task before = loadTask(ids.front());
+  const Task task = std::make_unique<TaskRecord>(*before);
+  if (isRead && isPower(*task))
+    throw UsageError("of a power time only --daily and --weekly can be set");
   applyTaskOptions(arguments, task.get());
-  requirePermissions(arguments, *task);
+  if (isRead) fillFromText(text, task.get());
+  requirePermissions(arguments, *before, *task);
   requireHarmless(*task);
-  const std::string past = hasSchedule(arguments) ? pastSchedule(*task, time(nullptr)) : "";
+  const std::string past = hasSchedule(arguments) || !isSameSchedule(*before, *task)
+                               ? pastSchedule(*task, time(nullptr))
+                               : "";
   if (!past.empty()) throw Failure("not saved: " + past);
   editTask(task.get());
   std::printf("%s saved: %s\n", titleOf(*task).c_str(), scheduleInWords(*task).c_str());
@@ -53,5 +70,7 @@ const Command kEditCommand = {
     "\n" TASK_OPTIONS_HELP
     "\n"
     "Also:\n"
+    "  --stdin                        the task as JSON (zelosched-json(5)) from the standard\n"
+    "                                 input, in place of options; what is not named stays\n"
     "  --force                        even if its application does not let it be edited\n",
     runEdit};

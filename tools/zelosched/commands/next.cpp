@@ -7,24 +7,30 @@
 #include <queue>
 #include <tuple>
 
+#include "check/task_check.h"
 #include "commands/command.h"
 #include "commands/for_each_id.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "json/task_input.h"
 #include "json/task_json.h"
 #include "runs/coming_runs.h"
+#include "runs/span.h"
 #include "store/owner.h"
 #include "store/power_room.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
+#include "terminal/input.h"
 #include "terminal/terminal.h"
 #include "terminal/text.h"
 
 namespace {
 
-constexpr Option kOptions[] = {{"count", Option::kValue, 'n'}, {"json"}};
+constexpr Option kOptions[] = {
+    {"count", Option::kValue, 'n'}, {"within", Option::kValue}, {"preview"}, {"json"}};
 constexpr int64_t kUsualCount = 20;
 constexpr int64_t kMostRuns = 10000;
+constexpr int64_t kLongestSpan = int64_t{366} * 24 * 60 * 60;  // seconds
 
 struct Entry {
   LocalMinute run;
@@ -48,7 +54,8 @@ class FirstRuns {
     all_ = std::move(list);
   }
 
-  std::vector<Entry> take(size_t count) {
+  // None of them after `last`.
+  std::vector<Entry> take(size_t count, const std::optional<LocalMinute> &last) {
     std::priority_queue queue(isLater, std::vector<Source *>());
     const auto advance = [&](Source *source) {
       source->run = source->runs.next();
@@ -59,6 +66,7 @@ class FirstRuns {
     while (entries.size() < count && !queue.empty()) {
       Source *source = queue.top();
       queue.pop();
+      if (last && *source->run > *last) break;
       entries.push_back({*source->run, source->task});
       advance(source);
     }
@@ -134,19 +142,97 @@ void printAsJson(const std::vector<Entry> &entries) {
   printTop(top);
 }
 
+// ---- of a task that is not saved ------------------------------------------------------------
+
+// The stored task that is to be changed, or a new one.
+Task taskToPreview(const std::vector<std::string> &operands) {
+  if (operands.empty()) return newTask(ZELO_SCHED_BACKEND_SCHEDULE);
+  const std::vector<int64_t> ids = parseIds(operands);
+  if (ids.size() > 1) throw UsageError("one task at a time");
+  Task task = loadTask(ids.front());
+  if (isPower(*task)) throw Failure(titleOf(*task) + " is a power time, which has no preview");
+  return task;
+}
+
+std::vector<LocalMinute> firstRunsOf(const TaskRecord &task, const LocalMinute &now, size_t count) {
+  std::vector<LocalMinute> found;
+  ComingRuns runs(task, now);
+  while (found.size() < count) {
+    const std::optional<LocalMinute> run = runs.next();
+    if (!run) break;
+    found.push_back(*run);
+  }
+  return found;
+}
+
+void printPreviewAsJson(const std::vector<LocalMinute> &runs, const JsonFaults &faults) {
+  Json::Value top = topObject();
+  top["due"] = Json::Value(Json::arrayValue);
+  for (const LocalMinute &run : runs) {
+    if (momentOf(run)) top["due"].append(jsonOf(run));
+  }
+  top["faults"] = Json::Value(Json::arrayValue);
+  for (const JsonFault &fault : faults) {
+    Json::Value object;
+    object["place"] = jsonText(fault.place);
+    object["text"] = jsonText(fault.what);
+    top["faults"].append(std::move(object));
+  }
+  printTop(top);
+}
+
+int preview(const Arguments &arguments, size_t count) {
+  const time_t now = time(nullptr);
+  const Task task = taskToPreview(arguments.operands());
+  const TaskRecord before = *task;
+  JsonFaults faults;
+  fillFromText(readInput(kStandardInput), task.get(), &faults);
+  std::vector<LocalMinute> runs;
+  if (isScheduleSound(faults)) {
+    runs = firstRunsOf(*task, localMinute(now), count);
+    const std::string past = pastSchedule(*task, now);
+    if (!past.empty() && !isSameSchedule(before, *task)) faults.push_back({kPlaceOfOnceDate, past});
+  }
+  if (arguments.has("json")) {
+    printPreviewAsJson(runs, faults);
+  } else {
+    for (const LocalMinute &run : runs) {
+      std::printf("%s %s\n", minuteText(run).c_str(), weekdayName(run));
+    }
+    complainOf(faults);
+  }
+  return faults.empty() ? kDone : kFailed;
+}
+
+// ---- the command ----------------------------------------------------------------------------
+
+std::optional<LocalMinute> lastMinute(const Arguments &arguments, time_t now) {
+  const auto text = arguments.value("within");
+  if (!text) return std::nullopt;
+  if (const auto seconds = parseSpan(*text, kLongestSpan)) return localMinute(now + *seconds);
+  throw UsageError("'--within' takes a time from 1m to 366d, such as 90m, 12h or 7d, not '" +
+                   printable(*text) + "'");
+}
+
 int runNext(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
-  const auto count =
-      static_cast<size_t>(arguments.number("count", 1, kMostRuns).value_or(kUsualCount));
-  FirstRuns runs(localMinute(time(nullptr)));
+  const time_t now = time(nullptr);
+  const std::optional<LocalMinute> last = lastMinute(arguments, now);
+  const auto count = static_cast<size_t>(
+      arguments.number("count", 1, kMostRuns).value_or(last ? kMostRuns : kUsualCount));
+  if (arguments.has("preview")) {
+    if (last) throw UsageError("'--preview' does not go with '--within'");
+    return preview(arguments, count);
+  }
+  FirstRuns runs(localMinute(now));
   int status = kDone;
   if (arguments.operands().empty()) {
     runs.add(std::make_unique<TaskList>());
   } else {
     status = forEachId(parseIds(arguments.operands()), [&](int64_t id) { addNamed(id, &runs); });
   }
-  const std::vector<Entry> entries = runs.take(count);
+  const std::vector<Entry> entries = runs.take(count, last);
   if (arguments.has("json")) {
     printAsJson(entries);
   } else {
@@ -158,10 +244,16 @@ int runNext(int argc, char **argv) {
 }  // namespace
 
 const Command kNextCommand = {
-    "next", "[TASK...] [--count N] [--json]", "list the coming runs",
+    "next", "[TASK...] [--count N] [--within TIME] [--preview] [--json]", "list the coming runs",
     "Lists the coming runs of all enabled tasks, or of the tasks that are named, by their\n"
     "ids or names, day by day.\n"
     "\n"
-    "  -n, --count N                  how many runs; 20\n"
+    "With --preview it reads one task as JSON from the standard input, as add --stdin does,\n"
+    "or as edit --stdin when a task is named; saves nothing; and lists when it would run and\n"
+    "every fault. The exit status is 1 when there is a fault.\n"
+    "\n"
+    "  -n, --count N                  how many runs; 20, and with --within 10000\n"
+    "  --within TIME                  only those due so soon, such as 90m, 12h or 7d\n"
+    "  --preview                      of a task that is not saved\n"
     "  --json                         as JSON: see zelosched-json(5)\n",
     runNext};

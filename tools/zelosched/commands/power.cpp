@@ -5,6 +5,7 @@
 #include <cstring>
 #include <ctime>
 
+#include "check/alarm_check.h"
 #include "commands/command.h"
 #include "commands/options.h"
 #include "commands/remove_tasks.h"
@@ -40,6 +41,15 @@ void printTable(const std::vector<const ZELO_SCHED_TASK *> &tasks) {
   table.print();
 }
 
+Json::Value clockAsJson() {
+  const Alarm alarm = readAlarm();
+  Json::Value clock;
+  clock["is_there"] = alarm.isThere;
+  clock["is_armed"] = alarm.isArmed;
+  clock["wakes_at"] = alarm.wakesAt ? jsonTime(*alarm.wakesAt) : Json::Value();
+  return clock;
+}
+
 int runPowerList(int argc, char **argv) {
   constexpr Option kOptions[] = {{"json"}};
   const Arguments arguments(argc, argv, kOptions);
@@ -56,6 +66,7 @@ int runPowerList(int argc, char **argv) {
   Json::Value top = topObject();
   Json::Value &times = top["power_times"] = Json::Value(Json::arrayValue);
   for (const ZELO_SCHED_TASK *task : tasks) times.append(powerTimeOf(*task, nextRun(*task, now)));
+  top["clock"] = clockAsJson();
   printTop(top);
   return kDone;
 }

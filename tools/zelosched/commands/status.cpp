@@ -3,6 +3,7 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <ctime>
 
 #include "check/health.h"
 #include "check/run_findings.h"
@@ -66,6 +67,7 @@ Json::Value jsonOf(const Finding &finding) {
 
 void printAsJson(const Findings &findings) {
   Json::Value whole = topObject();
+  whole["now"] = jsonTime(time(nullptr));
   whole["state"] = nameOf(worstOf(findings));
   whole["findings"] = Json::Value(Json::arrayValue);
   for (const Finding &finding : findings) whole["findings"].append(jsonOf(finding));

@@ -130,6 +130,11 @@ bool hasTaskOption(const Arguments &arguments) {
   return hasSchedule(arguments) || hasOther(arguments) || arguments.afterDashes();
 }
 
+void requireOneSource(const Arguments &arguments) {
+  if (!arguments.has("stdin") || !hasTaskOption(arguments)) return;
+  throw UsageError("'--stdin' is in place of the options that describe a task");
+}
+
 void applyTaskOptions(const Arguments &arguments, ZELO_SCHED_TASK *task) {
   if (isPower(*task)) requirePowerOptions(arguments);
   applySchedule(arguments, task);

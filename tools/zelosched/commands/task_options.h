@@ -47,6 +47,9 @@
 bool hasSchedule(const Arguments &arguments);
 bool hasTaskOption(const Arguments &arguments);
 
+// Throws UsageError when a task is to be read from the standard input and described by options too.
+void requireOneSource(const Arguments &arguments);
+
 // Sets what the arguments name. Throws UsageError and Failure.
 void applyTaskOptions(const Arguments &arguments, ZELO_SCHED_TASK *task);
 

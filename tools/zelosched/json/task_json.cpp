@@ -528,7 +528,8 @@ void readSchedule(const Json::Value &value, const std::string &place, JsonFaults
 // In a file of many tasks their places are hard to count.
 std::string ownedText(Members *members) {
   const Json::Value *name = members->find(kName.name);
-  return name != nullptr && name->isString() ? ", the owner of " + quotedText(*name) : "";
+  const bool isNamed = name != nullptr && name->isString() && !name->asString().empty();
+  return isNamed ? ", the owner of " + quotedText(*name) : "";
 }
 
 void readOwner(Members *members, ZELO_SCHED_TASK *task) {

@@ -10,7 +10,6 @@
 
 namespace {
 
-constexpr char kStandardInput[] = "-";
 constexpr size_t kMegabyte = size_t{1} << 20;
 constexpr size_t kMostBytes = 16 * kMegabyte;
 
