@@ -31,7 +31,7 @@ struct Minute {
 
 struct Field {
   bool any = false;
-  std::set<long> values{};
+  std::set<int64_t> values{};
   bool matches(int value) const { return any || values.contains(value); }
 };
 
@@ -53,7 +53,7 @@ Field parseField(const std::string &text) {
   if (field.any || text.empty()) return field;
   for (const std::string &number : splitAt(text, ',')) {
     size_t used = 0;
-    field.values.insert(std::stol(number, &used));
+    field.values.insert(std::stoll(number, &used));
     EXPECT_EQ(used, number.size()) << text;
   }
   return field;

@@ -1,6 +1,7 @@
 #!/bin/bash
 # The other processors: built without a warning, tested by their emulators, and what one has stored is
-# read alike by the others. In the long form (ZELO_SOAK_FACTOR) all programs, and all of the product.
+# read alike by the others. In the long form (ZELO_SOAK_FACTOR) all of the product as it is delivered, all
+# programs, and the other order of bytes; in the short one what is cheap to compile and differs most.
 #
 # Functions are called by check, and what is in single quotes is for another shell:
 # shellcheck disable=SC2016,SC2317
@@ -15,15 +16,15 @@ readonly WORK=$BUILD_DIR/processors_test
 readonly TARGETS=(arm64 armhf)
 readonly OTHER_ORDER=s390x # big-endian; of the product what stores and reads
 declare -rA EMULATORS=([arm64]=qemu-aarch64-static [armhf]=qemu-arm-static [s390x]=qemu-s390x-static)
-# What has to do with the width of numbers, the sign of characters, and the order of bytes; and one program
-# each that works with processes, the tools and the database.
+# What has to do with the width of numbers, the sign of characters, and the order of bytes.
 readonly FORMS=(schedule_test zelocore_section_file_test sched_parm_table_test sched_task_convert_test
   sched_task_convert_to_json_string_test backend_zeloautopower_test zelosdk_test)
-readonly SHORT=("${FORMS[@]}" zelocore_proc_test sched_date_test sched_task_run_test zeloschedtask_test
-  zelosched_task_json_test zelosched_coming_runs_test)
-readonly LONG_FORMS=("${FORMS[@]}" zelocore_err_test zelocore_szhash_test hash_round_trip_property_test
-  sched_task_save_from_json_string_test accessors_test sched_record_test power_platform_test
-  zelosched_task_json_test)
+readonly SHORT=("${FORMS[@]}" sched_date_test sched_util_test)
+readonly OTHER_ORDER_FORMS=("${FORMS[@]}" zelocore_err_test zelocore_szhash_test
+  hash_round_trip_property_test sched_task_save_from_json_string_test accessors_test sched_record_test
+  power_platform_test zelosched_task_json_test)
+# Compiling the tools takes as long as all else; of both processors, this one's types differ.
+declare -rA SHORT_TOOLS=([armhf]="zelosched zeloschedtask zeloschedtask_test zelosched_task_json_test")
 # Programs that map files or ask for the size of a page: SQLite's, and those of the store.
 readonly WITH_PAGES=(sched_db_vfs_test store_reader_test sched_shared_names_test)
 export JOBS=${JOBS:-2} PROGRAMS_AT_ONCE=2
@@ -35,11 +36,14 @@ if ((EUID != 0)) || ! grep -q '^ *0 *0 ' /proc/self/uid_map 2>/dev/null && [[ -e
   finish
 fi
 
-# Their builds alone would make the whole of the tests half as long again.
-if [[ -z ${ZELO_SOAK_FACTOR:-}${ZELO_PROCESSORS:-} ]]; then
-  skip "other processors are built for and tested" "scripts/soak does it, and ZELO_PROCESSORS=1"
-  finish
+if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then
+  readonly CROSS=$BUILD_DIR/cross
+  quick=()
+else
+  readonly CROSS=$BUILD_DIR/quick
+  quick=(--quick)
 fi
+cross_root=("$root/scripts/cross-root" "${quick[@]}")
 
 # quietly COMMAND...: shows the end of what it prints when it fails
 quietly() {
@@ -47,13 +51,13 @@ quietly() {
 }
 
 builds() {
-  quietly "$root/scripts/build" --target "$@" && ! grep -i 'warning:' "$WORK/log"
+  quietly "$root/scripts/build" "${quick[@]:---target}" "$@" && ! grep -i 'warning:' "$WORK/log"
 }
 
 # Shows how many passed.
 passes() {
   local status=0
-  "$root/scripts/cross-root" "$here/qemu/run_tests.sh" "$@" >"$WORK/log" 2>&1 || status=$?
+  "${cross_root[@]}" "$here/qemu/run_tests.sh" "${quick[@]}" "$@" >"$WORK/log" 2>&1 || status=$?
   grep -E '^(FAILED|    |skip)' "$WORK/log" || true
   echo "# $1: $(tail -n 1 "$WORK/log")"
   return "$status"
@@ -61,7 +65,7 @@ passes() {
 
 # But for one that the emulator breaks (no_spawn_error).
 platform_is_right() {
-  "$root/scripts/cross-root" "$root/scripts/sandbox" "${EMULATORS[$1]}" "$BUILD_DIR/cross/$1/tests/platform_check" \
+  "${cross_root[@]}" "$root/scripts/sandbox" "${EMULATORS[$1]}" "$CROSS/$1/tests/platform_check" \
     --system >"$WORK/log" || true
   same "$(grep -v '^ok ' "$WORK/log")" "not ok QLIBCExec: -1 when the program cannot be started" &&
     test "$(grep -c '^ok ' "$WORK/log")" -ge 100
@@ -69,11 +73,11 @@ platform_is_right() {
 
 # in_sandbox_of TARGET COMMANDS: with $print and $save as this processor's program; "own" is the machine
 in_sandbox_of() {
-  local target=$1 commands=$2 program=$BUILD_DIR/cross/$1/tests/stored_forms
+  local target=$1 commands=$2 program=$CROSS/$1/tests/stored_forms
   if [[ $target == own ]]; then
     "$root/scripts/sandbox" bash -c "forms() { '$BUILD_DIR/tests/stored_forms' \"\$1\"; }; cd $WORK; $commands"
   else
-    "$root/scripts/cross-root" "$root/scripts/sandbox" \
+    "${cross_root[@]}" "$root/scripts/sandbox" \
       bash -c "forms() { ${EMULATORS[$target]} $program \"\$1\"; }; cd $WORK; $commands"
   fi
 }
@@ -100,18 +104,19 @@ reasons() {
   echo no_subreaper
 }
 
-# The machine can what the emulator cannot.
+# The machine can what the emulator cannot. Whoever calls this may ignore signals (nohup), which the
+# programs would inherit.
 is_shown() {
   local name=qemu_$1 target
-  "$BUILD_DIR/tests/$name" || { echo "$1 fails here"; return 1; }
+  env --default-signal "$BUILD_DIR/tests/$name" || { echo "$1 fails here"; return 1; }
   for target in "${TARGETS[@]}"; do
-    ! "$root/scripts/cross-root" "${EMULATORS[$target]}" "$BUILD_DIR/cross/$target/tests/$name" ||
+    ! env --default-signal "${cross_root[@]}" "${EMULATORS[$target]}" "$CROSS/$target/tests/$name" ||
       { echo "$1 succeeds under ${EMULATORS[$target]}"; return 1; }
   done
 }
 
 same_interface() {
-  local target=$1 library=$BUILD_DIR/cross/$1/lib/libzeloscheduler.so.4
+  local target=$1 library=$CROSS/$1/lib/libzeloscheduler.so.4
   same "$(nm -D --defined-only --with-symbol-versions "$library" | awk '$2 != "A" { print $3 }' | LC_ALL=C sort)" \
     "$(cat "$here/exported_names.txt")" && compgen -G "$here/abi/*-$2.xml" >/dev/null &&
     abidiff --exported-interfaces-only "$here"/abi/*-"$2".xml "$library"
@@ -119,45 +124,56 @@ same_interface() {
 
 # A segment that is aligned for pages of 64 KiB is so for smaller ones.
 with_pages() {
-  quietly "$root/scripts/cross-root" env PAGE_SIZE="$1" "$here/qemu/run_tests.sh" arm64 "${WITH_PAGES[@]}"
+  quietly "${cross_root[@]}" env PAGE_SIZE="$1" "$here/qemu/run_tests.sh" arm64 "${WITH_PAGES[@]}"
 }
 
 fits_pages_of_64_kib() {
   local file
-  for file in "$BUILD_DIR/cross/$1"/lib/*.so "$BUILD_DIR/cross/$1"/bin/*; do
+  for file in "$CROSS/$1"/lib/*.so "$CROSS/$1"/bin/*; do
     ! readelf -lW "$file" | awk '$1 == "LOAD" { print $NF }' | grep -v '^0x10000$' || { echo "$file"; return 1; }
   done
 }
 
-check "a root with the compilers of all is made" quietly "$root/scripts/cross-root"
+# Says how long it took.
+timed_check() {
+  local before=$SECONDS
+  check "$@"
+  echo "# took $((SECONDS - before)) s"
+}
+
+timed_check "a root with the compilers is made" quietly "${cross_root[@]}"
 mapfile -t shown <<<"$(reasons)"
-tools=(zelosched zeloschedtask take-names stored_forms demo_tasks platform_check "${shown[@]/#/qemu_}")
+programs=(stored_forms platform_check "${shown[@]/#/qemu_}")
 for target in "${TARGETS[@]}"; do
   if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then
-    check "$target: everything is built" builds "$target"
-    check "$target: every program that the emulator can run passes" passes "$target"
+    timed_check "$target: everything is built" builds "$target"
+    timed_check "$target: every program that the emulator can run passes" passes "$target"
   else
-    check "$target: the product and some tests are built" builds "$target" "${tools[@]}" "${SHORT[@]}"
-    check "$target: these pass" passes "$target" "${SHORT[@]}"
+    read -ra tools <<<"${SHORT_TOOLS[$target]:-}"
+    timed_check "$target: the libraries and some tests are built" \
+      builds "$target" "${programs[@]}" "${SHORT[@]}" "${tools[@]}"
+    timed_check "$target: these pass" passes "$target" "${SHORT[@]}" "${tools[@]}"
   fi
-  check "$target: our platform keeps its contracts" platform_is_right "$target"
+  timed_check "$target: our platform keeps its contracts" platform_is_right "$target"
 done
-# Debian's own libraries of armhf are for pages of 4 KiB.
-check "arm64: it fits pages of 64 KiB" fits_pages_of_64_kib arm64
-if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then
-  check "arm64: with pages of 16 and 64 KiB the store and the database work" eval \
-    'with_pages 16384 && with_pages 65536'
-fi
-check "arm64: the interface is the checked-in one" same_interface arm64 aarch64-linux-gnu
-check "armhf: the interface is the checked-in one" same_interface armhf arm-linux-gnueabihf
 for reason in "${shown[@]}"; do check "what the emulators cannot do is shown: $reason" is_shown "$reason"; done
+others=("${TARGETS[@]}")
 
-names=("${FORMS[@]}")
-if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then names=("${LONG_FORMS[@]}"); fi
-check "$OTHER_ORDER: what stores and reads is built" builds "$OTHER_ORDER" stored_forms "${names[@]}"
-check "$OTHER_ORDER: its tests pass" passes "$OTHER_ORDER" "${names[@]}"
+# Debian's own libraries of armhf are for pages of 4 KiB.
+if [[ -n ${ZELO_SOAK_FACTOR:-} ]]; then
+  check "arm64: it fits pages of 64 KiB" fits_pages_of_64_kib arm64
+  timed_check "arm64: with pages of 16 and 64 KiB the store and the database work" eval \
+    'with_pages 16384 && with_pages 65536'
+  check "arm64: the interface is the checked-in one" same_interface arm64 aarch64-linux-gnu
+  check "armhf: the interface is the checked-in one" same_interface armhf arm-linux-gnueabihf
+  timed_check "$OTHER_ORDER: what stores and reads is built" \
+    builds "$OTHER_ORDER" stored_forms "${OTHER_ORDER_FORMS[@]}"
+  timed_check "$OTHER_ORDER: its tests pass" passes "$OTHER_ORDER" "${OTHER_ORDER_FORMS[@]}"
+  others+=("$OTHER_ORDER")
+fi
+
 check "this machine stores tasks and power times" stores own
-for target in "${TARGETS[@]}" "$OTHER_ORDER"; do
+for target in "${others[@]}"; do
   check "$target stores the same bytes, ids and texts" eval "stores $target && stores_the_same $target"
   check "$target reads what this machine stored" reads_what_stored "$target" own
   check "this machine reads what $target stored" reads_what_stored own "$target"

@@ -89,6 +89,18 @@ TEST_F(ZeloschedtaskTest, AnUnknownTaskIsReportedOnOneLineWithTheErrorRecord) {
   }
 }
 
+TEST_F(ZeloschedtaskTest, ARunIsMadeUpForThatWasDueAfter2038) {
+  const std::string id = "id=" + std::to_string(saveTask(makeTask("late", "echo ran > /tmp/late")));
+  const auto runDueAt = [&](const std::string &due) {
+    return runProgram({kProgram, "--run", id, "--now", "--trigger=catch-up", "--due=" + due});
+  };
+  const Outcome outcome = runDueAt("4294967280");
+  waitForChildRuns();
+  EXPECT_EQ(outcome.status, 0) << outcome.err;
+  EXPECT_EQ(readFile("/tmp/late"), "ran\n");
+  EXPECT_EQ(runDueAt("9223372036854775808").status, kUsageStatus);
+}
+
 TEST_F(ZeloschedtaskTest, HelpAndVersionGoToStandardOutput) {
   const Outcome help = runProgram({kProgram, "--help"});
   EXPECT_EQ(help.status, 0);

@@ -8,12 +8,14 @@
 
 #include <charconv>
 #include <climits>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <optional>
 #include <string_view>
 #include <system_error>
+#include <utility>
 
 #include "keeper.h"
 #include "zelocore.h"
@@ -55,12 +57,12 @@ int show(const char *text, const char *more) {
   return shown ? EXIT_SUCCESS : EXIT_FAILURE;
 }
 
-// Decimal digits with an optional minus, nothing before, between or after, within a long.
-std::optional<long> parseNumber(std::string_view argument, std::string_view prefix) {
+// Decimal digits with an optional minus, nothing before, between or after.
+std::optional<int64_t> parseNumber(std::string_view argument, std::string_view prefix) {
   if (!argument.starts_with(prefix)) return std::nullopt;
   const std::string_view digits = argument.substr(prefix.size());
   const char *end = digits.data() + digits.size();
-  long number = 0;
+  int64_t number = 0;
   const auto [parsed, error] = std::from_chars(digits.data(), end, number);
   if (error != std::errc{} || parsed != end) return std::nullopt;
   return number;
@@ -80,7 +82,7 @@ int run(const RunOrder &order) {
 
 // A descriptor that we were given, and the command must not have.
 bool takeDescriptor(std::string_view argument, std::string_view prefix, int *descriptor) {
-  const std::optional<long> number = parseNumber(argument, prefix);
+  const std::optional<int64_t> number = parseNumber(argument, prefix);
   if (!number || *number <= STDERR_FILENO || *number > INT_MAX) return false;
   *descriptor = static_cast<int>(*number);
   return fcntl(*descriptor, F_SETFD, FD_CLOEXEC) == 0;
@@ -107,10 +109,10 @@ bool takeOption(std::string_view argument, RunOrder *order) {
 std::optional<RunOrder> orderOf(int argc, char **argv) {
   constexpr int kFirstMore = 3;
   if (argc < kFirstMore || std::strcmp(argv[1], "--run") != 0) return std::nullopt;
-  const std::optional<long> id = parseNumber(argv[2], "id=");
-  if (!id) return std::nullopt;
+  const std::optional<int64_t> id = parseNumber(argv[2], "id=");
+  if (!id || !std::in_range<long>(*id)) return std::nullopt;
   RunOrder order;
-  order.task = *id;
+  order.task = static_cast<long>(*id);
   if (argc == kFirstMore) return order;
   if (std::strcmp(argv[kFirstMore], "--now") != 0) return std::nullopt;
   order.isAnyTime = true;
@@ -138,7 +140,7 @@ int main(int argc, char **argv) {
     return order->isAnyTime && geteuid() != 0 ? refuseRights() : run(*order);
   }
   if (argc == 3 && std::strcmp(argv[1], "--keep") == 0) {
-    if (const std::optional<long> number = parseNumber(argv[2], "run=")) {
+    if (const std::optional<int64_t> number = parseNumber(argv[2], "run=")) {
       return geteuid() != 0 ? refuseRights() : keepOn(*number);
     }
   }

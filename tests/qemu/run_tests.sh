@@ -2,16 +2,22 @@
 # Runs test programs of another processor by its emulator, in the root that scripts/cross-root makes:
 #
 #   scripts/cross-root tests/qemu/run_tests.sh TARGET [NAME...]      all programs, by default
+#   scripts/cross-root --quick tests/qemu/run_tests.sh --quick TARGET [NAME...]
 #
 # Left out is what the emulator cannot do, as tests/qemu/cannot.txt says. $BUILD_DIR is that of the machine's
-# own build; the programs are those of $BUILD_DIR/cross/TARGET. $PAGE_SIZE is another size of pages than 4096.
+# own build; the programs are those of $BUILD_DIR/cross/TARGET, or quick/TARGET. $PAGE_SIZE is another size of pages than 4096.
 set -euo pipefail
 
 here=$(cd "$(dirname "$0")" && pwd -P)
 root=$(cd "$here/../.." && pwd -P)
+builds=cross
+if [[ $1 == --quick ]]; then
+  builds=quick
+  shift
+fi
 target=$1
 shift
-export BUILD_DIR=$BUILD_DIR/cross/$target
+export BUILD_DIR=$BUILD_DIR/$builds/$target
 case $target in
   arm64) emulator=qemu-aarch64-static ;;
   armhf) emulator=qemu-arm-static ;;
@@ -37,10 +43,11 @@ programs() {
 # here, and so is what stands in the place of the programs.
 wrap_tools() {
   local tool
-  mkdir -p "$BUILD_DIR/bin.$target"
+  mkdir -p "$BUILD_DIR/bin" "$BUILD_DIR/bin.$target"
   mount -n --bind "$BUILD_DIR/bin" "$BUILD_DIR/bin.$target"
   mount -n -t tmpfs -o mode=0755 tools "$BUILD_DIR/bin"
   for tool in "$BUILD_DIR/bin.$target"/*; do
+    [[ -e $tool ]] || continue
     echo "#!/bin/sh
 exec $emulator -0 \"\$0\" $tool \"\$@\"" >"$BUILD_DIR/bin/${tool##*/}"
     chmod 755 "$BUILD_DIR/bin/${tool##*/}"

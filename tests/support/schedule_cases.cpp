@@ -479,7 +479,7 @@ bool isStorable(const Schedule &schedule) {
 std::vector<uint32_t> hoursOf(const ScheduleCase &each) {
   std::vector<uint32_t> hours;
   for (const std::string &hour : split(split(each.fields, ' ').at(1), ',')) {
-    const long number = std::stol(hour);
+    const int64_t number = std::stoll(hour);
     if (number >= 0 && number <= 23) hours.push_back(static_cast<uint32_t>(number));
   }
   return hours;
