@@ -38,8 +38,11 @@ prepare() {
   # What the tests need of Ansible, and nothing of the user's.
   export HOME=$SCRATCH ANSIBLE_HOME=$SCRATCH/ansible ANSIBLE_CONFIG=$SCRATCH/ansible.cfg
   export ANSIBLE_COLLECTIONS_PATH=$SCRATCH/collections LC_ALL=C.UTF-8
-  mkdir -p collections/ansible_collections/zelo
-  cp -r "$ROOT/ansible" collections/ansible_collections/zelo/scheduler
+  if ! { ansible-galaxy collection build "$ROOT/ansible" &&
+    ansible-galaxy collection install --offline -p collections zelo-scheduler-*.tar.gz; } >galaxy.log 2>&1; then
+    cat galaxy.log
+    exit 1
+  fi
   mkdir callbacks
   cp "$here/support/ansible_told.py" callbacks
   cat >ansible.cfg <<CONFIG
@@ -86,7 +89,7 @@ on() {
 # play [OPTION...]: the example, without its packages, for the set in set.json; keeps $status and out.json
 play() {
   status=0
-  timeout 100 ansible-playbook -i inventory collections/ansible_collections/zelo/scheduler/playbooks/fleet.yml \
+  timeout 100 ansible-playbook -i inventory zelo.scheduler.fleet \
     --skip-tags packages -e set="$SCRATCH/set.json" -e '{"applications": ["backup"]}' "$@" \
     >out.json 2>err || status=$?
 }
