@@ -195,6 +195,21 @@ def run_and_stop(browser, server):
     same([(run["outcome"], run["trigger"]) for run in runs("Long")], [("stopped", "manual")])
 
 
+@story("a run that has to wait says so, and is cancelled by stopping")
+def waits(browser, server):
+    number = add("--daily", "02:30", "--name", "Long", command="sleep 60")
+    z("run", "Long")
+    browser.open(server, f"task/{number}")
+    browser.see("is running")
+    browser.click("Run now")
+    browser.see("It waits for its turn, and has printed nothing.")
+    browser.click("Stop")
+    browser.dialog("Stop")
+    browser.see("was cancelled")
+    browser.see("was stopped")
+    same(sorted(run["outcome"] for run in runs("Long")), ["cancelled", "stopped"])
+
+
 @story("a task is removed after a question that names it")
 def removed(browser, server):
     number = add("--daily", "02:30", "--name", "Old backup")
