@@ -5,6 +5,7 @@ What they stand on is in web_machine.py. WEB_PICTURES names a directory for pict
 """
 
 import os
+import signal
 import sys
 import time
 import traceback
@@ -878,7 +879,10 @@ def real_cron(browser, server):
         wait_for("there is its run", lambda: browser.find("td.c-output button").click() or True)
         browser.see("from cron", ".output")
     finally:
+        with open("/var/run/crond.pid", encoding="utf-8") as file:
+            os.kill(int(file.read()), signal.SIGTERM)
         started.terminate()
+        started.wait()
     same([(run["trigger"], run["outcome"]) for run in runs("Soon")], [("schedule", "finished")])
 
 
