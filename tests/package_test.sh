@@ -613,6 +613,8 @@ check "what was root's under a free name before is replaced" \
   same "$(grep -l planted "$ROOT/tmp/scheduled_tasks" "$ROOT/tmp/zeloschedtask")" ""
 check "the tasks are there again" has_all_tasks
 check "and their lines" has_all_lines
+check "failures are mailed when that is switched on" same "$(in_root zelosched mail on --to-owners 2>/dev/null)" \
+  "failures are mailed to the owners of the tasks"
 check "all are purged" purge_packages
 check "nothing is left at all" same "$(differences_from "$WORK/before")" ""
 check "the crontab is as it was before" cmp "$ROOT/etc/crontab" "$WORK/crontab"

@@ -18,6 +18,7 @@ readonly PYTHON=/usr/bin/python3 # which has Debian's selenium
 # The page that the demonstration starts, in the sandbox of this test, which ends it too.
 demonstration_starts() {
   local log=$SCRATCH/demo.log tenths address
+  clean
   : >"$log"
   ZELO_DEMO_STAGE=page "$here/../scripts/demo" >"$log" 2>&1 &
   for ((tenths = 0; tenths < 300; tenths++)); do

@@ -100,6 +100,10 @@ preview_is_valid() {
   { echo '{"version": 1, "tasks": [{}, {}], "x": 1}' | z next --preview --json || true; } | is_valid preview
 }
 
+mail_is_valid() {
+  z mail --json | is_valid mail
+}
+
 owners_is_valid() {
   z owners --json | is_valid owners
 }
@@ -476,6 +480,7 @@ check "and of a run that goes on" a_run_that_goes_on_is_valid
 check "what 'next' tells, too" next_is_valid
 check "what it tells of a task that is not saved" preview_is_valid
 check "what 'owners' tells" owners_is_valid
+check "what 'mail' tells" mail_is_valid
 check "what 'power list' tells, too" power_list_is_valid
 check "what 'export' writes, too" export_is_valid
 check "what 'status' tells, too" status_is_valid

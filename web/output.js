@@ -24,8 +24,11 @@ export class Output {
   }
 
   load() {
+    this.text.hidden = this.run.state === "waiting";
     if (this.run.state === "running") {
       this.follow();
+    } else if (this.run.state === "waiting") {
+      setText(this.note, _("It waits for its turn, and has printed nothing."));
     } else {
       this.show();
     }

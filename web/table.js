@@ -3,7 +3,7 @@
 import { button, el, fill, setAttribute } from "./dom.js";
 import { _, format } from "./text.js";
 
-const PAGE = 100; // rows shown at once: more are slow to lay out, and nobody reads them
+const PAGE = 60; // rows shown at once: more are slow to lay out, and nobody reads them
 
 // A column is {key, label, make(cell), isSortable}; make returns what shows a row in that cell.
 export class Table {

@@ -4,6 +4,7 @@ import { setEnabled } from "./actions.js";
 import { href, replaceOptions, taskPath } from "./address.js";
 import { showAccess } from "./access.js";
 import { Health } from "./health.js";
+import { Mails } from "./mails.js";
 import { distanceText, moment, momentText } from "./moments.js";
 import { Table } from "./table.js";
 import { gradeOf, outcomeText, scheduleText } from "./words.js";
@@ -140,8 +141,9 @@ export class TasksView {
     this.table = new Table({ caption: _("Tasks"), columns: columns(model), sorted: (key) => this.sortBy(key) });
     this.count = el("span", { class: "count", role: "status" });
     this.empty = el("div", { class: "empty" });
+    this.mails = new Mails();
     this.add = el("a", { class: "button primary", href: href(["add"]) }, _("Add a task"));
-    this.list = el("section", { "aria-label": _("Tasks") }, this.tools(), this.empty, this.table.element);
+    this.list = el("section", { "aria-label": _("Tasks") }, this.tools(), this.empty, this.table.element, this.mails.element);
     fill(root, this.access, this.health.element, this.list);
     this.update();
   }
@@ -247,6 +249,7 @@ export class TasksView {
     this.list.hidden = !this.model.isLoaded;
     if (!this.model.isLoaded) return;
     this.add.hidden = !this.model.mayChange;
+    this.mails.show(this.model.mayChange);
     this.health.show(this.model);
     this.showApps();
     this.showRows();

@@ -91,7 +91,7 @@ def add(*words, command="true"):
 
 
 def clean():
-    library("clean")
+    library("clean; rm -rf /etc/zelosched /etc/default/zelosched-mail; mkdir -p /etc/zelosched/run-ended.d")
     shutil.copy(ROOT + "/packaging/zelo_poweroff_feasible_check", "/usr/zelo/bin")
     subprocess.run([BUILD + "/bin/zelosched", "restore"], check=False, stdout=subprocess.DEVNULL,
                    stderr=subprocess.DEVNULL)

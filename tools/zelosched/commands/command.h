@@ -28,6 +28,7 @@ extern const Command kNextCommand;
 extern const Command kHistoryCommand;
 extern const Command kLogCommand;
 extern const Command kStatusCommand;
+extern const Command kMailCommand;
 extern const Command kMetricsCommand;
 extern const Command kAddCommand;
 extern const Command kEditCommand;

@@ -6,11 +6,11 @@
 namespace {
 
 constexpr const Command *kTable[] = {
-    &kListCommand,    &kShowCommand,    &kNextCommand,       &kHistoryCommand, &kLogCommand,
-    &kStatusCommand,  &kMetricsCommand, &kAddCommand,        &kEditCommand,    &kEnableCommand,
-    &kDisableCommand, &kRemoveCommand,  &kRunCommand,        &kStopCommand,    &kSyncCommand,
-    &kPowerCommand,   &kOwnersCommand,  &kExportCommand,     &kApplyCommand,   &kImportCommand,
-    &kRestoreCommand, &kCatchUpCommand, &kCompletionCommand,
+    &kListCommand,    &kShowCommand,    &kNextCommand,    &kHistoryCommand,    &kLogCommand,
+    &kStatusCommand,  &kMetricsCommand, &kAddCommand,     &kEditCommand,       &kEnableCommand,
+    &kDisableCommand, &kRemoveCommand,  &kRunCommand,     &kStopCommand,       &kSyncCommand,
+    &kPowerCommand,   &kOwnersCommand,  &kMailCommand,    &kExportCommand,     &kApplyCommand,
+    &kImportCommand,  &kRestoreCommand, &kCatchUpCommand, &kCompletionCommand,
 };
 
 }  // namespace
