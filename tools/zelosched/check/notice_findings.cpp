@@ -6,9 +6,6 @@
 
 namespace {
 
-constexpr char kMailProgram[] = "/mail-on-failure";
-constexpr char kMailer[] = "/usr/sbin/sendmail";
-
 Findings warningOf(const std::string &text) {
   return {{Severity::kWarning, "notice", text}};
 }
@@ -16,7 +13,7 @@ Findings warningOf(const std::string &text) {
 // What keeps it from telling anybody; empty when nothing is known to.
 std::string faultOf(const NoticeProgram &program) {
   if (!program.fault.empty()) return program.fault;
-  if (program.path.ends_with(kMailProgram) && access(kMailer, X_OK) != 0) {
+  if (program.path == kMailProgram && !hasMailer()) {
     return std::string("has no ") + kMailer + ": nobody is mailed: install a mail transfer agent";
   }
   const std::string last = lastFaultOf(program);
@@ -44,8 +41,7 @@ Findings checkNotices() {
   if (!findings.empty()) return findings;
   if (told.empty()) {
     return {{Severity::kOk, "notice",
-             "nobody is told of failed runs: 'Who is told' in zelosched(8) says how"
-             " to switch mail on"}};
+             "nobody is told of failed runs: 'zelosched mail on' has them mailed"}};
   }
   return {{Severity::kOk, "notice", "of failed runs is told: " + told}};
 }

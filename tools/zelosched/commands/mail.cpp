@@ -16,6 +16,7 @@
 #include "commands/command.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "runs/notices.h"
 #include "store/place_file.h"
 #include "store/task_program.h"
 #include "terminal/failure.h"
@@ -24,9 +25,7 @@
 namespace {
 
 constexpr Option kOptions[] = {{"to", Option::kValue}, {"to-owners"}, {"json"}};
-constexpr char kLink[] = "/etc/zelosched/run-ended.d/mail-on-failure";
 constexpr char kSettings[] = "/etc/default/zelosched-mail";
-constexpr char kMailer[] = "/usr/sbin/sendmail";
 constexpr char kUsualProgram[] = "/usr/share/zelosched/mail-on-failure";
 constexpr char kAddress[] = "MAIL_TO=";
 
@@ -79,24 +78,20 @@ void setAddress(const std::string &text) {
 }
 
 bool isOn() {
-  return access(kLink, X_OK) == 0;
-}
-
-bool hasMailer() {
-  return access(kMailer, X_OK) == 0;
+  return access(kMailProgram, X_OK) == 0;
 }
 
 void switchOn() {
   if (isOn()) return;
-  unlink(kLink);  // a link that leads nowhere
-  if (symlink(mailProgram().c_str(), kLink) < 0) {
-    throw Failure(std::string("cannot make ") + kLink + ": " + std::strerror(errno));
+  unlink(kMailProgram);  // a link that leads nowhere
+  if (symlink(mailProgram().c_str(), kMailProgram) < 0) {
+    throw Failure(std::string("cannot make ") + kMailProgram + ": " + std::strerror(errno));
   }
 }
 
 void switchOff() {
-  if (unlink(kLink) == 0 || errno == ENOENT) return;
-  throw Failure(std::string("cannot remove ") + kLink + ": " + std::strerror(errno));
+  if (unlink(kMailProgram) == 0 || errno == ENOENT) return;
+  throw Failure(std::string("cannot remove ") + kMailProgram + ": " + std::strerror(errno));
 }
 
 void tell(bool asJson) {

@@ -236,6 +236,10 @@ void run(const std::string &program, const Environment &environment) {
 
 }  // namespace
 
+bool hasMailer() {
+  return access(kMailer, X_OK) == 0;
+}
+
 std::vector<NoticeProgram> noticePrograms() {
   struct stat directory {};
   if (stat(kDirectory, &directory) != 0) return {};

@@ -3,6 +3,11 @@
 
 #include "runs/history.h"
 
+// What mails failures when it is among those that are told.
+inline constexpr char kMailProgram[] = "/etc/zelosched/run-ended.d/mail-on-failure";
+inline constexpr char kMailer[] = "/usr/sbin/sendmail";
+bool hasMailer();
+
 // A program that is to be told, and why it cannot be, which is empty when it can.
 struct NoticeProgram {
   std::string path;
