@@ -19,7 +19,7 @@ declare -rA EMULATORS=([arm64]=qemu-aarch64-static [armhf]=qemu-arm-static [s390
 # What has to do with the width of numbers, the sign of characters, and the order of bytes.
 readonly FORMS=(schedule_test zelocore_section_file_test sched_parm_table_test sched_task_convert_test
   sched_task_convert_to_json_string_test backend_zeloautopower_test zelosdk_test)
-readonly SHORT=("${FORMS[@]}" sched_date_test sched_util_test)
+readonly SHORT=("${FORMS[@]}" sched_date_test sched_util_test owners_rights_test)
 readonly OTHER_ORDER_FORMS=("${FORMS[@]}" zelocore_err_test zelocore_szhash_test
   hash_round_trip_property_test sched_task_save_from_json_string_test accessors_test sched_record_test
   power_platform_test zelosched_task_json_test)
