@@ -105,10 +105,10 @@ reasons() {
 }
 
 # The machine can what the emulator cannot. Whoever calls this may ignore signals (nohup), which the
-# programs would inherit.
+# programs would inherit, and a chroot may be without /proc.
 is_shown() {
   local name=qemu_$1 target
-  env --default-signal "$BUILD_DIR/tests/$name" || { echo "$1 fails here"; return 1; }
+  env --default-signal "$root/scripts/sandbox" "$BUILD_DIR/tests/$name" || { echo "$1 fails here"; return 1; }
   for target in "${TARGETS[@]}"; do
     ! env --default-signal "${cross_root[@]}" "${EMULATORS[$target]}" "$CROSS/$target/tests/$name" ||
       { echo "$1 succeeds under ${EMULATORS[$target]}"; return 1; }
@@ -138,7 +138,7 @@ fits_pages_of_64_kib() {
 timed_check() {
   local before=$SECONDS
   check "$@"
-  echo "# took $((SECONDS - before)) s"
+  echo "# $((SECONDS - before)) s: $1"
 }
 
 timed_check "a root with the compilers is made" quietly "${cross_root[@]}"
