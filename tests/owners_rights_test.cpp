@@ -124,6 +124,16 @@ TEST_F(OwnersRightsTest, EveryIdOfTheCommandIsTheOwners) {
             "Groups:\t4343 4444 \n");
 }
 
+TEST_F(OwnersRightsTest, AnOwnerOfTheLargestNumberHasHisRights) {
+  constexpr uid_t kLargest = 4294967294U;
+  addUser("zelolargest", kLargest, kLargest, "/nonexistent");
+  EXPECT_EQ(run(kLargest, kIds), ZELO_SCHED_STATUS_FINISHED);
+  EXPECT_EQ(readFile(kOutput),
+            "Uid:\t4294967294\t4294967294\t4294967294\t4294967294\n"
+            "Gid:\t4294967294\t4294967294\t4294967294\t4294967294\n"
+            "Groups:\t4294967294 \n");
+}
+
 TEST_F(OwnersRightsTest, NobodysTaskHasNoneOfRootsIdsAndGroups) {
   EXPECT_EQ(run(kNobody, kIds), ZELO_SCHED_STATUS_FINISHED);
   EXPECT_EQ(readFile(kOutput),

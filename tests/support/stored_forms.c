@@ -53,17 +53,16 @@ static int save(ZELO_SCHED_TASK *task) {
   return saved;
 }
 
-/* Disabled, as not every machine has a clock that can be armed. */
-static int save_power_time(const char *args, uint32_t hour) {
+static int save_power_time(const char *args, const char *week, int32_t state, uint32_t hour) {
   ZELO_SCHED_TASK *task = ZELOSchedTaskAlloc();
   if (task == NULL) return -1;
   task->Backend = ZELO_SCHED_BACKEND_AUTOPOWER;
   if (ZELOSchedTaskGetDefault(task) < 0) return -1;
   task->ID = ZELO_SCHED_ID_NEW;
   snprintf(task->AppArgs, sizeof task->AppArgs, "%s", args);
-  snprintf(task->Week, sizeof task->Week, "1010101");
+  snprintf(task->Week, sizeof task->Week, "%s", week);
   task->Type = ZELO_SCHED_TYPE_WEEKLY;
-  task->State = ZELO_SCHED_STATE_DISABLED;
+  task->State = state;
   task->RunHour = hour;
   task->RunMin = 59;
   return save(task);
@@ -91,7 +90,11 @@ static int save_all(void) {
   task->StartMonth = 2;
   task->StartDay = 29;
   if (save(task) < 0) return 1;
-  return save_power_time("poweron", 7) < 0 || save_power_time("poweroff", 23) < 0;
+  /* No power-on time is enabled, as not every machine has a clock that can be armed. */
+  return save_power_time("poweron", "0000000", ZELO_SCHED_STATE_DISABLED, 0) < 0 ||
+         save_power_time("poweron", "1010101", ZELO_SCHED_STATE_DISABLED, 7) < 0 ||
+         save_power_time("poweroff", "0101010", ZELO_SCHED_STATE_DISABLED, 23) < 0 ||
+         save_power_time("poweroff", "1111111", ZELO_SCHED_STATE_ENABLED, 23) < 0;
 }
 
 int main(int argc, char **argv) {
