@@ -18,7 +18,7 @@ options:
       - The tasks, in the words of zelosched-json(5). Of each, C(name), C(owner), C(schedule) and C(command) must be
         given.
       - Write times in quotes, as YAML takes C(10:30) for a number.
-      - The tasks of a file that C(zelosched export) wrote are C((lookup('file', 'set.json') | from_json).tasks).
+      - The tasks of a file that C(zelosched export) wrote are read as in the examples below.
     type: list
     elements: dict
     required: true

@@ -78,7 +78,8 @@ class RunCheck {
       add(isKnown ? Severity::kOk : Severity::kWarning,
           run.outcome == Outcome::kGaveUp ? kGaveUp : kFailedRun, *task,
           resultInWords(run) + " at " + momentInWords(moment) + (isKnown ? " (acknowledged)" : ""),
-          isKnown ? "" : "'zelosched log " + id + "' shows what it printed");
+          isKnown || run.outputBytes == 0 ? ""
+                                          : "'zelosched log " + id + "' shows what it printed");
     }
     if (isWell) findings_.push_back({Severity::kOk, kFailedRun, "no task's last run failed"});
   }

@@ -61,6 +61,14 @@ LastRuns lastRunsOf(const KeptDatabase &kept, const TaskList &list) {
   return runs;
 }
 
+void addAcknowledged(const KeptDatabase &kept, const LastRuns &runs, MetricsText *text) {
+  text->begin("zelosched_task_failure_acknowledged",
+              "1 when somebody has taken note of the failure of the last run.");
+  for (const auto &[task, run] : runs) {
+    if (isBad(run) && isAcknowledged(kept, run)) text->add(labelsOf(*task), 1);
+  }
+}
+
 void addLastRuns(const LastRuns &runs, MetricsText *text) {
   text->begin("zelosched_task_last_run_start_timestamp_seconds",
               "When the last run of a task started.");
@@ -96,8 +104,9 @@ void addSuccesses(const KeptDatabase &kept, const TaskList &list, MetricsText *t
 }
 
 void addMissed(const KeptDatabase &kept, const TaskList &list, MetricsText *text) {
-  text->begin("zelosched_task_missed_runs",
-              "Times at which a task was due and did not run, since it last ran.");
+  text->begin(
+      "zelosched_task_missed_runs",
+      "Times at which a task was due and did not run, since it last ran or that was acknowledged.");
   for (const MissedTask &missed : missedTasks(kept, list, 0)) {
     if (missed.times > 0) text->add(labelsOf(*missed.task), static_cast<double>(missed.times));
   }
@@ -114,7 +123,9 @@ void addRuns(const TaskList &list, MetricsText *text) {
   sweepRuns(list);
   const KeptDatabase kept(KeptDatabase::kRead);
   const Snapshot snapshot(kept);
-  addLastRuns(lastRunsOf(kept, list), text);
+  const LastRuns runs = lastRunsOf(kept, list);
+  addLastRuns(runs, text);
+  addAcknowledged(kept, runs, text);
   addSuccesses(kept, list, text);
   addMissed(kept, list, text);
   addOutcomes(kept, text);

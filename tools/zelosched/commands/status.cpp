@@ -77,11 +77,14 @@ void printAsJson(const Findings &findings) {
 // Of one task, or of all.
 void acknowledgeWarnings(const Findings &findings, std::optional<int64_t> task, bool isQuiet) {
   acknowledge(KeptDatabase(KeptDatabase::kChange), task, Acknowledged::kAll);
+  size_t count = 0;
   for (const Finding &finding : findings) {
     if (isQuiet || finding.severity != Severity::kWarning || !isAboutPastRun(finding)) continue;
     if (task && finding.task != *task) continue;
     std::printf("acknowledged: %s\n", printable(finding.text).c_str());
+    ++count;
   }
+  if (count == 0 && !isQuiet) std::puts("there is nothing to acknowledge");
 }
 
 int acknowledgeAll(const Arguments &arguments) {
