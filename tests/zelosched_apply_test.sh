@@ -175,6 +175,37 @@ fails_at_every_step() {
   ((step > 100))
 }
 
+# Who ends a command at a terminal ends all that it has started: here while the working copy is
+# half written.
+ends_between_changes() {
+  local signal
+  before_and_after
+  cp /usr/bin/cp "$SCRATCH/whole_cp"
+  cat >"$SCRATCH/slow_cp" <<'CP'
+#!/bin/bash
+if [[ $3 == /tmp/scheduled_tasks ]]; then
+  head -c 700 "$2" >"$3"
+  kill "-$SIGNAL" 0
+fi
+exec /run/zelosched_test/whole_cp "$@"
+CP
+  chmod 0755 "$SCRATCH/slow_cp"
+  for signal in INT HUP TERM; do
+    as_before
+    mount -n --bind "$SCRATCH/slow_cp" /usr/bin/cp
+    status=$(SIGNAL=$signal "$PYTHON" -c 'import os, signal, subprocess, sys
+def begin():
+    os.setsid()
+    for number in (signal.SIGINT, signal.SIGHUP, signal.SIGTERM): signal.signal(number, signal.SIG_DFL)
+print(subprocess.run(sys.argv[1:], preexec_fn=begin, stdout=subprocess.DEVNULL).returncode)' \
+      "$ZELOSCHED" apply new --prune --app fleet)
+    umount /usr/bin/cp
+    same "$signal $status" "$signal -$(kill -l "$signal")" || return 1
+    z export >exported.now && is_old_or_new || return 1
+    z apply new --prune --app fleet >told && z export | cmp -s - exported.new || return 1
+  done
+}
+
 # Nothing that was stored is lost, each task that could not be saved is told, and with room the same
 # file is applied whole.
 a_full_disk_is_told() {
@@ -211,6 +242,7 @@ check "several applies take turns, each as a whole" two_applies_take_turns
 check "and so do an apply and those that add and edit" an_apply_and_others_take_turns
 check "what changed while it waited is seen" what_changed_while_it_waited_is_seen
 check "killed at any step, each task is old or new, and a second apply completes it" fails_at_every_step kill
+check "a signal to all that it has started ends it between two changes" ends_between_changes
 check "where any step fails once, it is told, and a second apply completes it" fails_at_every_step 5
 check "a full disk is told for each task, and with room all is done" a_full_disk_is_told
 if $IS_WATCHED; then

@@ -87,7 +87,6 @@ int main(int argc, char **argv) {
   try {
     return afterPrinting(runCommand(argc, argv));
   } catch (const std::exception &error) {
-    std::fprintf(stderr, "zelosched: %s\n", error.what());
-    return kFailed;
+    return complain(error.what());
   }
 }

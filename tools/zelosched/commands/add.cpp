@@ -42,6 +42,7 @@ int runAdd(int argc, char **argv) {
   if (window && !isRead && !arguments.has("name")) {
     throw UsageError("'--stagger' goes by the task's name: add --name");
   }
+  const uint32_t minutes = window ? minutesOfWindow(*window) : 0;
   // Before the others have to wait: who writes it may take his time.
   const std::string text = isRead ? readInput(kStandardInput) : "";
   const ChangeLock lock;
@@ -50,7 +51,7 @@ int runAdd(int argc, char **argv) {
   if (isRead) fillFromText(text, task.get());
   if (arguments.has("disabled")) task->State = ZELO_SCHED_STATE_DISABLED;
   requireHarmless(*task);
-  if (window) stagger(minutesOfWindow(*window), task.get());
+  if (window) stagger(minutes, task.get());
   const std::string past = pastSchedule(*task, time(nullptr));
   if (!past.empty()) throw Failure("not saved: " + past);
   createTask(task.get());

@@ -56,6 +56,13 @@ void requirePermissions(const ApplyStep &step, bool insists) {
   }
 }
 
+// The last hour of a task that was spread is not that of the file.
+bool saysRepetition(const TaskText &text) {
+  const Json::Value &schedule = text.object["schedule"];
+  return schedule.isMember("every_hours") &&
+         (schedule["every_hours"].isNull() || schedule.isMember("until_hour"));
+}
+
 class Planner {
  public:
   Planner(const TaskList &stored, const ApplyRules &rules, JsonFaults *faults)
@@ -120,6 +127,12 @@ class Planner {
       return;
     }
     const TaskRecord &before = *tasks.front();
+    if (rules_.window && before.RepeatHour != 0 && !saysRepetition(text)) {
+      faults_->push_back({text.place + ".schedule",
+                          "says nothing of the repetition that " + titleOf(before) +
+                              " has: --stagger needs every_hours and until_hour, or null"});
+      return;
+    }
     const size_t faultsBefore = faults_->size();
     Task after = std::make_unique<TaskRecord>(before);
     after->next = nullptr;

@@ -33,7 +33,9 @@ const std::optional<std::string> &nameOf(uid_t uid) {
 
 }  // namespace
 
+// What no name can be is not asked for: a zero byte would end the question before it.
 std::optional<uid_t> findUserByName(const std::string &name) {
+  if (name.size() > LOGIN_NAME_MAX || name.find('\0') != std::string::npos) return std::nullopt;
   const passwd *entry = getpwnam(name.c_str());
   return entry != nullptr ? std::optional<uid_t>(entry->pw_uid) : std::nullopt;
 }

@@ -6,6 +6,7 @@
 #include "check/task_check.h"
 #include "runs/task_notes.h"
 #include "sched_cron_room.h"
+#include "store/held_signals.h"
 #include "store/power_room.h"
 #include "store/store_copy.h"
 #include "terminal/failure.h"
@@ -118,6 +119,7 @@ void removeTask(const ZELO_SCHED_TASK &task) {
 }
 
 void storeNew(ZELO_SCHED_TASK *task) {
+  const HeldSignals held;
   forgetError();
   if (ZELOSchedTaskCreate(task) < 0) {
     throwFailedChange(failedTo("save the task"),
@@ -127,6 +129,7 @@ void storeNew(ZELO_SCHED_TASK *task) {
 }
 
 void storeChanged(ZELO_SCHED_TASK *task) {
+  const HeldSignals held;
   forgetError();
   if (ZELOSchedTaskEdit(task) < 0) {
     throwFailedChange(failedTo("save " + titleOf(*task)),
@@ -137,6 +140,7 @@ void storeChanged(ZELO_SCHED_TASK *task) {
 }
 
 void storeRemoved(const ZELO_SCHED_TASK &task) {
+  const HeldSignals held;
   forgetError();
   if (ZELOSchedTaskRemove(task.ID) < 0) {
     throwFailedChange(failedTo("remove " + titleOf(task)),

@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "store/held_signals.h"
 #include "store/save.h"
 #include "store/store_copy.h"
 #include "store/task_list.h"
@@ -32,6 +33,7 @@ void armClock() {
 }  // namespace
 
 void synchronise() {
+  const HeldSignals held;
   try {
     writeTasksOut();
   } catch (const Failure &) {
