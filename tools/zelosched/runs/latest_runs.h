@@ -10,10 +10,10 @@
 #include "store/task_list.h"
 
 struct LatestRuns {
-  bool isKnown = false;  // this user may read the runs, and they can be read
-  std::string fault;     // what failed, where this user may read them
+  bool isKnown = false;                 // this user may read the runs, and they can be read
+  std::string fault;                    // what failed, where this user may read them
   std::map<int64_t, RunRecord> ofEach;  // the last, or the one that goes on
-  std::set<int64_t> running;  // the tasks that have a run which goes on
+  std::set<int64_t> running;            // the tasks that have a run which goes on
 
   const RunRecord *of(int64_t task) const;
 };
