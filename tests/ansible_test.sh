@@ -102,6 +102,33 @@ def changes(host): return [(c["name"], c["change"]) for c in hosts[host]["The ta
 print(eval(sys.argv[1]))' "$1"
 }
 
+# module NAME OPTIONS: a module alone, on the machine of the test; its result is in result.json
+module() {
+  /usr/bin/python3 - "$1" "$2" >result.json 2>err <<'PY'
+import json, runpy, sys
+sys.path.insert(0, "collections")
+from ansible.module_utils import basic
+name, options = sys.argv[1:]
+basic._ANSIBLE_ARGS = json.dumps({"ANSIBLE_MODULE_ARGS": json.loads(options)}).encode()
+runpy.run_path("collections/ansible_collections/zelo/scheduler/plugins/modules/%s.py" % name, run_name="__main__")
+PY
+}
+
+# of_module EXPRESSION: of the result `r`
+of_module() {
+  python3 -c 'import json, sys
+with open("result.json") as file: r = json.load(file)
+print(eval(sys.argv[1]))' "$1" || cat result.json err
+}
+
+# fake STATUS ANSWER: a program in the place of zelosched
+fake() {
+  # shellcheck disable=SC2016
+  printf '#!/bin/sh\n[ "$1" = list ] || cat >/dev/null\ncat "$0.answer"\nexit %d\n' "$1" >fake
+  printf '%s' "$2" >fake.answer
+  chmod +x fake
+}
+
 # is OPERATION...: compares, and shows what Ansible said when they differ
 is() {
   same "$@" || { head -c 4000 out.json err; return 1; }
@@ -237,6 +264,47 @@ machines_begin_at_times_of_their_own() {
   is "$(of 'sorted(s["changed"] for s in stats.values())')" "[0, 0]"
 }
 
+applications_are_a_list() {
+  local value
+  a_set 02:30 >set.json
+  for value in applications= applications=backup; do
+    play --limit machine11 -e "$value"
+    is "$((status != 0)) $(of '"list" in hosts["machine11"]["The applications are a list"]["msg"]')" "1 True" &&
+      is "$(of '"The tasks are those of the set" in hosts["machine11"]')" False || return 1
+  done
+}
+
+# As zelosched itself refuses it.
+a_set_is_read_by_the_program() {
+  local before wanted file
+  before=$(tasks_of 11)
+  local task='"name": "t", "app": "backup", "command": "docker ps --format {{.Names}}", "schedule": {"type": "daily", "at": "03:00"}'
+  while IFS='|' read -r wanted file; do
+    echo "$file" >set.json
+    play --limit machine11
+    is "$((status != 0)) $(of "'$wanted' in hosts['machine11']['The tasks are those of the set']['msg']")" "1 True" &&
+      same "$(tasks_of 11)" "$before" || return 1
+  done <<SETS
+version: is 2|{"version": 2, "tasks": [{$task, "owner": "root"}]}
+taskz|{"version": 1, "taskz": [], "tasks": [{$task, "owner": "root"}]}
+owner|{"version": 1, "tasks": [{$task, "owner": "nobody", "owner": "root"}]}
+SETS
+  echo "{\"version\": 1, \"tasks\": [{$task, \"owner\": \"root\"}]}" >set.json
+  play --limit machine11
+  is "$status" 0 && same "$(on 11 zelosched export | grep -cF 'docker ps --format {{.Names}}')" 1
+}
+
+# Such as one of a newer kind, or none.
+a_status_that_cannot_be_told_fails_the_play() {
+  sed 's/zelosched status/zelosched-that-is-not-there status/' \
+    collections/ansible_collections/zelo/scheduler/playbooks/fleet.yml >broken.yml
+  a_set 02:30 >set.json
+  status=0
+  timeout 100 ansible-playbook -i inventory broken.yml --limit machine11 --skip-tags packages -e set="$SCRATCH/set.json" \
+    >out.json 2>err || status=$?
+  is "$((status != 0)) $(of '(stats["machine11"]["failures"], hosts["machine11"]["Tasks run"]["failed_when_result"])')" "1 (1, True)"
+}
+
 # ---- without Ansible ------------------------------------------------------------------------
 
 a_file_over_ssh_does_it_too() {
@@ -313,6 +381,115 @@ faults_are_told_by_the_module() {
   fi
 }
 
+readonly HALF='"version": 1, "crontab_written": false'
+
+# Which is no success.
+what_is_no_answer_fails() {
+  local mode wanted answer options
+  while IFS='|' read -r mode wanted answer; do
+    fake "$mode" "$answer"
+    options='"executable": "/run/fleet/fake", "_ansible_diff": true, "_ansible_check_mode": '
+    if ((mode == 3)); then options+=true; else options+=false; fi
+    module tasks "{\"tasks\": [], $options}" || true
+    same "$(of_module "(r.get('failed', False), '$wanted' in r.get('msg', ''))")" "(True, True)" ||
+      { echo "$mode $answer"; return 1; }
+    if ((mode != 0)); then continue; fi
+    module task "{\"name\": \"n\", \"state\": \"absent\", $options}" || true
+    same "$(of_module "(r.get('failed', False), '$wanted' in r.get('msg', ''))")" "(True, True)" ||
+      { echo "absent $mode $answer"; return 1; }
+  done <<ANSWERS
+0|no answer|
+0|no answer|not json
+0|no answer|[]
+0|no answer|7
+0|no answer|{"version": 1}
+0|no answer|{$HALF, "changes": {}, "tasks": {}}
+0|no answer|{$HALF, "changes": [{}], "tasks": [{}]}
+0|no answer|{$HALF, "changes": [7], "tasks": [7]}
+0|no answer|{$HALF, "changes": [{"id": 1, "name": 7, "app": null, "change": "created", "differences": []}], "tasks": [{"id": 1, "name": 7, "app": null, "ui": {}}]}
+0|no answer|{$HALF, "changes": [{"id": 1, "name": "n", "app": null, "change": "made", "differences": []}], "tasks": [{"id": "1", "name": "n", "app": null, "ui": {}}]}
+0|no answer|{$HALF, "changes": [{"id": 1, "name": "n", "app": null, "change": "created"}], "tasks": [{"id": 1, "name": "n", "app": null, "ui": {}}]}
+0|no answer|{"version": 2, "crontab_written": false, "changes": [], "tasks": []}
+3|no answer|not json
+3|no answer|{"changes": [{}], "crontab_written": false, "version": 1}
+1|ended with 1|not json
+1|ended with 1|{"changes": [{}], "crontab_written": false, "version": 1}
+ANSWERS
+}
+
+a_program_that_goes_on_is_ended() {
+  printf '#!/bin/sh\nexec sleep 100\n' >fake
+  local began=$SECONDS
+  module tasks '{"tasks": [], "executable": "/run/fleet/fake", "timeout": 1}' || true
+  same "$(of_module "r['msg']")" "zelosched was ended after 1 s: 'timeout' allows no more" && ((SECONDS - began < 30))
+}
+
+# z COMMAND...: on the machine of the test
+z() {
+  "$BUILD_DIR/bin/zelosched" "$@"
+}
+
+here_are() {
+  same "$(z list --all --json | python3 -c 'import json, sys
+print(*sorted(t["name"] for t in json.load(sys.stdin)["tasks"]))')" "$*"
+}
+
+# An empty text is what a variable without a value gives.
+only_a_list_is_pruned() {
+  z restore >/dev/null
+  z add --daily 01:00 --name own -- true >/dev/null
+  local prune
+  for prune in '""' '"backup"' 'null' '{"backup": 1}' '[7]' '[null]'; do
+    module tasks "{\"tasks\": [], \"executable\": \"$BUILD_DIR/bin/zelosched\", \"prune\": $prune}" || true
+    [[ $prune == null ]] || same "$(of_module "r['msg'].startswith('prune: ')")" True || { echo "$prune"; return 1; }
+    here_are own || return 1
+  done
+  module tasks "{\"tasks\": [], \"executable\": \"$BUILD_DIR/bin/zelosched\", \"prune\": [\"\"]}"
+  here_are
+}
+
+a_hidden_task_goes_by_force_alone() {
+  z apply - >/dev/null <<<'{"version": 1, "tasks": [{"name": "hidden", "owner": "root", "command": "true",
+    "schedule": {"type": "daily", "at": "08:30"}, "ui": {"listable": false}}]}'
+  local mode absent="\"name\": \"hidden\", \"state\": \"absent\", \"executable\": \"$BUILD_DIR/bin/zelosched\""
+  for mode in true false; do
+    module task "{$absent, \"_ansible_check_mode\": $mode}" || true
+    same "$(of_module "'hidden by its application' in r['msg']")" True && here_are hidden || return 1
+  done
+  module task "{$absent, \"force\": true}" && here_are
+}
+
+# A task that got the number between the two looks, and that by the name of another.
+another_task_with_the_number_is_told() {
+  cat >racy <<SCRIPT
+#!/bin/sh
+if [ "\$1" = remove ]; then
+  "$BUILD_DIR/bin/zelosched" remove --yes 1 >/dev/null
+  "$BUILD_DIR/bin/zelosched" add --daily 05:00 --name Important -- true >/dev/null
+fi
+exec "$BUILD_DIR/bin/zelosched" "\$@"
+SCRIPT
+  chmod +x racy
+  z add --daily 01:00 --name Nightly -- true >/dev/null
+  module task '{"name": "Nightly", "state": "absent", "executable": "/run/fleet/racy"}' || true
+  same "$(of_module "(r.get('failed'), r.get('changed'), 'task 1 (Important) removed' in r.get('msg', ''))")" "(True, True, True)"
+}
+
+# Whoever looks at it has a terminal.
+the_diff_is_shown_safely() {
+  local unsafe='\u001b[2J\u009b2J\u202e\u2066\u007f\n\udb40\udc01'
+  fake 0 "{\"version\": 1, \"crontab_written\": false, \"changes\": [{\"id\": 1, \"name\": \"größe$unsafe\", \"app\": \"b$unsafe\",
+    \"change\": \"changed\", \"differences\": [{\"member\": \"command\", \"before\": \"a$unsafe\", \"after\": \"ö$unsafe\"}]}]}"
+  module tasks '{"tasks": [], "executable": "/run/fleet/fake", "_ansible_diff": true}'
+  same "$(of_module 'r["diff"]')" "$(U=$unsafe python3 -c 'import os
+u = os.environ["U"]; h = "größe%s (b%s)" % (u, u)
+print([{"before_header": h, "after_header": h, "before": "command: \"a%s\"\n" % u, "after": "command: \"ö%s\"\n" % u}])')" || return 1
+  fake 0 "{\"version\": 1, \"tasks\": [{\"id\": 1, \"name\": \"n\", \"app\": null, \"action\": \"ö$unsafe\",
+    \"ui\": {\"can_delete\": true, \"listable\": true}}]}"
+  module task '{"name": "n", "state": "absent", "executable": "/run/fleet/fake", "_ansible_diff": true, "_ansible_check_mode": true}'
+  same "$(of_module 'r["diff"]["before"].splitlines()[4]')" "  \"action\": \"ö$unsafe\","
+}
+
 modules_are_described() {
   local module
   for module in task tasks; do
@@ -362,10 +539,19 @@ check "and has all when it is back" and_has_all_when_it_is_back
 check "a machine that refuses the set disturbs no other, and says why" a_machine_that_refuses_disturbs_no_other
 check "a machine without cron fails the play" a_machine_without_cron_fails_the_play
 check "machines begin at times of their own, always the same" machines_begin_at_times_of_their_own
+check "applications that are no list are refused" applications_are_a_list
+check "a set is read by the program, with its guards" a_set_is_read_by_the_program
+check "a status that cannot be told fails the play" a_status_that_cannot_be_told_fails_the_play
 check "a file over ssh does the same" a_file_over_ssh_does_it_too
 check "and so does a package of the set, as the documentation has it" a_package_of_the_set_does_it_too
 check "one task comes, changes and goes" one_task_comes_changes_and_goes
 check "what is wrong with a task is told" faults_are_told_by_the_module
+check "what is no answer of the program fails" what_is_no_answer_fails
+check "a program that goes on for too long is ended" a_program_that_goes_on_is_ended
+check "only a list of applications is pruned" only_a_list_is_pruned
+check "a hidden task goes by force alone" a_hidden_task_goes_by_force_alone
+check "that another task had got the number is told" another_task_with_the_number_is_told
+check "a diff is shown without what a terminal obeys" the_diff_is_shown_safely
 check "ansible-doc describes the modules" modules_are_described
 check "and each of their options as it is" descriptions_are_whole
 for number in $MACHINES; do stop_machine "$number"; done

@@ -4,15 +4,32 @@ from __future__ import absolute_import, division, print_function
 __metaclass__ = type
 
 import json
+import re
 
 VERSION = 1  # of the vocabulary, zelosched-json(5)
 TO_DO = 3  # the exit status of a dry run that found something to do
+TIMED_OUT = 124  # that of timeout(1)
+SECONDS_TO_END = 10  # for a program that is told to end
+
+CHANGES = ("created", "changed", "unchanged", "removed", "failed")
 
 COMMON_OPTIONS = {
     "stagger": {"type": "str"},
     "force": {"type": "bool", "default": False},
     "executable": {"type": "path"},
+    "timeout": {"type": "int", "default": 600},
 }
+
+# What zelosched escapes too: control characters, the marks that turn the direction of writing or break
+# lines, and what cannot be seen; and halves of characters, which no terminal can be sent. A line's end is
+# none of them here.
+UNSAFE = re.compile("[\x00-\x09\x0b-\x1f\x7f-\x9f\xad\u061c\u200b\u200e\u200f\u2028-\u202e\u2060-\u2064"
+                    "\u2066-\u2069\ud800-\udfff\ufeff\ufff9-\ufffb\U000e0000-\U000e007f]")
+
+
+def shown(text):
+    """The text, of which a terminal obeys nothing but the ends of lines."""
+    return UNSAFE.sub(lambda found: json.dumps(found.group())[1:-1], text)
 
 
 def executable_of(module):
@@ -26,19 +43,65 @@ def said(error):
 
 
 def call(module, arguments, text=None, good=(0,)):
-    status, out, error = module.run_command([executable_of(module)] + arguments, data=text)
-    if status not in good:
-        module.fail_json(msg=said(error) or "zelosched ended with %d" % status, rc=status, **told(module, out))
-    return out
+    """What the program printed, and whether it ended well."""
+    limit = module.params["timeout"]
+    if limit < 0:
+        module.fail_json(msg="timeout: %d is no number of seconds" % limit)
+    command = [module.get_bin_path("timeout", required=True), "--kill-after=%d" % SECONDS_TO_END, str(limit)]
+    status, out, error = module.run_command(command + [executable_of(module)] + arguments, data=text)
+    if status in good:
+        return out
+    told_by_then = {}
+    try:
+        told_by_then = told(module, out)
+    except ValueError:
+        pass  # most failures tell nothing but the reason
+    message = said(error) or "zelosched ended with %d" % status
+    if status == TIMED_OUT:
+        message = "zelosched was ended after %d s: 'timeout' allows no more" % limit
+    module.fail_json(msg=message, rc=status, **told_by_then)
+
+
+def answer_of(out, member, types):
+    """The object that the program printed, and its list of objects, whose members have these types."""
+    try:
+        answer = json.loads(out)
+    except (ValueError, RecursionError):
+        raise ValueError("no JSON")
+    if not isinstance(answer, dict) or answer.get("version") != VERSION:
+        raise ValueError("no object of version %d" % VERSION)
+    objects = answer.get(member)
+    if not isinstance(objects, list):
+        raise ValueError("no list '%s'" % member)
+    for entry in objects:
+        if not isinstance(entry, dict):
+            raise ValueError("something else than objects in '%s'" % member)
+        for name, kinds in types.items():
+            if name not in entry or not isinstance(entry[name], kinds):
+                raise ValueError("no '%s' as it should be in '%s'" % (name, member))
+    return answer, objects
+
+
+def fail_without_answer(module, error):
+    module.fail_json(msg="zelosched gave no answer that can be understood, but %s: "
+                     "is 'executable' the program, and of this version?" % error)
+
+
+MAYBE_TEXT = (str, type(None))
 
 
 def told(module, out):
     """The changes that an apply told, which it does also when some of them failed."""
-    try:
-        answer = json.loads(out)
-        changes = answer["changes"]
-    except (ValueError, KeyError, TypeError):
-        return {}
+    answer, changes = answer_of(out, "changes", {"id": (int, type(None)), "name": str, "app": MAYBE_TEXT,
+                                                 "change": str, "differences": list})
+    if not isinstance(answer.get("crontab_written"), bool):
+        raise ValueError("no 'crontab_written'")
+    for change in changes:
+        if change["change"] not in CHANGES:
+            raise ValueError("a change of another kind")
+        for difference in change["differences"]:
+            if not isinstance(difference, dict) or not {"member", "before", "after"} <= set(difference):
+                raise ValueError("a difference of another kind")
     is_changed = answer["crontab_written"] or any(c["change"] not in ("unchanged", "failed") for c in changes)
     result = {
         "changed": is_changed,
@@ -51,15 +114,35 @@ def told(module, out):
 
 def diff_of(change):
     title = change["name"] if change["app"] is None else "%s (%s)" % (change["name"], change["app"])
+    title = shown(title).replace("\n", "\\n")
 
     def side(which):
-        return "".join("%s: %s\n" % (d["member"], json.dumps(d[which], ensure_ascii=False))
+        return "".join("%s: %s\n" % (d["member"], shown(json.dumps(d[which], ensure_ascii=False)))
                        for d in change["differences"] if d[which] is not None)
     return {"before_header": title, "after_header": title, "before": side("before"), "after": side("after")}
 
 
-def apply_tasks(module, tasks, apps=()):
-    """Makes the tasks be as they are said to be; of the applications, no others. What became of them."""
+def stored_tasks(module):
+    """All tasks of the machine."""
+    out = call(module, ["list", "--all", "--json"])
+    try:
+        tasks = answer_of(out, "tasks", {"id": int, "name": str, "app": MAYBE_TEXT, "ui": dict})[1]
+        for task in tasks:
+            for name in ("can_delete", "listable"):
+                if not isinstance(task["ui"].get(name), bool):
+                    raise ValueError("no '%s' in 'ui'" % name)
+        return tasks
+    except ValueError as error:
+        fail_without_answer(module, error)
+
+
+def set_of(tasks):
+    """The text of a set that has these tasks."""
+    return json.dumps({"version": VERSION, "tasks": tasks})
+
+
+def apply_set(module, text, apps=()):
+    """Makes the tasks be as the set says; of the applications, no others. What became of them."""
     arguments = ["apply", "-", "--json", "--diff"]
     if module.check_mode:
         arguments.append("--dry-run")
@@ -71,6 +154,8 @@ def apply_tasks(module, tasks, apps=()):
         arguments.append("--prune")
         for app in apps:
             arguments += ["--app", app]
-    text = json.dumps({"version": VERSION, "tasks": tasks})
     out = call(module, arguments, text, (0, TO_DO) if module.check_mode else (0,))
-    return told(module, out)
+    try:
+        return told(module, out)
+    except ValueError as error:
+        fail_without_answer(module, error)

@@ -76,6 +76,12 @@ options:
   executable:
     description: The program, where it is not in the usual place.
     type: path
+  timeout:
+    description:
+      - The program is ended when it goes on for longer than so many seconds; 0 for no limit. What is changed by then
+        stays changed, and another play does the rest.
+    type: int
+    default: 600
 attributes:
   check_mode:
     description: Can run in C(check_mode) and predict what would be changed, without changing anything.
@@ -89,6 +95,10 @@ seealso:
   - module: zelo.scheduler.tasks
 notes:
   - Changing tasks takes the rights of root.
+  - A task is removed by its number, right after it was looked up. When another program removes it at that moment and
+    saves another task, which gets the number, that one is removed instead, unless its application protects it; the
+    module fails then and says which, where the two have different names. C(prune) of M(zelo.scheduler.tasks)
+    looks up and removes in one step.
 """
 
 EXAMPLES = r"""
@@ -135,7 +145,8 @@ changes:
 import json
 
 from ansible.module_utils.basic import AnsibleModule
-from ansible_collections.zelo.scheduler.plugins.module_utils.zelosched import COMMON_OPTIONS, apply_tasks, call
+from ansible_collections.zelo.scheduler.plugins.module_utils.zelosched import (
+    COMMON_OPTIONS, apply_set, call, set_of, shown, stored_tasks)
 
 MEMBERS = {
     "owner": {"type": "str"},
@@ -165,24 +176,29 @@ def described(params):
 
 def remove(module):
     name, app = module.params["name"], module.params["app"]
-    tasks = json.loads(call(module, ["list", "--all", "--json"]))["tasks"]
-    found = [t for t in tasks if t["name"] == name and (t["app"] or "") == app]
+    found = [t for t in stored_tasks(module) if t["name"] == name and (t["app"] or "") == app]
     if len(found) > 1:
         module.fail_json(msg="tasks %s have this name and application: remove them by their numbers"
                          % " and ".join(str(t["id"]) for t in found))
     if not found:
         return {"changed": False, "changes": []}
+    task = found[0]
+    title = "task %d (%s)" % (task["id"], name)
     force = ["--force"] if module.params["force"] else []
-    if module.check_mode:
-        if not force and not found[0]["ui"]["can_delete"]:
-            module.fail_json(msg="the application of task %d (%s) does not let it be removed by hand"
-                             % (found[0]["id"], name))
-    else:
-        call(module, ["remove", "--yes"] + force + [str(found[0]["id"])])
-    change = {"id": found[0]["id"], "name": name, "app": found[0]["app"], "change": "removed"}
+    if not force and not task["ui"]["listable"]:
+        module.fail_json(msg="%s is hidden by its application: 'force' removes it all the same" % title)
+    if not force and not task["ui"]["can_delete"]:
+        module.fail_json(msg="the application of %s does not let it be removed by hand" % title)
+    if not module.check_mode:
+        said = call(module, ["remove", "--yes"] + force + [str(task["id"])]).strip()
+        # What it says of other names may be escaped, and cannot be compared.
+        if name.isascii() and name.isprintable() and not said.startswith(title + " removed"):
+            module.fail_json(msg="another program had given the number of %s to another task: %s" % (title, said),
+                             changed=True)
+    change = {"id": task["id"], "name": name, "app": task["app"], "change": "removed"}
     result = {"changed": True, "changes": [change]}
     if module._diff:
-        result["diff"] = {"before": json.dumps(found[0], indent=2, ensure_ascii=False) + "\n", "after": ""}
+        result["diff"] = {"before": shown(json.dumps(task, indent=2, ensure_ascii=False)) + "\n", "after": ""}
     return result
 
 
@@ -201,7 +217,7 @@ def main():
     )
     if module.params["state"] == "absent":
         module.exit_json(**remove(module))
-    module.exit_json(**apply_tasks(module, [described(module.params)]))
+    module.exit_json(**apply_set(module, set_of([described(module.params)])))
 
 
 if __name__ == "__main__":

@@ -18,16 +18,20 @@ options:
       - The tasks, in the words of zelosched-json(5). Of each, C(name), C(owner), C(schedule) and C(command) must be
         given.
       - Write times in quotes, as YAML takes C(10:30) for a number.
-      - The tasks of a file that C(zelosched export) wrote are read as in the examples below.
+      - One of I(tasks) and I(set) must be given.
     type: list
     elements: dict
-    required: true
+  set:
+    description:
+      - The text of a file that C(zelosched export) wrote, or that was written by hand. The program reads it as it is,
+        so that it refuses what another version wrote, members that it does not know, and members that are given twice.
+      - Read it by C(lookup) and C(| string), as the examples show, or Ansible would parse it first.
+    type: raw
   prune:
     description:
-      - Applications of which every task that the set lacks is removed.
-      - An empty text stands for the tasks that belong to no application.
-    type: list
-    elements: str
+      - A list of applications of which every task that the set lacks is removed. A text alone is refused.
+      - An empty text in the list stands for the tasks that belong to no application.
+    type: raw
     default: []
   stagger:
     description:
@@ -43,6 +47,12 @@ options:
     description:
       - The program, where it is not in the usual place.
     type: path
+  timeout:
+    description:
+      - The program is ended when it goes on for longer than so many seconds; 0 for no limit. What is changed by then
+        stays changed, and another play does the rest.
+    type: int
+    default: 600
 attributes:
   check_mode:
     description: Can run in C(check_mode) and predict what would be changed, without changing anything.
@@ -79,7 +89,7 @@ EXAMPLES = r"""
 
 - name: A set that was exported from another machine
   zelo.scheduler.tasks:
-    tasks: "{{ (lookup('file', 'set.json') | from_json).tasks }}"
+    set: "{{ lookup('file', 'set.json') | string }}"
   become: true
 """
 
@@ -106,17 +116,39 @@ changes:
 """
 
 from ansible.module_utils.basic import AnsibleModule
-from ansible_collections.zelo.scheduler.plugins.module_utils.zelosched import COMMON_OPTIONS, apply_tasks
+from ansible_collections.zelo.scheduler.plugins.module_utils.zelosched import COMMON_OPTIONS, apply_set, set_of
+
+
+def pruned(module):
+    """The applications; an empty text, which a variable without a value is, must not be taken for one."""
+    apps = module.params["prune"]
+    if not isinstance(apps, list) or not all(isinstance(app, str) for app in apps):
+        module.fail_json(msg="prune: must be a list of the names of applications, such as [backup]")
+    return apps
+
+
+def wanted(module):
+    if module.params["set"] is None:
+        return set_of(module.params["tasks"])
+    if not isinstance(module.params["set"], str):
+        module.fail_json(msg="set: must be the text of a file: write \"{{ lookup('file', 'set.json') | string }}\"")
+    return module.params["set"]
 
 
 def main():
     options = dict(
         COMMON_OPTIONS,
-        tasks={"type": "list", "elements": "dict", "required": True},
-        prune={"type": "list", "elements": "str", "default": []},
+        tasks={"type": "list", "elements": "dict"},
+        set={"type": "raw"},
+        prune={"type": "raw", "default": []},
     )
-    module = AnsibleModule(argument_spec=options, supports_check_mode=True)
-    module.exit_json(**apply_tasks(module, module.params["tasks"], module.params["prune"]))
+    module = AnsibleModule(
+        argument_spec=options,
+        required_one_of=[("tasks", "set")],
+        mutually_exclusive=[("tasks", "set")],
+        supports_check_mode=True,
+    )
+    module.exit_json(**apply_set(module, wanted(module), pruned(module)))
 
 
 if __name__ == "__main__":
