@@ -34,7 +34,7 @@ passes_on_status() {
 # In a clone nothing else is built.
 demonstration_builds_what_it_uses() {
   local targets name names
-  targets=" $(sed -n 's,^"$root/scripts/build" ,,p' "$here/../scripts/demo") "
+  targets=" $(sed -n 's,^ *"$root/scripts/build" ,,p' "$here/../scripts/demo" | tr '\n' ' ') "
   names=$(grep -hoE 'BUILD_DIR/(bin|tests)/[a-z_]+' "$here/../scripts/demo" "$here/support/start_cron.sh")
   for name in ${names//BUILD_DIR\//}; do
     name=${name##*/}

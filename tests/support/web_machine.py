@@ -14,7 +14,8 @@ import time
 
 from selenium import webdriver
 from selenium.common.exceptions import (ElementClickInterceptedException, NoSuchElementException,
-                                        StaleElementReferenceException, WebDriverException)
+                                        StaleElementReferenceException, TimeoutException,
+                                        WebDriverException)
 from selenium.webdriver.chrome.service import Service
 from selenium.webdriver.common.by import By
 from selenium.webdriver.common.keys import Keys
@@ -198,6 +199,7 @@ class Browser:
         options.set_capability("goog:loggingPrefs", {"browser": "ALL"})
         self.driver = webdriver.Chrome(options=options, service=Service("/usr/bin/chromedriver"))
         self.driver.set_script_timeout(PATIENCE)
+        self.driver.set_page_load_timeout(PATIENCE)
         self.size(1280, 900)
 
     def quit(self):
@@ -218,7 +220,10 @@ class Browser:
     def open(self, server, path=""):
         """Loaded anew, also where only what follows the # differs."""
         self.driver.get("about:blank")
-        self.driver.get(server.url + "#/" + path)
+        try:
+            self.driver.get(server.url + "#/" + path)
+        except TimeoutException:  # Chromium's renderer now and then never begins; the page is not to blame
+            self.driver.get(server.url + "#/" + path)
         wait_for("the page is there", lambda: self.find("nav a"))
 
     def script(self, text, *arguments):
