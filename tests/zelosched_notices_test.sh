@@ -38,11 +38,20 @@ add() {
 # Until nobody looks after a run any more.
 run() {
   z run --wait "$@" >/dev/null 2>&1 || true
-  local i
-  for ((i = 0; i < 1200; i++)); do
-    pgrep -x zeloschedtask >/dev/null || return 0
+  wait_for_keepers
+}
+
+# That pgrep could not look says nothing.
+wait_for_keepers() {
+  local i status
+  for ((i = 0; i < 1800; i++)); do
+    status=0
+    pgrep -x zeloschedtask >/dev/null || status=$?
+    ((status != 1)) || return 0
     sleep 0.05
   done
+  echo "a run is still looked after: $(pgrep -a zeloschedtask)"
+  return 1
 }
 
 told_is() {
@@ -109,9 +118,8 @@ does_not_wait_for_the_pipe() {
   program all <<<"echo told >>$SCRATCH/told"
   z run --wait 1 >/dev/null
   local i
-  for ((i = 0; i < 1200; i++)); do [[ ! -e $SCRATCH/told ]] || break; sleep 0.05; done
-  told_is told
-  kill "$(cat "$SCRATCH/told.pid")"
+  for ((i = 0; i < 1200; i++)); do [[ ! -s $SCRATCH/told ]] || break; sleep 0.05; done
+  told_is told && kill "$(cat "$SCRATCH/told.pid")" && wait_for_keepers
 }
 
 # In its process group; the clock of the wait is the kernel's, so this takes half a minute.
@@ -120,8 +128,7 @@ ends_a_program_that_hangs() {
   add true
   program a <<<"sleep 1000 & echo \$! >$SCRATCH/told.pid; sleep 1000"
   program b <<<"echo told >>$SCRATCH/told"
-  run 1
-  told_is told && ! kill -0 "$(cat "$SCRATCH/told.pid")" 2>/dev/null
+  run 1 && told_is told && ! kill -0 "$(cat "$SCRATCH/told.pid")" 2>/dev/null
 }
 
 tells_of_lost_runs_once() {

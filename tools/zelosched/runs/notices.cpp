@@ -2,11 +2,9 @@
 
 #include <dirent.h>
 #include <fcntl.h>
-#include <poll.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/stat.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <syslog.h>
 #include <unistd.h>
@@ -25,7 +23,8 @@
 namespace {
 
 constexpr char kDirectory[] = "/etc/zelosched/run-ended.d";
-constexpr std::chrono::milliseconds kPatience(30000);
+constexpr std::chrono::seconds kPatience(30);
+constexpr useconds_t kLook = 20000;
 constexpr char kRunDirectory[] = "/run/zelosched";
 constexpr char kFaults[] = "/run/zelosched/notices";
 constexpr char kOutputPattern[] = "/run/zelosched/told.XXXXXX";
@@ -196,17 +195,17 @@ pid_t start(const std::string &program, Environment environment, std::string *fa
   return 0;
 }
 
-// False when it went on for too long.
+// False when it went on for too long. Looks now and then rather than wait for an event: that needs
+// nothing which could be refused, and would leave us waiting for ever.
 bool waitForEnd(pid_t pid) {
-  const int file = static_cast<int>(syscall(SYS_pidfd_open, pid, 0));
-  if (file < 0) return true;
-  pollfd wanted{file, POLLIN, 0};
-  int ready;
-  do {
-    ready = poll(&wanted, 1, static_cast<int>(kPatience.count()));
-  } while (ready < 0 && errno == EINTR);
-  close(file);
-  return ready != 0;
+  const auto until = std::chrono::steady_clock::now() + kPatience;
+  for (;;) {
+    siginfo_t info = {};
+    const int result = waitid(P_PID, static_cast<id_t>(pid), &info, WEXITED | WNOHANG | WNOWAIT);
+    if (result != 0 || info.si_pid != 0) return true;
+    if (std::chrono::steady_clock::now() >= until) return false;
+    usleep(kLook);
+  }
 }
 
 std::string faultOf(int status) {
