@@ -4,6 +4,7 @@ import { href, taskPath } from "./address.js";
 import { openDialog } from "./dialogs.js";
 import { longDayText, moment, timeText, wallNow } from "./moments.js";
 import { ask } from "./tool.js";
+import { inTurn } from "./turns.js";
 import { bandOfHour, offTimes } from "./week.js";
 import { _, format, ngettext, short } from "./text.js";
 
@@ -30,6 +31,7 @@ function powerMark(run) {
 export class CalendarView {
   constructor(root, model) {
     this.model = model;
+    this.refresh = inTurn(() => this.load());
     this.title = _("Calendar");
     this.note = el("p", { class: "beside", role: "status" });
     this.legend = el("p", { class: "legend", hidden: true }, el("span", { class: "swatch off", "aria-hidden": "true" }),
@@ -39,19 +41,8 @@ export class CalendarView {
     this.update();
   }
 
-  // One question at a time, as elsewhere.
-  async update() {
-    if (!this.model.isLoaded) return;
-    if (this.isLoading) {
-      this.loadsAgain = true;
-      return;
-    }
-    this.isLoading = true;
-    do {
-      this.loadsAgain = false;
-      await this.load();
-    } while (this.loadsAgain);
-    this.isLoading = false;
+  update() {
+    if (this.model.isLoaded) this.refresh();
   }
 
   async load() {

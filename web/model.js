@@ -1,6 +1,7 @@
 // What the page knows of the machine: one copy, which all views show.
 import { ask } from "./tool.js";
 import { moment, now, setMachineTime } from "./moments.js";
+import { inTurn } from "./turns.js";
 
 export class Model extends EventTarget {
   constructor() {
@@ -12,27 +13,15 @@ export class Model extends EventTarget {
     this.status = null;
     this.fault = null; // a sentence when the machine could not be asked
     this.mayChange = null; // not known yet
-    this.asking = null; // the promise of what is being asked
-    this.asksAgain = false;
+    // Asks the machine.
+    this.refresh = inTurn(async () => {
+      await this.load();
+      this.dispatchEvent(new Event("changed"));
+    });
   }
 
   taskOf(id) {
     return this.tasks.find((task) => task.id === id) || null;
-  }
-
-  // Asks the machine. What changes meanwhile is asked about once more, and never twice at once.
-  refresh() {
-    this.asksAgain = true;
-    this.asking ||= this.ask().finally(() => { this.asking = null; });
-    return this.asking;
-  }
-
-  async ask() {
-    while (this.asksAgain) {
-      this.asksAgain = false;
-      await this.load();
-      this.dispatchEvent(new Event("changed"));
-    }
   }
 
   async load() {

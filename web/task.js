@@ -7,6 +7,7 @@ import { durationChart } from "./chart.js";
 import { distanceText, momentText } from "./moments.js";
 import { Runs } from "./runs.js";
 import { ask } from "./tool.js";
+import { inTurn } from "./turns.js";
 import { gradeOf, limitText, outcomeText, scheduleText } from "./words.js";
 import { _, format, short, visible } from "./text.js";
 
@@ -28,6 +29,7 @@ export class TaskView {
   constructor(root, model, { path, options }) {
     this.id = Number(path[1]);
     this.model = model;
+    this.load = inTurn(() => this.isClosed || Promise.all([this.loadComing(), this.loadRuns()]));
     this.title = "";
     this.access = el("div");
     this.head = el("div", { class: "head" });
@@ -129,20 +131,6 @@ export class TaskView {
       ...fact(_("Overlap"), overlapText(task.overlap)),
       ...(task.app ? fact(_("Application"), el("bdi", { class: "long" }, visible(task.app_name || task.app))) : []),
       ...(task.action ? fact(_("What it does"), el("bdi", { class: "long" }, visible(task.action))) : []));
-  }
-
-  // One question at a time, and once more for what came meanwhile.
-  async load() {
-    if (this.isLoading) {
-      this.loadsAgain = true;
-      return;
-    }
-    this.isLoading = true;
-    do {
-      this.loadsAgain = false;
-      await Promise.all([this.loadComing(), this.loadRuns()]);
-    } while (this.loadsAgain && !this.isClosed);
-    this.isLoading = false;
   }
 
   async loadComing() {

@@ -6,10 +6,6 @@
 
 namespace {
 
-Findings warningOf(const std::string &text) {
-  return {{Severity::kWarning, "notice", text}};
-}
-
 // What keeps it from telling anybody; empty when nothing is known to.
 std::string faultOf(const NoticeProgram &program) {
   if (!program.fault.empty()) return program.fault;
@@ -32,8 +28,7 @@ Findings checkNotices() {
   for (const NoticeProgram &program : noticePrograms()) {
     const std::string fault = faultOf(program);
     if (!fault.empty()) {
-      const Findings warning = warningOf(program.path + " " + fault);
-      findings.insert(findings.end(), warning.begin(), warning.end());
+      findings.push_back({Severity::kWarning, "notice", program.path + " " + fault});
     } else {
       told += (told.empty() ? "" : ", ") + program.path.substr(program.path.rfind('/') + 1);
     }
