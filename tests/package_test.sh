@@ -362,7 +362,7 @@ names_are_roots() {
 boot_without() {
   local unit
   unit=$(tr / - <<<"${1#/}").mount
-  printf '[Unit]\nDefaultDependencies=no\n[Mount]\nWhat=/dev/nothing\nWhere=%s\nType=ext4\n' "$1" \
+  printf '[Unit]\nDefaultDependencies=no\n[Mount]\nWhat=nothing\nWhere=%s\nType=nothing\n' "$1" \
     >"$ROOT/etc/systemd/system/$unit"
   mkdir -p "$ROOT/etc/systemd/system/local-fs.target.wants"
   ln -s "../$unit" "$ROOT/etc/systemd/system/local-fs.target.wants/$unit"
