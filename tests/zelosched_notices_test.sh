@@ -265,6 +265,20 @@ says_what_became_of_it() {
   same "$(shown | sed -n 1p)" "root | scheduled task 2 (Task 2) ended by its time limit | 6"
 }
 
+# There was no run, of which something could be told.
+says_what_was_missed() {
+  put_sendmail
+  env ZELO_RUN='' ZELO_RUN_TASK=4 ZELO_RUN_TASK_NAME=backup ZELO_RUN_OWNER=root ZELO_RUN_OUTCOME=missed \
+    ZELO_RUN_DUE=2026-11-20T02:30:00+01:00 ZELO_RUN_START='' ZELO_RUN_END='' ZELO_RUN_OUTPUT='' \
+    ZELO_RUN_OUTPUT_BYTES=0 "$MAILER"
+  same "$(shown)" "root | scheduled task 4 (backup) was not started when it was due | 6
+\"zelosched status\" on this machine tells why, where that is known." &&
+    same "$(sed '1,/^$/d' "$SCRATCH"/mail.* | base64 -d | sed '/^$/,$d')" "Task:     4 (backup)
+Owner:    root
+Outcome:  was not started when it was due
+Due:      2026-11-20T02:30:00+01:00"
+}
+
 no_name_becomes_a_header() {
   put_sendmail
   add 'exit 3'
@@ -283,5 +297,6 @@ check "not again within an hour for the same task" not_again_within_an_hour
 check "a success is mailed when it is the first again" mails_no_success_but_the_first_again
 check "a long name stays whole, in words as a header wants them" long_names_stay_whole
 check "how a run ended is said as elsewhere" says_what_became_of_it
+check "of a missed time is said what is known" says_what_was_missed
 check "no name becomes a header" no_name_becomes_a_header
 finish
