@@ -190,11 +190,8 @@ def remove(module):
     if not force and not task["ui"]["can_delete"]:
         module.fail_json(msg="the application of %s does not let it be removed by hand" % title)
     if not module.check_mode:
-        said = call(module, ["remove", "--yes"] + force + [str(task["id"])]).strip()
-        # What it says of other names may be escaped, and cannot be compared.
-        if name.isascii() and name.isprintable() and not said.startswith(title + " removed"):
-            module.fail_json(msg="another program had given the number of %s to another task: %s" % (title, said),
-                             changed=True)
+        # The number may have been given to another task meanwhile.
+        call(module, ["remove", "--yes", "--if-name=" + name, "--if-app=" + app] + force + [str(task["id"])])
     change = {"id": task["id"], "name": name, "app": task["app"], "change": "removed"}
     result = {"changed": True, "changes": [change]}
     if module._diff:

@@ -14,15 +14,19 @@
 namespace {
 
 constexpr char kKind[] = "copies";
-constexpr char kPutTasksBack[] = ": 'zelosched restore' puts the tasks back";
-constexpr char kWriteAnew[] = ": 'zelosched restore' writes it anew";
+constexpr char kPutTasksBack[] = "'zelosched restore' puts the tasks back";
+constexpr char kWriteAnew[] = "'zelosched restore' writes it anew";
 
-Findings critical(const std::string &text) {
-  return {{Severity::kCritical, kKind, text}};
+Findings found(Severity severity, const std::string &text, const std::string &remedy) {
+  return {{severity, kKind, text, remedy}};
 }
 
-Findings warning(const std::string &text) {
-  return {{Severity::kWarning, kKind, text}};
+Findings critical(const std::string &text, const std::string &remedy = "") {
+  return found(Severity::kCritical, text, remedy);
+}
+
+Findings warning(const std::string &text, const std::string &remedy = "") {
+  return found(Severity::kWarning, text, remedy);
 }
 
 Findings ok(const std::string &text) {
@@ -48,41 +52,40 @@ bool isNothingSaved() {
 Findings checkLastGoodCopy() {
   if (!exists(kPersistentCopy) || !judgeStore(kPersistentCopy).isWhole()) return {};
   if (!exists(kLastGoodCopy))
-    return warning(std::string(kLastGoodCopy) + " is missing" + kWriteAnew);
+    return warning(std::string(kLastGoodCopy) + " is missing", kWriteAnew);
   if (contents(kLastGoodCopy) == contents(kPersistentCopy)) return {};
-  return warning(std::string(kLastGoodCopy) + " is not as " + kPersistentCopy + " is" + kWriteAnew);
+  return warning(std::string(kLastGoodCopy) + " is not as " + kPersistentCopy + " is", kWriteAnew);
 }
 
 Findings checkCopies() {
   const char *why = nullptr;
   if (schedLookAt(kSchedStore, &why) == SchedNameState::kForeign) {
-    return critical(std::string(kWorkingCopy) + " " + why + kPutTasksBack);
+    return critical(std::string(kWorkingCopy) + " " + why, kPutTasksBack);
   }
   if (isNothingSaved()) return ok("no task was ever saved");
   if (!exists(kWorkingCopy)) {
-    return critical(std::string(kWorkingCopy) + " is missing" + kPutTasksBack);
+    return critical(std::string(kWorkingCopy) + " is missing", kPutTasksBack);
   }
   if (doTasksWaitForRestore()) {
-    return critical(std::string(kWorkingCopy) + " has no tasks, though some are kept" +
+    return critical(std::string(kWorkingCopy) + " has no tasks, though some are kept",
                     kPutTasksBack);
   }
   if (!countSections(kWorkingCopy)) {
     return critical(std::string(kWorkingCopy) + " cannot be read: " + errorInWords());
   }
   if (!exists(kPersistentCopy)) {
-    return warning(std::string(kPersistentCopy) + " is missing" + kWriteAnew);
+    return warning(std::string(kPersistentCopy) + " is missing", kWriteAnew);
   }
   if (!countSections(kPersistentCopy)) {
     return warning(std::string(kPersistentCopy) + " cannot be read: " + errorInWords());
   }
   if (contents(kPersistentCopy).empty()) {
-    return warning(std::string(kPersistentCopy) +
-                   " is cut off: 'zelosched restore' writes it anew from " + kWorkingCopy);
+    return warning(std::string(kPersistentCopy) + " is cut off",
+                   std::string(kWriteAnew) + " from " + kWorkingCopy);
   }
   if (contents(kWorkingCopy) == contents(kPersistentCopy)) {
     return ok("the working and the persistent copy of the tasks agree");
   }
-  return warning(
-      "the working and the persistent copy of the tasks differ: save a task again, or what was "
-      "changed last is lost at the next boot");
+  return warning("the working and the persistent copy of the tasks differ",
+                 "save a task again, or what was changed last is lost at the next boot");
 }

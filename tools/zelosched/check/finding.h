@@ -2,8 +2,11 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
+
+#include "runs/run_record.h"
 
 enum class Severity {
   kOk,
@@ -14,15 +17,17 @@ enum class Severity {
 
 struct Finding {
   Severity severity;
-  const char *kind;  // a word by which programs tell it from others
-  std::string text;  // a sentence, which may end with what helps against it
-  int64_t task = 0;  // whose it is, when it is one task's
+  const char *kind;         // a word by which programs tell it from others
+  std::string text;         // a sentence
+  std::string remedy = {};  // what helps against it
+  int64_t task = 0;         // whose it is, when it is one task's
   std::string taskName = {};
-  std::string remedy = {};  // what helps against it, where that stands apart
+  std::optional<RunRecord> run = {};  // when it is about one
+  std::optional<int64_t> due = {};    // the moment that was missed
 };
 using Findings = std::vector<Finding>;
 
-// With the remedy.
+// For people who read nothing else: with the remedy.
 std::string sentenceOf(const Finding &finding);
 
 // "ok", "unknown", "warning" or "critical".

@@ -35,8 +35,8 @@ Findings checkNotices() {
   }
   if (!findings.empty()) return findings;
   if (told.empty()) {
-    return {{Severity::kOk, "notice",
-             "nobody is told of failed runs: 'zelosched mail on' has them mailed"}};
+    return {{Severity::kOk, "notice", "nobody is told of failed runs",
+             "'zelosched mail on' has them mailed"}};
   }
   return {{Severity::kOk, "notice", "of failed runs is told: " + told}};
 }

@@ -11,6 +11,7 @@
 #include "runs/missed.h"
 #include "runs/result_text.h"
 #include "runs/runs.h"
+#include "runs/task_notes.h"
 #include "terminal/text.h"
 
 namespace {
@@ -55,9 +56,10 @@ class RunCheck {
   }
 
  private:
-  void add(Severity severity, const char *kind, const TaskRecord &task, const std::string &text,
-           const std::string &remedy = "") {
-    findings_.push_back({severity, kind, titleOf(task) + " " + text, task.ID, task.Name, remedy});
+  Finding &add(Severity severity, const char *kind, const TaskRecord &task, const std::string &text,
+               const std::string &remedy = "") {
+    findings_.push_back({severity, kind, titleOf(task) + " " + text, remedy, task.ID, task.Name});
+    return findings_.back();
   }
 
   // Of a task that is still there and enabled; one that was disabled worries nobody.
@@ -78,8 +80,8 @@ class RunCheck {
       add(isKnown ? Severity::kOk : Severity::kWarning,
           run.outcome == Outcome::kGaveUp ? kGaveUp : kFailedRun, *task,
           resultInWords(run) + " at " + momentInWords(moment) + (isKnown ? " (acknowledged)" : ""),
-          isKnown || run.outputBytes == 0 ? ""
-                                          : "'zelosched log " + id + "' shows what it printed");
+          isKnown || run.outputBytes == 0 ? "" : "'zelosched log " + id + "' shows what it printed")
+          .run = run;
     }
     if (isWell) findings_.push_back({Severity::kOk, kFailedRun, "no task's last run failed"});
   }
@@ -97,7 +99,8 @@ class RunCheck {
             "was due at " + momentInWords(missed.due) + times + " and did not run" +
                 whyMissed(missed.machine),
             "'zelosched run " + id + "' runs it now, 'zelosched status --acknowledge " + id +
-                "' takes note of it");
+                "' takes note of it")
+            .due = missed.due;
       }
       if (missed.planned > 0) {
         add(Severity::kOk, "planned-off", task,
@@ -134,26 +137,30 @@ class RunCheck {
   void judgeRunning(const KeptDatabase &kept) {
     RunFilter filter;
     filter.underWay = true;
+    const std::map<int64_t, TaskNote> notes = taskNotes(kept);
     const auto now = static_cast<int64_t>(time(nullptr));
     bool isAny = false;
     for (const KeptRun &run : runsOf(kept, filter)) {
       isAny = true;
-      const auto found = tasks_.find(run.task);
-      const std::string title =
-          found != tasks_.end() ? titleOf(*found->second) : "task " + std::to_string(run.task);
+      const auto note = notes.find(run.task);
+      const bool isRemoved = note == notes.end() || run.generation != note->second.generation;
+      const std::string id = std::to_string(run.task);
       const int64_t since = run.start ? *run.start : run.queued.value_or(now);
       const bool isTooLong =
           run.state == RunState::kRunning && isLong(kept, run, static_cast<double>(now - since));
-      std::string text =
+      const auto found = tasks_.find(run.task);
+      const std::string title = isRemoved || found == tasks_.end()
+                                    ? "the removed task " + id + " (" + run.taskName + ")"
+                                    : titleOf(*found->second);
+      const std::string text =
           title +
           (run.state == RunState::kWaiting ? " waits for its turn since " : " is running since ") +
-          momentInWords(since);
-      if (isTooLong) {
-        text += ", which is unusually long: 'zelosched log --follow " + std::to_string(run.task) +
-                "' shows what it prints, 'zelosched stop " + std::to_string(run.task) + "' ends it";
-      }
+          momentInWords(since) + (isTooLong ? ", which is unusually long" : "");
+      const std::string remedy = "'zelosched log --follow " + id +
+                                 "' shows what it prints, 'zelosched stop " + id + "' ends it";
       findings_.push_back({isTooLong ? Severity::kWarning : Severity::kOk,
-                           isTooLong ? "long-run" : "running", text, run.task, run.taskName});
+                           isTooLong ? "long-run" : "running", text,
+                           isTooLong && !isRemoved ? remedy : "", run.task, run.taskName, run});
     }
     if (!isAny) findings_.push_back({Severity::kOk, "running", "no task is running"});
   }

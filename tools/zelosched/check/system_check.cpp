@@ -64,8 +64,8 @@ Findings checkCron() {
 }
 
 Findings checkProgram() {
-  const auto critical = [](const std::string &what) {
-    return Findings{{Severity::kCritical, "program", kTaskProgram + what}};
+  const auto critical = [](const std::string &what, const std::string &remedy = "") {
+    return Findings{{Severity::kCritical, "program", kTaskProgram + what, remedy}};
   };
   struct stat info {};
   if (lstat(kTaskProgram, &info) != 0) {
@@ -78,8 +78,8 @@ Findings checkProgram() {
     return critical(" is not root's alone: whoever can write it runs commands as root");
   }
   if (contents(kTaskProgram) == kSchedTaskProgram.contents) {
-    return critical(
-        " only stands in for the program that starts tasks: 'zelosched restore' puts that there");
+    return critical(" only stands in for the program that starts tasks",
+                    "'zelosched restore' puts that there");
   }
   return {{Severity::kOk, "program", std::string(kTaskProgram) + " is there, and root's"}};
 }
@@ -94,12 +94,11 @@ Findings checkTmp() {
   if (info.st_uid == 0 && (!isForOthers || (info.st_mode & S_ISVTX) != 0)) {
     return {{Severity::kOk, "tmp", std::string(kTmp) + " is root's, and sticky"}};
   }
-  const char *const remedy = "'chown root /tmp' and 'chmod 1777 /tmp' set that right";
   return {{Severity::kWarning, "tmp",
            std::string(kTmp) + (info.st_uid != 0 ? " is not root's" : " is not sticky") +
                ", so another user can put his own program in the place of the one that cron starts "
-               "as root: " +
-               remedy}};
+               "as root",
+           "'chown root /tmp' and 'chmod 1777 /tmp' set that right"}};
 }
 
 Findings checkSharedNames() {
@@ -109,10 +108,10 @@ Findings checkSharedNames() {
   }
   const size_t scratch = foreignScratchNames();
   if (scratch > 0) {
-    findings.push_back({Severity::kWarning, "names",
-                        counted(scratch, "name") +
-                            " of scratch copies of the tasks in /tmp belong to other users: "
-                            "'zelosched restore' takes them away"});
+    findings.push_back(
+        {Severity::kWarning, "names",
+         counted(scratch, "name") + " of scratch copies of the tasks in /tmp belong to other users",
+         "'zelosched restore' takes them away"});
   }
   const bool isStoreOurs = schedLookAt(kSchedStore, nullptr) != SchedNameState::kForeign;
   if (findings.empty() && isStoreOurs) {

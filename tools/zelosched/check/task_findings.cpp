@@ -50,10 +50,9 @@ Findings checkCrontab(const TaskList &list) {
   }
   const bool isReadable =
       std::none_of(list.tasks().begin(), list.tasks().end(), isUnreadableByCron);
-  findings.push_back({Severity::kWarning, "crontab",
-                      isReadable ? "'zelosched sync' writes the crontab again"
-                                 : "'zelosched sync' writes the crontab again once no task has a "
-                                   "field that cron cannot read"});
+  findings.back().remedy = isReadable ? "'zelosched sync' writes the crontab again"
+                                      : "'zelosched sync' writes the crontab again once no task "
+                                        "has a field that cron cannot read";
   return findings;
 }
 
@@ -63,14 +62,15 @@ Findings checkCrontabLength() {
   return {{Severity::kCritical, "crontab",
            "/etc/crontab has " + std::to_string(lines) +
                " lines, and cron ignores all of it when there are more than " +
-               std::to_string(kSchedMostCronLines) + ": remove or disable tasks, or other lines"}};
+               std::to_string(kSchedMostCronLines),
+           "remove or disable tasks, or other lines"}};
 }
 
 // One field that cron cannot read can stop every other task too.
 Findings checkTaskFields(const TaskList &list) {
   Findings findings;
   const auto add = [&](Severity severity, const ZELO_SCHED_TASK &task, const std::string &text) {
-    findings.push_back({severity, "task", text, task.ID, task.Name});
+    findings.push_back({severity, "task", text, "", task.ID, task.Name});
   };
   for (const ZELO_SCHED_TASK *task : list.tasks()) {
     if (!isEnabled(*task)) continue;

@@ -6,6 +6,7 @@
 
 #include "check/task_check.h"
 #include "commands/command.h"
+#include "commands/expected_task.h"
 #include "commands/task_options.h"
 #include "json/task_input.h"
 #include "store/change_lock.h"
@@ -17,7 +18,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {TASK_OPTIONS, {"stdin"}, {"force"}};
+constexpr Option kOptions[] = {TASK_OPTIONS, {"stdin"}, {"force"}, EXPECTED_TASK_OPTIONS};
 
 void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &before,
                         const ZELO_SCHED_TASK &task) {
@@ -42,6 +43,7 @@ int runEdit(int argc, char **argv) {
   const std::string text = isRead ? readInput(kStandardInput) : "";
   const ChangeLock lock;
   const Task before = loadTask(ids.front());
+  ExpectedTask(arguments).require(*before);
   const Task task = std::make_unique<TaskRecord>(*before);
   if (isRead && isPower(*task))
     throw UsageError("of a power time only --daily and --weekly can be set");
@@ -72,5 +74,6 @@ const Command kEditCommand = {
     "Also:\n"
     "  --stdin                        the task as JSON (zelosched-json(5)) from the standard\n"
     "                                 input, in place of options; what is not named stays\n"
-    "  --force                        even if its application does not let it be edited\n",
+    "  --force                        even if its application does not let it be "
+    "edited\n" EXPECTED_TASK_HELP,
     runEdit};

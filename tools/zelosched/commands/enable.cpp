@@ -2,6 +2,7 @@
 #include <cstdio>
 
 #include "commands/command.h"
+#include "commands/expected_task.h"
 #include "commands/for_each_id.h"
 #include "commands/options.h"
 #include "commands/stop_task.h"
@@ -11,12 +12,14 @@
 
 namespace {
 
-constexpr Option kDisableOptions[] = {{"stop"}};
+constexpr Option kEnableOptions[] = {EXPECTED_TASK_OPTIONS};
+constexpr Option kDisableOptions[] = {{"stop"}, EXPECTED_TASK_OPTIONS};
 
 // A task that would do harm may be disabled, which ends the harm, but not enabled.
-void setState(int64_t id, int32_t state) {
+void setState(int64_t id, int32_t state, const ExpectedTask &expected) {
   const ChangeLock lock;
   const Task task = loadTask(id);
+  expected.require(*task);
   if (task->State == state) {
     std::printf("%s is %s already\n", titleOf(*task).c_str(), stateName(*task));
     return;
@@ -29,8 +32,8 @@ void setState(int64_t id, int32_t state) {
   if (task->ID != formerId) std::printf("it was task %d before\n", formerId);
 }
 
-void disable(int64_t id, bool stops) {
-  setState(id, ZELO_SCHED_STATE_DISABLED);
+void disable(int64_t id, bool stops, const ExpectedTask &expected) {
+  setState(id, ZELO_SCHED_STATE_DISABLED, expected);
   const Task task = findTask(id);
   if (!task) return;  // a power time, which has another id now
   if (stops) {
@@ -41,31 +44,34 @@ void disable(int64_t id, bool stops) {
 }
 
 int runEnable(int argc, char **argv) {
-  const Arguments arguments(argc, argv, {});
+  const Arguments arguments(argc, argv, kEnableOptions);
   arguments.requireNoCommand();
+  const ExpectedTask expected(arguments);
   return forEachId(parseIds(arguments.operands()),
-                   [](int64_t id) { setState(id, ZELO_SCHED_STATE_ENABLED); });
+                   [&](int64_t id) { setState(id, ZELO_SCHED_STATE_ENABLED, expected); });
 }
 
 int runDisable(int argc, char **argv) {
   const Arguments arguments(argc, argv, kDisableOptions);
   arguments.requireNoCommand();
+  const ExpectedTask expected(arguments);
   return forEachId(parseIds(arguments.operands()),
-                   [&](int64_t id) { disable(id, arguments.has("stop")); });
+                   [&](int64_t id) { disable(id, arguments.has("stop"), expected); });
 }
 
 }  // namespace
 
 const Command kEnableCommand = {
-    "enable", "TASK...", "let tasks run at their times",
+    "enable", "TASK... [OPTION...]", "let tasks run at their times",
     "Lets the tasks run at their times. One with a fault that would do harm is refused, and\n"
-    "so is one whose line would make /etc/crontab longer than cron reads.\n",
+    "so is one whose line would make /etc/crontab longer than cron reads.\n"
+    "\n" EXPECTED_TASK_HELP,
     runEnable};
 
 const Command kDisableCommand = {
-    "disable", "TASK... [--stop]", "keep tasks, but do not run them",
+    "disable", "TASK... [--stop] [OPTION...]", "keep tasks, but do not run them",
     "Keeps the tasks, but does not run them until they are enabled. A run that is under\n"
     "way, or waits for its turn, goes on, which is told.\n"
     "\n"
-    "  --stop                         end it, as 'zelosched stop' does\n",
+    "  --stop                         end it, as 'zelosched stop' does\n" EXPECTED_TASK_HELP,
     runDisable};

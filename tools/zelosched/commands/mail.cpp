@@ -10,8 +10,10 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
-#include <fstream>
+#include <optional>
 #include <sstream>
+#include <string_view>
+#include <vector>
 
 #include "commands/command.h"
 #include "commands/options.h"
@@ -28,6 +30,7 @@ constexpr Option kOptions[] = {{"to", Option::kValue}, {"to-owners"}, {"json"}};
 constexpr char kSettings[] = "/etc/default/zelosched-mail";
 constexpr char kUsualProgram[] = "/usr/share/zelosched/mail-on-failure";
 constexpr char kAddress[] = "MAIL_TO=";
+constexpr mode_t kDirectoryMode = 0755;
 
 // Beside where this program is installed.
 std::string mailProgram() {
@@ -38,55 +41,117 @@ std::string mailProgram() {
   return realpath(beside.c_str(), whole) != nullptr ? whole : kUsualProgram;
 }
 
-// It is a line of a file that root's shell reads: nothing that means something to that.
+// It is a line of a file that root's shell reads: nothing that means something to that. A user of
+// this machine, or user and host.
 bool isAddress(const std::string &text) {
   constexpr size_t kLongest = 254;
-  return !text.empty() && text.size() <= kLongest && text.front() != '-' &&
-         std::all_of(text.begin(), text.end(), [](unsigned char c) {
-           return std::isalnum(c) != 0 || std::strchr("@._+-", c) != nullptr;
-         });
+  const auto isWord = [](unsigned char c) { return std::isalnum(c) != 0 || c == '_'; };
+  const auto isPart = [&](std::string_view part) {
+    return !part.empty() && isWord(part.front()) && isWord(part.back()) &&
+           std::all_of(part.begin(), part.end(), [&](unsigned char c) {
+             return isWord(c) ||
+                    std::string_view(".+-").find(static_cast<char>(c)) != std::string_view::npos;
+           });
+  };
+  const std::string_view whole = text;
+  const size_t at = whole.find('@');
+  return whole.size() <= kLongest && isPart(whole.substr(0, at)) &&
+         (at == whole.npos || isPart(whole.substr(at + 1)));
 }
 
-bool isAddressLine(const std::string &line) {
-  return line.compare(0, strlen(kAddress), kAddress) == 0;
+// What the settings say of the address. They are a file that a shell reads, of which one form of
+// line is understood here: the one that this command writes, also within quotes.
+struct Settings {
+  std::vector<std::string> others;  // the lines that say nothing of it
+  std::string address;              // none: to the owners
+  std::string fault;                // why that is not known
+  mode_t mode = 0644;
+};
+
+bool takeAddress(const std::string &line, Settings *settings) {
+  if (line.compare(0, strlen(kAddress), kAddress) != 0) return false;
+  std::string value = line.substr(strlen(kAddress));
+  const bool isQuoted = value.size() > 1 && value.front() == value.back() &&
+                        (value.front() == '"' || value.front() == '\'');
+  if (isQuoted) value = value.substr(1, value.size() - 2);
+  if (!value.empty() && !isAddress(value)) return false;
+  settings->address = value;
+  return true;
 }
 
-std::vector<std::string> settingsLines() {
-  std::ifstream file(kSettings);
-  std::vector<std::string> lines;
-  for (std::string line; std::getline(file, line);) lines.push_back(line);
-  return lines;
+bool isComment(const std::string &line) {
+  const size_t first = line.find_first_not_of(" \t");
+  return first != std::string::npos && line[first] == '#';
 }
 
-// Empty when the mails go to the owners.
-std::string address() {
-  std::string found;
-  for (const std::string &line : settingsLines()) {
-    if (isAddressLine(line)) found = line.substr(strlen(kAddress));
+Settings readMailSettings() {
+  Settings settings;
+  struct stat info {};
+  if (lstat(kSettings, &info) != 0) return settings;
+  settings.mode = info.st_mode & ALLPERMS;
+  if (!S_ISREG(info.st_mode)) {
+    settings.fault = std::string(kSettings) + " is no regular file";
+    return settings;
   }
-  return found;
+  try {
+    std::istringstream lines(contentsOf(kSettings));
+    for (std::string line; std::getline(lines, line);) {
+      if (takeAddress(line, &settings)) continue;
+      settings.others.push_back(line);
+      if (line.find("MAIL_TO") != std::string::npos && !isComment(line)) {
+        settings.fault = std::string(kSettings) + " sets MAIL_TO in a way of its own";
+      }
+    }
+  } catch (const Failure &failure) {
+    settings.fault = failure.what();
+  }
+  return settings;
 }
 
+// The file's other lines and its mode stay.
 void setAddress(const std::string &text) {
+  const Settings settings = readMailSettings();
+  if (!settings.fault.empty()) throw Failure(settings.fault + ": set the address there by hand");
   std::ostringstream contents;
-  for (const std::string &line : settingsLines()) {
-    if (!isAddressLine(line)) contents << line << '\n';
-  }
+  for (const std::string &line : settings.others) contents << line << '\n';
   if (!text.empty()) contents << kAddress << text << '\n';
-  constexpr mode_t kMode = 0644;
-  placeFile(kSettings, contents.str(), kMode);
+  placeFile(kSettings, contents.str(), settings.mode);
+}
+
+// What keeps the program from being run, where it is there; nothing when it is run.
+std::optional<std::string> faultOfProgram() {
+  for (const NoticeProgram &program : noticePrograms()) {
+    const bool isItsDirectory = std::string_view(kMailProgram).starts_with(program.path + "/");
+    if (isItsDirectory || program.path == kMailProgram) {
+      return program.fault.empty() ? "" : program.path + " " + program.fault;
+    }
+  }
+  return std::nullopt;
 }
 
 bool isOn() {
-  return access(kMailProgram, X_OK) == 0;
+  const std::optional<std::string> fault = faultOfProgram();
+  return fault && fault->empty();
+}
+
+// Only a link is ours to make and to take away.
+void requireLinkOrNothing() {
+  struct stat info {};
+  if (lstat(kMailProgram, &info) != 0 || S_ISLNK(info.st_mode)) return;
+  throw Failure(std::string(kMailProgram) +
+                " is no link but a program of your own: move it away, or change its mode");
 }
 
 void switchOn() {
   if (isOn()) return;
+  mkdir("/etc/zelosched", kDirectoryMode);
+  mkdir("/etc/zelosched/run-ended.d", kDirectoryMode);
   unlink(kMailProgram);  // a link that leads nowhere
   if (symlink(mailProgram().c_str(), kMailProgram) < 0) {
     throw Failure(std::string("cannot make ") + kMailProgram + ": " + std::strerror(errno));
   }
+  const std::optional<std::string> fault = faultOfProgram();
+  if (fault && !fault->empty()) throw Failure("failures are not mailed: " + *fault);
 }
 
 void switchOff() {
@@ -95,19 +160,25 @@ void switchOff() {
 }
 
 void tell(bool asJson) {
-  const std::string to = address();
+  const Settings settings = readMailSettings();
   if (asJson) {
     Json::Value top = topObject();
     top["mail"]["is_on"] = isOn();
-    top["mail"]["to"] = jsonTextOrNull(to);
+    top["mail"]["to"] = jsonTextOrNull(settings.address);
+    top["mail"]["fault"] = jsonTextOrNull(settings.fault);
     top["mail"]["has_mailer"] = hasMailer();
     printTop(top);
     return;
   }
-  std::printf("failures are %s\n", !isOn()      ? "not mailed"
-                                   : to.empty() ? "mailed to the owners of the tasks"
-                                                : ("mailed to " + printable(to)).c_str());
-  if (isOn() && !hasMailer()) {
+  if (!isOn()) {
+    std::puts("failures are not mailed");
+    return;
+  }
+  const std::string to = !settings.fault.empty()    ? "; to whom is not known: " + settings.fault
+                         : settings.address.empty() ? " to the owners of the tasks"
+                                                    : " to " + settings.address;
+  std::printf("failures are mailed%s\n", printable(to).c_str());
+  if (!hasMailer()) {
     complain(std::string("there is no ") + kMailer + ": install a package that sends mail");
   }
 }
@@ -127,6 +198,7 @@ int runMail(int argc, char **argv) {
     throw UsageError("'" + printable(*to) + "' is no address: write it as you@example.org");
   }
   if (!words.empty() && geteuid() != 0) throw Failure("switching the mails takes root's rights");
+  if (!words.empty()) requireLinkOrNothing();
   if (hasOn) {
     if (to || arguments.has("to-owners")) setAddress(to.value_or(""));
     switchOn();

@@ -43,6 +43,7 @@ bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
 
 Task loadRemovable(int64_t id, const RemoveRules &rules) {
   Task task = loadTask(id);
+  rules.expected.require(*task);
   if (rules.powerOnly && !isPower(*task)) throw Failure(titleOf(*task) + " is no power time");
   requirePermission(*task, task->CanDeleteFromUI, "removed", rules.insists);
   return task;

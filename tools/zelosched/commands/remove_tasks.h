@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "commands/command.h"
+#include "commands/expected_task.h"
 #include "store/task_list.h"
 
 struct RemoveRules {
@@ -14,6 +15,7 @@ struct RemoveRules {
   bool insists;        // whatever the application allows
   bool powerOnly;      // a task that is no power time is refused
   bool stops = false;  // ends the runs of it that go on
+  ExpectedTask expected = {};
 };
 
 using TaskStep = std::function<void(const TaskRecord &task)>;

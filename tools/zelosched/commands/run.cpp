@@ -8,6 +8,7 @@
 #include <thread>
 
 #include "commands/command.h"
+#include "commands/expected_task.h"
 #include "commands/for_each_id.h"
 #include "commands/options.h"
 #include "runs/history_keep.h"
@@ -22,7 +23,8 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"wait", Option::kNone, 'w'}, {"output"}, {"force"}};
+constexpr Option kOptions[] = {
+    {"wait", Option::kNone, 'w'}, {"output"}, {"force"}, EXPECTED_TASK_OPTIONS};
 constexpr std::chrono::milliseconds kPause(50);
 constexpr std::chrono::seconds kPatience(2);  // with a keeper that has just been started
 constexpr char kClearLine[] = "\r\033[K";
@@ -180,6 +182,7 @@ void runUnseen(const ZELO_SCHED_TASK &task) {
 
 void runOne(int64_t id, const Arguments &arguments) {
   const Task task = loadTask(id);
+  ExpectedTask(arguments).require(*task);
   requirePermission(*task, task->CanRunFromUI, "run", arguments.has("force"));
   if (arguments.has("wait") || arguments.has("output")) {
     runAndWait(*task, arguments.has("output"));
@@ -200,7 +203,7 @@ int runRun(int argc, char **argv) {
 }  // namespace
 
 const Command kRunCommand = {
-    "run", "TASK... [--wait] [--output] [--force]", "run tasks now",
+    "run", "TASK... [--wait] [--output] [--force] [OPTION...]", "run tasks now",
     "Runs the tasks now, whatever their times say and also when they are disabled, with\n"
     "the limits, the locale and the time zone that cron gives them. A run waits for others\n"
     "that must not overlap with it, as always, and it is said for which.\n"
@@ -214,5 +217,6 @@ const Command kRunCommand = {
     "                                 is 0 only when the command exited with 0\n"
     "  --output                       wait, and show what the command prints, with control\n"
     "                                 characters made visible on a terminal\n"
-    "  --force                        even if its application does not let it be run\n",
+    "  --force                        even if its application does not let it be "
+    "run\n" EXPECTED_TASK_HELP,
     runRun};

@@ -10,6 +10,7 @@
 #include "commands/command.h"
 #include "commands/options.h"
 #include "json/json_out.h"
+#include "json/run_json.h"
 #include "runs/missed.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
@@ -59,9 +60,12 @@ Json::Value jsonOf(const Finding &finding) {
   Json::Value object;
   object["severity"] = nameOf(finding.severity);
   object["kind"] = finding.kind;
-  object["text"] = jsonText(sentenceOf(finding));
+  object["text"] = jsonText(finding.text);
+  object["remedy"] = jsonTextOrNull(finding.remedy);
   object["task"] = finding.task != 0 ? Json::Value(Json::Int64(finding.task)) : Json::Value();
   object["task_name"] = jsonTextOrNull(finding.taskName);
+  object["run"] = finding.run ? jsonOf(*finding.run) : Json::Value();
+  object["due"] = finding.due ? jsonTime(*finding.due) : Json::Value();
   return object;
 }
 

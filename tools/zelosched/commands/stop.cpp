@@ -4,6 +4,7 @@
 #include <cstdio>
 
 #include "commands/command.h"
+#include "commands/expected_task.h"
 #include "commands/for_each_id.h"
 #include "commands/options.h"
 #include "commands/stop_task.h"
@@ -11,7 +12,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"grace", Option::kValue}};
+constexpr Option kOptions[] = {{"grace", Option::kValue}, EXPECTED_TASK_OPTIONS};
 constexpr int64_t kMostGrace = int64_t{24} * 60 * 60;  // seconds
 
 int runStop(int argc, char **argv) {
@@ -21,8 +22,10 @@ int runStop(int argc, char **argv) {
   const std::chrono::seconds grace(
       arguments.number("grace", 0, kMostGrace).value_or(kUsualGrace.count()));
   if (geteuid() != 0) throw Failure("stopping runs takes root's rights");
+  const ExpectedTask expected(arguments);
   return forEachId(ids, [&](int64_t id) {
-    const Task task = findTask(id);
+    const Task task = expected.isAny() ? loadTask(id) : findTask(id);
+    if (task) expected.require(*task);
     const std::string title = task ? titleOf(*task) : "task " + std::to_string(id);
     if (stopTask(id, title, grace) > 0) return;
     if (!task) throw Failure("there is no task " + std::to_string(id) + ", and no run of it");
@@ -33,12 +36,12 @@ int runStop(int argc, char **argv) {
 }  // namespace
 
 const Command kStopCommand = {
-    "stop", "TASK... [--grace SECONDS]", "end the runs of tasks that go on or wait",
+    "stop", "TASK... [--grace SECONDS] [OPTION...]", "end the runs of tasks that go on or wait",
     "Ends the runs of the tasks that are under way: one that waits for its turn does not\n"
     "start; of one that goes on, every process gets SIGTERM, also those that its command\n"
     "has put into the background or into a session of their own, and what is left after 10\n"
     "seconds gets SIGKILL. The history says that they were stopped. Of a run that another\n"
     "program has started, processes that have left their parents are not found.\n"
     "\n"
-    "  --grace SECONDS                how long a run has to end by itself; 10\n",
+    "  --grace SECONDS                how long a run has to end by itself; 10\n" EXPECTED_TASK_HELP,
     runStop};

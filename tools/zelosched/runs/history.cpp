@@ -122,6 +122,9 @@ std::string conditionOf(const KeptDatabase &kept, const RunFilter &filter,
     condition += std::to_string(static_cast<int>(Outcome::kFinished));
   }
   if (filter.underWay) condition += " AND state < 2";
+  if (filter.ofTasksOfToday) {
+    condition += " AND generation IN (SELECT generation FROM task WHERE removed IS NULL)";
+  }
   return condition;
 }
 

@@ -50,9 +50,10 @@ struct RunFilter {
   std::optional<int64_t> run;
   std::optional<int64_t> since;  // moments
   std::optional<int64_t> until;
-  bool failed = false;    // those alone that did not end well
-  bool underWay = false;  // those alone that have not ended
-  int64_t limit = -1;     // none for a negative one
+  bool failed = false;          // those alone that did not end well
+  bool underWay = false;        // those alone that have not ended
+  bool ofTasksOfToday = false;  // those alone of tasks that are there
+  int64_t limit = -1;           // none for a negative one
 };
 
 // Newest first. Each of these throws Failure.

@@ -50,6 +50,7 @@ LatestRuns latestRuns(const TaskList &list) {
     for (KeptRun &run : lastRuns(kept)) latest.ofEach[run.task] = std::move(run);
     RunFilter underWay;
     underWay.underWay = true;
+    underWay.ofTasksOfToday = true;
     for (KeptRun &run : runsOf(kept, underWay)) {
       latest.running.insert(run.task);
       // The one that goes on for longest: later ones wait for it.
