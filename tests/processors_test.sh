@@ -31,6 +31,18 @@ export JOBS=${JOBS:-2} PROGRAMS_AT_ONCE=2
 umask 022
 mkdir -p "$WORK"
 
+# An unknown one, for which a root would be made first.
+is_refused() {
+  local status=0
+  "$@" >"$WORK/log" 2>&1 || status=$?
+  test "$status" -ne 0 && grep -q "no processor '.*': there are arm64 and armhf" "$WORK/log"
+}
+
+check "no other processor is built for" eval \
+  'is_refused "$root/scripts/build" --target arm && is_refused "$root/scripts/build" --target arm64x'
+check "nor packaged for" eval \
+  'is_refused "$root/scripts/package" --target s390x && is_refused "$root/scripts/package" --target'
+
 if ((EUID != 0)) || ! grep -q '^ *0 *0 ' /proc/self/uid_map 2>/dev/null && [[ -e /proc/self/uid_map ]]; then
   skip "other processors are built for and tested" "only root can make a root for their compilers"
   finish
