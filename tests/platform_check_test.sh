@@ -68,6 +68,14 @@ everything_is_put_back() {
   done
 }
 
+# The signal is for all of the check, as one of a terminal is.
+puts_back_when_interrupted() {
+  same "$(on_machine 'before=$(cksum /etc/crontab)
+    WRONG_PLATFORM="ZELOScheduleSet hangs" LD_PRELOAD=$WRONG timeout -s INT 3 "$CHECK" --system | grep -v "^ok "
+    test "$before" = "$(cksum /etc/crontab)" && echo same')" \
+    $'not ok ZELOScheduleSet: a line of the time that runs the command as root (ended by signal 2)\nsame'
+}
+
 puts_back_a_long_crontab() {
   same "$(on_machine 'seq -f "# %g is a line of a crontab" 5000 >>/etc/crontab; before=$(cksum /etc/crontab)
     wrongly "ZELOScheduleSet: every other line stays, and one is new" --system >/dev/null
@@ -115,6 +123,7 @@ check "every fault is named" same "$(unnamed_faults)" ""
 check "a call that exits is named" names_a_call_that_exits
 check "without being asked for, nothing of a machine is changed, whatever the platform does" nothing_is_done
 check "what a machine has once is put back, also after a crash" everything_is_put_back
+check "and after an interrupt" puts_back_when_interrupted
 check "so is a long crontab" puts_back_a_long_crontab
 check "where there is no crontab, none is made" makes_no_crontab
 check "power times that cannot be read stay" keeps_lists_that_cannot_be_read

@@ -1,7 +1,7 @@
 /*
  * To be preloaded into examples/platform_check: a platform that breaks one contract, the one that
- * WRONG_PLATFORM names as the check names it ("QLIBCExec: the exit status"). "CALL exits" and "CALL
- * crashes" are further ones.
+ * WRONG_PLATFORM names as the check names it ("QLIBCExec: the exit status"). "CALL exits",
+ * "CALL crashes" and "CALL hangs" are further ones.
  */
 #include <dlfcn.h>
 #include <signal.h>
@@ -549,6 +549,7 @@ int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
   const int result = real(&given, enabled);
   if (result == 0 && given.weekdays != 0) {
     if (wrong("ZELOScheduleSet crashes")) abort();
+    if (wrong("ZELOScheduleSet hangs")) pause();
     if (wrong("ZELOScheduleSet: every other line stays, and one is new")) {
       QLIBCExec("/bin/sh", "-c", "sed -i 1d /etc/crontab", NULL);
     }
