@@ -24,6 +24,7 @@ struct Finding {
   std::string taskName = {};
   std::optional<RunRecord> run = {};  // when it is about one
   std::optional<int64_t> due = {};    // the moment that was missed
+  std::string machine = {};           // how it was then, "off" or "on", where that is known
 };
 using Findings = std::vector<Finding>;
 

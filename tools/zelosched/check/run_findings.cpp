@@ -28,16 +28,21 @@ std::string momentInWords(int64_t moment) {
   return minuteText(localMinute(moment));
 }
 
-const char *whyMissed(MachineThen machine) {
+struct MissedWhile {
+  const char *machine;
+  const char *inWords;
+};
+
+MissedWhile whileMissed(MachineThen machine) {
   switch (machine) {
     case MachineThen::kOff:
-      return ", as the machine was off";
+      return {"off", ", as the machine was off"};
     case MachineThen::kOn:
-      return ", though the machine was on";
+      return {"on", ", though the machine was on"};
     case MachineThen::kMaybeOn:
       break;
   }
-  return "";
+  return {"", ""};
 }
 
 class RunCheck {
@@ -95,12 +100,14 @@ class RunCheck {
         const std::string id = std::to_string(task.ID);
         const std::string times =
             missed.times > 1 ? ", the last of " + std::to_string(missed.times) + " times," : "";
-        add(Severity::kWarning, kMissedRun, task,
-            "was due at " + momentInWords(missed.due) + times + " and did not run" +
-                whyMissed(missed.machine),
+        const MissedWhile then = whileMissed(missed.machine);
+        Finding &finding = add(
+            Severity::kWarning, kMissedRun, task,
+            "was due at " + momentInWords(missed.due) + times + " and did not run" + then.inWords,
             "'zelosched run " + id + "' runs it now, 'zelosched status --acknowledge " + id +
-                "' takes note of it")
-            .due = missed.due;
+                "' takes note of it");
+        finding.due = missed.due;
+        finding.machine = then.machine;
       }
       if (missed.planned > 0) {
         add(Severity::kOk, "planned-off", task,

@@ -66,6 +66,7 @@ Json::Value jsonOf(const Finding &finding) {
   object["task_name"] = jsonTextOrNull(finding.taskName);
   object["run"] = finding.run ? jsonOf(*finding.run) : Json::Value();
   object["due"] = finding.due ? jsonTime(*finding.due) : Json::Value();
+  object["machine"] = jsonTextOrNull(finding.machine);
   return object;
 }
 
