@@ -45,12 +45,13 @@ std::string mailProgram() {
 // this machine, or user and host.
 bool isAddress(const std::string &text) {
   constexpr size_t kLongest = 254;
-  const auto isWord = [](unsigned char c) { return std::isalnum(c) != 0 || c == '_'; };
+  const auto isWord = [](char c) {
+    return std::isalnum(static_cast<unsigned char>(c)) != 0 || c == '_';
+  };
   const auto isPart = [&](std::string_view part) {
     return !part.empty() && isWord(part.front()) && isWord(part.back()) &&
-           std::all_of(part.begin(), part.end(), [&](unsigned char c) {
-             return isWord(c) ||
-                    std::string_view(".+-").find(static_cast<char>(c)) != std::string_view::npos;
+           std::all_of(part.begin(), part.end(), [&](char c) {
+             return isWord(c) || std::string_view(".+-").find(c) != std::string_view::npos;
            });
   };
   const std::string_view whole = text;
