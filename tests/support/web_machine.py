@@ -105,8 +105,7 @@ def older_runs(name, count, ago):
 def clean():
     library("clean; rm -rf /etc/zelosched /etc/default/zelosched-mail; mkdir -p /etc/zelosched/run-ended.d")
     shutil.copy(ROOT + "/packaging/zelo_poweroff_feasible_check", "/usr/zelo/bin")
-    subprocess.run([BUILD + "/bin/zelosched", "restore"], check=False, stdout=subprocess.DEVNULL,
-                   stderr=subprocess.DEVNULL)
+    shutil.copy(BUILD + "/bin/zeloschedtask", "/tmp/zeloschedtask")
 
 
 def thousand_tasks():
