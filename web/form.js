@@ -308,7 +308,6 @@ export class FormView {
     }
     const id = this.id === null ? said.trim() : this.id;
     this.isSaved = true;
-    await this.model.refresh();
     if (fault !== null) tellFault(fault, { isOfNextView: true });
     else tell(format(_("$0 was saved."), short(titleOf({ id, name: this.name.input.value }))));
     if (!this.isClosed) goInstead(taskPath(id));

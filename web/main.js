@@ -122,7 +122,7 @@ class Page {
   }
 
   refresh() {
-    if (!cockpit.hidden) this.model.refresh();
+    return cockpit.hidden ? null : this.model.refresh();
   }
 
   async look() {

@@ -10,14 +10,13 @@ export function switchCell({ mayChange, set, nameOf }) {
   async function follow(row, isOn) {
     const isGoing = wishes.has(row.id);
     wishes.set(row.id, isOn);
-    if (isGoing) return true;
+    if (isGoing) return;
     let isDone = true;
     for (let wanted = null; isDone && wanted !== wishes.get(row.id);) {
       wanted = wishes.get(row.id);
       isDone = await set(row, wanted);
     }
     wishes.delete(row.id);
-    return isDone;
   }
 
   return (cell) => {
@@ -26,10 +25,7 @@ export function switchCell({ mayChange, set, nameOf }) {
     const show = () => { box.checked = wishes.has(shown.id) ? wishes.get(shown.id) : shown.enabled; };
     box.addEventListener("change", () => {
       const row = shown;
-      follow(row, box.checked).then((isDone) => {
-        // What was done is not known here yet; what was refused is as it was.
-        if (!isDone || shown !== row) show();
-      });
+      follow(row, box.checked).then(show);
     });
     cell.append(box);
     return (row) => {

@@ -58,10 +58,10 @@ export function whenChanged(listener) {
   changed = listener;
 }
 
-// Changes something, and gives what the program says to that.
+// Changes something, and gives what the program says to that, when the page knows what came of it.
 export async function change(words, input) {
   const { output, fault } = await outcome(words, input);
-  changed();
+  await changed();
   if (fault !== null) throw new ToolError(fault, output);
   return output;
 }
