@@ -53,7 +53,7 @@ void letUserChangesTakeCapabilities() {
 
 // EINVAL comes from a kernel that has none.
 bool clearAmbientCapabilities() {
-  return prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0, 0, 0) == 0 || errno == EINVAL;
+  return prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0UL, 0UL, 0UL) == 0 || errno == EINVAL;
 }
 
 // The library of the C language has no call for these.

@@ -369,6 +369,16 @@ TEST_F(StoreTest, TheIdOfASectionThatCannotBeReadIsNotFree) {
   EXPECT_EQ(task->ID, 3);
 }
 
+// As on every processor, however wide long is there.
+TEST_F(StoreTest, OfTheNameOfASectionThatCannotBeReadTheLowest32BitsCount) {
+  addSection("1", 1);
+  addSection("4294967298", 2);
+  failCallFor("QLIBCFileGetSection", "4294967298", {.times = kAlways, .code = 0x0B00});
+  const Task task = makeTask("new", "true");
+  EXPECT_EQ(backend_.create(task.get()), 0);
+  EXPECT_EQ(task->ID, 3);
+}
+
 TEST_F(StoreTest, TheIdsOfTasksAreNotFreeWhileThereIsNoClock) {
   for (const char *section : {"1", "2"}) addSection(section, std::atoi(section));
   failCall("localtime", {.times = kAlways, .error = EOVERFLOW});

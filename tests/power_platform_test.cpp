@@ -590,6 +590,16 @@ TEST_F(PoweronSetTest, ATimeSkippedBeforeMidnightComesAfterIt) {
   EXPECT_EQ(armed({{1, kSaturdays, 23, 30}}), "2025-04-06 00:30:00");
 }
 
+TEST_F(PoweronSetTest, TheClockIsArmedAfter2038) {
+  setZone("UTC");
+  setClock("2038-01-19 03:14");  // the last minute that 32 bits can tell
+  EXPECT_EQ(armed({{1, 127, 3, 15}}), "2038-01-19 03:15:00");
+  EXPECT_EQ(alarm(), "2147483700\n");
+  setClock("2106-02-07 06:00");  // and with 32 bits without a sign
+  EXPECT_EQ(armed({{1, 127, 6, 30}}), "2106-02-07 06:30:00");
+  EXPECT_EQ(alarm(), "4294967400\n");
+}
+
 TEST_F(PoweronSetTest, AZoneThatWasChangedSinceTheStartCounts) {
   EXPECT_EQ(armed({{1, 127, 9, 0}}), "2013-05-07 09:00:00");
   ASSERT_EQ(setenv("TZ", "XXX-1", 1), 0);  // and no call that takes it over

@@ -590,9 +590,9 @@ class NamesTest : public PlantedJournalTest {
   }
   int remove(const std::string &path) { return vfs_->xDelete(vfs_, path.c_str(), 0); }
   int open(const std::string &path, int flags) {
-    const std::unique_ptr<char[]> memory(new char[static_cast<size_t>(vfs_->szOsFile)]());
-    auto *file = reinterpret_cast<sqlite3_file *>(memory.get());
-    return vfs_->xOpen(vfs_, path.c_str(), file, flags, nullptr);
+    const std::unique_ptr<void, decltype(&std::free)> file(
+        std::calloc(1, static_cast<size_t>(vfs_->szOsFile)), &std::free);
+    return vfs_->xOpen(vfs_, path.c_str(), static_cast<sqlite3_file *>(file.get()), flags, nullptr);
   }
 
   Database db_;

@@ -869,6 +869,15 @@ TEST_F(ZelocoreTornSectionFile, WaitingEnds) {
   EXPECT_LE(g_calls.pauses, kMostPauses);
 }
 
+/* Edited by hand, on every processor. */
+TEST_F(ZelocoreTornSectionFile, ATrailerOfMoreSectionsThan32BitsCountIsOneThatDisagrees) {
+  Write(
+      "# zelo section file\n[1]\na=\"x\"\n# end of file: 4294967296 sections, checksum "
+      "0123456789abcdef\n");
+  MakeOld();
+  EXPECT_EQ(Names(), Texts{"1"});
+}
+
 TEST_F(ZelocoreTornSectionFile, AnOldFileIsNotWaitedFor) {
   Write("");
   MakeOld();

@@ -279,6 +279,28 @@ Outcome:  was not started when it was due
 Due:      2026-11-20T02:30:00+01:00"
 }
 
+# tell_of_failure NAME: as a keeper would
+tell_of_failure() {
+  env ZELO_RUN=1 ZELO_RUN_TASK=1 ZELO_RUN_TASK_NAME="$1" ZELO_RUN_OWNER=root ZELO_RUN_OUTCOME=failed \
+    ZELO_RUN_EXIT_CODE=3 ZELO_RUN_DUE='' ZELO_RUN_START='' ZELO_RUN_END='' ZELO_RUN_OUTPUT='' \
+    ZELO_RUN_OUTPUT_BYTES=0 "$MAILER"
+}
+
+what_is_no_character_is_left_out() {
+  put_sendmail
+  tell_of_failure "$(printf 'a\374\302\205b%.0s' {1..60})"
+  awk 'length > 78 { print "long:", length; bad = 1 } END { exit bad }' "$SCRATCH"/mail.* &&
+    shown | sed -n 1p | grep -qF "($(printf 'ab%.0s' {1..60}))"
+}
+
+takes_turns() {
+  put_sendmail
+  local i
+  for i in 1 2 3 4 5; do tell_of_failure backup & done
+  wait
+  same "$(mails)" 1
+}
+
 no_name_becomes_a_header() {
   put_sendmail
   add 'exit 3'
@@ -298,5 +320,7 @@ check "a success is mailed when it is the first again" mails_no_success_but_the_
 check "a long name stays whole, in words as a header wants them" long_names_stay_whole
 check "how a run ended is said as elsewhere" says_what_became_of_it
 check "of a missed time is said what is known" says_what_was_missed
+check "what is no character is left out" what_is_no_character_is_left_out
+check "several ends at once are one mail" takes_turns
 check "no name becomes a header" no_name_becomes_a_header
 finish

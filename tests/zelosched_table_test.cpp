@@ -24,6 +24,9 @@ TEST(ZeloschedTextTest, WhatCannotBeSeenIsEscaped) {
   EXPECT_EQ(printable("a\xc2\xad"), "a\\xc2\\xad");                    // a soft hyphen
   EXPECT_EQ(printable("a\xe2\x81\xa0"), "a\\xe2\\x81\\xa0");           // a joiner
   EXPECT_EQ(printable("a\xf3\xa0\x81\x81"), "a\\xf3\\xa0\\x81\\x81");  // a tag
+  EXPECT_EQ(printable("\xe3\x85\xa4"), "\\xe3\\x85\\xa4");             // a filler
+  EXPECT_EQ(printable("\xe2\xa0\x80"), "\\xe2\\xa0\\x80");             // an empty pattern
+  EXPECT_EQ(printable("a\xcd\x8f"), "a\\xcd\\x8f");                    // a grapheme joiner
 }
 
 TEST(ZeloschedTextTest, BytesThatAreNoUtf8AreEscaped) {

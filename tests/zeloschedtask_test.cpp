@@ -1,7 +1,7 @@
 // The program that cron starts.
 #include <gtest/gtest.h>
 
-#include <climits>
+#include <cstdint>
 #include <ctime>
 
 #include "failing_calls.h"
@@ -78,7 +78,7 @@ TEST_F(ZeloschedtaskTest, ATaskThatStartsLaterIsSilentlyNotRun) {
 }
 
 TEST_F(ZeloschedtaskTest, AnUnknownTaskIsReportedOnOneLineWithTheErrorRecord) {
-  for (const std::string &id : {std::string("7"), std::string("-5"), std::to_string(LONG_MAX)}) {
+  for (const std::string &id : {std::string("7"), std::string("-5"), std::to_string(INT32_MAX)}) {
     const Outcome outcome = runTask("id=" + id);
     EXPECT_EQ(outcome.status, 1);
     EXPECT_EQ(outcome.out, "");
@@ -131,6 +131,9 @@ TEST_F(ZeloschedtaskTest, AnythingElseIsAUsageError) {
       {"--run", "id=0x7"},
       {"--run", "id=7.0"},
       {"--run", "ID=7"},
+      {"--run", "id=2147483648"},
+      {"--run", "id=-2147483649"},
+      {"--run", "id=4294967297"},
       {"--run", "id=9223372036854775808"},
       {"--run", "id=-9223372036854775809"},
       {"--run", "id=99999999999999999999999999"},

@@ -110,7 +110,7 @@ std::optional<RunOrder> orderOf(int argc, char **argv) {
   constexpr int kFirstMore = 3;
   if (argc < kFirstMore || std::strcmp(argv[1], "--run") != 0) return std::nullopt;
   const std::optional<int64_t> id = parseNumber(argv[2], "id=");
-  if (!id || !std::in_range<long>(*id)) return std::nullopt;
+  if (!id || !std::in_range<int32_t>(*id)) return std::nullopt;
   RunOrder order;
   order.task = static_cast<long>(*id);
   if (argc == kFirstMore) return order;

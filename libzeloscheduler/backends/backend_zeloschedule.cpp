@@ -132,7 +132,8 @@ class StoreWalk {
   bool isStored() const { return state_ == SchedNameState::kOurs; }
   bool isRead() const { return read_ == kFound; }
   const char *section() const { return szSection_; }
-  long sectionId() const { return strtol(szSection_, nullptr, kDecimal); }
+  // Its lowest 32 bits, as of every stored number.
+  int32_t sectionId() const { return static_cast<int32_t>(strtoll(szSection_, nullptr, kDecimal)); }
 
   // The section that was read, as a task: its stored fields, and when it runs next. Each 0 or -1.
   int convert(ZELO_SCHED_TASK *pTask) { return ::convert(pTask, hash_.get()); }

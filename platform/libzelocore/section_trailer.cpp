@@ -12,7 +12,7 @@ namespace {
 
 constexpr std::string_view kStart = "# end of file: ";
 constexpr std::string_view kMiddle = " sections, checksum ";
-constexpr const char *kFormat = "# end of file: %zu sections, checksum %016llx\n";
+constexpr const char *kFormat = "# end of file: %llu sections, checksum %016llx\n";
 constexpr size_t kChecksumDigits = 16;
 constexpr size_t kRoom = 96;
 
@@ -66,8 +66,9 @@ bool trailerAgrees(const Trailer &trailer, std::string_view text, size_t section
 
 std::string trailerOf(std::string_view text, size_t sections) {
   char line[kRoom];
-  const int size = std::snprintf(line, sizeof line, kFormat, sections,
-                                 static_cast<unsigned long long>(checksum(text)));
+  const int size =
+      std::snprintf(line, sizeof line, kFormat, static_cast<unsigned long long>(sections),
+                    static_cast<unsigned long long>(checksum(text)));
   return {line, static_cast<size_t>(size)};
 }
 

@@ -16,7 +16,7 @@ inline constexpr std::string_view kHeader = "# zelo section file\n";
 struct Trailer {
   size_t begin;  // of its line
   size_t end;
-  size_t sections;
+  uint64_t sections;  // as the file says, on every processor
   uint64_t checksum;  // of all that stands before it
 };
 

@@ -2,6 +2,9 @@
    programs, fails with FAIL_ERROR, once, or ends the program where FAIL_ERROR is "kill". It is
    noted in the file FAIL_MARK, so that a caller sees when there are no more. What the program
    starts is left alone. */
+/* Where off_t has 32 bits of its own, each of two names is to be a function here. */
+#undef _FILE_OFFSET_BITS
+#undef _TIME_BITS
 #include <dlfcn.h>
 #include <errno.h>
 #include <fcntl.h>

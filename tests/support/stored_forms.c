@@ -90,8 +90,9 @@ static int save_all(void) {
   task->StartMonth = 2;
   task->StartDay = 29;
   if (save(task) < 0) return 1;
-  /* No power-on time is enabled, as not every machine has a clock that can be armed. */
-  return save_power_time("poweron", "0000000", ZELO_SCHED_STATE_DISABLED, 0) < 0 ||
+  /* The first needs a machine with a clock that can be armed. */
+  return save_power_time("poweron", "1100110", ZELO_SCHED_STATE_ENABLED, 7) < 0 ||
+         save_power_time("poweron", "0000000", ZELO_SCHED_STATE_DISABLED, 0) < 0 ||
          save_power_time("poweron", "1010101", ZELO_SCHED_STATE_DISABLED, 7) < 0 ||
          save_power_time("poweroff", "0101010", ZELO_SCHED_STATE_DISABLED, 23) < 0 ||
          save_power_time("poweroff", "1111111", ZELO_SCHED_STATE_ENABLED, 23) < 0;

@@ -1,6 +1,7 @@
 /*
  * To be preloaded into examples/platform_check: a platform that breaks one contract, the one that
- * WRONG_PLATFORM names as the check names it ("QLIBCExec: the exit status").
+ * WRONG_PLATFORM names as the check names it ("QLIBCExec: the exit status"). "CALL exits",
+ * "CALL crashes" and "CALL hangs" are further ones.
  */
 #include <dlfcn.h>
 #include <signal.h>
@@ -23,8 +24,10 @@ static int wrong(const char *fault) {
   static __typeof__(&name) real = NULL; \
   if (real == NULL) *(void **)&real = dlsym(RTLD_NEXT, #name)
 
-#define WRONG(result, fault) \
-  if (wrong(fault)) return result
+#define WRONG(result, fault)         \
+  do {                               \
+    if (wrong(fault)) return result; \
+  } while (0)
 
 static void set_mode(const char *path, mode_t mode) {
   if (chmod(path, mode) != 0) abort();
@@ -79,10 +82,7 @@ int QLIBCSzHashSetValue(PSZHASH *ppHash, const char *szKey, const char *szValue)
   if (szKey == NULL) WRONG(0, "QLIBCSzHashSetValue: null is refused");
   if (szKey != NULL) {
     const int is_there = QLIBCSzHashGetValue(*ppHash, szKey) != NULL;
-    if (is_there) {
-      WRONG(0, "QLIBCSzHashSetValue: a value is replaced");
-      WRONG(0, "QLIBPluginSetArgByInt: an argument can be set again");
-    }
+    if (is_there) WRONG(0, "QLIBCSzHashSetValue: a value is replaced");
     if (strcmp(szKey, "KEY") == 0 && wrong("QLIBCSzHashSetValue: keys differ in case"))
       szKey = "key";
     if (strcmp(szKey, "key 500") == 0) WRONG(-1, "QLIBCSzHashSetValue: the hash grows");
@@ -144,6 +144,7 @@ int QLIBCSzListPush(PSZLIST *ppList, const char *szText) {
 
 int QLIBCSzListCount(PSZLIST pList) {
   REAL(QLIBCSzListCount);
+  if (wrong("QLIBCSzListCount exits")) exit(0);
   if (pList == NULL) WRONG(-1, "QLIBCSzListCount: 0 for null");
   return real(pList);
 }
@@ -170,12 +171,26 @@ void QLIBCSzListFree(PSZLIST pList) {
 
 /* ---- section files ---- */
 
+static int is_link(const char *path) {
+  struct stat found;
+  return lstat(path, &found) == 0 && S_ISLNK(found.st_mode);
+}
+
+static void spoil_section(const char *path, const char *section) {
+  REAL(QLIBCFileSetSection);
+  PSZHASH hash = QLIBCSzHashAlloc(1);
+  QLIBCSzHashSetValue(&hash, "other", "spoilt");
+  real(path, section, 0, hash, 0);
+  QLIBCSzHashFree(hash);
+}
+
 int QLIBCFileExist(const char *szPath) {
   REAL(QLIBCFileExist);
   const int exists = real(szPath);
   if (szPath == NULL) WRONG(1, "QLIBCFileExist: 0 for null");
   if (szPath != NULL && !exists) WRONG(1, "QLIBCFileExist: 0 for what is not there");
-  if (exists) WRONG(0, "QLIBCFileExist: 1 for what is there");
+  if (exists && access(szPath, F_OK) == 0) WRONG(0, "QLIBCFileExist: 1 for what is there");
+  if (exists) WRONG(0, "QLIBCFileExist: 1 for what cannot be told");
   return exists;
 }
 
@@ -202,6 +217,10 @@ int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
   if (count < 0 && QLIBCErrGet() == QLIBC_ERR_IO) {
     WRONG(0, "QLIBCFileEnumSection: a file that is cut off is told");
   }
+  if (count == 2 && strcmp(QLIBCSzListGet(*ppList, before + 1), "copied") == 0 &&
+      wrong("QLIBCFileEnumSection: a file that is being copied is waited for")) {
+    return -1;
+  }
   if (count == 2 && (wrong("QLIBCFileEnumSection: the names in the order of the file") ||
                      wrong("QLIBCFileSetSection: the order stays"))) {
     char *first = strdup(QLIBCSzListGet(*ppList, before));
@@ -225,7 +244,7 @@ int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHa
   if (found == 0) WRONG(1, "QLIBCFileGetSection: 0 when there is no such section");
   WRONG(found > 0 ? 2 : found, "QLIBCFileGetSection: 1 when the section was read");
   if (found > 0) {
-    if (wrong("QLIBCFileGetSection: its values, with quotes and without")) {
+    if (wrong("QLIBCFileGetSection: its values")) {
       QLIBCSzHashSetValue(ppHash, "key", "\"two\"");
     }
     if (strcmp(szSection, "2") == 0 &&
@@ -238,6 +257,7 @@ int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHa
 
 int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int flags) {
   REAL(QLIBCFileAddSection);
+  if (is_link(szPath)) WRONG(1, "QLIBCFileAddSection: a symbolic link is refused");
   if (access(szPath, F_OK) != 0) WRONG(0, "QLIBCFileAddSection: 1, and the file is made");
   if (strcmp(szSection, "2") == 0 && wrong("QLIBCFileAddSection: the other sections stay"))
     unlink(szPath);
@@ -255,6 +275,7 @@ int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PS
                         int reserved) {
   struct stat before;
   REAL(QLIBCFileSetSection);
+  if (is_link(szPath)) WRONG(1, "QLIBCFileSetSection: a symbolic link is refused");
   if (stat(szPath, &before) != 0) abort();
   if (wrong("QLIBCFileSetSection: the file is replaced as a whole")) {
     QLIBCExec("/bin/sh", "-c", "ln \"$1\" \"$1.was\"", "sh", szPath,
@@ -267,6 +288,8 @@ int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PS
   if (result == 1) {
     if (wrong("QLIBCFileSetSection: the mode stays")) set_mode(szPath, 0600);
     WRONG(2, "QLIBCFileSetSection: 1 when it was replaced");
+    if (wrong("QLIBCFileSetSection: the other sections keep what they hold"))
+      spoil_section(szPath, "2");
     if (wrong("QLIBCFileSetSection: the file is replaced as a whole")) {
       static const char put_back[] = "cat \"$1\" >\"$1.was\" && mv \"$1.was\" \"$1\"";
       QLIBCExec("/bin/sh", "-c", put_back, "sh", szPath, NULL);
@@ -279,8 +302,11 @@ int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PS
 
 int QLIBCFileRemoveSection(const char *szPath, const char *szSection) {
   REAL(QLIBCFileRemoveSection);
+  if (is_link(szPath)) WRONG(1, "QLIBCFileRemoveSection: a symbolic link is refused");
   WRONG(1, "QLIBCFileRemoveSection: that section and no other is gone");
   const int result = real(szPath, szSection);
+  if (result == 1 && wrong("QLIBCFileRemoveSection: the other sections keep what they hold"))
+    spoil_section(szPath, "2");
   if (result == 1) WRONG(0, "QLIBCFileRemoveSection: 1 when it was removed");
   if (result == 0) WRONG(1, "QLIBCFileRemoveSection: 0 when there is none");
   return result;
@@ -288,6 +314,7 @@ int QLIBCFileRemoveSection(const char *szPath, const char *szSection) {
 
 int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue, int flags) {
   REAL(QLIBCFileSetLine);
+  if (is_link(szPath)) WRONG(1, "QLIBCFileSetLine: a symbolic link is refused");
   const int is_there = access(szPath, F_OK) == 0;
   if (!is_there && szValue == NULL) WRONG(1, "QLIBCFileSetLine: 0 when there is nothing to remove");
   if (!is_there && szValue != NULL) WRONG(0, "QLIBCFileSetLine: a value without a file is refused");
@@ -330,6 +357,7 @@ int QLIBCExec(const char *szProgram, ...) {
       WRONG(-1, "QLIBCExec: the exit status for a caller who ignores his children");
     signal(SIGCHLD, SIG_DFL);
   }
+  if (result > 128) WRONG(0, "QLIBCExec: not 0 for what a signal ended");
   if (result == -1) WRONG(127, "QLIBCExec: -1 when the program cannot be started");
   return result;
 }
@@ -362,10 +390,9 @@ static int ints; /* set so far */
 
 int QLIBPluginInit(const char *szPlugin, const char *szAction, void **ppContext) {
   REAL(QLIBPluginInit);
-  if (wrong("QLIBPluginSetArg: a plugin is told the action, the stage and the arguments"))
-    szAction = "";
   const int result = real(szPlugin, szAction, ppContext);
   WRONG(-1, "QLIBPluginInit: 0, and the first word is not null");
+  if (wrong("QLIBPluginInit: the context is three words")) ppContext[3] = NULL;
   return result;
 }
 
@@ -378,14 +405,16 @@ int QLIBPluginSetArg(void **ppContext, const char *szKey, const char *szValue) {
 int QLIBPluginSetArgByInt(void **ppContext, const char *szKey, int value) {
   REAL(QLIBPluginSetArgByInt);
   WRONG(1, "QLIBPluginSetArgByInt: 0");
-  if (ints++ > 0) WRONG(0, "QLIBPluginSetArgByInt: an argument can be set again");
+  if (ints++ > 0) WRONG(-1, "QLIBPluginSetArgByInt: an argument can be set again");
   return real(ppContext, szKey, value);
 }
 
 int QLIBPluginAction(int stage, void **ppContext) {
   REAL(QLIBPluginAction);
-  const int result = real(stage, ppContext);
   const int has_plugins = access("/usr/zelo/libexec/plugins/platform_check.d", F_OK) == 0;
+  if (has_plugins && wrong("QLIBPluginAction crashes")) abort();
+  if (has_plugins) WRONG(0, "QLIBPluginAction: a plugin is called");
+  const int result = real(stage, ppContext);
   if (!has_plugins) WRONG(-1, "QLIBPluginAction: 0 without plugins");
   if (has_plugins && result == 0) WRONG(1, "QLIBPluginAction: 0 when every plugin succeeds");
   if (result < 0) WRONG(0, "QLIBPluginAction: below 0 when one fails");
@@ -405,8 +434,9 @@ int ZELOUserGetByUID(uid_t uid, PZELOUSER *ppUser) {
   const int result = real(uid, ppUser);
   if (result == 0) {
     WRONG(1, "ZELOUserGetByUID: 0, and the user");
-    if (wrong("ZELOUserGetByUID: his name, ids, home directory and shell")) (*ppUser)->gid = 1;
+    if (wrong("ZELOUserGetByUID: his name, id, home directory and shell")) (*ppUser)->uid = 1;
   }
+  if (uid == 4294967294U) WRONG(0, "ZELOUserGetByUID: the highest id is one of a user");
   if (result < 0) WRONG(0, "ZELOUserGetByUID: a user who is not there is told");
   return result;
 }
@@ -422,6 +452,7 @@ int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, i
   if (cbSrc == 0) WRONG(0, "SzBase64EncodeFull: an empty source is an empty text");
   const int result = real(src, cbSrc, dst, cbDst, reserved);
   if (result == 0) WRONG(1, "SzBase64EncodeFull: 0 where there is no room");
+  if (cbDst == 9 && wrong("SzBase64EncodeFull: nothing is written behind the room")) dst[9] = 0;
   if (result == 1 && cbSrc == 4)
     WRONG(0, "SzBase64EncodeFull: 1, and a text that ends with a zero byte");
   if (result == 1 && cbSrc > 200 && wrong("SzBase64EncodeFull: one line, however long"))
@@ -434,9 +465,11 @@ int ZELOEncodingBase64Decode(const char *src, size_t cbSrc, char *dst, size_t *p
   const size_t room = *pcbDst;
   if (memchr(src, '\n', cbSrc) != NULL)
     WRONG(0, "ZELOEncodingBase64Decode: white space is passed over");
-  if (memchr(src, '*', cbSrc) != NULL)
-    WRONG(1, "ZELOEncodingBase64Decode: 0 for another character");
+  if (cbSrc % 4 == 2)
+    WRONG(0, "ZELOEncodingBase64Decode: a text that ends within a group is the whole bytes of it");
   const int result = real(src, cbSrc, dst, pcbDst);
+  if (room == 4 && wrong("ZELOEncodingBase64Decode: nothing is written behind the room"))
+    dst[4] = 0;
   if (result == 0 && room == 255) WRONG(1, "ZELOEncodingBase64Decode: 0 where there is no room");
   if (result == 1 && *pcbDst == 256 && wrong("ZELOEncodingBase64Decode: 1, and every byte"))
     dst[200] = 0;
@@ -445,50 +478,79 @@ int ZELOEncodingBase64Decode(const char *src, size_t cbSrc, char *dst, size_t *p
 
 /* ---- power times and the crontab ---- */
 
+static int reads; /* of the lists of before, which come first */
+
 int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries) {
   REAL(ZELOAutoPowerConfGet);
   const int count = real(list, capacity, pEntries);
+  if (capacity > 100 && reads++ == 0) WRONG(-1, "ZELOAutoPowerConfGet: the lists are read");
   if (list > ZELO_AUTOPOWER_OFF)
     WRONG(0, "ZELOAutoPowerConfGet: a list that does not exist is refused");
   if (count == 2 && wrong("ZELOAutoPowerConfGet: what was set, and how many"))
     pEntries[1].minute = 0;
-  if (capacity == 1) WRONG(2, "ZELOAutoPowerConfGet: no more than there is room for");
+  if (capacity == 1) {
+    WRONG(2, "ZELOAutoPowerConfGet: no more than there is room for");
+    if (wrong("ZELOAutoPowerConfGet: nothing is written behind the room")) pEntries[1].minute = 0;
+  }
   return count;
 }
 
+/* Those that are refused are carried out, on the machine. */
 int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries) {
+  static const ZELO_AUTOPOWER valid = {0, 127, 0, 0};
+  static int sets;
+  ZELO_AUTOPOWER got[2];
   REAL(ZELOAutoPowerConfSet);
-  if (count == 0 && list == ZELO_AUTOPOWER_ON)
-    WRONG(0, "ZELOAutoPowerConfSet: a list can be emptied");
-  const int result = real(list, count, pEntries);
+  if (sets++ == 0 && wrong("ZELOAutoPowerConfSet: a list that was read is one that can be set"))
+    return -1;
   if (list > ZELO_AUTOPOWER_OFF)
-    WRONG(0, "ZELOAutoPowerConfSet: a list that does not exist is refused");
-  if (result < 0 && list == ZELO_AUTOPOWER_ON)
-    WRONG(0, "ZELOAutoPowerConfSet: an hour of 24 is refused");
-  if (result == 0) WRONG(1, "ZELOAutoPowerConfSet: 0");
-  if (count == 2 && wrong("ZELOAutoPowerConfSet: the other list stays"))
-    real(ZELO_AUTOPOWER_OFF, 0, NULL);
+    WRONG(real(ZELO_AUTOPOWER_OFF, 1, &valid),
+          "ZELOAutoPowerConfSet: a list that does not exist is refused");
+  if (count == 1 && pEntries->hour > 23)
+    WRONG(real(list, 1, &valid), "ZELOAutoPowerConfSet: an hour of 24 is refused");
+  if (count == 0 && list == ZELO_AUTOPOWER_ON && QLIBCFileExist("/usr/zelo/etc/power_sched.conf"))
+    WRONG(0, "ZELOAutoPowerConfSet: a list can be emptied");
+  if (count == 0 && list == ZELO_AUTOPOWER_OFF &&
+      ZELOAutoPowerConfGet(ZELO_AUTOPOWER_OFF, 2, got) == 1)
+    WRONG(0, "ZELOAutoPowerConfSet: the times of before are put back");
+  if (count == 100 && wrong("ZELOAutoPowerConfSet: there is room for a hundred")) count = 99;
+  const int result = real(list, count, pEntries);
+  if (count == 2) {
+    if (wrong("ZELOAutoPowerConfSet crashes")) abort();
+    WRONG(1, "ZELOAutoPowerConfSet: 0");
+    if (wrong("ZELOAutoPowerConfSet: the other list stays")) real(ZELO_AUTOPOWER_OFF, 0, NULL);
+  }
   return result;
 }
 
 int ZELOAutoPoweronSet(void) {
+  ZELO_AUTOPOWER got[2];
   REAL(ZELOAutoPoweronSet);
-  WRONG(-1, "ZELOAutoPoweronSet: 0 when no time is wanted");
+  if (ZELOAutoPowerConfGet(ZELO_AUTOPOWER_ON, 2, got) > 0)
+    WRONG(1, "ZELOAutoPoweronSet: 0 when a time is wanted, or why the machine cannot");
+  else
+    WRONG(-1, "ZELOAutoPoweronSet: 0 when no time is wanted");
   return real();
 }
 
 int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
   static const char crontab[] = "/etc/crontab";
+  static int lines;
   ZELO_SCHEDULE given = *pSchedule;
   REAL(ZELOScheduleSet);
-  if (given.hour > 23) WRONG(0, "ZELOScheduleSet: an hour of 24 is refused");
+  if (given.hour > 23 && wrong("ZELOScheduleSet: an hour of 24 is refused")) given.hour = 23;
   if (given.weekdays == 0 && wrong("ZELOScheduleSet: no line without a weekday"))
     given.weekdays = 127;
-  if (given.weekdays != 0)
-    WRONG(0, "ZELOScheduleSet: a line of the time that runs the command as root");
+  if (given.weekdays == 2) {
+    if (wrong("ZELOScheduleSet: a line of the time that runs the command as root"))
+      given.weekdays = 4;
+    if (++lines == 50) WRONG(0, "ZELOScheduleSet: a line for each of a hundred calls");
+  }
   const int result = real(&given, enabled);
   if (result == 0 && given.weekdays != 0) {
-    if (wrong("ZELOScheduleSet: every other line stays")) {
+    if (wrong("ZELOScheduleSet crashes")) abort();
+    if (wrong("ZELOScheduleSet hangs")) pause();
+    if (wrong("ZELOScheduleSet: every other line stays, and one is new")) {
       QLIBCExec("/bin/sh", "-c", "sed -i 1d /etc/crontab", NULL);
     }
     if (wrong("ZELOScheduleSet: owner and mode stay")) set_mode(crontab, 0600);
@@ -498,6 +560,9 @@ int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
 
 int ZELOUpdateCrontab(const char *szCommand, int stop, int reload) {
   REAL(ZELOUpdateCrontab);
-  WRONG(-1, "ZELOUpdateCrontab: 0 when nothing is to be told");
+  if (reload)
+    WRONG(-1, "ZELOUpdateCrontab: 0 when cron is told, and when there is none");
+  else
+    WRONG(-1, "ZELOUpdateCrontab: 0 when nothing is to be told");
   return real(szCommand, stop, reload);
 }

@@ -54,12 +54,13 @@ int runAdd(int argc, char **argv) {
   if (window) stagger(minutes, task.get());
   const std::string past = pastSchedule(*task, time(nullptr));
   if (!past.empty()) throw Failure("not saved: " + past);
-  createTask(task.get());
+  saveNewTask(task.get());
   if (arguments.has("quiet")) {
     std::printf("%d\n", task->ID);
   } else {
     announce(*task);
   }
+  requireCrontabInStep();
   return kDone;
 }
 

@@ -48,7 +48,9 @@ struct HelpOption {
 };
 
 size_t endOfWord(const std::string &text, size_t at) {
-  while (at < text.size() && (std::islower(text[at]) != 0 || text[at] == '-')) ++at;
+  while (at < text.size() &&
+         (std::islower(static_cast<unsigned char>(text[at])) != 0 || text[at] == '-'))
+    ++at;
   return at;
 }
 

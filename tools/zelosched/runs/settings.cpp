@@ -1,12 +1,14 @@
 #include "runs/settings.h"
 
+#include <unistd.h>
+
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
-#include <fstream>
 #include <optional>
+#include <sstream>
 #include <string_view>
 
+#include "store/place_file.h"
 #include "terminal/failure.h"
 #include "terminal/number.h"
 #include "terminal/text.h"
@@ -89,13 +91,12 @@ std::string take(std::string_view line, Settings *settings) {
 
 Settings readSettings(SettingsFaults *faults) {
   Settings settings;
-  errno = 0;
-  std::ifstream file(kPath);
-  if (!file) {
-    const int reason = errno;
-    if (reason != ENOENT) {
-      faults->push_back(std::string("cannot read ") + kPath + ": " + std::strerror(reason));
-    }
+  if (access(kPath, F_OK) != 0 && errno == ENOENT) return settings;
+  std::istringstream file;
+  try {
+    file.str(contentsOf(kPath));
+  } catch (const Failure &failure) {
+    faults->push_back(failure.what());
     return settings;
   }
   std::string line;

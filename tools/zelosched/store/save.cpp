@@ -88,7 +88,7 @@ void requireCronRoom(size_t lines) {
                 std::to_string(kSchedMostCronLines) + ": remove or disable tasks first");
 }
 
-void createTask(ZELO_SCHED_TASK *task) {
+void saveNewTask(ZELO_SCHED_TASK *task) {
   requireHarmless(*task);
   if (isPower(*task)) {
     PowerRoom().take(*task);
@@ -97,6 +97,10 @@ void createTask(ZELO_SCHED_TASK *task) {
     requireCronRoom(hasCronLine(*task) ? 1 : 0);
   }
   storeNew(task);
+}
+
+void createTask(ZELO_SCHED_TASK *task) {
+  saveNewTask(task);
   requireCrontabInStep();
 }
 

@@ -21,6 +21,10 @@ void createTask(ZELO_SCHED_TASK *task);
 void editTask(ZELO_SCHED_TASK *task);
 void removeTask(const ZELO_SCHED_TASK &task);
 
+// createTask without the look at the crontab afterwards, for who tells in between that the task is
+// saved and which id it has.
+void saveNewTask(ZELO_SCHED_TASK *task);
+
 // The steps of these alone, for several changes that are checked before the first of them and after
 // the last.
 void storeNew(ZELO_SCHED_TASK *task);
