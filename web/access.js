@@ -15,7 +15,7 @@ export function watchAccess(changed) {
 
 // Cockpit asks what the machine's own rules ask for, mostly the password. The page is loaded anew
 // by Cockpit when the access is there.
-export function askForAccess() {
+function askForAccess() {
   const client = cockpit.dbus(null, { bus: "internal" });
   const superuser = client.proxy("cockpit.Superuser", "/superuser");
   const fault = el("p", { class: "fault", role: "alert" });

@@ -1,13 +1,30 @@
 // Where in the page somebody is, which the address tells, so that it can be linked.
 const cockpit = window.cockpit;
 
+// One that cannot be read is that of the first view.
+function readable() {
+  try {
+    return cockpit.location;
+  } catch (error) {
+    window.history.replaceState(null, "", "#/");
+    return cockpit.location;
+  }
+}
+
+// Of an option that is there several times, the last one counts.
 export function here() {
-  const { path, options } = cockpit.location;
-  return { path, options };
+  const { path, options } = readable();
+  const last = (value) => (Array.isArray(value) ? value[value.length - 1] : value);
+  return { path, options: Object.fromEntries(Object.entries(options).map(([name, value]) => [name, last(value)])) };
 }
 
 export function go(path, options = {}) {
   cockpit.location.go(path, options);
+}
+
+// Going back does not lead to where one is now.
+export function goInstead(path) {
+  cockpit.location.replace(path);
 }
 
 // The same view with other options; going back leads to the view before.

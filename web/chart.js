@@ -2,7 +2,7 @@
 import { el, svg } from "./dom.js";
 import { durationText, momentText } from "./moments.js";
 import { gradeOf, outcomeText } from "./words.js";
-import { _, format } from "./text.js";
+import { format, ngettext } from "./text.js";
 
 const MOST = 30;
 const WIDTH = 600;
@@ -21,7 +21,8 @@ export function durationChart(runs, open) {
     return svg("rect", { class: "bar " + gradeOf(run), x: (MOST - shown.length + i) * step + 2, y: HEIGHT - height,
       width: step - 4, height, on: { click: () => open(run) } }, svg("title", {}, text));
   });
-  const title = format(_("How long the last $0 runs took; the longest $1"), shown.length, durationText(longest));
+  const title = format(ngettext("How long the last $0 run took; the longest $1", "How long the last $0 runs took; the longest $1",
+    shown.length), shown.length, durationText(longest));
   return el("figure", { class: "chart" },
     svg("svg", { viewBox: `0 0 ${WIDTH} ${HEIGHT}`, role: "img", "aria-label": title, preserveAspectRatio: "none" },
       svg("line", { class: "axis", x1: 0, x2: WIDTH, y1: HEIGHT, y2: HEIGHT }), ...bars),

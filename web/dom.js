@@ -47,6 +47,30 @@ export function button(label, attributes, click) {
   return el("button", { type: "button", ...attributes, on: { click } }, label);
 }
 
+// The children in that order. Moving an element takes the focus from it, so only what stands elsewhere
+// is moved.
+export function place(parent, elements) {
+  elements.forEach((element, i) => {
+    if (parent.children[i] !== element) parent.insertBefore(element, parent.children[i] || null);
+  });
+  while (parent.children.length > elements.length) parent.lastElementChild.remove();
+}
+
+const CAN_HAVE_FOCUS = "a[href], button, input, select, textarea, [tabindex='0']";
+
+// The first thing there that can be used.
+export function focusIn(element) {
+  const found = [...element.querySelectorAll(CAN_HAVE_FOCUS)].find((one) => !one.disabled && one.checkVisibility());
+  if (found) found.focus();
+  return Boolean(found);
+}
+
+// Whether what had the focus has gone or is hidden: who uses the keys would begin anew.
+export function isFocusLost() {
+  const { activeElement } = document;
+  return !activeElement || activeElement === document.body || !activeElement.checkVisibility();
+}
+
 let lastId = 0;
 export function newId() {
   lastId += 1;

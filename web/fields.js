@@ -1,5 +1,8 @@
 // Fields of forms: a label, an input, a hint, and what is wrong with it.
 import { el, fill, newId, setAttribute } from "./dom.js";
+import { weekdayText } from "./moments.js";
+import { DAYS } from "./words.js";
+import { _ } from "./text.js";
 
 // `places` are the members of a task that the field is about.
 export class Field {
@@ -17,6 +20,11 @@ export class Field {
 
   has(place) {
     return this.places.some((own) => place === own || place.startsWith(own + "[") || place.startsWith(own + "."));
+  }
+
+  // What stands there is no number or no whole date, so that the browser gives nothing.
+  isUnreadable() {
+    return [this.input, ...this.input.querySelectorAll("input")].some((input) => input.validity && input.validity.badInput);
   }
 
   tell(texts) {
@@ -41,8 +49,8 @@ export class Group extends Field {
   }
 }
 
-export function check(label, isChecked, changed) {
-  const input = el("input", { type: "checkbox", checked: isChecked, on: { change: changed || (() => {}) } });
+export function check(label, isChecked) {
+  const input = el("input", { type: "checkbox", checked: isChecked });
   return { input, element: el("label", { class: "check" }, input, label) };
 }
 
@@ -50,4 +58,18 @@ export function select(choices, value) {
   const input = el("select", {}, ...choices.map(([key, label]) => el("option", { value: key }, label)));
   input.value = value;
   return input;
+}
+
+// The days of the week, of which `chosen` says which are on: their names, as schedules have them.
+export class DaysField extends Group {
+  constructor(chosen, options) {
+    const boxes = DAYS.map((day, i) => check(weekdayText(i, "short"), chosen.includes(day)));
+    boxes.forEach((box, i) => box.input.setAttribute("aria-label", weekdayText(i, "long")));
+    super(_("Days"), boxes.map((box) => box.element), options);
+    this.boxes = boxes;
+  }
+
+  value() {
+    return DAYS.filter((day, i) => this.boxes[i].input.checked);
+  }
 }

@@ -1,13 +1,15 @@
 // Adding a task, and changing one. The tool is asked at each change what it would say to it, and
 // says when the task would run; nothing is saved by that.
-import { button, el, fill, setText } from "./dom.js";
-import { go, href, taskPath } from "./address.js";
+import { button, el, fill, isFocusLost, setText } from "./dom.js";
+import { go, goInstead, href, taskPath } from "./address.js";
 import { showAccess } from "./access.js";
-import { clearNotes, confirm, tell } from "./dialogs.js";
+import { clearFaults, tell, tellFault } from "./dialogs.js";
 import { Field, Group, check, select } from "./fields.js";
 import { distanceText, momentText } from "./moments.js";
 import { ScheduleFields } from "./schedule-fields.js";
 import { ask, askAbout, change } from "./tool.js";
+import { oneAtATime } from "./turns.js";
+import { titleOf } from "./words.js";
 import { _, format, short, visible } from "./text.js";
 
 const PAUSE = 200; // ms without a key before the tool is asked
@@ -16,7 +18,7 @@ const PLACE = "tasks[0].";
 
 const UNITS = () => [["s", _("seconds")], ["m", _("minutes")], ["h", _("hours")], ["d", _("days")]];
 
-// People first: they are who tasks are for. A hint of the store's owner is kept even when the machine
+// People first: they are who tasks are for. The owner that the task has is there even when the machine
 // does not list him.
 function ownerChoices(owners, current) {
   const name = (owner) => (owner.full_name && owner.full_name !== owner.owner
@@ -31,6 +33,8 @@ export class FormView {
   constructor(root, model, { path }) {
     this.root = root;
     this.model = model;
+    this.isSaved = false;
+    this.saveOnce = oneAtATime(() => this.trySaving());
     this.id = path[0] === "task" ? Number(path[1]) : null;
     this.title = this.id === null ? _("Add a task") : _("Edit the task");
     this.update();
@@ -42,8 +46,8 @@ export class FormView {
     const task = this.id === null ? null : this.model.taskOf(this.id);
     if (!this.form) {
       this.make(task);
-    } else if (task && JSON.stringify(this.settingsOf(task)) !== this.before) {
-      this.tellChanged();
+    } else if (this.id !== null && !this.isSaving && !this.isSaved && this.model.isListed) {
+      this.tellOf(task);
     }
   }
 
@@ -58,18 +62,24 @@ export class FormView {
       fill(this.root, access);
       return;
     }
+    if (task && !task.ui.can_edit) {
+      fill(this.root, el("h2", {}, format(_("Edit $0"), short(titleOf(task)))),
+        el("p", {}, _("Its application does not let it be edited.")),
+        el("p", {}, el("a", { href: href(taskPath(this.id)) }, _("Show the task"))));
+      return;
+    }
     this.task = task;
     this.before = task && JSON.stringify(this.settingsOf(task));
     this.makeFields(task || { name: "", command: "", owner: "root", enabled: true, schedule: null, time_limit: null,
       overlap: { task: false, app: true }, app: null, ui: { can_edit_name: true, can_edit_owner: true } });
+    this.heading = el("h2", { class: "long" }, this.id === null ? _("Add a task") : format(_("Edit $0"), short(titleOf(task))));
     this.fault = el("div");
     this.changed = el("div");
     this.coming = el("ol", { class: "coming" });
     this.comingNote = el("p", { class: "beside" });
     this.save = el("button", { class: "primary" }, this.id === null ? _("Add the task") : _("Save"));
     this.form = el("form", { novalidate: true, on: { submit: (event) => this.submit(event), input: () => this.typed() } },
-      el("h2", { class: "long" }, this.id === null ? _("Add a task") : format(_("Edit $0"), short(task.name))),
-      this.changed,
+      this.heading, this.changed,
       el("div", { class: "form-columns" },
         el("div", { class: "fields" },
           el("fieldset", {}, el("legend", {}, _("What it does")), this.name.element, this.command.element, this.owner.element),
@@ -82,7 +92,9 @@ export class FormView {
       el("div", { class: "actions" }, this.save,
         button(_("Cancel"), { class: "secondary" }, () => this.cancel())));
     fill(this.root, this.form);
-    this.start = JSON.stringify(this.value());
+    this.start = this.value();
+    this.toldOf = null;
+    this.comingShown = null;
     this.touched = new Set();
     this.preview();
     this.loadOwners(task ? task.owner : "root");
@@ -150,8 +162,26 @@ export class FormView {
     };
   }
 
-  text() {
-    return JSON.stringify({ version: 1, tasks: [this.value()] });
+  // What differs from what was loaded; of a new task all.
+  changes() {
+    const value = this.value();
+    if (this.id === null) return value;
+    const isOther = ([name]) => JSON.stringify(value[name]) !== JSON.stringify(this.start[name]);
+    const changes = Object.fromEntries(Object.entries(value).filter(isOther));
+    if ("app" in changes) changes.app_name = null; // which is the name of the one before
+    return changes;
+  }
+
+  // Whether something would be lost by leaving.
+  isChanged() {
+    return Boolean(this.form) && !this.isSaved &&
+      (JSON.stringify(this.value()) !== JSON.stringify(this.start) || this.fields.some((field) => field.isUnreadable()));
+  }
+
+  // `task` as the machine has it now: of what the tool wants to be told always, others may have changed the rest.
+  text(task) {
+    const needed = task ? { name: task.name, owner: task.owner, schedule: task.schedule, command: task.command } : {};
+    return JSON.stringify({ version: 1, tasks: [{ ...needed, ...this.changes() }] });
   }
 
   typed() {
@@ -161,33 +191,61 @@ export class FormView {
     this.timer = window.setTimeout(() => this.preview(), PAUSE);
   }
 
-  named(...words) {
-    return this.id === null ? words : [...words, String(this.id)];
-  }
-
   // What the tool says to what stands there. The answer to an older question is passed over.
   async preview() {
     this.asked = (this.asked || 0) + 1;
     const number = this.asked;
     try {
-      const answer = await askAbout(this.text(), ...this.named("next", "--preview", "--count", COMING));
+      const answer = await askAbout(this.text(this.id === null ? null : this.model.taskOf(this.id)), "next", "--preview", "--count", COMING,
+        ...(this.id === null ? [] : [String(this.id)]));
       if (number !== this.asked) return null;
       this.showPreview(answer);
       return answer;
     } catch (error) {
-      if (number === this.asked) setText(this.comingNote, error.message);
+      if (number === this.asked) {
+        this.showComing([]);
+        setText(this.comingNote, error.message);
+      }
       return null;
     }
   }
 
-  showPreview({ due, faults }) {
+  // Written only when it is another answer: it is read out then.
+  showComing(due) {
+    const key = JSON.stringify(due);
+    if (key === this.comingShown) return;
+    this.comingShown = key;
     fill(this.coming, ...due.map((time) => el("li", {}, momentText(time) + " ",
       el("span", { class: "beside" }, distanceText(time)))));
-    setText(this.comingNote, due.length > 0 ? "" : _("Not as it stands."));
+  }
+
+  comingNoteOf(due) {
+    if (due.length === 0) return _("Not as it stands.");
+    return this.isOn.input.checked ? "" : _("But it is switched off, and does not run until it is switched on.");
+  }
+
+  // By its field, in words of the page: it says less of what else is wrong there.
+  ownFaults() {
+    const found = this.schedule.faults();
+    for (const field of this.fields) {
+      if (field.isUnreadable()) found.set(field, _("What stands here is no number, or not complete."));
+    }
+    return found;
+  }
+
+  showPreview({ due, faults }) {
+    const unseen = this.ownFaults();
+    this.showComing(unseen.size > 0 ? [] : due);
+    setText(this.comingNote, this.comingNoteOf(unseen.size > 0 ? [] : due));
+    this.showFieldFaults(faults, unseen);
+  }
+
+  showFieldFaults(faults, unseen) {
     const placed = faults.map(({ place, text }) => ({ place: place.startsWith(PLACE) ? place.slice(PLACE.length) : "", text }));
     for (const field of this.fields) {
-      const own = placed.filter(({ place }) => this.fieldOf(place) === field);
-      field.tell(this.isSubmitted || this.touched.has(field) ? own.map(({ text }) => this.sentence(text)) : []);
+      const own = unseen.has(field) ? [unseen.get(field)]
+        : placed.filter(({ place }) => this.fieldOf(place) === field).map(({ text }) => this.sentence(text));
+      field.tell(this.isSubmitted || this.touched.has(field) ? own : []);
     }
     const others = placed.filter(({ place }) => !this.fieldOf(place));
     this.showFaults(this.isSubmitted ? others.map(({ text }) => this.sentence(text)) : []);
@@ -207,18 +265,22 @@ export class FormView {
     fill(this.fault, ...texts.map((text) => el("div", { class: "note bad", role: "alert" }, el("p", {}, text))));
   }
 
-  // First what the tool would say, beside the fields; then it is saved. What was typed stays in any case.
-  async submit(event) {
+  submit(event) {
     event.preventDefault();
-    if (this.isSaving) return;
+    this.saveOnce();
+  }
+
+  // First what the tool would say, beside the fields; then it is saved. What was typed stays in any case.
+  async trySaving() {
     this.isSaving = true;
     this.isSubmitted = true;
-    this.save.disabled = true;
     window.clearTimeout(this.timer);
-    clearNotes();
+    clearFaults();
     try {
       const answer = await this.preview();
-      if (answer && answer.faults.length > 0) {
+      const unseen = this.ownFaults();
+      if (unseen.size > 0 || (answer && answer.faults.length > 0)) {
+        if (!answer) this.showFieldFaults([], unseen);
         this.focusFault();
       } else {
         await this.store();
@@ -226,18 +288,29 @@ export class FormView {
     } catch (error) {
       this.showFaults([error.message]);
     }
-    this.save.disabled = false;
     this.isSaving = false;
+    if (!this.isClosed) this.update(); // what came in meanwhile
   }
 
   async store() {
-    const words = this.id === null ? ["add", "--stdin", "--quiet"] : ["edit", String(this.id), "--stdin"];
-    const said = await change(words, this.text());
+    const task = this.id === null ? null : (await ask("show", String(this.id))).tasks[0];
+    const words = this.id === null ? ["add", "--stdin", "--quiet"]
+      : ["edit", String(this.id), "--if-name=" + this.task.name, "--stdin"];
+    let said = "";
+    let fault = null;
+    try {
+      said = await change(words, this.text(task));
+    } catch (error) {
+      // A new one may be saved and something else wrong, which is told with its number.
+      if (this.id !== null || !/^\d+$/.test((error.output || "").trim())) throw error;
+      said = error.output;
+      fault = error.message;
+    }
     const id = this.id === null ? said.trim() : this.id;
     this.isSaved = true;
-    await this.model.refresh();
-    tell(format(_("$0 was saved."), short(this.name.input.value)));
-    go(taskPath(id));
+    if (fault !== null) tellFault(fault, { isOfNextView: true });
+    else tell(format(_("$0 was saved."), short(titleOf({ id, name: this.name.input.value }))));
+    if (!this.isClosed) goInstead(taskPath(id));
   }
 
   focusFault() {
@@ -249,25 +322,56 @@ export class FormView {
     else field.input.focus();
   }
 
-  tellChanged() {
-    fill(this.changed, el("div", { class: "note warn", role: "alert" },
-      el("p", {}, _("This task has been changed elsewhere. Saving puts what stands here in its place.")),
-      button(_("Show it as it is now"), { class: "secondary" }, () => {
-        this.form = null;
-        this.update();
-      })));
+  // What became of the task meanwhile.
+  tellOf(task) {
+    const now = JSON.stringify([task && task.name, task && this.settingsOf(task)]);
+    if (now === this.toldOf) return;
+    this.toldOf = now;
+    if (task === null) {
+      this.tellChanged(_("This task has been removed. What stands here can still be saved as a new one."), this.saveAsNew());
+    } else if (task.name !== this.task.name) {
+      this.tellChanged(format(_("Task $0 is $1 by now. What stands here can be saved as a new one."), this.id, short(titleOf(task))),
+        this.saveAsNew(), this.showNow());
+    } else if (JSON.stringify(this.settingsOf(task)) !== this.before) {
+      this.tellChanged(_("This task has been changed elsewhere. Saving changes only what you have changed here."), this.showNow());
+    } else {
+      fill(this.changed);
+    }
   }
 
-  async cancel() {
-    const isChanged = JSON.stringify(this.value()) !== this.start;
-    if (isChanged && !await confirm({ title: _("Leave without saving?"), text: _("What you have changed here is lost."),
-      action: _("Leave"), isDangerous: true })) return;
+  tellChanged(text, ...actions) {
+    fill(this.changed, el("div", { class: "note warn", role: "alert" }, el("p", {}, text), ...actions));
+  }
+
+  showNow() {
+    return button(_("Show it as it is now"), { class: "secondary" }, () => {
+      this.form = null;
+      this.update();
+    });
+  }
+
+  saveAsNew() {
+    return button(_("Make it a new task"), { class: "secondary" }, () => {
+      this.id = null;
+      this.task = null;
+      this.name.input.disabled = false;
+      this.owner.input.disabled = false;
+      setText(this.heading, _("Add a task"));
+      setText(this.save, _("Add the task"));
+      fill(this.changed);
+      this.preview();
+      if (isFocusLost()) this.save.focus();
+    });
+  }
+
+  cancel() {
     go(this.id === null ? [] : taskPath(this.id));
   }
 
   take() {}
 
   close() {
+    this.isClosed = true;
     window.clearTimeout(this.timer);
     this.asked = Infinity;
   }

@@ -1,71 +1,79 @@
 // What is wrong, worst first, each with what helps; or one line.
-import { button, el, fill } from "./dom.js";
+import { button, el, fill, focusIn, isFocusLost, place, setAttribute, setText } from "./dom.js";
 import { attempt } from "./dialogs.js";
 import { change } from "./tool.js";
-import { outcomeText } from "./words.js";
-import { distanceText } from "./moments.js";
+import { outcomeText, titleOf } from "./words.js";
+import { distanceText, momentText } from "./moments.js";
 import { _, format, ngettext, short, visible } from "./text.js";
 import { go, taskPath } from "./address.js";
-import { runNow } from "./actions.js";
+import { acknowledge, runNow } from "./actions.js";
 
 const cockpit = window.cockpit;
 
+const OF_PAST_RUN = ["failed-run", "gave-up", "missed-run"];
+
+// Why it did not run is told by the end of the sentence alone.
+function missedForm(text) {
+  if (text.endsWith(", as the machine was off")) return _("$0 was due $1, $2, and did not run, as the machine was off.");
+  if (text.endsWith(", though the machine was on")) return _("$0 was due $1, $2, and did not run, though the machine was on.");
+  return _("$0 was due $1, $2, and did not run.");
+}
+
 // The page's own words where it has them; else those of the program.
-function textOf(finding, task) {
-  const last = task && task.last_run;
-  switch (finding.kind) {
+function textOf({ kind, severity, text, run, due }, task) {
+  const name = task && short(titleOf(task));
+  switch (kind) {
     case "cron":
       return _("Cron is not running: no task will start by itself.");
     case "failed-run":
     case "gave-up":
-      if (!last) break;
-      return format(_("$0 $1, $2."), short(task.name), outcomeText(last),
-        distanceText(last.end || last.start || last.queued));
+      if (!task || !run) break;
+      return format(_("$0 $1, $2."), name, outcomeText(run), distanceText(run.end || run.start || run.queued));
     case "missed-run":
-      if (!task) break;
-      return format(_("$0 was due and did not run."), short(task.name));
+      if (!task || !due) break;
+      return format(missedForm(text), name, momentText(due), distanceText(due));
     case "long-run":
-      if (!last) break;
-      return format(_("$0 has been running for unusually long: it began $1."), short(task.name),
-        distanceText(last.start));
+      if (!task || !run) break;
+      return format(_("$0 has been running for unusually long: it began $1."), name, distanceText(run.start));
     case "runs":
     case "turns":
-      if (finding.severity === "unknown") {
-        return finding.kind === "runs"
-          ? _("Which runs failed or were missed: unknown without administrative access.")
-          : _("Whether something keeps changes waiting: unknown without administrative access.");
-      }
-      break;
+      if (severity !== "unknown") break;
+      return kind === "runs"
+        ? _("Which runs failed or were missed: unknown without administrative access.")
+        : _("Whether something keeps changes waiting: unknown without administrative access.");
   }
-  return visible(finding.text);
+  return visible(text);
 }
 
-function acknowledge(task) {
-  return attempt(() => change(["status", "--acknowledge", String(task.id)]));
+// What helps by a command, {command: label}: there is a button for it, once however many findings it mends.
+const COMMANDS = { sync: () => _("Write the crontab again"), restore: () => _("Put it back") };
+
+function commandOf({ remedy }) {
+  const found = /^'zelosched (sync|restore)'/.exec(remedy || "");
+  return found ? found[1] : null;
 }
 
+// What helps, as {key, label, act}.
 function actionsOf(finding, task, mayChange) {
+  const { kind, run } = finding;
   const actions = [];
-  const add = (label, act) => actions.push(button(label, { class: "secondary small" }, act));
-  if (finding.kind === "cron") {
-    add(_("Start cron in Services"), () => cockpit.jump("/system/services#/cron.service"));
-  } else if (task && (finding.kind === "failed-run" || finding.kind === "gave-up")) {
-    const run = task.last_run ? task.last_run.run : null;
-    add(_("Show the run"), () => go(taskPath(task.id), run ? { run: String(run) } : {}));
+  const add = (key, label, act) => actions.push({ key, label, act });
+  if (kind === "cron") {
+    add("services", _("Start cron in Services"), () => cockpit.jump("/system/services#/cron.service"));
+  } else if (task && run) {
+    add("show", _("Show the run"), () => go(taskPath(task.id), run.run ? { run: String(run.run) } : {}));
   } else if (task) {
-    add(_("Show the task"), () => go(taskPath(task.id)));
-  } else if (finding.kind === "power") {
-    add(_("Show power times"), () => go(["power"]));
-  } else if (finding.kind === "crontab" && mayChange) {
-    add(_("Write the crontab again"), () => attempt(() => change(["sync"])));
-  } else if ((finding.kind === "program" || finding.kind === "names") && mayChange) {
-    add(_("Put it back"), () => attempt(() => change(["restore"])));
+    add("show", _("Show the task"), () => go(taskPath(task.id)));
+  } else if (kind === "power") {
+    add("show", _("Show power times"), () => go(["power"]));
   }
-  const isOfRun = task && ["failed-run", "gave-up", "missed-run"].includes(finding.kind);
-  if (isOfRun && mayChange) {
-    if (task.ui.can_run && !task.running) add(_("Run now"), () => runNow(task));
-    add(_("Take note"), () => acknowledge(task));
+  if (!mayChange) return actions;
+  if (task && OF_PAST_RUN.includes(kind)) {
+    if (task.ui.can_run && !task.running) add("run", _("Run now"), () => runNow(task));
+    add("note", _("Take note"), () => acknowledge(task));
   }
+  const command = commandOf(finding);
+  if (command) add(command, COMMANDS[command](), () => attempt(() => change([command])));
   return actions;
 }
 
@@ -75,44 +83,127 @@ const SEVERITIES = {
   unknown: () => _("Unknown"),
 };
 
+// One finding. Its buttons stay the same ones as long as they are offered, and with them the focus.
+class Row {
+  constructor() {
+    this.severity = el("span");
+    this.text = el("bdi");
+    this.remedy = el("span", { class: "beside" });
+    this.buttons = new Map();
+    this.actions = el("span", { class: "row-actions" });
+    this.element = el("li", {}, this.severity, el("span", { class: "what" }, this.text, " ", this.remedy), this.actions);
+  }
+
+  show({ finding, task, text, actions }) {
+    setAttribute(this.element, "class", finding.severity);
+    setAttribute(this.severity, "class", "severity " + finding.severity);
+    setText(this.severity, SEVERITIES[finding.severity]());
+    setText(this.text, text);
+    setText(this.remedy, finding.remedy && !OF_PAST_RUN.includes(finding.kind) && !commandOf(finding) ? visible(finding.remedy) : "");
+    const kept = new Map();
+    for (const action of actions) {
+      const one = this.buttons.get(action.key) || this.makeButton(action.key);
+      one.act = action.act;
+      setText(one.element, action.label);
+      setAttribute(one.element, "aria-label", task ? format("$0: $1", action.label, short(titleOf(task))) : null);
+      kept.set(action.key, one);
+    }
+    this.buttons = kept;
+    place(this.actions, [...kept.values()].map((one) => one.element));
+  }
+
+  makeButton() {
+    const one = { act: null };
+    one.element = button("", { class: "secondary small" }, () => one.act());
+    return one;
+  }
+}
+
+const MOST = 10; // shown at first, so that much that is wrong does not push the tasks away
+
+// The one that it is about, and no other that has its number by now.
+function taskOf(finding, model) {
+  const task = finding.task === null ? null : model.taskOf(finding.task);
+  return task && task.name === finding.task_name ? task : null;
+}
+
 export class Health {
   constructor() {
-    this.element = el("section", { class: "health", "aria-label": _("Health") });
-    this.shown = null;
+    this.heading = el("h2");
+    this.list = el("ul", { class: "findings" });
+    this.well = el("p", { class: "well", role: "status" });
+    this.most = MOST;
+    this.more = button("", { class: "secondary small" }, () => this.showAll());
+    this.element = el("section", { class: "health", "aria-label": _("Health"), tabindex: "-1" }, this.heading, this.well, this.list,
+      this.more);
+    this.rows = new Map();
   }
 
   show(model) {
-    if (!model.status) return;
-    const found = model.status.findings.filter((finding) => finding.severity !== "ok");
-    // What has not changed stays, with the focus that may be in it.
-    const rows = found.map((finding) => {
-      const task = finding.task === null ? null : model.taskOf(finding.task);
-      return { finding, task, text: textOf(finding, task) };
-    });
-    const key = JSON.stringify([rows.map((row) => [row.text, row.finding.kind, row.finding.severity,
-      row.task && [row.task.id, row.task.running, row.task.last_run && row.task.last_run.run]]), model.mayChange,
-    model.tasks.length === 0]);
-    if (key === this.shown) return;
-    this.shown = key;
-    if (rows.length === 0) {
-      fill(this.element, el("p", { class: "well", role: "status" },
-        el("span", { class: "mark good", "aria-hidden": "true" }, "✓"), _("All is well.")));
-      return;
+    this.model = model;
+    const { status, mayChange } = model;
+    const found = status === null ? [{ severity: "unknown", kind: "machine", text: _("The machine could not be asked how it is."),
+      task: null, run: null, due: null, remedy: null }] : status.findings.filter((finding) => finding.severity !== "ok");
+    const hadFocus = this.list.contains(document.activeElement);
+    const focused = [...this.list.children].findIndex((row) => row.contains(document.activeElement));
+    const rows = this.shownOf(found, model, mayChange);
+    const kept = new Map();
+    for (const shown of rows.slice(0, this.most)) {
+      const row = this.rows.get(shown.key) || new Row();
+      row.show(shown);
+      kept.set(shown.key, row);
     }
-    fill(this.element, el("h2", {}, this.heading(found)),
-      el("ul", { class: "findings" }, ...rows.map((row) => this.row(row, model.mayChange))));
+    this.rows = kept;
+    place(this.list, [...kept.values()].map((row) => row.element));
+    setText(this.heading, rows.length === 0 ? "" : this.headingOf(found, status !== null));
+    this.heading.hidden = rows.length === 0;
+    this.list.hidden = rows.length === 0;
+    const left = rows.length - kept.size;
+    this.more.hidden = left === 0;
+    setText(this.more, format(ngettext("Show $0 more", "Show $0 more", left), left));
+    this.showWell(rows.length === 0);
+    if (hadFocus && isFocusLost()) this.giveFocus(focused);
   }
 
-  heading(found) {
+  showAll() {
+    const before = this.list.children.length;
+    this.most = Infinity;
+    this.show(this.model);
+    focusIn(this.list.children[before]);
+  }
+
+  // Each with a key by which it is known again, and no button twice.
+  shownOf(found, model, mayChange) {
+    const offered = new Set();
+    const times = new Map();
+    return found.map((finding) => {
+      const task = taskOf(finding, model);
+      const name = [finding.kind, finding.task, finding.run && finding.run.run].join(" ");
+      times.set(name, (times.get(name) || 0) + 1);
+      // The crontab is written from the tasks, which must be there first.
+      const actions = actionsOf(finding, task, mayChange)
+        .filter(({ key }) => !(key in COMMANDS && offered.has(key)) && !(key === "sync" && model.isDamaged));
+      for (const { key } of actions) offered.add(key);
+      return { key: name + " " + times.get(name), finding, task, text: textOf(finding, task), actions };
+    });
+  }
+
+  // To the row that is in the place of the one that had it.
+  giveFocus(i) {
+    const row = this.list.children[Math.min(i, this.list.children.length - 1)];
+    if (!row || !focusIn(row)) this.element.focus();
+  }
+
+  showWell(isWell) {
+    if (this.well.hidden === !isWell && this.well.firstChild) return;
+    this.well.hidden = !isWell;
+    fill(this.well, el("span", { class: "mark good", "aria-hidden": "true" }, "✓"), _("All is well."));
+  }
+
+  headingOf(found, isKnown) {
+    if (!isKnown) return _("Whether all is well: unknown");
     const count = found.filter((finding) => finding.severity !== "unknown").length;
     if (count === 0) return _("Nothing is known to be wrong");
     return format(ngettext("$0 thing needs attention", "$0 things need attention", count), count);
-  }
-
-  row({ finding, task, text }, mayChange) {
-    return el("li", { class: finding.severity },
-      el("span", { class: "severity " + finding.severity }, SEVERITIES[finding.severity]()),
-      el("span", { class: "what" }, el("bdi", {}, text)),
-      el("span", { class: "row-actions" }, ...actionsOf(finding, task, mayChange)));
   }
 }

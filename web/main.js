@@ -1,9 +1,9 @@
 // The page: which view is shown, and when it is shown anew.
-import { el, fill, setAttribute, setText } from "./dom.js";
-import { here, href } from "./address.js";
+import { el, fill, isFocusLost, setAttribute, setText } from "./dom.js";
+import { go, here, href } from "./address.js";
 import { watchAccess } from "./access.js";
 import { CalendarView } from "./calendar.js";
-import { notesPlace } from "./dialogs.js";
+import { clearFaultsOfView, confirm, notesPlace } from "./dialogs.js";
 import { FormView } from "./form.js";
 import { Model } from "./model.js";
 import { zoneNote } from "./moments.js";
@@ -13,6 +13,7 @@ import { TasksView } from "./tasks.js";
 import { followTheme } from "./theme.js";
 import { whenChanged } from "./tool.js";
 import { Watch } from "./watch.js";
+import { oneAtATime } from "./turns.js";
 import { _, format, language } from "./text.js";
 
 const cockpit = window.cockpit;
@@ -39,32 +40,57 @@ class Page {
     this.zone = el("p", { class: "zone" });
     this.fault = el("div");
     this.view = null;
-    this.root = el("main", { tabindex: "-1" });
+    this.root = el("main", { tabindex: "-1", hidden: true });
+    this.waiting = el("p", { class: "beside", role: "status" }, _("Asking the machine …"));
     fill(document.getElementById("page"),
       el("header", {}, el("h1", {}, _("Scheduled tasks")), el("nav", { "aria-label": _("Views") }, ...this.tabs.map((tab) => tab.link))),
-      this.zone, notesPlace(), this.fault, this.root);
+      this.zone, notesPlace(), this.fault, this.waiting, this.root);
     cockpit.addEventListener("locationchanged", () => this.route());
     this.model.addEventListener("changed", () => this.update());
+    this.mayLeave = oneAtATime(() => this.askToLeave());
+    window.addEventListener("beforeunload", (event) => {
+      if (!this.hasUnsaved()) return;
+      event.preventDefault();
+      event.returnValue = ""; // for browsers that ask by this only
+    });
+  }
+
+  hasUnsaved() {
+    return Boolean(this.view && this.view.isChanged && this.view.isChanged());
+  }
+
+  // The address is another one already; who stays is led back.
+  async askToLeave() {
+    const stayed = this.path;
+    const isAgreed = await confirm({ title: _("Leave without saving?"), text: _("What you have changed here is lost."),
+      action: _("Leave"), isDangerous: true });
+    if (isAgreed) this.show();
+    else go(stayed);
   }
 
   // Another view, or the same with other options.
   route() {
     const { path, options } = here();
-    const key = JSON.stringify(path);
+    if (JSON.stringify(path) === JSON.stringify(this.path)) this.view.take(options);
+    else if (this.hasUnsaved()) this.mayLeave();
+    else this.show();
+  }
+
+  show() {
+    const { path, options } = here();
     for (const { link, isOf } of this.tabs) setAttribute(link, "aria-current", isOf(path) ? "page" : null);
-    if (key === this.shown) {
-      this.view.take(options);
-      return;
-    }
     const isFirst = this.view === null;
-    if (!isFirst) this.view.close();
-    this.shown = key;
+    if (!isFirst) {
+      this.view.close();
+      clearFaultsOfView();
+    }
+    this.path = path;
     const View = viewOf(path);
     fill(this.root);
     this.view = new View(this.root, this.model, { path, options });
     this.showTitle();
     // What was there before has gone, and with it the focus.
-    if (!isFirst && !this.root.contains(document.activeElement)) this.root.focus();
+    if (!isFirst && !this.root.contains(document.activeElement)) this.root.focus({ preventScroll: true });
   }
 
   showTitle() {
@@ -73,13 +99,18 @@ class Page {
 
   update() {
     const { model } = this;
-    setText(this.zone, zoneNote() || "");
+    const hadFocus = !isFocusLost();
+    this.waiting.hidden = model.isAnswered;
+    this.root.hidden = !model.isAnswered;
     fill(this.fault, model.fault === null ? null
       : el("div", { class: "note bad", role: "alert" }, el("p", {}, model.fault)));
     if (this.view) {
       this.view.update();
       this.showTitle();
     }
+    setText(this.zone, zoneNote() || "");
+    // What had the focus may have gone by what came in.
+    if (hadFocus && isFocusLost() && !document.querySelector("dialog")) this.root.focus({ preventScroll: true });
     this.waitForNext();
   }
 
@@ -91,7 +122,11 @@ class Page {
   }
 
   refresh() {
-    if (!cockpit.hidden) this.model.refresh();
+    return cockpit.hidden ? null : this.model.refresh();
+  }
+
+  async look() {
+    if (await this.model.isOther()) this.refresh();
   }
 
   start() {
@@ -101,7 +136,7 @@ class Page {
       this.update();
     });
     whenChanged(() => this.refresh());
-    this.watch = new Watch(() => this.refresh(), () => this.update());
+    this.watch = new Watch(() => this.refresh(), () => this.look());
   }
 }
 
@@ -109,6 +144,7 @@ function start() {
   document.documentElement.lang = language();
   document.documentElement.dir = cockpit.language_direction || "ltr";
   followTheme();
+  here(); // which mends an address that cannot be read
   new Page().start();
 }
 

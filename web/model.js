@@ -3,15 +3,24 @@ import { ask } from "./tool.js";
 import { moment, now, setMachineTime } from "./moments.js";
 import { inTurn } from "./turns.js";
 
+// What stays the same when only time has passed.
+function lasting(status) {
+  return JSON.stringify({ ...status, now: null });
+}
+
 export class Model extends EventTarget {
   constructor() {
     super();
-    this.isLoaded = false;
+    this.isAnswered = false; // the machine was asked once at least, whatever it said
+    this.isLoaded = false; // there are tasks to show, which may be old
+    this.isListed = false; // they are those of now
     this.tasks = [];
+    this.isPowerLoaded = false;
     this.powerTimes = [];
     this.clock = null;
-    this.status = null;
-    this.fault = null; // a sentence when the machine could not be asked
+    this.status = null; // not known
+    this.mail = null;
+    this.fault = null; // sentences when the machine could not be asked
     this.mayChange = null; // not known yet
     // Asks the machine.
     this.refresh = inTurn(async () => {
@@ -24,20 +33,38 @@ export class Model extends EventTarget {
     return this.tasks.find((task) => task.id === id) || null;
   }
 
+  // The store is not as it should be: what is shown may be nothing, and nothing can be added.
+  get isDamaged() {
+    return !this.isListed || (this.status !== null &&
+      this.status.findings.some((finding) => finding.kind === "copies" && finding.severity === "critical"));
+  }
+
+  // What one of the questions has no answer to, the others may have.
   async load() {
-    try {
-      const [list, power, status] = await Promise.all([
-        ask("list", "--all"), ask("power", "list"), ask("status")]);
-      setMachineTime(status.now);
-      this.tasks = list.tasks;
-      this.powerTimes = power.power_times;
-      this.clock = power.clock;
-      this.status = status;
-      this.fault = null;
+    const [list, power, status, mail] = await Promise.allSettled([
+      ask("list", "--all"), ask("power", "list"), ask("status"), ask("mail")]);
+    if (status.value) setMachineTime(status.value.now);
+    this.status = status.value || null;
+    this.isListed = Boolean(list.value);
+    if (list.value) {
+      this.tasks = list.value.tasks;
       this.isLoaded = true;
-    } catch (error) {
-      this.fault = error.message;
     }
+    if (power.value) {
+      this.powerTimes = power.value.power_times;
+      this.clock = power.value.clock;
+      this.isPowerLoaded = true;
+    }
+    this.mail = mail.value ? mail.value.mail : null;
+    const faults = [list, power, status].filter((one) => one.reason).map((one) => one.reason.message);
+    this.fault = faults.length > 0 ? [...new Set(faults)].join("\n") : null;
+    this.isAnswered = true;
+  }
+
+  // Whether the machine is another than is known, in what no file tells.
+  async isOther() {
+    const status = await ask("status").catch(() => null);
+    return lasting(status) !== lasting(this.status);
   }
 
   // Seconds until the next time at which something is due.

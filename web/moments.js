@@ -1,6 +1,6 @@
 // Times as the machine has them. A text such as "2026-12-24T18:30:00+01:00" is shown as it stands
 // there, whatever the browser's own zone is.
-import { _, format, language } from "./text.js";
+import { _, format, language, ngettext } from "./text.js";
 
 const MINUTE = 60;
 const HOUR = 60 * MINUTE;
@@ -9,11 +9,17 @@ const FORM = /^(\d{4})-(\d\d)-(\d\d)T(\d\d):(\d\d):(\d\d)(Z|[+-]\d\d:\d\d)$/;
 
 let skew = 0; // seconds that the machine's clock is ahead of the browser's
 let offset = null; // minutes that the machine's zone is ahead of UTC
+let isZoneOther = false; // the browser had another offset at some time that was told
 
 function offsetOf(text) {
   if (text === "Z") return 0;
   const minutes = Number(text.slice(1, 3)) * 60 + Number(text.slice(4, 6));
   return text[0] === "-" ? -minutes : minutes;
+}
+
+// Minutes that the browser's zone is ahead of UTC.
+function ownOffset(epoch) {
+  return -new Date(epoch * 1000).getTimezoneOffset();
 }
 
 // {epoch, wall}: seconds since 1970, and a Date whose UTC fields are those of the machine's clock.
@@ -25,7 +31,9 @@ export function moment(text) {
   wall.setUTCFullYear(year, month - 1, day);
   wall.setUTCHours(hour, minute, second);
   const ahead = offsetOf(found[7]);
-  return { epoch: wall.getTime() / 1000 - ahead * MINUTE, wall, offset: ahead };
+  const epoch = wall.getTime() / 1000 - ahead * MINUTE;
+  if (ahead !== ownOffset(epoch)) isZoneOther = true;
+  return { epoch, wall, offset: ahead };
 }
 
 export function setMachineTime(text) {
@@ -50,10 +58,12 @@ function zoneText(minutes) {
   return `UTC${minutes < 0 ? "-" : "+"}${hours}:${String(size % 60).padStart(2, "0")}`;
 }
 
-// A sentence when the browser has other times than the machine, else null.
+// A sentence when the browser has other times than the machine, now or at one that was told, as in
+// summer; else null.
 export function zoneNote() {
-  const own = -new Date().getTimezoneOffset();
-  if (offset === null || own === offset) return null;
+  if (offset === null || !isZoneOther) return null;
+  const own = ownOffset(now());
+  if (own === offset) return _("All times are the machine's. This browser is in another time zone, whose times differ at other seasons.");
   return format(_("All times are the machine's ($0). This browser is in another time zone ($1)."),
     zoneText(offset), zoneText(own));
 }
@@ -72,7 +82,7 @@ export function timeText(wall) {
 }
 
 // "Mon, 23 Nov", with the year of one that is not this year's.
-export function dayText(wall) {
+function dayText(wall) {
   const isThisYear = wall.getUTCFullYear() === wallNow().getUTCFullYear();
   const year = isThisYear ? {} : { year: "numeric" };
   return formatter(isThisYear ? "day" : "dayAndYear",
@@ -111,7 +121,8 @@ export function distanceText(text) {
   if (size < MINUTE) return isAhead ? _("in less than a minute") : _("just now");
   if (size < HOUR) return format(isAhead ? _("in $0 min") : _("$0 min ago"), Math.floor(size / MINUTE));
   if (size < 2 * DAY) return format(isAhead ? _("in $0 h") : _("$0 h ago"), Math.floor(size / HOUR));
-  return format(isAhead ? _("in $0 days") : _("$0 days ago"), Math.floor(size / DAY));
+  const days = Math.floor(size / DAY);
+  return format(isAhead ? ngettext("in $0 day", "in $0 days", days) : ngettext("$0 day ago", "$0 days ago", days), days);
 }
 
 export function durationText(seconds) {

@@ -1,17 +1,29 @@
 // What a run printed, or prints.
 import { el, fill, setText } from "./dom.js";
 import { ask, follow } from "./tool.js";
-import { _, format, visible } from "./text.js";
+import { _, format, ngettext, visible } from "./text.js";
 
-const MOST = 200000; // characters kept of one that goes on: the browser shows no more at once
+const cockpit = window.cockpit;
 
-// Bytes that are no text are shown as U+FFFD.
-function decoded(text, encoding) {
-  if (text === null) return "";
-  if (encoding !== "base64") return text;
-  const bytes = Uint8Array.from(window.atob(text), (c) => c.charCodeAt(0));
-  return new TextDecoder().decode(bytes);
+const MOST = 64000; // characters shown of what goes on, and of beginning and end of what has ended
+const PAUSE = 200; // ms between two drawings: a run may print faster than anybody reads
+const PIECES = 100; // more are put together
+
+// What the beginning or the end of it may stand for at most, so that not all is decoded. Base64 has four
+// characters for three bytes, and a character has four bytes at most.
+const MOST_BASE64 = Math.ceil((MOST * 4) / 3) * 4;
+
+// Bytes that are no text are shown as U+FFFD. `cut` gives the part that is shown.
+function decoded(text, encoding, cut) {
+  const most = encoding === "base64" ? MOST_BASE64 : MOST;
+  const part = cut(text || "", most);
+  const whole = visible(encoding !== "base64" ? part
+    : new TextDecoder().decode(Uint8Array.from(window.atob(part), (c) => c.charCodeAt(0))));
+  return { shown: cut(whole, MOST), isCut: part !== (text || "") || whole.length > MOST };
 }
+
+const beginningOf = (text, most) => text.slice(0, most);
+const endOf = (text, most) => (text.length > most ? text.slice(-most) : text);
 
 export class Output {
   constructor(run) {
@@ -20,10 +32,17 @@ export class Output {
     this.note = el("p", { class: "beside", role: "status" });
     this.element = el("div", { class: "output-of-run" }, this.text, this.note);
     this.stop = null;
+    // What nobody sees is not followed; whoever looks again gets it from the beginning on.
+    this.look = () => {
+      if (cockpit.hidden) this.stopFollowing();
+      else if (this.run.state === "running") this.load();
+    };
+    cockpit.addEventListener("visibilitychange", this.look);
     this.load();
   }
 
   load() {
+    this.stopFollowing();
     this.text.hidden = this.run.state === "waiting";
     if (this.run.state === "running") {
       this.follow();
@@ -34,35 +53,80 @@ export class Output {
     }
   }
 
+  words() {
+    return ["log", String(this.run.task), "--run", String(this.run.run)];
+  }
+
   async show() {
     try {
-      const { output } = await ask("log", String(this.run.task), "--run", String(this.run.run));
-      const head = decoded(output.head, output.encoding);
-      const tail = decoded(output.tail, output.encoding);
-      const gap = output.left_out_bytes > 0
-        ? el("em", { class: "gap" }, format(_("[$0 bytes are left out here]"), output.left_out_bytes)) : null;
-      fill(this.text, visible(head), gap ? "\n" : null, gap, gap ? "\n" : null, visible(tail));
-      setText(this.note, head + tail === "" ? _("It printed nothing.") : "");
-      this.text.hidden = head + tail === "";
+      const { output } = await ask(...this.words());
+      const head = decoded(output.head, output.encoding, beginningOf);
+      const tail = decoded(output.tail, output.encoding, endOf);
+      const isCut = head.isCut || tail.isCut;
+      const isNothing = head.shown + tail.shown === "";
+      fill(this.text, head.shown, ...this.gap(output.left_out_bytes, isCut), tail.shown);
+      setText(this.note, isNothing ? _("It printed nothing.") : isCut ? this.whereAllIs() : "");
+      this.text.hidden = isNothing;
     } catch (error) {
       this.text.hidden = true;
       setText(this.note, error.message);
     }
   }
 
-  // As it comes, from the beginning on.
+  gap(bytes, isCut) {
+    if (bytes === 0 && !isCut) return [];
+    const text = isCut ? _("[more is left out here]")
+      : format(ngettext("[$0 byte is left out here]", "[$0 bytes are left out here]", bytes), bytes);
+    return ["\n", el("em", { class: "gap" }, text), "\n"];
+  }
+
+  whereAllIs() {
+    return format(_("All that is kept of it shows: $0"), "zelosched " + this.words().join(" "));
+  }
+
+  // As it comes, from the beginning on; of much only the end.
   follow() {
-    let text = "";
+    let coming = "";
+    let timer = null;
+    fill(this.text);
     setText(this.note, _("The run goes on."));
-    this.stop = follow(["log", String(this.run.task), "--run", String(this.run.run), "--follow"], (more) => {
-      text = (text + more).slice(-MOST);
-      const isAtEnd = this.text.scrollTop + this.text.clientHeight >= this.text.scrollHeight - 4;
-      setText(this.text, visible(text));
-      if (isAtEnd) this.text.scrollTop = this.text.scrollHeight;
+    const draw = () => {
+      timer = null;
+      this.append(visible(coming));
+      coming = "";
+    };
+    const stop = follow([...this.words(), "--follow"], (more) => {
+      coming = endOf(coming + more, MOST);
+      if (timer === null) timer = window.setTimeout(draw, this.text.firstChild ? PAUSE : 0);
     }, (fault) => {
+      if (this.stop !== end) return;
       this.stop = null;
-      setText(this.note, fault || "");
+      window.clearTimeout(timer);
+      draw();
+      this.text.hidden = !this.text.firstChild;
+      setText(this.note, fault || (this.isCut ? this.whereAllIs() : this.text.firstChild ? "" : _("It printed nothing.")));
     });
+    const end = () => {
+      window.clearTimeout(timer);
+      stop();
+    };
+    this.isCut = false;
+    this.stop = end;
+  }
+
+  // What is there stays, but for the oldest of it where it is too much.
+  append(more) {
+    if (more === "") return;
+    const { text } = this;
+    const isAtEnd = text.scrollTop + text.clientHeight >= text.scrollHeight - 4;
+    text.append(endOf(more, MOST));
+    let size = 0;
+    for (const piece of text.childNodes) size += piece.data.length;
+    for (; size - text.firstChild.data.length >= MOST; text.firstChild.remove()) size -= text.firstChild.data.length;
+    if (size > MOST) text.firstChild.deleteData(0, size - MOST);
+    this.isCut = this.isCut || size > MOST || more.length > MOST;
+    if (text.childNodes.length > PIECES) text.normalize();
+    if (isAtEnd) text.scrollTop = text.scrollHeight;
   }
 
   // The run as it is now.
@@ -72,12 +136,16 @@ export class Output {
     this.run = run;
     if (!isNews) return;
     if (wasRunning && run.state === "ended" && this.stop) return; // what follows shows the end too
-    this.close();
     this.load();
   }
 
-  close() {
+  stopFollowing() {
     if (this.stop) this.stop();
     this.stop = null;
+  }
+
+  close() {
+    this.stopFollowing();
+    cockpit.removeEventListener("visibilitychange", this.look);
   }
 }

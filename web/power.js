@@ -1,9 +1,10 @@
 // The times at which the machine goes on and off.
 import { button, el, fill, setAttribute, setText } from "./dom.js";
 import { showAccess } from "./access.js";
-import { attempt, confirm, openDialog } from "./dialogs.js";
-import { Field, Group, check, select } from "./fields.js";
+import { attempt, confirm, openForm } from "./dialogs.js";
+import { DaysField, Field, select } from "./fields.js";
 import { distanceText, momentText, weekdayText } from "./moments.js";
+import { switchCell } from "./switch.js";
 import { Table } from "./table.js";
 import { change } from "./tool.js";
 import { bandOfHour, offTimes } from "./week.js";
@@ -27,49 +28,51 @@ function inWords(time) {
 
 // ---- adding and changing --------------------------------------------------------------------
 
-const WEEKDAYS = [0, 1, 2, 3, 4];
+const WORKDAYS = DAYS.slice(0, 5);
 
-// Of a new one: on which days, and at which hour.
-function askForTime(time, newDays, hour) {
-  const direction = new Field(_("The machine goes"), select([["off", _("off")], ["on", _("on")]], time ? time.power : "off"));
-  direction.input.disabled = time !== null;
-  const boxes = DAYS.map((name, i) => check(weekdayText(i, "short"), time ? time.days.includes(name) : newDays.includes(i)));
-  boxes.forEach((box, i) => box.input.setAttribute("aria-label", weekdayText(i, "long")));
-  const days = new Group(_("Days"), boxes.map((box) => box.element));
-  const at = new Field(_("Time"), el("input", { type: "time", class: "short",
-    value: time ? time.at : String(hour).padStart(2, "0") + ":00" }));
-  const fault = el("p", { class: "fault", role: "alert" });
-
-  async function save(event) {
-    event.preventDefault();
-    const chosen = DAYS.filter((name, i) => boxes[i].input.checked);
-    days.tell(chosen.length === 0 ? [_("Choose one day at least.")] : []);
-    at.tell(at.input.value === "" ? [_("Give a time.")] : []);
-    if (chosen.length === 0 || at.input.value === "") return;
-    const when = ["--weekly", chosen.join(","), at.input.value.slice(0, 5)];
-    try {
-      await change(time ? ["edit", String(time.id), ...when] : ["power", "add", direction.input.value, ...when, "--quiet"]);
-      dialog.close();
-    } catch (error) {
-      setText(fault, error.message);
-    }
-  }
-
-  async function remove() {
-    dialog.close();
-    await removeTime(time);
-  }
-
-  const dialog = openDialog(time ? _("Change the power time") : _("Add a power time"),
-    el("form", { on: { submit: save } }, direction.element, days.element, at.element, fault,
-      el("div", { class: "actions" }, el("button", { class: "primary" }, _("Save")),
-        time ? button(_("Remove"), { class: "danger" }, remove) : null,
-        button(_("Cancel"), { class: "secondary" }, () => dialog.close()))));
+// For questions about a power time. One that is changed gets another id.
+function subjectOf(model, time) {
+  return {
+    model,
+    isThere: () => model.powerTimes.some((one) => one.id === time.id),
+    gone: format(_("$0 is not there any more: nothing was done."), inWords(time)),
+  };
 }
 
-async function removeTime(time) {
+// Of a new one: on which days, and at which hour.
+function askForTime(model, time, newDays, hour) {
+  const direction = new Field(_("The machine goes"), select([["off", _("off")], ["on", _("on")]], time ? time.power : "off"));
+  direction.input.disabled = time !== null;
+  const days = new DaysField(time ? time.days : newDays);
+  const at = new Field(_("Time"), el("input", { type: "time", class: "short",
+    value: time ? time.at : String(hour).padStart(2, "0") + ":00" }));
+
+  // Nothing where something is missing, which stands beside its field.
+  async function save() {
+    const chosen = days.value();
+    days.tell(chosen.length === 0 ? [_("Choose one day at least.")] : []);
+    at.tell(at.input.value === "" ? [_("Give a time of day.")] : []);
+    if (chosen.length === 0 || at.input.value === "") return false;
+    const when = ["--weekly", chosen.join(","), at.input.value.slice(0, 5)];
+    await change(time ? ["edit", String(time.id), ...when] : ["power", "add", direction.input.value, ...when, "--quiet"]);
+    return true;
+  }
+
+  openForm({
+    title: time ? _("Change the power time") : _("Add a power time"),
+    fields: [direction.element, days.element, at.element],
+    save,
+    subject: time ? subjectOf(model, time) : null,
+    more: (dialog) => (time ? [button(_("Remove"), { class: "danger" }, () => {
+      dialog.close();
+      removeTime(model, time);
+    })] : []),
+  });
+}
+
+async function removeTime(model, time) {
   const isAgreed = await confirm({ title: _("Remove the power time?"), text: inWords(time), action: _("Remove"),
-    isDangerous: true });
+    subject: subjectOf(model, time), isDangerous: true });
   if (isAgreed) await attempt(() => change(["power", "remove", "--yes", String(time.id)]));
 }
 
@@ -77,7 +80,8 @@ async function removeTime(time) {
 
 // Seven days beside each other, hours below: the arrow keys go through them, Enter adds or changes.
 class Week {
-  constructor() {
+  constructor(model) {
+    this.model = model;
     this.focused = { day: 0, hour: 7 };
     this.cells = [...Array(HOURS).keys()].map((hour) => [...Array(7).keys()].map((day) =>
       el("td", { class: "cell", role: "gridcell", tabindex: "-1", on: {
@@ -103,10 +107,10 @@ class Week {
     return this.times.filter((time) => time.days.includes(DAYS[day]) && Number(time.at.slice(0, 2)) === hour);
   }
 
-  // Of several in an hour, each is in the table below.
+  // Of several in an hour the first one; each is in the table above.
   act(day, hour) {
     if (!this.mayChange) return;
-    askForTime(this.timesAt(day, hour)[0] || null, [day], hour);
+    askForTime(this.model, this.timesAt(day, hour)[0] || null, [DAYS[day]], hour);
   }
 
   key(event, day, hour) {
@@ -120,7 +124,7 @@ class Week {
     } else if (event.key === "Enter" || event.key === " ") {
       this.act(day, hour);
     } else if (event.key === "Delete" && times.length > 0 && this.mayChange) {
-      removeTime(times[0]);
+      removeTime(this.model, times[0]);
     } else {
       return;
     }
@@ -154,29 +158,15 @@ class Week {
 
 // ---- the view -------------------------------------------------------------------------------
 
-function switchCell(mayChange) {
-  return (cell) => {
-    let shown = null;
-    const box = el("input", { type: "checkbox", role: "switch" });
-    box.addEventListener("change", async () => {
-      const isDone = await attempt(() => change([box.checked ? "enable" : "disable", String(shown.id)]));
-      if (!isDone) box.checked = shown.enabled;
-    });
-    cell.append(box);
-    return (time) => {
-      shown = time;
-      box.checked = time.enabled;
-      box.disabled = !mayChange();
-      setAttribute(box, "aria-label", format(_("$0 is switched on"), inWords(time)));
-    };
-  };
+function setEnabled(time, isEnabled) {
+  return attempt(() => change([isEnabled ? "enable" : "disable", String(time.id)]));
 }
 
-function actionsCell(mayChange) {
+function actionsCell(model, mayChange) {
   return (cell) => {
     let shown = null;
-    const edit = button(_("Change"), { class: "secondary small" }, () => askForTime(shown, [], 0));
-    const remove = button(_("Remove"), { class: "secondary small" }, () => removeTime(shown));
+    const edit = button(_("Change"), { class: "secondary small" }, () => askForTime(model, shown, [], 0));
+    const remove = button(_("Remove"), { class: "secondary small" }, () => removeTime(model, shown));
     cell.append(edit, remove);
     return (time) => {
       shown = time;
@@ -194,7 +184,7 @@ export class PowerView {
     this.title = _("Power");
     this.access = el("div");
     this.clock = el("div", { class: "clock" });
-    this.week = new Week();
+    this.week = new Week(model);
     this.none = el("p", { class: "beside" });
     const mayChange = () => model.mayChange === true;
     this.table = new Table({ caption: _("Power times"), columns: [
@@ -209,10 +199,10 @@ export class PowerView {
       { key: "when", label: _("When"), make: (cell) => (time) => setText(cell, format(_("$0 at $1"), daysText(time.days), time.at)) },
       { key: "next", label: _("Next"), make: (cell) => (time) =>
         setText(cell, time.enabled && time.next ? `${momentText(time.next)} (${distanceText(time.next)})` : _("switched off")) },
-      { key: "enabled", label: _("On"), make: switchCell(mayChange) },
-      { key: "actions", label: _("Actions"), make: actionsCell(mayChange) },
+      { key: "enabled", label: _("On"), make: switchCell({ mayChange, set: setEnabled, nameOf: inWords }) },
+      { key: "actions", label: _("Actions"), make: actionsCell(model, mayChange) },
     ], sorted: () => {} });
-    this.add = button(_("Add a power time"), { class: "primary" }, () => askForTime(null, WEEKDAYS, 23));
+    this.add = button(_("Add a power time"), { class: "primary" }, () => askForTime(model, null, WORKDAYS, 23));
     fill(root, this.access, el("h2", {}, _("When the machine goes on and off")), this.clock,
       el("section", { "aria-label": _("Power times") }, el("div", { class: "actions" }, this.add), this.none, this.table.element),
       el("p", { class: "beside" }, _("Choose an hour of the week to add a time there, or one that is there to change it.")),
@@ -222,12 +212,14 @@ export class PowerView {
 
   update() {
     showAccess(this.access, this.model.mayChange);
-    if (!this.model.isLoaded) return;
+    if (!this.model.isPowerLoaded) return;
     const mayChange = this.model.mayChange === true;
     this.add.hidden = !mayChange;
     const times = this.model.powerTimes;
+    const hadFocus = this.table.element.contains(document.activeElement);
     this.table.show(times);
     this.table.element.hidden = times.length === 0;
+    if (hadFocus && times.length === 0) this.add.focus();
     setText(this.none, times.length === 0 ? _("There is no power time: the machine stays as it is.") : "");
     this.showClock(times);
     const key = JSON.stringify([times, mayChange]);

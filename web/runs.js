@@ -1,5 +1,5 @@
 // The runs of a task, each with its output below it.
-import { button, el, fill, setAttribute, setText } from "./dom.js";
+import { button, el, fill, focusIn, place, setAttribute, setText } from "./dom.js";
 import { Output } from "./output.js";
 import { distanceText, durationText, moment, momentText, now } from "./moments.js";
 import { gradeOf, outcomeText, triggerText } from "./words.js";
@@ -92,11 +92,7 @@ export class Runs {
     }
     for (const [key, row] of this.rows) if (!kept.has(key)) row.shut();
     this.rows = kept;
-    const elements = [...kept.values()].flatMap((row) => [row.element, row.below]);
-    elements.forEach((element, i) => {
-      if (this.body.children[i] !== element) this.body.insertBefore(element, this.body.children[i] || null);
-    });
-    while (this.body.children.length > elements.length) this.body.lastElementChild.remove();
+    place(this.body, [...kept.values()].flatMap((row) => [row.element, row.below]));
     this.openWanted();
   }
 
@@ -104,6 +100,15 @@ export class Runs {
   want(number) {
     this.wanted = number;
     this.openWanted();
+  }
+
+  count() {
+    return this.rows.size;
+  }
+
+  focusOn(i) {
+    const row = [...this.rows.values()][i];
+    if (row) focusIn(row.element);
   }
 
   openWanted() {

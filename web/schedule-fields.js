@@ -1,9 +1,8 @@
 // The fields that say when a task runs, and the schedule that they say.
 import { el } from "./dom.js";
-import { Field, Group, check, select } from "./fields.js";
-import { monthText, wallNow, weekdayText } from "./moments.js";
-import { DAYS } from "./words.js";
-import { _, format } from "./text.js";
+import { DaysField, Field, select } from "./fields.js";
+import { monthText, wallNow } from "./moments.js";
+import { _, format, ngettext } from "./text.js";
 
 function isoDay(wall) {
   return wall.toISOString().slice(0, 10);
@@ -15,6 +14,8 @@ function tomorrow() {
 
 const TYPES = () => [["daily", _("Every day")], ["weekly", _("On days of the week")], ["monthly", _("Every month")],
   ["yearly", _("Every year")], ["once", _("Once")]];
+
+const WORKDAYS = ["mon", "tue", "wed", "thu", "fri"];
 
 // Which fields a type has, beside the time of day.
 const OF_TYPE = {
@@ -32,10 +33,7 @@ export class ScheduleFields {
     this.type = new Field(_("When"), select(TYPES(), given.type), { places: ["schedule.type", "schedule"] });
     this.at = new Field(_("Time"), el("input", { type: "time", value: given.at, required: true, class: "short" }),
       { places: ["schedule.at"] });
-    this.boxes = DAYS.map((day, i) => check(weekdayText(i, "short"),
-      given.days ? given.days.includes(day) : i < 5));
-    this.boxes.forEach((box, i) => box.input.setAttribute("aria-label", weekdayText(i, "long")));
-    this.days = new Group(_("Days"), this.boxes.map((box) => box.element), { places: ["schedule.days"] });
+    this.days = new DaysField(given.days || WORKDAYS, { places: ["schedule.days"] });
     this.day = new Field(_("Day of the month"), number(given.day, 31), { places: ["schedule.day"],
       hint: _("Months without that day are passed over.") });
     this.month = new Field(_("Month"), select([...Array(12).keys()].map((i) => [String(i + 1), monthText(i + 1)]),
@@ -43,7 +41,7 @@ export class ScheduleFields {
     this.date = new Field(_("Date"), el("input", { type: "date", value: given.date || tomorrow(), class: "short" }),
       { places: ["schedule.date"] });
     this.every = new Field(_("Repeat on that day"), select([["", _("No, one run")], ...[...Array(23).keys()]
-      .map((i) => [String(i + 1), i === 0 ? _("Every hour") : format(_("Every $0 hours"), i + 1)])],
+      .map((i) => [String(i + 1), format(ngettext("Every hour", "Every $0 hours", i + 1), i + 1)])],
     given.every_hours ? String(given.every_hours) : ""), { places: ["schedule.every_hours"] });
     this.until = new Field(_("Until the hour"), select(hours(0, _("End of the day")),
       given.until_hour === null || given.until_hour === undefined || given.until_hour === 23 ? "" : String(given.until_hour)),
@@ -62,6 +60,21 @@ export class ScheduleFields {
     this.until.element.hidden = this.every.input.value === "";
   }
 
+  // What is wrong by what is seen here, in words of the page, by its field.
+  faults() {
+    const schedule = this.value();
+    const found = new Map();
+    if (schedule.at === "") found.set(this.at, _("Give a time of day."));
+    if (OF_TYPE[schedule.type].includes("day") && !(schedule.day >= 1 && schedule.day <= 31)) {
+      found.set(this.day, _("Give a day from 1 to 31."));
+    }
+    if (schedule.days && schedule.days.length === 0) found.set(this.days, _("Choose one day at least."));
+    if (schedule.until_hour !== null && schedule.until_hour < Number(schedule.at.slice(0, 2))) {
+      found.set(this.until, _("This hour is before the time above."));
+    }
+    return found;
+  }
+
   // As the tool reads it. What is empty or no number goes to it as it is, so that it says what is wrong.
   value() {
     const type = this.type.input.value;
@@ -69,7 +82,7 @@ export class ScheduleFields {
     const schedule = { type, at: this.at.input.value.slice(0, 5) };
     const members = {
       date: () => { schedule.date = this.date.input.value; },
-      days: () => { schedule.days = DAYS.filter((day, i) => this.boxes[i].input.checked); },
+      days: () => { schedule.days = this.days.value(); },
       day: () => { schedule.day = asNumber(this.day.input.value); },
       month: () => { schedule.month = Number(this.month.input.value); },
       from: () => { schedule.from = this.from.input.value || null; },

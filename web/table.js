@@ -1,7 +1,7 @@
 // A table whose rows stay the same elements as long as they are shown, so that what comes in from
 // elsewhere takes away neither the focus nor a selection.
-import { button, el, fill, setAttribute } from "./dom.js";
-import { _, format } from "./text.js";
+import { button, el, focusIn, isFocusLost, place, setAttribute, setText } from "./dom.js";
+import { format, ngettext } from "./text.js";
 
 const PAGE = 60; // rows shown at once: more are slow to lay out, and nobody reads them
 
@@ -15,11 +15,12 @@ export class Table {
     this.keyOf = (row) => row.id;
     this.heads = new Map();
     this.body = el("tbody");
-    this.more = el("div", { class: "more" });
+    this.more = button("", { class: "secondary" }, () => this.showMore());
+    this.left = el("div", { class: "more", hidden: true }, this.more);
     const head = columns.map((column) => this.makeHead(column, sorted));
     this.table = el("table", {}, el("caption", { class: "unseen" }, caption),
       el("thead", {}, el("tr", {}, ...head)), this.body);
-    this.element = el("div", { class: "table" }, this.table, this.more);
+    this.element = el("div", { class: "table" }, this.table, this.left);
   }
 
   makeHead(column, sorted) {
@@ -67,6 +68,7 @@ export class Table {
 
   showIn(rows, rowFor) {
     this.last = rows;
+    const focused = this.focused();
     const kept = new Map();
     for (const row of rows.slice(0, this.shown)) {
       const key = this.keyOf(row);
@@ -77,22 +79,31 @@ export class Table {
     const used = new Set(kept.values());
     this.spare.push(...[...this.rows.values()].filter((built) => !used.has(built)));
     this.rows = kept;
-    this.place([...kept.values()].map((built) => built.element));
+    place(this.body, [...kept.values()].map((built) => built.element));
     const left = rows.length - kept.size;
-    fill(this.more, left > 0 ? button(format(_("Show $0 more"), Math.min(left, PAGE)),
-      { class: "secondary" }, () => this.showMore()) : null);
+    const next = Math.min(left, PAGE);
+    setText(this.more, format(ngettext("Show $0 more", "Show $0 more", next), next));
+    this.left.hidden = left === 0;
+    if (focused && isFocusLost()) this.giveFocus(focused);
   }
 
-  // Moving an element takes the focus from it, so only what stands elsewhere is moved.
-  place(elements) {
-    elements.forEach((element, i) => {
-      if (this.body.children[i] !== element) this.body.insertBefore(element, this.body.children[i] || null);
-    });
-    while (this.body.children.length > elements.length) this.body.lastElementChild.remove();
+  // Which row and cell the focus is in.
+  focused() {
+    const cell = document.activeElement && document.activeElement.closest("td");
+    if (!cell || !this.body.contains(cell)) return null;
+    return { row: [...this.body.children].indexOf(cell.parentElement), cell: cell.cellIndex };
+  }
+
+  // Its row has gone: the same cell of the one that is in its place.
+  giveFocus({ row, cell }) {
+    const instead = this.body.children[Math.min(row, this.body.children.length - 1)];
+    if (instead && !focusIn(instead.children[cell])) focusIn(instead);
   }
 
   showMore() {
+    const before = this.body.children.length;
     this.shown += PAGE;
     this.show(this.last);
+    if (this.body.children[before]) focusIn(this.body.children[before]);
   }
 }

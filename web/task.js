@@ -1,5 +1,5 @@
 // One task: what it is, when it runs, how its runs went.
-import { button, el, fill, setText } from "./dom.js";
+import { button, el, fill, setAttribute, setText } from "./dom.js";
 import { removeTask, runNow, setEnabled, stopRuns } from "./actions.js";
 import { go, href, replaceOptions } from "./address.js";
 import { showAccess } from "./access.js";
@@ -7,11 +7,12 @@ import { durationChart } from "./chart.js";
 import { distanceText, momentText } from "./moments.js";
 import { Runs } from "./runs.js";
 import { ask } from "./tool.js";
-import { inTurn } from "./turns.js";
-import { gradeOf, limitText, outcomeText, scheduleText } from "./words.js";
-import { _, format, short, visible } from "./text.js";
+import { inTurn, oneAtATime } from "./turns.js";
+import { gradeOf, limitText, outcomeText, scheduleText, titleOf } from "./words.js";
+import { _, format, ngettext, short, visible } from "./text.js";
 
-const RUNS = "50";
+const RUNS = 50;
+const MOST_RUNS = 200;
 const COMING = "5";
 
 function fact(label, ...content) {
@@ -25,6 +26,10 @@ function overlapText(overlap) {
   return _("A run waits for the one before, and for those of other tasks of its application.");
 }
 
+function numberOf(text) {
+  return /^\d+$/.test(text || "") ? Number(text) : null;
+}
+
 export class TaskView {
   constructor(root, model, { path, options }) {
     this.id = Number(path[1]);
@@ -32,84 +37,103 @@ export class TaskView {
     this.load = inTurn(() => this.isClosed || Promise.all([this.loadComing(), this.loadRuns()]));
     this.title = "";
     this.access = el("div");
-    this.head = el("div", { class: "head" });
+    this.wanted = numberOf(options.run); // the run whose output is to be shown
+    this.limit = RUNS;
+    this.makeHead();
     this.facts = el("dl", { class: "facts" });
     this.coming = el("ol", { class: "coming" });
     this.chart = el("div");
     this.note = el("p", { class: "beside" });
-    this.runs = new Runs((number) => replaceOptions({ run: number === null ? "" : String(number) }));
-    this.runs.want(options.run ? Number(options.run) : null);
+    this.more = button("", { class: "secondary" }, () => this.showMore());
+    this.left = el("div", { class: "more", hidden: true }, this.more);
+    this.runs = new Runs((number) => {
+      this.wanted = number;
+      replaceOptions({ run: number === null ? "" : String(number) });
+    });
+    this.runs.want(this.wanted);
     this.newest = null;
     this.columns = el("div", { class: "columns" },
       el("section", { "aria-label": _("Task") }, el("h3", {}, _("Task")), this.facts),
       el("section", { "aria-label": _("Coming runs") }, el("h3", {}, _("Coming runs")), this.coming));
-    this.history = el("section", { "aria-label": _("Runs") }, el("h3", {}, _("Runs")), this.chart, this.note, this.runs.element);
-    fill(root, this.access, this.head, this.columns, this.history);
+    this.history = el("section", { "aria-label": _("Runs") }, el("h3", {}, _("Runs")), this.chart, this.note, this.runs.element, this.left);
+    fill(root, this.access, this.gone, this.head, this.columns, this.history);
     this.update();
   }
 
   update() {
     showAccess(this.access, this.model.mayChange);
-    if (!this.model.isLoaded) return;
     this.task = this.model.taskOf(this.id);
-    this.columns.hidden = this.task === null;
-    this.history.hidden = this.task === null;
+    for (const element of [this.head, this.columns, this.history]) element.hidden = this.task === null;
+    this.gone.hidden = this.task !== null || !this.model.isLoaded;
     if (!this.task) {
-      this.showGone();
+      this.title = this.model.isLoaded ? _("No such task") : "";
+      this.dropRuns();
       return;
     }
-    this.title = short(this.task.name);
+    // Another one may have got the number.
+    if (this.shownName !== this.task.name) this.dropRuns();
+    this.shownName = this.task.name;
+    this.title = short(titleOf(this.task));
     this.showHead();
     this.showFacts();
     this.load();
   }
 
-  showGone() {
-    this.title = _("No such task");
-    fill(this.head, el("h2", {}, _("There is no such task")), el("p", {}, el("a", { href: href([]) }, _("All tasks"))));
-    this.headShown = null;
+  // What one of them prints is not followed any more.
+  dropRuns() {
+    this.runs.show([]);
+    this.runs.element.hidden = true;
+    this.showChart([]);
+    this.shownRuns = null;
   }
 
-  // Only when something of it changes: it has the buttons, and one of them may have the focus.
+  // The buttons stay the same ones, since one of them may have the focus, or have it given back by a dialog.
+  makeHead() {
+    this.name = el("bdi");
+    this.outcome = el("span");
+    this.off = el("span", { class: "outcome none" }, _("switched off"));
+    this.problems = el("div");
+    const make = (label, style, act) => button(label, { class: style }, act);
+    this.buttons = {
+      run: make(_("Run now"), "primary", oneAtATime(() => this.run())),
+      stop: make(_("Stop"), "danger", () => stopRuns(this.model, this.task)),
+      edit: make(_("Edit"), "secondary", () => go(["task", String(this.id), "edit"])),
+      enable: make("", "secondary", oneAtATime(() => setEnabled(this.task, !this.task.enabled))),
+      remove: make(_("Remove"), "danger plain-danger", async () => {
+        if (await removeTask(this.model, this.task)) go([]);
+      }),
+    };
+    this.actions = el("div", { class: "actions" }, ...Object.values(this.buttons));
+    this.head = el("div", { class: "head" }, el("h2", { class: "long" }, this.name),
+      el("p", { class: "state" }, this.outcome, this.off), this.problems, this.actions);
+    this.gone = el("div", { class: "head", hidden: true }, el("h2", {}, _("There is no such task")),
+      el("p", {}, el("a", { href: href([]) }, _("All tasks"))));
+  }
+
   showHead() {
-    const { task, model } = this;
-    const key = JSON.stringify([task.name, task.enabled, task.running, task.ui, task.problems, model.mayChange,
-      task.last_run && [task.last_run.run, task.last_run.state, task.last_run.outcome]]);
-    if (this.headShown === key) return;
-    this.headShown = key;
-    const focused = document.activeElement && document.activeElement.dataset.action;
-    const run = task.last_run;
-    fill(this.head,
-      el("h2", { class: "long" }, el("bdi", {}, visible(task.name) || format(_("Task $0"), task.id))),
-      el("p", { class: "state" },
-        el("span", { class: "outcome " + (run === undefined ? "none" : gradeOf(run)) },
-          run === undefined ? _("How its runs went: unknown") : format(_("Last run: $0"), outcomeText(run))),
-        task.enabled ? null : el("span", { class: "outcome none" }, _("switched off"))),
-      ...task.problems.map((problem) => el("div", { class: "note bad", role: "alert" }, el("p", {}, visible(problem)))),
-      model.mayChange ? this.actions() : null);
-    const again = focused && this.head.querySelector(`[data-action="${focused}"]`);
-    if (again) again.focus();
-  }
-
-  actions() {
     const { task } = this;
-    const action = (name, label, style, isOffered, act) => (isOffered
-      ? button(label, { class: style, "data-action": name }, act) : null);
-    return el("div", { class: "actions" },
-      action("run", _("Run now"), "primary", task.ui.can_run, () => this.run()),
-      action("stop", _("Stop"), "danger", task.running, () => stopRuns(task)),
-      action("edit", _("Edit"), "secondary", task.ui.can_edit, () => go(["task", String(task.id), "edit"])),
-      action("enable", task.enabled ? _("Switch off") : _("Switch on"), "secondary", true,
-        () => setEnabled(task, !task.enabled)),
-      action("remove", _("Remove"), "danger plain-danger", task.ui.can_delete, async () => {
-        if (await removeTask(task)) go([]);
-      }));
+    const run = task.last_run;
+    setText(this.name, titleOf(task));
+    setText(this.outcome, run === undefined ? _("How its runs went: unknown") : format(_("Last run: $0"), outcomeText(run)));
+    setAttribute(this.outcome, "class", "outcome " + (run === undefined ? "none" : gradeOf(run)));
+    this.off.hidden = task.enabled;
+    if (this.problemsShown !== task.problems.join("\n")) {
+      this.problemsShown = task.problems.join("\n");
+      fill(this.problems, ...task.problems.map((problem) => el("div", { class: "note bad", role: "alert" }, el("p", {}, visible(problem)))));
+    }
+    const { run: runs, stop, edit, enable, remove } = this.buttons;
+    runs.hidden = !task.ui.can_run;
+    stop.hidden = !task.running;
+    edit.hidden = !task.ui.can_edit;
+    setText(enable, task.enabled ? _("Switch off") : _("Switch on"));
+    remove.hidden = !task.ui.can_delete;
+    this.actions.hidden = !this.model.mayChange;
   }
 
   async run() {
-    this.newest = this.latestNumber();
+    this.newest = Math.max(this.latestNumber(), this.task.last_run ? this.task.last_run.run || 0 : 0);
     this.opensNext = true;
-    this.opensNext = await runNow(this.task);
+    this.opensNext = await runNow(this.task) === true;
     this.load();
   }
 
@@ -134,34 +158,38 @@ export class TaskView {
   }
 
   async loadComing() {
-    let due = [];
+    const { task } = this;
+    if (!task) return;
+    let rows = [];
+    let none = task.enabled ? _("None") : _("None, as it is switched off");
     try {
-      if (this.task.enabled) due = (await ask("next", String(this.id), "--count", COMING)).runs.map((run) => run.due);
+      const { runs } = task.enabled ? await ask("next", String(this.id), "--count", COMING) : { runs: [] };
+      rows = runs.filter((run) => run.due).map((run) => [momentText(run.due), distanceText(run.due)]);
     } catch (error) {
-      due = [];
+      none = error.message;
     }
-    const rows = due.filter((time) => time).map((time) => [momentText(time), distanceText(time)]);
-    const key = JSON.stringify(rows);
+    const key = JSON.stringify([rows, none]);
     if (this.comingShown === key) return;
     this.comingShown = key;
-    fill(this.coming, ...rows.map(([time, distance]) => el("li", {}, time + " ", el("span", { class: "beside" }, distance))));
-    if (rows.length === 0) {
-      fill(this.coming, el("li", { class: "none" }, this.task.enabled ? _("None") : _("None, as it is switched off")));
-    }
+    fill(this.coming, ...rows.map(([time, distance]) => el("li", {}, time + " ", el("span", { class: "beside" }, distance))),
+      rows.length === 0 ? el("li", { class: "none" }, none) : null);
   }
 
   async loadRuns() {
-    if (this.model.mayChange !== true && this.task.last_run === undefined) {
+    const { task } = this;
+    if (!task) return;
+    if (this.model.mayChange !== true && task.last_run === undefined) {
       setText(this.note, _("Unknown without administrative access."));
       this.runs.element.hidden = true;
       return;
     }
     try {
-      const { runs } = await ask("history", "--task", String(this.id), "--limit", RUNS);
-      if (this.isClosed) return;
+      const { runs, why } = await this.askForRuns();
+      if (this.isClosed || !this.task || this.task.name !== task.name) return; // it is another one by now
       this.shownRuns = runs;
-      setText(this.note, runs.length === 0 ? _("It has not run yet.") : "");
+      setText(this.note, runs.length === 0 ? _("It has not run yet.") : why);
       this.runs.element.hidden = runs.length === 0;
+      this.showLeft(runs);
       this.runs.show(runs);
       this.openNewest();
       this.showChart(runs);
@@ -170,13 +198,51 @@ export class TaskView {
     }
   }
 
+  // The last ones, and the one whose output is wanted where that is older; why it is not there.
+  async askForRuns() {
+    const latest = async () => (await ask("history", "--task", String(this.id), "--limit", String(this.limit))).runs;
+    const { wanted } = this;
+    const isThere = (runs) => wanted === null || runs.some((run) => run.run === wanted);
+    let runs = await latest();
+    if (!isThere(runs) && runs.length === this.limit && this.limit < MOST_RUNS) {
+      this.limit = MOST_RUNS;
+      runs = await latest();
+    }
+    if (isThere(runs)) return { runs, why: "" };
+    try {
+      const { run } = await ask("log", String(this.id), "--run", String(wanted));
+      return { runs: [...runs, run], why: "" };
+    } catch (error) {
+      return { runs, why: error.message };
+    }
+  }
+
+  // More than are asked for may be there.
+  showLeft(runs) {
+    const next = MOST_RUNS - RUNS;
+    this.left.hidden = this.limit === MOST_RUNS || runs.length < this.limit;
+    setText(this.more, format(ngettext("Show up to $0 more", "Show up to $0 more", next), next));
+  }
+
+  async showMore() {
+    const before = this.runs.count();
+    this.limit = MOST_RUNS;
+    await this.load();
+    this.runs.focusOn(before);
+  }
+
   // The run that was started here is shown as soon as it is known.
   openNewest() {
     const number = this.latestNumber();
     if (!this.opensNext || number <= this.newest) return;
     this.opensNext = false;
-    this.runs.want(number);
+    this.want(number);
     replaceOptions({ run: String(number) });
+  }
+
+  want(number) {
+    this.wanted = number;
+    this.runs.want(number);
   }
 
   showChart(runs) {
@@ -187,7 +253,8 @@ export class TaskView {
   }
 
   take(options) {
-    this.runs.want(options.run ? Number(options.run) : null);
+    this.want(numberOf(options.run));
+    this.load();
   }
 
   close() {

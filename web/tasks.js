@@ -6,8 +6,9 @@ import { showAccess } from "./access.js";
 import { Health } from "./health.js";
 import { Mails } from "./mails.js";
 import { distanceText, moment, momentText } from "./moments.js";
+import { switchCell } from "./switch.js";
 import { Table } from "./table.js";
-import { gradeOf, outcomeText, scheduleText } from "./words.js";
+import { gradeOf, outcomeText, scheduleText, titleOf } from "./words.js";
 import { _, format, language, ngettext, visible } from "./text.js";
 
 const collator = new Intl.Collator(language(), { numeric: true, sensitivity: "base" });
@@ -60,7 +61,7 @@ function nameCell(cell) {
   cell.append(link, app);
   return (task) => {
     setAttribute(link, "href", href(taskPath(task.id)));
-    setText(link.firstChild, visible(task.name) || format(_("Task $0"), task.id));
+    setText(link.firstChild, titleOf(task));
     setText(app, visible(task.app_name || task.app || ""));
     setAttribute(app, "dir", "auto");
   };
@@ -91,27 +92,6 @@ function lastCell(cell) {
   };
 }
 
-function switchCell(mayChange) {
-  return (cell) => {
-    let shown = null;
-    let isBusy = false;
-    const box = el("input", { type: "checkbox", role: "switch" });
-    box.addEventListener("change", async () => {
-      isBusy = true;
-      const isDone = await setEnabled(shown, box.checked);
-      isBusy = false;
-      if (!isDone) box.checked = shown.enabled;
-    });
-    cell.append(box);
-    return (task) => {
-      shown = task;
-      box.disabled = !mayChange();
-      if (!isBusy) box.checked = task.enabled;
-      setAttribute(box, "aria-label", format(_("$0 is switched on"), visible(task.name).slice(0, 200)));
-    };
-  };
-}
-
 function columns(model) {
   return [
     { key: "name", label: _("Name"), isSortable: true, make: nameCell },
@@ -121,14 +101,15 @@ function columns(model) {
     { key: "last", label: _("Last run"), isSortable: true, make: lastCell },
     { key: "owner", label: _("Owner"), isSortable: true,
       make: (cell) => (task) => setText(cell, visible(task.owner)) },
-    { key: "enabled", label: _("On"), isSortable: true, make: switchCell(() => model.mayChange) },
+    { key: "enabled", label: _("On"), isSortable: true,
+      make: switchCell({ mayChange: () => model.mayChange, set: setEnabled, nameOf: (task) => titleOf(task).slice(0, 200) }) },
   ];
 }
 
 // ---- the view -------------------------------------------------------------------------------
 
 function optionsOf({ q = "", app = "", failed = "", sort = "", desc = "" }) {
-  return { q, app, failed, sort: ORDERS[sort] ? sort : "", desc };
+  return { q, app, failed: failed === "1" ? failed : "", sort: Object.hasOwn(ORDERS, sort) ? sort : "", desc };
 }
 
 export class TasksView {
@@ -143,8 +124,13 @@ export class TasksView {
     this.empty = el("div", { class: "empty" });
     this.mails = new Mails();
     this.add = el("a", { class: "button primary", href: href(["add"]) }, _("Add a task"));
-    this.list = el("section", { "aria-label": _("Tasks") }, this.tools(), this.empty, this.table.element, this.mails.element);
+    this.old = el("div", { class: "note warn", role: "status", hidden: true },
+      el("p", {}, _("The machine could not be asked for its tasks. They are shown as they were.")));
+    this.list = el("section", { "aria-label": _("Tasks") }, this.old, this.tools(), this.empty, this.table.element, this.mails.element);
     fill(root, this.access, this.health.element, this.list);
+    // Before a link leads away from here.
+    this.flush = () => this.remembering && this.remember();
+    document.addEventListener("click", this.flush, true);
     this.update();
   }
 
@@ -167,6 +153,7 @@ export class TasksView {
   }
 
   remember() {
+    window.clearTimeout(this.remembering);
     this.remembering = null;
     replaceOptions(this.options);
   }
@@ -209,18 +196,18 @@ export class TasksView {
     else this.table.show(rows);
     this.table.element.hidden = chosen.length === 0;
     setText(this.count, chosen.length === all ? format(ngettext("$0 task", "$0 tasks", all), all)
-      : format(_("$0 of $1 tasks"), chosen.length, all));
+      : format(ngettext("$0 of $1 task", "$0 of $1 tasks", all), chosen.length, all));
     this.showEmpty(all, chosen.length);
   }
 
   showEmpty(all, chosen) {
     this.empty.hidden = chosen > 0;
     if (chosen > 0) return;
-    const key = all === 0 ? "none" : "filtered";
-    if (this.empty.dataset.shown === key + this.model.mayChange) return;
-    this.empty.dataset.shown = key + this.model.mayChange;
-    if (all > 0) {
-      fill(this.empty, el("p", {}, _("No task is like that.")));
+    const key = (all > 0 ? "filtered" : this.model.isDamaged ? "damaged" : "none") + this.model.mayChange;
+    if (this.empty.dataset.shown === key) return;
+    this.empty.dataset.shown = key;
+    if (all > 0 || this.model.isDamaged) {
+      fill(this.empty, el("p", {}, all > 0 ? _("No task is like that.") : _("The tasks cannot be read.")));
       return;
     }
     fill(this.empty, el("h2", {}, _("There is no task yet")),
@@ -230,7 +217,7 @@ export class TasksView {
 
   showApps() {
     const apps = new Map();
-    for (const task of this.model.tasks) if (task.app) apps.set(task.app, task.app_name || task.app);
+    for (const task of this.model.tasks) if (task.app && task.ui.listable) apps.set(task.app, task.app_name || task.app);
     if (this.options.app && !apps.has(this.options.app)) apps.set(this.options.app, this.options.app);
     const key = JSON.stringify([...apps]);
     if (this.apps === key) return;
@@ -245,12 +232,13 @@ export class TasksView {
   update() {
     this.texts = new Map();
     showAccess(this.access, this.model.mayChange);
-    this.health.element.hidden = !this.model.isLoaded;
+    this.health.show(this.model);
     this.list.hidden = !this.model.isLoaded;
     if (!this.model.isLoaded) return;
-    this.add.hidden = !this.model.mayChange;
-    this.mails.show(this.model.mayChange);
-    this.health.show(this.model);
+    this.old.hidden = this.model.isListed;
+    setAttribute(this.table.element, "class", this.model.isListed ? "table" : "table old");
+    this.add.hidden = !this.model.mayChange || this.model.isDamaged;
+    this.mails.show(this.model);
     this.showApps();
     this.showRows();
   }
@@ -267,5 +255,6 @@ export class TasksView {
 
   close() {
     window.clearTimeout(this.remembering);
+    document.removeEventListener("click", this.flush, true);
   }
 }

@@ -9,12 +9,20 @@ export function language() {
   return cockpit.language.replace("_", "-");
 }
 
-// What is no letter and can turn or hide others: control characters, marks of direction, and what
-// has no width. The line feed and the tab stay.
-const UNSEEN = /[\u0000-\u0008\u000b-\u001f\u007f-\u009f\u061c\u200b-\u200f\u2028-\u202e\u2060-\u206f\ufeff\ufff9-\ufffb]/g;
+// What can turn or hide others: control characters, marks of direction, and what cannot be seen. It is what
+// zelosched escapes, but for the line feed and the tab. The joiners of some scripts stay, and what chooses
+// among forms of the character before it.
+const UNSEEN = "\\u0000-\\u0008\\u000b-\\u001f\\u007f-\\u009f\\u00ad\\u034f\\u061c\\u115f\\u1160\\u17b4\\u17b5\\u180b-\\u180f\\u200b" +
+  "\\u200e\\u200f\\u2028-\\u202e\\u2060-\\u206f\\u2800\\u3164\\ufeff\\uffa0\\ufff9-\\ufffb\\u{1d159}\\u{1d173}-\\u{1d17a}\\u{e0000}-\\u{e0fff}";
+const UNSAFE = new RegExp(`[${UNSEEN}]|(?<=^|[${UNSEEN}])[\\ufe00-\\ufe0f]`, "gu");
+
+function escaped(character) {
+  const code = character.codePointAt(0).toString(16);
+  return code.length > 4 ? `\\u{${code}}` : "\\u" + code.padStart(4, "0");
+}
 
 export function visible(text) {
-  return String(text).replace(UNSEEN, (c) => "\\u" + c.charCodeAt(0).toString(16).padStart(4, "0"));
+  return String(text).replace(UNSAFE, escaped);
 }
 
 // For a title or a sentence; the whole is shown elsewhere.

@@ -1,9 +1,17 @@
 // Calls of zelosched, the only program that this page starts: never by a shell.
+import { visible } from "./text.js";
+
 const cockpit = window.cockpit;
 
 const PROGRAM = "zelosched";
 
-export class ToolError extends Error {}
+class ToolError extends Error {
+  // What was printed all the same.
+  constructor(message, output = "") {
+    super(visible(message));
+    this.output = output;
+  }
+}
 
 function inSentences(message) {
   return message.split("\n").map((line) => line.replace(/^zelosched( [a-z-]+)?: /, "").trim())
@@ -34,10 +42,8 @@ function outcome(words, input) {
 }
 
 // The answer to a question as JSON. Some answers come with a status that says how bad they are.
-export async function ask(...words) {
-  const { output, fault } = await outcome([...words, "--json"]);
-  if (output.trim() === "") throw new ToolError(fault || "");
-  return JSON.parse(output);
+export function ask(...words) {
+  return askAbout(undefined, ...words);
 }
 
 // The same about something that is not stored.
@@ -52,11 +58,11 @@ export function whenChanged(listener) {
   changed = listener;
 }
 
-// Changes something, and gives what the program says to that.
+// Changes something, and gives what the program says to that, when the page knows what came of it.
 export async function change(words, input) {
   const { output, fault } = await outcome(words, input);
-  changed();
-  if (fault !== null) throw new ToolError(fault);
+  await changed();
+  if (fault !== null) throw new ToolError(fault, output);
   return output;
 }
 
@@ -64,6 +70,6 @@ export async function change(words, input) {
 export function follow(words, show, done) {
   const call = start(words);
   call.stream(show);
-  call.then(() => done(null)).catch((error) => done(inSentences(error.message || "")));
+  call.then(() => done(null)).catch((error) => done(visible(inSentences(error.message || ""))));
   return () => call.close("terminated");
 }

@@ -1,5 +1,19 @@
 // Work that is never done twice at once.
 
+// A function that starts the work, and does nothing while that goes on: of two clicks one counts.
+export function oneAtATime(work) {
+  let isGoing = false;
+  return async (...given) => {
+    if (isGoing) return undefined;
+    isGoing = true;
+    try {
+      return await work(...given);
+    } finally {
+      isGoing = false;
+    }
+  };
+}
+
 // A function that starts the work, or has it done once more when it is going on: what has changed
 // meanwhile may have come too late for it.
 export function inTurn(work) {

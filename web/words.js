@@ -1,5 +1,5 @@
 // What a task and its runs are, in words.
-import { _, format, ngettext } from "./text.js";
+import { _, format, ngettext, visible } from "./text.js";
 import { dateText, monthText, weekdayText } from "./moments.js";
 
 export const DAYS = ["mon", "tue", "wed", "thu", "fri", "sat", "sun"];
@@ -37,14 +37,22 @@ function dayInWords(schedule) {
 
 export function scheduleText(schedule) {
   let text = format(_("$0 at $1"), dayInWords(schedule), schedule.at);
-  if (schedule.every_hours) {
+  const until = schedule.until_hour === null || schedule.until_hour === undefined ? 23 : schedule.until_hour;
+  // A last hour that is not after the first leaves one run a day.
+  if (schedule.every_hours && until > Number(schedule.at.slice(0, 2))) {
     const every = format(ngettext("every hour", "every $0 hours", schedule.every_hours), schedule.every_hours);
-    const until = schedule.until_hour === null || schedule.until_hour === undefined ? 23 : schedule.until_hour;
     text = format(_("$0, then $1 until $2"), text, every,
       String(until).padStart(2, "0") + schedule.at.slice(-3));
   }
   if (schedule.from) text = format(_("$0, from $1 on"), text, dateInWords(schedule.from));
   return text;
+}
+
+const BLANK = /^[\s\u200c\u200d]*$/;
+
+// What a task is called: one whose name shows nothing by its number.
+export function titleOf(task) {
+  return BLANK.test(task.name) ? format(_("Task $0"), task.id) : visible(task.name);
 }
 
 export function outcomeText(run) {

@@ -13,6 +13,7 @@ import tempfile
 import time
 
 from selenium import webdriver
+from selenium.webdriver import ActionChains
 from selenium.common.exceptions import (ElementClickInterceptedException, NoSuchElementException,
                                         StaleElementReferenceException, TimeoutException,
                                         WebDriverException)
@@ -91,11 +92,20 @@ def add(*words, command="true"):
     return int(z("add", "--quiet", *words, "--", command))
 
 
+def older_runs(name, count, ago):
+    """The last run of the task so often once more in the history, each that many seconds older."""
+    library(f"""sql $KEPT "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < {count})
+        INSERT INTO run(task, generation, task_name, app, owner, started_by, queued, start, ended, duration, state,
+          outcome, exit_code, output_bytes, moment, boot, pid, told)
+        SELECT task, generation, task_name, app, owner, started_by, queued - i * {ago}, start - i * {ago},
+          ended - i * {ago}, duration, state, outcome, exit_code, output_bytes, moment - i * {ago}, boot, pid, told
+        FROM n, (SELECT * FROM run WHERE task_name = '{name}' ORDER BY run DESC LIMIT 1)" """)
+
+
 def clean():
     library("clean; rm -rf /etc/zelosched /etc/default/zelosched-mail; mkdir -p /etc/zelosched/run-ended.d")
     shutil.copy(ROOT + "/packaging/zelo_poweroff_feasible_check", "/usr/zelo/bin")
-    subprocess.run([BUILD + "/bin/zelosched", "restore"], check=False, stdout=subprocess.DEVNULL,
-                   stderr=subprocess.DEVNULL)
+    shutil.copy(BUILD + "/bin/zeloschedtask", "/tmp/zeloschedtask")
 
 
 def thousand_tasks():
@@ -145,8 +155,11 @@ class Server:
         if user:
             library("copy_for_others")
             program = "/run/for_others/zelosched"
+        self.broken_file = os.path.join(WORK, f"broken.{self.port}")
         self.write(os.path.join(tools, "zelosched"),
-                   f'#!/bin/sh\necho "$@" >>{self.calls_file}\nexec {program} "$@"\n')
+                   f'#!/bin/sh\necho "$@" >>{self.calls_file}\n'
+                   f'if [ -e {self.broken_file} ] && grep -qx "$1" {self.broken_file}; then\n'
+                   f'  tail -n 1 {self.broken_file} >&2\n  exit 1\nfi\nexec {program} "$@"\n')
         with open(self.calls_file, "w", encoding="utf-8"):
             os.chmod(self.calls_file, 0o666)
         session = os.path.join(tools, "session")
@@ -162,6 +175,8 @@ class Server:
     def start(self):
         """Anew: a session that nobody uses for a while ends, and with it the server's only one."""
         self.stop()
+        if os.path.exists(self.broken_file):
+            os.remove(self.broken_file)
         with open(os.path.join(WORK, f"ws.{self.port}.log"), "w", encoding="utf-8") as log:
             self.process = subprocess.Popen(
                 ["/usr/lib/cockpit/cockpit-ws", "--no-tls", "--address", "127.0.0.1", "--port", str(self.port),
@@ -177,6 +192,15 @@ class Server:
     def calls(self):
         with open(self.calls_file, encoding="utf-8") as file:
             return file.read().splitlines()
+
+    def break_tool(self, *commands, saying="cannot do that"):
+        """These commands of it fail from now on; without any, none does."""
+        if commands:
+            with open(self.broken_file, "w", encoding="utf-8") as file:
+                file.write("\n".join([*commands, "zelosched: " + saying]) + "\n")
+        elif os.path.exists(self.broken_file):
+            os.remove(self.broken_file)
+        library("touch $STORE")
 
     def stop(self):
         if self.process:
@@ -209,6 +233,9 @@ class Browser:
         """Of the page, which may be narrower than any window."""
         self.driver.execute_cdp_cmd("Emulation.setDeviceMetricsOverride",
                                     {"width": width, "height": height, "deviceScaleFactor": 1, "mobile": False})
+
+    def double_click(self, element):
+        ActionChains(self.driver).double_click(element).perform()
 
     def zone(self, name):
         self.driver.execute_cdp_cmd("Emulation.setTimezoneOverride", {"timezoneId": name})
@@ -290,6 +317,10 @@ class Browser:
 
     def keys(self, *keys):
         self.driver.switch_to.active_element.send_keys(*keys)
+
+    def see_focused(self, what, condition):
+        """Waits until what has the focus is like that."""
+        wait_for(f"{what} has the focus", lambda: condition(self.focused()))
 
     def focused(self):
         return self.driver.switch_to.active_element
