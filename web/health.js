@@ -12,15 +12,18 @@ const cockpit = window.cockpit;
 
 const OF_PAST_RUN = ["failed-run", "gave-up", "missed-run"];
 
-// Why it did not run is told by the end of the sentence alone.
-function missedForm(text) {
-  if (text.endsWith(", as the machine was off")) return _("$0 was due $1, $2, and did not run, as the machine was off.");
-  if (text.endsWith(", though the machine was on")) return _("$0 was due $1, $2, and did not run, though the machine was on.");
-  return _("$0 was due $1, $2, and did not run.");
+// By how the machine was then, where that is known.
+const MISSED = {
+  off: () => _("$0 was due $1, $2, and did not run, as the machine was off."),
+  on: () => _("$0 was due $1, $2, and did not run, though the machine was on."),
+};
+
+function missedForm(machine) {
+  return machine === null ? _("$0 was due $1, $2, and did not run.") : MISSED[machine]();
 }
 
 // The page's own words where it has them; else those of the program.
-function textOf({ kind, severity, text, run, due }, task) {
+function textOf({ kind, severity, text, run, due, machine }, task) {
   const name = task && short(titleOf(task));
   switch (kind) {
     case "cron":
@@ -31,7 +34,7 @@ function textOf({ kind, severity, text, run, due }, task) {
       return format(_("$0 $1, $2."), name, outcomeText(run), distanceText(run.end || run.start || run.queued));
     case "missed-run":
       if (!task || !due) break;
-      return format(missedForm(text), name, momentText(due), distanceText(due));
+      return format(missedForm(machine), name, momentText(due), distanceText(due));
     case "long-run":
       if (!task || !run) break;
       return format(_("$0 has been running for unusually long: it began $1."), name, distanceText(run.start));
