@@ -45,7 +45,7 @@ function textOf({ kind, severity, text, run, due }, task) {
   return visible(text);
 }
 
-// What helps by a command, {command: label}: there is a button for it, once however many findings it mends.
+// What helps by a command, {command: label}: there is a button for it.
 const COMMANDS = { sync: () => _("Write the crontab again"), restore: () => _("Put it back") };
 
 function commandOf({ remedy }) {
@@ -172,18 +172,15 @@ export class Health {
     focusIn(this.list.children[before]);
   }
 
-  // Each with a key by which it is known again, and no button twice.
+  // Each with a key by which it is known again.
   shownOf(found, model, mayChange) {
-    const offered = new Set();
     const times = new Map();
     return found.map((finding) => {
       const task = taskOf(finding, model);
       const name = [finding.kind, finding.task, finding.run && finding.run.run].join(" ");
       times.set(name, (times.get(name) || 0) + 1);
       // The crontab is written from the tasks, which must be there first.
-      const actions = actionsOf(finding, task, mayChange)
-        .filter(({ key }) => !(key in COMMANDS && offered.has(key)) && !(key === "sync" && model.isDamaged));
-      for (const { key } of actions) offered.add(key);
+      const actions = actionsOf(finding, task, mayChange).filter(({ key }) => !(key === "sync" && model.isDamaged));
       return { key: name + " " + times.get(name), finding, task, text: textOf(finding, task), actions };
     });
   }
