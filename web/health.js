@@ -91,7 +91,7 @@ class Row {
     this.remedy = el("span", { class: "beside" });
     this.buttons = new Map();
     this.actions = el("span", { class: "row-actions" });
-    this.element = el("li", {}, this.severity, el("span", { class: "what" }, this.text, " ", this.remedy), this.actions);
+    this.element = el("li", {}, this.severity, el("span", { class: "what" }, this.text, this.remedy), this.actions);
   }
 
   show({ finding, task, text, actions }) {
@@ -99,7 +99,9 @@ class Row {
     setAttribute(this.severity, "class", "severity " + finding.severity);
     setText(this.severity, SEVERITIES[finding.severity]());
     setText(this.text, text);
-    setText(this.remedy, finding.remedy && !OF_PAST_RUN.includes(finding.kind) && !commandOf(finding) ? visible(finding.remedy) : "");
+    // Where there is a button for it, it is not told.
+    const isTold = finding.remedy && !OF_PAST_RUN.includes(finding.kind) && !commandOf(finding);
+    setText(this.remedy, isTold ? ": " + visible(finding.remedy) : "");
     const kept = new Map();
     for (const action of actions) {
       const one = this.buttons.get(action.key) || this.makeButton(action.key);

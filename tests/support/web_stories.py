@@ -349,6 +349,14 @@ def older(browser, server):
     older_runs("Much used", 200, 60)
     browser.open(server, f"task/{number}?run=1")
     browser.see("it is me", ".output")
+    # Another task that gets the number does not get the runs.
+    z("remove", "--yes", str(number))
+    same(add("--daily", "02:30", "--name", "New"), number)
+    browser.see("It has not run yet.")
+    same(browser.shown(".output"), [])
+    browser.open(server, f"task/{number}?run=1")
+    browser.see("Run 1 is one of Much used.")
+    same(browser.shown(".output"), [])
 
 
 @story("a run is started, watched while it prints, and stopped")
