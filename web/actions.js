@@ -22,7 +22,7 @@ function subjectOf(model, task) {
 export const runNow = oneAtATime((task) => attempt(async () => {
   await change(["run", ...named(task)]);
   tell(format(_("$0 was started."), short(titleOf(task))));
-}));
+}), (task) => task.id);
 
 export function setEnabled(task, isEnabled) {
   return attempt(() => change([isEnabled ? "enable" : "disable", ...named(task)]));

@@ -48,7 +48,7 @@ function textOf({ kind, severity, text, run, due, machine }, task) {
   return visible(text);
 }
 
-// What helps by a command, {command: label}: there is a button for it, once however many findings it mends.
+// What helps by a command, {command: label}: there is a button for it.
 const COMMANDS = { sync: () => _("Write the crontab again"), restore: () => _("Put it back") };
 
 function commandOf({ remedy }) {
@@ -94,7 +94,7 @@ class Row {
     this.remedy = el("span", { class: "beside" });
     this.buttons = new Map();
     this.actions = el("span", { class: "row-actions" });
-    this.element = el("li", {}, this.severity, el("span", { class: "what" }, this.text, " ", this.remedy), this.actions);
+    this.element = el("li", {}, this.severity, el("span", { class: "what" }, this.text, this.remedy), this.actions);
   }
 
   show({ finding, task, text, actions }) {
@@ -102,7 +102,9 @@ class Row {
     setAttribute(this.severity, "class", "severity " + finding.severity);
     setText(this.severity, SEVERITIES[finding.severity]());
     setText(this.text, text);
-    setText(this.remedy, finding.remedy && !OF_PAST_RUN.includes(finding.kind) && !commandOf(finding) ? visible(finding.remedy) : "");
+    // Where there is a button for it, it is not told.
+    const isTold = finding.remedy && !OF_PAST_RUN.includes(finding.kind) && !commandOf(finding);
+    setText(this.remedy, isTold ? ": " + visible(finding.remedy) : "");
     const kept = new Map();
     for (const action of actions) {
       const one = this.buttons.get(action.key) || this.makeButton(action.key);
@@ -175,18 +177,15 @@ export class Health {
     focusIn(this.list.children[before]);
   }
 
-  // Each with a key by which it is known again, and no button twice.
+  // Each with a key by which it is known again.
   shownOf(found, model, mayChange) {
-    const offered = new Set();
     const times = new Map();
     return found.map((finding) => {
       const task = taskOf(finding, model);
       const name = [finding.kind, finding.task, finding.run && finding.run.run].join(" ");
       times.set(name, (times.get(name) || 0) + 1);
       // The crontab is written from the tasks, which must be there first.
-      const actions = actionsOf(finding, task, mayChange)
-        .filter(({ key }) => !(key in COMMANDS && offered.has(key)) && !(key === "sync" && model.isDamaged));
-      for (const { key } of actions) offered.add(key);
+      const actions = actionsOf(finding, task, mayChange).filter(({ key }) => !(key === "sync" && model.isDamaged));
       return { key: name + " " + times.get(name), finding, task, text: textOf(finding, task), actions };
     });
   }

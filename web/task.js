@@ -71,7 +71,10 @@ export class TaskView {
       return;
     }
     // Another one may have got the number.
-    if (this.shownName !== this.task.name) this.dropRuns();
+    if (this.shownName !== this.task.name) {
+      this.dropRuns();
+      if (this.shownName !== undefined) this.want(null);
+    }
     this.shownName = this.task.name;
     this.title = short(titleOf(this.task));
     this.showHead();
@@ -187,7 +190,7 @@ export class TaskView {
       const { runs, why } = await this.askForRuns();
       if (this.isClosed || !this.task || this.task.name !== task.name) return; // it is another one by now
       this.shownRuns = runs;
-      setText(this.note, runs.length === 0 ? _("It has not run yet.") : why);
+      setText(this.note, why || (runs.length === 0 ? _("It has not run yet.") : ""));
       this.runs.element.hidden = runs.length === 0;
       this.showLeft(runs);
       this.runs.show(runs);
@@ -201,7 +204,7 @@ export class TaskView {
   // The last ones, and the one whose output is wanted where that is older; why it is not there.
   async askForRuns() {
     const latest = async () => (await ask("history", "--task", String(this.id), "--limit", String(this.limit))).runs;
-    const { wanted } = this;
+    const { task, wanted } = this;
     const isThere = (runs) => wanted === null || runs.some((run) => run.run === wanted);
     let runs = await latest();
     if (!isThere(runs) && runs.length === this.limit && this.limit < MOST_RUNS) {
@@ -211,7 +214,9 @@ export class TaskView {
     if (isThere(runs)) return { runs, why: "" };
     try {
       const { run } = await ask("log", String(this.id), "--run", String(wanted));
-      return { runs: [...runs, run], why: "" };
+      // A removed task may have had the number.
+      return run.task_name === task.name ? { runs: [...runs, run], why: "" }
+        : { runs, why: format(_("Run $0 is one of $1."), wanted, short(run.task_name)) };
     } catch (error) {
       return { runs, why: error.message };
     }

@@ -1,15 +1,17 @@
 // Work that is never done twice at once.
 
-// A function that starts the work, and does nothing while that goes on: of two clicks one counts.
-export function oneAtATime(work) {
-  let isGoing = false;
+// A function that starts the work, and does nothing while that goes on: of two clicks one counts. Works
+// of different keys go on beside each other.
+export function oneAtATime(work, keyOf = () => null) {
+  const going = new Set();
   return async (...given) => {
-    if (isGoing) return undefined;
-    isGoing = true;
+    const key = keyOf(...given);
+    if (going.has(key)) return undefined;
+    going.add(key);
     try {
       return await work(...given);
     } finally {
-      isGoing = false;
+      going.delete(key);
     }
   };
 }

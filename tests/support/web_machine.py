@@ -160,8 +160,6 @@ class Server:
                    f'#!/bin/sh\necho "$@" >>{self.calls_file}\n'
                    f'if [ -e {self.broken_file} ] && grep -qx "$1" {self.broken_file}; then\n'
                    f'  tail -n 1 {self.broken_file} >&2\n  exit 1\nfi\nexec {program} "$@"\n')
-        with open(self.calls_file, "w", encoding="utf-8"):
-            os.chmod(self.calls_file, 0o666)
         session = os.path.join(tools, "session")
         become = f"setpriv --reuid={user} --regid=65534 --clear-groups " if user else ""
         self.write(session, f"#!/bin/sh\nexec {become}cockpit-bridge\n")
@@ -177,6 +175,8 @@ class Server:
         self.stop()
         if os.path.exists(self.broken_file):
             os.remove(self.broken_file)
+        with open(self.calls_file, "w", encoding="utf-8"):
+            os.chmod(self.calls_file, 0o666)
         with open(os.path.join(WORK, f"ws.{self.port}.log"), "w", encoding="utf-8") as log:
             self.process = subprocess.Popen(
                 ["/usr/lib/cockpit/cockpit-ws", "--no-tls", "--address", "127.0.0.1", "--port", str(self.port),

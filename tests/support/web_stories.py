@@ -56,6 +56,14 @@ def listed(browser, server):
         assert part in text, (part, text)
     switches = browser.all("tbody input[role=switch]")
     same(sorted(one.is_selected() for one in switches), [False, True, True])
+    # What cannot be seen is shown, and a task without a name has its number; what belongs together stays.
+    names = {" ": "Task 4", "so\u00adft": "so\\u00adft", "\u3164": "\\u3164", "tag\U000e0041": "tag\\u{e0041}",
+             "\U0001f468\u200d\U0001f469": "\U0001f468\u200d\U0001f469", "\u2764\ufe0f": "\u2764\ufe0f"}
+    for name in names:
+        add("--daily", "02:30", "--name", name)
+    browser.see("9 tasks")
+    for name in names.values():
+        assert name in column(browser, "name"), (name, column(browser, "name"))
 
 
 @story("a switch on the list switches the task")
@@ -74,8 +82,9 @@ def switched(browser, server):
     browser.script("for (const i of [1, 2]) arguments[0].click()", browser.find("tbody input[role=switch]"))
     wait_for("both are done", lambda: [call.split()[0] for call in server.calls() if "able 1" in call]
              == ["disable", "enable", "disable", "enable"])
-    wait_for("it is on again", lambda: task("Nightly backup")["enabled"] and
-             browser.find("tbody input[role=switch]").is_selected())
+    settle(server)
+    same(len([call for call in server.calls() if "able 1" in call]), 4)
+    same([task("Nightly backup")["enabled"], browser.find("tbody input[role=switch]").is_selected()], [True, True])
     # What was refused is told until it is done.
     server.break_tool("disable")
     browser.find("tbody input[role=switch]").click()
@@ -122,9 +131,10 @@ def unwell_later(browser, server):
     browser.open(server)
     same(sorted(one.accessible_name for one in wait_for("buttons", lambda: browser.shown(".health button"))),
          ["Run now: Backup", "Show the run: Backup", "Take note: Backup"])
-    browser.click("Run now")
+    browser.double_click(browser.named("Run now"))
     browser.see("is running", "tbody")
     browser.see("Backup failed with code 3, just now", ".health")
+    same(len([call for call in server.calls() if call.startswith("run ")]), 1)
     browser.click("Show the run")
     browser.see("no space left", ".output")
     assert "run=1" in browser.driver.current_url, browser.driver.current_url
@@ -269,7 +279,7 @@ def ordered(browser, server):
     assert "sort=name" in browser.driver.current_url and "desc=1" in browser.driver.current_url
     browser.driver.refresh()
     wait_for("again", lambda: column(browser, "name") == ["C", "b", "a10", "a9"])
-    for odd in ("?sort=__proto__", "?sort=constructor", "?q=a&q=b"):
+    for odd in ("?sort=__proto__", "?sort=constructor", "?q=a&q=b", "?failed=0", "%zz", "?q=%E0%A4%A"):
         browser.open(server, odd)
         browser.see("b", "tbody")
 
@@ -339,6 +349,14 @@ def older(browser, server):
     older_runs("Much used", 200, 60)
     browser.open(server, f"task/{number}?run=1")
     browser.see("it is me", ".output")
+    # Another task that gets the number does not get the runs.
+    z("remove", "--yes", str(number))
+    same(add("--daily", "02:30", "--name", "New"), number)
+    browser.see("It has not run yet.")
+    same(browser.shown(".output"), [])
+    browser.open(server, f"task/{number}?run=1")
+    browser.see("Run 1 is one of Much used.")
+    same(browser.shown(".output"), [])
 
 
 @story("a run is started, watched while it prints, and stopped")
@@ -591,6 +609,15 @@ def refused(browser, server):
     browser.double_click(browser.named("Add the task"))
     browser.see("Typed was saved")
     same(len([call for call in server.calls()[before:] if call.startswith("add ")]), 1)
+    # Saved, but something else is wrong: the page goes on to the task, and says so.
+    os.remove("/etc/crontab")
+    browser.open(server, "add")
+    browser.write("Name", "Half")
+    browser.write("Command", "true")
+    browser.click("Add the task")
+    browser.see("cron does not know them all", ".notes")
+    browser.see("Coming runs")
+    same(len([one for one in tasks() if one["name"] == "Half"]), 1)
     same(task("Typed")["schedule"]["date"], "2099-01-01")
 
 
@@ -815,6 +842,7 @@ def live(browser, server):
                         (lambda: os.rename("/var/run/crond.pid", "/var/run/crond.pid.kept"), "Cron is not running"),
                         (lambda: os.rename("/var/run/crond.pid.kept", "/var/run/crond.pid"), "All is well"),
                         (lambda: z("remove", "From the shell", "--yes"), "There is no task yet")):
+        settle(server)
         what()
         begin = time.monotonic()
         browser.see(shown, "main")
@@ -902,6 +930,21 @@ def hide_and_see(browser, server):
     same("Two" in browser.text(), False)
     hide(browser, False)
     browser.see("Two")
+
+
+@story("a page that is opened hidden asks nothing either")
+def opened_hidden(browser, server):
+    add("--daily", "02:30", "--name", "One")
+    unseen = browser.driver.execute_cdp_cmd("Page.addScriptToEvaluateOnNewDocument", {
+        "source": "Object.defineProperty(document, 'hidden', {value: true, configurable: true})"})
+    try:
+        browser.open(server)
+        time.sleep(1)
+        same(server.calls(), [])
+    finally:
+        browser.driver.execute_cdp_cmd("Page.removeScriptToEvaluateOnNewDocument", unseen)
+    hide(browser, False)
+    browser.see("1 task")
 
 
 def hide(browser, is_hidden):
