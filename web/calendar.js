@@ -101,7 +101,7 @@ export class CalendarView {
     const missed = runs.filter((run) => run.isOff).length;
     const count = format(ngettext("$0 run", "$0 runs", runs.length), runs.length);
     const sentences = [missed === 0 ? count + "."
-      : format(ngettext("$0, $1 of them while the machine is off.", "$0, $1 of them while the machine is off.", missed), count, missed)];
+      : format(ngettext("$0, $1 of which will not happen, as the machine is off.", "$0, $1 of which will not happen, as the machine is off.", missed), count, missed)];
     if (end) sentences.push(format(_("There are more than can be shown: what comes after $0 is missing here."), momentText(end)));
     return sentences.join(" ");
   }

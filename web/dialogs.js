@@ -66,8 +66,9 @@ export function openForm({ title, fields, save, subject = null, more = () => [] 
   if (subject) closeWithout({ ...subject, isThere: () => isSaving || subject.isThere() }, dialog);
 }
 
-// Read out when they appear. What was done stays until it is dismissed or the next one comes, what was not
-// done until something else is, or another view is shown.
+// Read out when they appear. What was done stays until it is dismissed, the next one comes, or a second view
+// is shown: the first may be the one that it led to. What was not done stays until something else is, or
+// another view is shown.
 const place = el("div", { class: "notes" });
 
 export function notesPlace() {
@@ -75,18 +76,22 @@ export function notesPlace() {
 }
 
 let isOfNextView = false;
+let isOfLastView = false; // of the view before this one
 
 export function clearFaults() {
   if (place.querySelector(".bad")) fill(place);
 }
 
 // What was told for the view that is shown now stays.
-export function clearFaultsOfView() {
+export function clearNotesOfView() {
   if (!isOfNextView) clearFaults();
+  if (isOfLastView) fill(place);
   isOfNextView = false;
+  isOfLastView = true;
 }
 
 function note(kind, role, text) {
+  isOfLastView = false;
   fill(place, el("div", { class: "note " + kind, role }, el("p", {}, text),
     button(_("Dismiss"), { class: "plain" }, () => fill(place))));
 }

@@ -3,7 +3,7 @@
 import { button, el, fill, isFocusLost, setText } from "./dom.js";
 import { go, goInstead, href, taskPath } from "./address.js";
 import { showAccess } from "./access.js";
-import { clearFaults, tell, tellFault } from "./dialogs.js";
+import { clearFaults, confirm, tell, tellFault } from "./dialogs.js";
 import { Field, Group, check, select } from "./fields.js";
 import { distanceText, momentText } from "./moments.js";
 import { ScheduleFields } from "./schedule-fields.js";
@@ -178,10 +178,8 @@ export class FormView {
       (JSON.stringify(this.value()) !== JSON.stringify(this.start) || this.fields.some((field) => field.isUnreadable()));
   }
 
-  // `task` as the machine has it now: of what the tool wants to be told always, others may have changed the rest.
-  text(task) {
-    const needed = task ? { name: task.name, owner: task.owner, schedule: task.schedule, command: task.command } : {};
-    return JSON.stringify({ version: 1, tasks: [{ ...needed, ...this.changes() }] });
+  text() {
+    return JSON.stringify({ version: 1, tasks: [this.changes()] });
   }
 
   typed() {
@@ -196,7 +194,7 @@ export class FormView {
     this.asked = (this.asked || 0) + 1;
     const number = this.asked;
     try {
-      const answer = await askAbout(this.text(this.id === null ? null : this.model.taskOf(this.id)), "next", "--preview", "--count", COMING,
+      const answer = await askAbout(this.text(), "next", "--preview", "--count", COMING,
         ...(this.id === null ? [] : [String(this.id)]));
       if (number !== this.asked) return null;
       this.showPreview(answer);
@@ -293,13 +291,12 @@ export class FormView {
   }
 
   async store() {
-    const task = this.id === null ? null : (await ask("show", String(this.id))).tasks[0];
     const words = this.id === null ? ["add", "--stdin", "--quiet"]
       : ["edit", String(this.id), "--if-name=" + this.task.name, "--stdin"];
     let said = "";
     let fault = null;
     try {
-      said = await change(words, this.text(task));
+      said = await change(words, this.text());
     } catch (error) {
       // A new one may be saved and something else wrong, which is told with its number.
       if (this.id !== null || !/^\d+$/.test((error.output || "").trim())) throw error;
@@ -333,7 +330,7 @@ export class FormView {
       this.tellChanged(format(_("Task $0 is $1 by now. What stands here can be saved as a new one."), this.id, short(titleOf(task))),
         this.saveAsNew(), this.showNow());
     } else if (JSON.stringify(this.settingsOf(task)) !== this.before) {
-      this.tellChanged(_("This task has been changed elsewhere. Saving changes only what you have changed here."), this.showNow());
+      this.tellChanged(_("This task has been changed elsewhere. Saving changes only what you have changed here; a schedule is changed whole."), this.showNow());
     } else {
       fill(this.changed);
     }
@@ -344,7 +341,10 @@ export class FormView {
   }
 
   showNow() {
-    return button(_("Show it as it is now"), { class: "secondary" }, () => {
+    return button(_("Show it as it is now"), { class: "secondary" }, async () => {
+      const isAgreed = !this.isChanged() || await confirm({ title: _("Show it as it is now?"),
+        text: _("What you have changed here is lost."), action: _("Show it"), isDangerous: true });
+      if (!isAgreed) return;
       this.form = null;
       this.update();
     });

@@ -3,7 +3,7 @@ import { el, fill, isFocusLost, setAttribute, setText } from "./dom.js";
 import { go, here, href } from "./address.js";
 import { watchAccess } from "./access.js";
 import { CalendarView } from "./calendar.js";
-import { clearFaultsOfView, confirm, notesPlace } from "./dialogs.js";
+import { clearNotesOfView, confirm, notesPlace } from "./dialogs.js";
 import { FormView } from "./form.js";
 import { Model } from "./model.js";
 import { zoneNote } from "./moments.js";
@@ -82,7 +82,7 @@ class Page {
     const isFirst = this.view === null;
     if (!isFirst) {
       this.view.close();
-      clearFaultsOfView();
+      clearNotesOfView();
     }
     this.path = path;
     const View = viewOf(path);

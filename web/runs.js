@@ -15,6 +15,8 @@ function durationOf(run) {
   return start && run.state === "running" ? durationText(Math.max(0, now() - start.epoch)) : "";
 }
 
+const LOWEST = 0.7; // of the window, where there is room for the output below a run
+
 class Row {
   constructor(list) {
     this.list = list;
@@ -59,6 +61,8 @@ class Row {
     fill(this.place, this.output.element);
     this.below.hidden = false;
     this.showToggle();
+    const { top, bottom } = this.element.getBoundingClientRect();
+    if (top < 0 || bottom > window.innerHeight * LOWEST) this.element.scrollIntoView({ block: "start" });
   }
 
   shut() {

@@ -13,8 +13,9 @@ class ToolError extends Error {
   }
 }
 
+// Without what is about the words that the page has chosen.
 function inSentences(message) {
-  return message.split("\n").map((line) => line.replace(/^zelosched( [a-z-]+)?: /, "").trim())
+  return message.split(/^usage: /m)[0].split("\n").map((line) => line.replace(/^zelosched( [a-z-]+)?: /, "").trim())
     .filter((line) => line !== "").join("\n");
 }
 

@@ -22,7 +22,8 @@ void fillFromText(const std::string &text, ZELO_SCHED_TASK *task, JsonFaults *fa
     faults->push_back({"tasks", "must be one task, and are " + std::to_string(texts.size())});
     return;
   }
-  fillTask(texts.front(), task, faults);
+  const bool isStored = task->ID != ZELO_SCHED_ID_NEW;
+  fillTask(texts.front(), task, faults, isStored ? Needed::kNone : Needed::kAll);
 }
 
 void fillFromText(const std::string &text, ZELO_SCHED_TASK *task) {

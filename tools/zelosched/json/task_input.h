@@ -7,8 +7,8 @@
 
 #include "json/task_json.h"
 
-// Takes a file with one task and sets what it names, on the defaults or on a stored task, as
-// fillTask does. Throws Failure for what is no JSON at all.
+// Takes a file with one task and sets what it names, on the defaults or on a stored task, of which
+// nothing need be named, as fillTask does. Throws Failure for what is no JSON at all.
 void fillFromText(const std::string &text, ZELO_SCHED_TASK *task, JsonFaults *faults);
 
 // The same for who saves: every fault is told, and thrown as one Failure.

@@ -198,12 +198,14 @@ bool isOneOf(const char *const (&names)[count], const std::string &name) {
 // An object whose members are taken one by one; those that nobody has asked for are none.
 class Members {
  public:
-  Members(std::string place, const Json::Value &object, JsonFaults *faults)
-      : place_(std::move(place)), object_(object), faults_(faults) {
+  Members(std::string place, const Json::Value &object, JsonFaults *faults,
+          Needed needed = Needed::kAll)
+      : place_(std::move(place)), object_(object), faults_(faults), needed_(needed) {
     if (!object_.isObject()) fault("must be an object, not " + quotedText(object_));
   }
 
   bool isObject() const { return object_.isObject(); }
+  bool needsAll() const { return needed_ == Needed::kAll; }
 
   // Null when it is absent.
   const Json::Value *find(const char *name) {
@@ -213,7 +215,7 @@ class Members {
   }
   const Json::Value *require(const char *name) {
     const Json::Value *value = find(name);
-    if (value == nullptr && isObject()) faultOf(name, "is missing");
+    if (value == nullptr && isObject() && needed_ == Needed::kAll) faultOf(name, "is missing");
     return value;
   }
 
@@ -244,6 +246,7 @@ class Members {
   std::string place_;
   const Json::Value &object_;
   JsonFaults *faults_;
+  Needed needed_;
   std::vector<std::string> asked_;
 };
 
@@ -565,8 +568,9 @@ void readCommand(Members *members, ZELO_SCHED_TASK *task) {
   LimitedCommand limited = takeApart(task->Command);
   if (const auto limit = readLimit(members)) limited.limit = *limit;
   const Json::Value *value = members->require("command");
-  if (value == nullptr) return;
-  const auto text = readText(*value, "command", members);
+  if (value == nullptr && members->needsAll()) return;
+  const auto text =
+      value != nullptr ? readText(*value, "command", members) : std::optional(limited.command);
   if (!text) return;
   limited.command = *text;
   const std::string stored = storedCommand(limited);
@@ -709,9 +713,9 @@ void setTimes(const ZELO_SCHED_TASK &task, TaskText *text) {
   }
 }
 
-void fillTask(const TaskText &text, ZELO_SCHED_TASK *task, JsonFaults *faults) {
+void fillTask(const TaskText &text, ZELO_SCHED_TASK *task, JsonFaults *faults, Needed needed) {
   const size_t before = faults->size();
-  Members members(text.place, text.object, faults);
+  Members members(text.place, text.object, faults, needed);
   if (!members.isObject()) return;
   for (const char *name : kReadOnly) members.find(name);
   readTaskName(&members, task);

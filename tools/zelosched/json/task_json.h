@@ -51,7 +51,9 @@ void setTimes(const ZELO_SCHED_TASK &task, TaskText *text);
 // Sets what the text names, on the defaults or on a stored task. Members that are absent keep what
 // the task has; another kind of schedule, or another day of it, takes the start date away. Without
 // a fault the task is fit to be saved.
-void fillTask(const TaskText &text, ZELO_SCHED_TASK *task, JsonFaults *faults);
+enum class Needed { kAll, kNone };  // of what a file must say of each task
+void fillTask(const TaskText &text, ZELO_SCHED_TASK *task, JsonFaults *faults,
+              Needed needed = Needed::kAll);
 
 // Each on a line of standard error.
 void complainOf(const JsonFaults &faults);
