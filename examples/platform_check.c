@@ -16,8 +16,11 @@
  * What crashes, hangs or exits in the calls of a group is named, and the next group goes on.
  * 0 when all hold, 1 when one does not, 2 for a wrong call, and for --system of who is not root.
  *
- *   cc platform_check.c -I/opt/appliance/include -L/opt/appliance/lib -lzelosdk -lzelocore \
+ *   cc platform_check.c -I/opt/appliance/include -I../platform/libzelocore/include \
+ *     -I../platform/libzelosdk/include -L/opt/appliance/lib -lzelosdk -lzelocore \
  *     -Wl,-rpath,/opt/appliance/lib -o platform_check
+ *
+ * On armhf with -D_FILE_OFFSET_BITS=64 -D_TIME_BITS=64 too.
  */
 #include <dirent.h>
 #include <errno.h>
