@@ -557,7 +557,7 @@ static void check_exec(void) {
 static void note_what_is_kept(int descriptor, pid_t session) {
   struct stat here;
   struct stat ours;
-  shared->kept[0] = fcntl(descriptor, F_GETFD) == 0;
+  shared->kept[0] = descriptor >= 0 && fcntl(descriptor, F_GETFD) >= 0;
   shared->kept[1] = stat(".", &here) == 0 && stat(directory, &ours) == 0 &&
                     here.st_dev == ours.st_dev && here.st_ino == ours.st_ino;
   shared->kept[2] = getsid(0) == session;
@@ -577,8 +577,8 @@ static void check_fork(void) {
   const pid_t session = getsid(0);
   snprintf(path, sizeof path, "%s/by_child", directory);
   memset(shared->kept, 0, sizeof shared->kept);
-  if (chdir(directory) != 0 || (descriptor = dup(0)) < 0) perror(directory);
-  if (descriptor < 0) descriptor = open(directory, O_RDONLY);
+  descriptor = open(directory, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (descriptor < 0 || chdir(directory) != 0) perror(directory);
   umask(027);
   signal(SIGCHLD, on_child);
   forked = QLIBCProcForkChildNoWait();
