@@ -11,12 +11,16 @@
  *                               puts a plugin into that directory too, where this platform
  *                               looks for those of "platform_check"
  *
- * Prints one line for each contract, "ok CALL: contract" or "not ok CALL: contract".
+ * Prints one line for each contract, "ok CALL: contract" or "not ok CALL: contract", and the sum,
+ * "N hold, M do not", as the last line, on standard error.
  * What crashes, hangs or exits in the calls of a group is named, and the next group goes on.
- * 0 when all hold, 1 when one does not, 2 for a wrong call.
+ * 0 when all hold, 1 when one does not, 2 for a wrong call, and for --system of who is not root.
  *
- *   cc platform_check.c -I/opt/appliance/include -L/opt/appliance/lib -lzelosdk -lzelocore \
+ *   cc platform_check.c -I/opt/appliance/include -I../platform/libzelocore/include \
+ *     -I../platform/libzelosdk/include -L/opt/appliance/lib -lzelosdk -lzelocore \
  *     -Wl,-rpath,/opt/appliance/lib -o platform_check
+ *
+ * On armhf with -D_FILE_OFFSET_BITS=64 -D_TIME_BITS=64 too.
  */
 #include <dirent.h>
 #include <errno.h>
@@ -36,10 +40,14 @@
 /* A group that came to its end exits so: a status that no call of a platform has a reason for. */
 enum { USAGE = 2, HELD = 87, FAILED = 88 };
 enum { PATIENCE = 60, ROOM = 65536, CONTRACT_ROOM = 128, ENTRIES = 100, KEPT = 1000, GUARD = 0x5a };
+enum { LONG = 16384, LIMIT = 5, SOMEONE = 1, MANY = 1000 };
 
 /* What the groups, each a process of its own, leave to this one. */
 static struct {
   char current[CONTRACT_ROOM]; /* the contract that is being checked */
+  int sums[2];                 /* of the contracts that do not hold, and of those that do */
+  int worked;                  /* in a child: 1, or -1 when not; 0 as long as it has not ended */
+  int kept[4];                 /* by a child: descriptors, directory, session, umask */
   int counts[2];               /* the power times of before, -1 while nothing was changed */
   ZELO_AUTOPOWER times[2][KEPT];
 } * shared;
@@ -52,6 +60,15 @@ static void contract(int holds) {
   printf("%s %s\n", holds ? "ok" : "not ok", shared->current);
   fflush(stdout);
   failed += !holds;
+  ++shared->sums[holds];
+}
+
+/* What does not hold, and why. 1, the number of faults. */
+static int fault(const char *what, const char *why) {
+  printf("not ok %s%s\n", what, why);
+  fflush(stdout);
+  ++shared->sums[0];
+  return 1;
 }
 
 /* Noted before the call is made, in case it does not come back. */
@@ -82,6 +99,22 @@ static void write_text(const char *path, const char *text) {
   }
 }
 
+/* Of a file of any length, with a zero byte behind it; null without one. */
+static char *whole_text(const char *path, struct stat *status) {
+  FILE *stream = fopen(path, "re");
+  char *text = NULL;
+  memset(status, 0, sizeof *status);
+  if (stream == NULL) return NULL;
+  if (fstat(fileno(stream), status) == 0 && S_ISREG(status->st_mode))
+    text = calloc((size_t)status->st_size + 1, 1);
+  if (text != NULL && fread(text, 1, (size_t)status->st_size, stream) != (size_t)status->st_size) {
+    free(text);
+    text = NULL;
+  }
+  fclose(stream);
+  return text;
+}
+
 /* Whether bytes that no call may write to are as they were set. */
 static int untouched(const void *bytes, size_t count) {
   size_t i = 0;
@@ -97,6 +130,13 @@ static const char *read_text(const char *path) {
   count = fread(text, 1, sizeof text - 1, stream);
   fclose(stream);
   text[count] = '\0';
+  return text;
+}
+
+/* As long as the command of a task gets in the store. */
+static const char *long_text(void) {
+  static char text[LONG + 1];
+  memset(text, 'x', LONG);
   return text;
 }
 
@@ -152,6 +192,9 @@ static void check_hashes(void) {
     found += is(QLIBCSzHashGetValue(hash, key), key);
   }
   CONTRACT(QLIBCSzHashSetValue, "the hash grows", found == 1000);
+  CONTRACT(QLIBCSzHashSetValue, "a value of 16384 bytes",
+           QLIBCSzHashSetValue(&hash, "key", long_text()) == 0 &&
+               is(QLIBCSzHashGetValue(hash, "key"), long_text()));
   CONTRACT(QLIBCSzHashEnumKey, "every key once, and how many",
            QLIBCSzHashEnumKey(hash, &keys) == 1002 && QLIBCSzListCount(keys) == 1002);
   QLIBCHashRemoveAll(NULL);
@@ -183,6 +226,9 @@ static void check_lists(void) {
   CONTRACT(QLIBCStrSep, "the pieces that are not empty, appended",
            QLIBCStrSep(",a,,b;c", ",;", &list) == 3 && is(QLIBCSzListGet(list, 1000), "a") &&
                is(QLIBCSzListGet(list, 1002), "c"));
+  CONTRACT(
+      QLIBCSzListPush, "a text of 16384 bytes",
+      QLIBCSzListPush(&list, long_text()) == 1004 && is(QLIBCSzListGet(list, 1003), long_text()));
   CONTRACT(QLIBCSzListFree, "null is allowed", (QLIBCSzListFree(list), QLIBCSzListFree(NULL), 1));
 }
 
@@ -196,7 +242,7 @@ static PSZHASH hash_with(const char *key, const char *value) {
 
 /* The value of a key in the file. */
 static const char *stored(const char *section, const char *key) {
-  static char value[1024];
+  static char value[LONG + 1];
   PSZHASH hash = QLIBCSzHashAlloc(1);
   const char *found =
       QLIBCFileGetSection(file, section, &hash) == 1 ? QLIBCSzHashGetValue(hash, key) : NULL;
@@ -226,14 +272,16 @@ static void check_reading(void) {
   PSZHASH two = hash_with("key", "two");
   PSZLIST list = QLIBCSzListAlloc(1);
   char other[300];
+  int touches = 0;
   CONTRACT(QLIBCFileExist, "0 for what is not there", QLIBCFileExist(file) == 0);
   CONTRACT(QLIBCFileExist, "0 for null", QLIBCFileExist(NULL) == 0);
   CONTRACT(QLIBCFileEnumSection, "a file that is not there is told",
            fails(QLIBCFileEnumSection(file, &list), 0x0900));
   CONTRACT(QLIBCFileGetSection, "a file that is not there is told",
            fails(QLIBCFileGetSection(file, "1", &hash), 0x0900));
-  CONTRACT(QLIBCFileTouch, "an empty file is made",
-           QLIBCFileTouch(file) == 0 && access(file, F_OK) == 0 && *read_text(file) == '\0');
+  CONTRACT(
+      QLIBCFileTouch, "an empty file is made",
+      (touches = QLIBCFileTouch(file) == 0 && access(file, F_OK) == 0 && *read_text(file) == '\0'));
   CONTRACT(QLIBCFileExist, "1 for what is there", QLIBCFileExist(file) == 1);
   write_text(file, "any text\n");
   CONTRACT(QLIBCFileTouch, "a file that is there keeps what is in it",
@@ -242,6 +290,10 @@ static void check_reading(void) {
   QLIBCFileAddSection(file, "2", two, 0);
   QLIBCFileAddSection(file, "1", one, 0);
   CONTRACT(QLIBCFileEnumSection, "the names in the order of the file", is(sections(), "2 1 "));
+  QLIBCSzListPush(&list, "before");
+  CONTRACT(QLIBCFileEnumSection, "the names are appended",
+           QLIBCFileEnumSection(file, &list) == 2 && QLIBCSzListCount(list) == 3 &&
+               is(QLIBCSzListGet(list, 0), "before") && is(QLIBCSzListGet(list, 2), "1"));
   CONTRACT(QLIBCFileGetSection, "1 when the section was read",
            QLIBCFileGetSection(file, "2", &hash) == 1);
   CONTRACT(QLIBCFileGetSection, "its values",
@@ -251,9 +303,9 @@ static void check_reading(void) {
   CONTRACT(QLIBCFileGetSection, "0 when there is no such section",
            QLIBCFileGetSection(file, "3", &hash) == 0);
   snprintf(other, sizeof other, "%s/other", directory);
-  CONTRACT(
-      QLIBCFileTouch, "a symbolic link is not followed",
-      symlink(file, other) == 0 && (unlink(file), QLIBCFileTouch(other), access(file, F_OK) != 0));
+  touches = touches && symlink(file, other) == 0 && unlink(file) == 0;
+  CONTRACT(QLIBCFileTouch, "a symbolic link is not followed",
+           touches && (QLIBCFileTouch(other), access(file, F_OK) != 0));
   unlink(other);
   CONTRACT(QLIBCFileExist, "1 for what cannot be told",
            symlink(other, other) == 0 && QLIBCFileExist(other) == 1);
@@ -264,11 +316,32 @@ static void check_reading(void) {
   QLIBCSzListFree(list);
 }
 
+/* Gives the file a mode, and where that can be done a strange owner. */
+static int is_someones; /* now */
+
+static void give_file_away(void) {
+  if (chmod(file, 0640) != 0) perror(file);
+  is_someones = chown(file, SOMEONE, SOMEONE) == 0;
+}
+
+/* After a change, if it was one. */
+#define KEEPS_OWNER_AND_MODE(call, changed)                                         \
+  do {                                                                              \
+    struct stat is_now;                                                             \
+    const int is_there = (changed) && stat(file, &is_now) == 0;                     \
+    CONTRACT(call, "the mode stays", is_there && (is_now.st_mode & 07777) == 0640); \
+    if (is_someones) {                                                              \
+      CONTRACT(call, "the owner stays",                                             \
+               is_there &&is_now.st_uid == SOMEONE && is_now.st_gid == SOMEONE);    \
+    }                                                                               \
+  } while (0)
+
 static void check_changing(void) {
   char bytes[256];
   struct stat before;
   struct stat after;
   int i = 0;
+  int changed = 0;
   PSZHASH one = hash_with("key", "one");
   PSZHASH two = hash_with("other", "two");
   for (i = 1; i < 256; ++i) bytes[i - 1] = (char)i;
@@ -280,68 +353,128 @@ static void check_changing(void) {
   CONTRACT(QLIBCFileAddSection, "a section that is there is refused",
            fails(QLIBCFileAddSection(file, "1", two, 0), 0x0D00) && is(stored("1", "key"), "one"));
   QLIBCSzHashSetValue(&two, "bytes", bytes);
-  QLIBCFileAddSection(file, "2", two, 0);
+  QLIBCSzHashSetValue(&two, "run hour", "7");
+  QLIBCSzHashSetValue(&two, "long", long_text());
+  give_file_away();
+  changed = QLIBCFileAddSection(file, "2", two, 0) == 1;
   CONTRACT(QLIBCFileAddSection, "every byte but zero reads back", is(stored("2", "bytes"), bytes));
+  CONTRACT(QLIBCFileAddSection, "a key with a blank reads back", is(stored("2", "run hour"), "7"));
+  CONTRACT(QLIBCFileAddSection, "a value of 16384 bytes reads back",
+           is(stored("2", "long"), long_text()));
   CONTRACT(QLIBCFileAddSection, "the other sections stay",
            is(sections(), "1 2 ") && is(stored("1", "key"), "one"));
+  KEEPS_OWNER_AND_MODE(QLIBCFileAddSection, changed);
 
-  chmod(file, 0640);
-  stat(file, &before);
+  give_file_away();
+  changed = stat(file, &before) == 0;
   CONTRACT(QLIBCFileSetSection, "1 when it was replaced",
-           QLIBCFileSetSection(file, "1", 0, two, 0) == 1);
-  stat(file, &after);
+           (i = QLIBCFileSetSection(file, "1", 0, two, 0)) == 1);
+  changed = changed && i == 1 && stat(file, &after) == 0;
   CONTRACT(QLIBCFileSetSection, "no key of before is left",
            is(stored("1", "other"), "two") && is(stored("1", "key"), "(none)"));
   CONTRACT(QLIBCFileSetSection, "the order stays", is(sections(), "1 2 "));
   CONTRACT(QLIBCFileSetSection, "the other sections keep what they hold",
            is(stored("2", "other"), "two") && is(stored("2", "bytes"), bytes));
-  CONTRACT(QLIBCFileSetSection, "the file is replaced as a whole", before.st_ino != after.st_ino);
-  CONTRACT(QLIBCFileSetSection, "the mode stays", (after.st_mode & 07777) == 0640);
+  CONTRACT(QLIBCFileSetSection, "the file is replaced as a whole",
+           changed && before.st_ino != after.st_ino);
+  KEEPS_OWNER_AND_MODE(QLIBCFileSetSection, changed);
   CONTRACT(QLIBCFileSetSection, "0 when there is no such section, and nothing is written",
            QLIBCFileSetSection(file, "3", 0, one, 0) == 0 && is(sections(), "1 2 "));
 
-  CONTRACT(QLIBCFileRemoveSection, "1 when it was removed", QLIBCFileRemoveSection(file, "1") == 1);
+  give_file_away();
+  CONTRACT(QLIBCFileRemoveSection, "1 when it was removed",
+           (changed = QLIBCFileRemoveSection(file, "1") == 1));
   CONTRACT(QLIBCFileRemoveSection, "that section and no other is gone", is(sections(), "2 "));
   CONTRACT(QLIBCFileRemoveSection, "the other sections keep what they hold",
            is(stored("2", "other"), "two") && is(stored("2", "bytes"), bytes));
+  KEEPS_OWNER_AND_MODE(QLIBCFileRemoveSection, changed);
   CONTRACT(QLIBCFileRemoveSection, "0 when there is none", QLIBCFileRemoveSection(file, "1") == 0);
-
-  /* As a copy is whose writer was killed. */
-  stat(file, &after);
-  if (truncate(file, after.st_size * 2 / 3) != 0) perror(file);
-  CONTRACT(QLIBCFileEnumSection, "a file that is cut off is told",
-           is(sections(), "(failed)") && QLIBCErrGet() == 0x0B00);
-  CONTRACT(QLIBCFileAddSection, "a file that is cut off is not built on",
-           fails(QLIBCFileAddSection(file, "9", one, 0), 0x0B00));
   unlink(file);
   QLIBCSzHashFree(one);
   QLIBCSzHashFree(two);
 }
 
-/* Half of a file, the rest of which comes a moment later. */
-static void check_copied(void) {
+/* As a copy is whose writer was killed. */
+static void check_cut_off(void) {
   PSZHASH hash = hash_with("key", "value");
-  char *text = NULL;
+  struct stat whole;
+  int is_cut = 0;
+  unlink(file);
+  is_cut = QLIBCFileAddSection(file, "1", hash, 0) == 1 &&
+           QLIBCFileAddSection(file, "2", hash, 0) == 1 && stat(file, &whole) == 0 &&
+           whole.st_size > 2 && truncate(file, whole.st_size * 2 / 3) == 0;
+  CONTRACT(QLIBCFileEnumSection, "a file that is cut off is told",
+           is_cut && is(sections(), "(failed)") && QLIBCErrGet() == 0x0B00);
+  CONTRACT(QLIBCFileGetSection, "a file that is cut off is told",
+           is_cut && fails(QLIBCFileGetSection(file, "1", &hash), 0x0B00));
+  CONTRACT(QLIBCFileAddSection, "a file that is cut off is not built on",
+           is_cut && fails(QLIBCFileAddSection(file, "9", hash, 0), 0x0B00));
+  CONTRACT(QLIBCFileSetSection, "a file that is cut off is not built on",
+           is_cut && fails(QLIBCFileSetSection(file, "1", 0, hash, 0), 0x0B00));
+  CONTRACT(QLIBCFileRemoveSection, "a file that is cut off is not built on",
+           is_cut && fails(QLIBCFileRemoveSection(file, "1"), 0x0B00));
+  unlink(file);
+  QLIBCSzHashFree(hash);
+}
+
+static int many_sections(void) {
+  PSZHASH hash = hash_with("key", "value");
+  PSZLIST list = QLIBCSzListAlloc(1);
+  char name[16];
+  int found = 0;
+  int i = 0;
+  unlink(file);
+  for (i = 0; i < MANY; ++i) {
+    snprintf(name, sizeof name, "%d", i);
+    QLIBCFileAddSection(file, name, hash, 0);
+  }
+  QLIBCFileEnumSection(file, &list);
+  for (i = 0; i < MANY; ++i) {
+    snprintf(name, sizeof name, "%d", i);
+    found += is(QLIBCSzListGet(list, i), name) && is(stored(name, "key"), "value");
+  }
+  unlink(file);
+  QLIBCSzHashFree(hash);
+  QLIBCSzListFree(list);
+  return found;
+}
+
+static void check_many_sections(void) {
+  CONTRACT(QLIBCFileAddSection, "there is room for a thousand", many_sections() == MANY);
+}
+
+/* The sections of a file of which the first bytes are there, and the others a moment later. */
+static const char *copied_sections(const char *second, int parts) {
+  PSZHASH hash = hash_with("key", "value");
+  const char *found = NULL;
+  char *bytes = NULL;
   struct stat whole;
   pid_t copier = 0;
   unlink(file);
   QLIBCFileAddSection(file, "1", hash, 0);
-  QLIBCFileAddSection(file, "copied", hash, 0);
+  QLIBCFileAddSection(file, second, hash, 0);
   QLIBCSzHashFree(hash);
-  stat(file, &whole);
-  text = strdup(read_text(file));
-  if (truncate(file, whole.st_size / 2) != 0) perror(file);
+  bytes = whole_text(file, &whole);
+  if (bytes == NULL || truncate(file, parts == 0 ? 0 : whole.st_size / parts) != 0) return "(none)";
   copier = fork();
   if (copier == 0) {
+    int out = -1;
     usleep(10000);
-    write_text(file, text);
-    _exit(0);
+    out = open(file, O_WRONLY | O_CLOEXEC);
+    _exit(out < 0 || write(out, bytes, (size_t)whole.st_size) != whole.st_size);
   }
-  CONTRACT(QLIBCFileEnumSection, "a file that is being copied is waited for",
-           is(sections(), "1 copied "));
+  found = sections();
   waitpid(copier, NULL, 0);
-  free(text);
+  free(bytes);
   unlink(file);
+  return found;
+}
+
+static void check_copied(void) {
+  CONTRACT(QLIBCFileEnumSection, "a file that is being copied is waited for",
+           is(copied_sections("copied", 2), "1 copied "));
+  CONTRACT(QLIBCFileEnumSection, "a file of which no byte is there yet is waited for",
+           is(copied_sections("empty", 0), "1 empty "));
 }
 
 /* Who changes a file through a link would change another one, or take the link away. */
@@ -370,16 +503,16 @@ static void check_links(void) {
 }
 
 static void check_lines(void) {
-  struct stat now;
+  int changed = 0;
   CONTRACT(QLIBCFileSetLine, "0 when there is nothing to remove",
            QLIBCFileSetLine(file, "key", NULL, 0) == 0);
   CONTRACT(QLIBCFileSetLine, "a value without a file is refused",
            fails(QLIBCFileSetLine(file, "key", "a line", 0), 0x0900) && access(file, F_OK) != 0);
   write_text(file, "first\nhas the key\nhas the key too\n");
-  chmod(file, 0640);
+  give_file_away();
   CONTRACT(QLIBCFileSetLine, "the first line with the key is replaced",
-           QLIBCFileSetLine(file, "key", "new", 0) == 1 &&
-               is(read_text(file), "first\nnew\nhas the key too\n"));
+           (changed = QLIBCFileSetLine(file, "key", "new", 0) == 1 &&
+                      is(read_text(file), "first\nnew\nhas the key too\n")));
   CONTRACT(QLIBCFileSetLine, "where no line has it, one is appended",
            QLIBCFileSetLine(file, "none", "last", 0) == 1 &&
                is(read_text(file), "first\nnew\nhas the key too\nlast\n"));
@@ -389,47 +522,214 @@ static void check_lines(void) {
   CONTRACT(QLIBCFileSetLine, "a value with a line feed is refused",
            fails(QLIBCFileSetLine(file, "new", "a\nb", 0), 0x0D00) &&
                is(read_text(file), "first\nnew\nlast\n"));
-  CONTRACT(QLIBCFileSetLine, "the mode stays",
-           stat(file, &now) == 0 && (now.st_mode & 07777) == 0640);
+  KEEPS_OWNER_AND_MODE(QLIBCFileSetLine, changed);
   unlink(file);
 }
 
 /* ---- processes -------------------------------------------------------------------------- */
 
-static void check_processes(void) {
-  char path[300];
+static void check_exec(void) {
+  int exits = 0;
   int status = 0;
   pid_t child = 0;
-  snprintf(path, sizeof path, "%s/by_child", directory);
-  CONTRACT(QLIBCExec, "the exit status", QLIBCExec("/bin/sh", "-c", "exit 7", NULL) == 7);
+  CONTRACT(QLIBCExec, "the exit status", (exits = QLIBCExec("/bin/sh", "-c", "exit 7", NULL) == 7));
   CONTRACT(QLIBCExec, "arguments arrive as they are",
            QLIBCExec("/bin/sh", "-c", "test \"$1\" = 'a  $b'", "sh", "a  $b", NULL) == 0);
+  setenv("PLATFORM_CHECK", "a  b", 1);
+  CONTRACT(QLIBCExec, "the environment arrives",
+           QLIBCExec("/bin/sh", "-c", "test \"$PLATFORM_CHECK\" = 'a  b'", NULL) == 0);
   CONTRACT(QLIBCExec, "not 0 for what a signal ended",
-           QLIBCExec("/bin/sh", "-c", "kill -9 $$", NULL) != 0);
+           exits && QLIBCExec("/bin/sh", "-c", "kill -9 $$", NULL) != 0);
   CONTRACT(QLIBCExec, "-1 when the program cannot be started",
            fails(QLIBCExec("/nonexistent", NULL), 0x2A00));
+  child = fork();
+  if (child == 0) _exit(3);
+  CONTRACT(QLIBCExec, "a child of the caller is still there to be waited for",
+           QLIBCExec("/bin/sh", "-c", "exit 7", NULL) == 7 && waitpid(child, &status, 0) == child &&
+               WIFEXITED(status) && WEXITSTATUS(status) == 3);
   signal(SIGCHLD, SIG_IGN);
   CONTRACT(QLIBCExec, "the exit status for a caller who ignores his children",
            QLIBCExec("/bin/sh", "-c", "exit 7", NULL) == 7);
   signal(SIGCHLD, SIG_DFL);
-  status = QLIBCProcForkChildNoWait();
-  if (status == 0) {
+}
+
+/* What a child finds that is not the caller's alone. */
+static void note_what_is_kept(int descriptor, pid_t session) {
+  struct stat here;
+  struct stat ours;
+  shared->kept[0] = descriptor >= 0 && fcntl(descriptor, F_GETFD) >= 0;
+  shared->kept[1] = stat(".", &here) == 0 && stat(directory, &ours) == 0 &&
+                    here.st_dev == ours.st_dev && here.st_ino == ours.st_ino;
+  shared->kept[2] = getsid(0) == session;
+  shared->kept[3] = umask(0) == 027;
+}
+
+static void on_child(int number) {
+  (void)number;
+}
+
+static void check_fork(void) {
+  char path[300];
+  struct sigaction action;
+  int descriptor = -1;
+  int forked = 0;
+  int i = 0;
+  const pid_t session = getsid(0);
+  snprintf(path, sizeof path, "%s/by_child", directory);
+  memset(shared->kept, 0, sizeof shared->kept);
+  descriptor = open(directory, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (descriptor < 0 || chdir(directory) != 0) perror(directory);
+  umask(027);
+  signal(SIGCHLD, on_child);
+  forked = QLIBCProcForkChildNoWait();
+  if (forked == 0) {
+    note_what_is_kept(descriptor, session);
     close(open(path, O_CREAT | O_WRONLY | O_CLOEXEC, 0600));
     _exit(0);
   }
-  CONTRACT(QLIBCProcForkChildNoWait, "1 for the caller", status == 1);
-  for (status = 0; status < 1000 && access(path, F_OK) != 0; ++status) usleep(10000);
+  CONTRACT(QLIBCProcForkChildNoWait, "1 for the caller", forked == 1);
+  CONTRACT(QLIBCProcForkChildNoWait, "the handling of SIGCHLD stays",
+           forked == 1 && sigaction(SIGCHLD, NULL, &action) == 0 && action.sa_handler == on_child);
+  signal(SIGCHLD, SIG_DFL);
+  for (i = 0; i < 1000 && access(path, F_OK) != 0; ++i) usleep(10000);
   CONTRACT(QLIBCProcForkChildNoWait, "0 for the child, which runs", access(path, F_OK) == 0);
   CONTRACT(QLIBCProcForkChildNoWait, "there is no child to wait for",
-           waitpid(-1, NULL, WNOHANG) == -1 && errno == ECHILD);
+           forked == 1 && waitpid(-1, NULL, WNOHANG) == -1 && errno == ECHILD);
+  CONTRACT(QLIBCProcForkChildNoWait, "the child keeps descriptors", shared->kept[0]);
+  CONTRACT(QLIBCProcForkChildNoWait, "the child keeps the directory", shared->kept[1]);
+  CONTRACT(QLIBCProcForkChildNoWait, "the child keeps the session", shared->kept[2]);
+  CONTRACT(QLIBCProcForkChildNoWait, "the child keeps the umask", shared->kept[3]);
   unlink(path);
-  CONTRACT(QLIBCProcAlive, "1 for this process", QLIBCProcAlive(getpid()) == 1);
+}
+
+static void check_alive(void) {
+  int lives = 0;
+  pid_t child = 0;
+  CONTRACT(QLIBCProcAlive, "1 for this process", (lives = QLIBCProcAlive(getpid()) == 1));
   child = fork();
   if (child == 0) _exit(0);
-  waitid(P_PID, (id_t)child, NULL, WEXITED | WNOWAIT);
-  CONTRACT(QLIBCProcAlive, "0 for one that nobody has waited for yet", QLIBCProcAlive(child) == 0);
-  waitpid(child, NULL, 0);
-  CONTRACT(QLIBCProcAlive, "0 for one that is gone", QLIBCProcAlive(child) == 0);
+  lives = lives && child > 0 && waitid(P_PID, (id_t)child, NULL, WEXITED | WNOWAIT) == 0;
+  CONTRACT(QLIBCProcAlive, "0 for one that nobody has waited for yet",
+           lives && QLIBCProcAlive(child) == 0);
+  lives = lives && waitpid(child, NULL, 0) == child;
+  CONTRACT(QLIBCProcAlive, "0 for one that is gone", lives && QLIBCProcAlive(child) == 0);
+}
+
+/* ---- in children ------------------------------------------------------------------------- */
+
+/* Calls that are made in a process and then in a child of it, which has its memory and none of its
+ * threads. */
+static int error_works(void) {
+  const int line = (int)getpid(); /* none that was set before */
+  QLIBCErrSetEx(7, "a.c", line);
+  return QLIBCErrGet() == 7 && is(QLIBCErrorGetFile(), "a.c") && QLIBCErrorGetLine() == line;
+}
+
+static int hash_works(void) {
+  PSZHASH hash = hash_with("key", "value");
+  const int works = is(QLIBCSzHashGetValue(hash, "key"), "value");
+  QLIBCSzHashFree(hash);
+  return works;
+}
+
+static int touch_works(void) {
+  char path[300];
+  snprintf(path, sizeof path, "%s/touched", directory);
+  unlink(path);
+  return QLIBCFileTouch(path) == 0 && unlink(path) == 0;
+}
+
+static int sections_work(void) {
+  return is(sections(), "1 ");
+}
+
+static int section_works(void) {
+  return is(stored("1", "key"), "value");
+}
+
+static int exec_works(void) {
+  return QLIBCExec("/bin/sh", "-c", "exit 7", NULL) == 7;
+}
+
+static int alive_works(void) {
+  return QLIBCProcAlive(getpid()) == 1 && QLIBCProcAlive(1) == 1;
+}
+
+static int user_works(void) {
+  PZELOUSER user = NULL;
+  const int works =
+      ZELOUserGetByUID(0, &user) == 0 && user != NULL && user->uid == 0 && user->szName != NULL;
+  if (works) ZELOUserFree(user);
+  return works;
+}
+
+static int decoding_works(void) {
+  char back[8];
+  size_t size = sizeof back;
+  return ZELOEncodingBase64Decode("YSBiPw==", 8, back, &size) == 1 && size == 4;
+}
+
+static const struct {
+  const char *call;
+  int (*works)(void);
+} calls[] = {{"QLIBCErrSetEx", error_works},
+             {"QLIBCSzHashGetValue", hash_works},
+             {"QLIBCFileTouch", touch_works},
+             {"QLIBCFileEnumSection", sections_work},
+             {"QLIBCFileGetSection", section_works},
+             {"QLIBCExec", exec_works},
+             {"QLIBCProcAlive", alive_works},
+             {"ZELOUserGetByUID", user_works},
+             {"ZELOEncodingBase64Decode", decoding_works}};
+
+/* 1 when it does in the child that this makes, before the time is over. */
+static int works_in_child(int (*works)(void), int (*forks)(void)) {
+  int result = 0;
+  int i = 0;
+  shared->worked = 0;
+  result = forks();
+  if (result == 0) {
+    alarm(LIMIT);
+    shared->worked = works() ? 1 : -1;
+    _exit(0);
+  }
+  for (i = 0; result > 0 && i < LIMIT * 200 && *(volatile int *)&shared->worked == 0; ++i)
+    usleep(5000);
+  return result > 0 && *(volatile int *)&shared->worked == 1;
+}
+
+static int plain_fork(void) {
+  return (int)fork();
+}
+
+static void check_forked(void) {
+  PSZHASH hash = hash_with("key", "value");
+  size_t i = 0;
+  unlink(file);
+  QLIBCFileAddSection(file, "1", hash, 0);
+  QLIBCSzHashFree(hash);
+  for (i = 0; i < sizeof calls / sizeof *calls; ++i) {
+    int works = 0;
+    alarm(PATIENCE);
+    snprintf(shared->current, CONTRACT_ROOM, "%s: works in a forked child too", calls[i].call);
+    works = calls[i].works();
+    contract(works && works_in_child(calls[i].works, plain_fork));
+    snprintf(shared->current, CONTRACT_ROOM, "%s: works in the child of QLIBCProcForkChildNoWait",
+             calls[i].call);
+    contract(works && works_in_child(calls[i].works, QLIBCProcForkChildNoWait));
+  }
+  unlink(file);
+}
+
+/* As root, with the effective id of another, as a run has who may not read all that root may. */
+static void check_other_user(void) {
+  const int user = user_works();
+  const int alive = QLIBCProcAlive(getppid()) == 1;
+  if (geteuid() != 0 || seteuid(SOMEONE) != 0) return;
+  CONTRACT(ZELOUserGetByUID, "as before with the effective id of another", user && user_works());
+  CONTRACT(QLIBCProcAlive, "as before with the effective id of another",
+           alive && QLIBCProcAlive(getppid()) == 1);
+  if (seteuid(0) != 0) perror("seteuid");
 }
 
 /* ---- plugins ------------------------------------------------------------------------------ */
@@ -453,16 +753,39 @@ static void check_plugins(void) {
 
 static void check_users(void) {
   PZELOUSER user = NULL;
-  PZELOUSER none = NULL;
+  ZELOUSER guard;
+  PZELOUSER none = &guard;
+  int highest = 0;
+  memset(&guard, 0, sizeof guard);
   CONTRACT(ZELOUserGetByUID, "0, and the user", ZELOUserGetByUID(0, &user) == 0 && user != NULL);
   CONTRACT(ZELOUserGetByUID, "his name, id, home directory and shell",
            user != NULL && user->szName != NULL && user->szName[0] != '\0' && user->uid == 0 &&
                user->szHome != NULL && user->szHome[0] == '/' && user->szShell != NULL);
   CONTRACT(ZELOUserGetByUID, "a user who is not there is told",
-           fails(ZELOUserGetByUID(0x7ffffffd, &none), 0x2000) && none == NULL);
-  CONTRACT(ZELOUserGetByUID, "the highest id is one of a user",
-           fails(ZELOUserGetByUID(4294967294U, &none), 0x2000) && none == NULL);
+           fails(ZELOUserGetByUID(0x7ffffffd, &none), 0x2000));
+  CONTRACT(ZELOUserGetByUID, "the pointer is left alone on failure", none == &guard);
+  none = &guard;
+  highest = ZELOUserGetByUID(4294967294U, &none);
+  CONTRACT(ZELOUserGetByUID, "the highest id is looked up like any other",
+           highest == 0 ? none != NULL && none->uid == 4294967294U
+                        : fails(highest, 0x2000) && none == &guard);
+  if (none != &guard) ZELOUserFree(none);
   CONTRACT(ZELOUserFree, "null is allowed", (ZELOUserFree(user), ZELOUserFree(NULL), 1));
+}
+
+static void check_long_base64(void) {
+  static char bytes[LONG * 3 / 4 - 1];
+  static char text[LONG + 1];
+  static char back[sizeof bytes];
+  size_t size = sizeof back;
+  size_t i = 0;
+  int encoded = 0;
+  for (i = 0; i < sizeof bytes; ++i) bytes[i] = (char)(i % 251);
+  encoded = SzBase64EncodeFull(bytes, sizeof bytes, text, sizeof text, 1);
+  CONTRACT(SzBase64EncodeFull, "12287 bytes", encoded == 1 && strlen(text) == LONG);
+  CONTRACT(ZELOEncodingBase64Decode, "12287 bytes",
+           encoded == 1 && ZELOEncodingBase64Decode(text, LONG, back, &size) == 1 &&
+               size == sizeof bytes && memcmp(back, bytes, sizeof bytes) == 0);
 }
 
 static void check_base64(void) {
@@ -589,21 +912,6 @@ static const char crontab[] = "/etc/crontab";
 static struct stat crontab_was;
 static char *crontab_before;
 
-/* Of a file of any length; null without one. */
-static char *whole_text(const char *path, struct stat *status) {
-  FILE *stream = fopen(path, "re");
-  char *text = NULL;
-  if (stream == NULL) return NULL;
-  if (fstat(fileno(stream), status) == 0 && S_ISREG(status->st_mode))
-    text = calloc((size_t)status->st_size + 1, 1);
-  if (text != NULL && fread(text, 1, (size_t)status->st_size, stream) != (size_t)status->st_size) {
-    free(text);
-    text = NULL;
-  }
-  fclose(stream);
-  return text;
-}
-
 static int crontab_is_as_before(void) {
   struct stat status;
   char *text = whole_text(crontab, &status);
@@ -626,56 +934,110 @@ static int put_back_crontab(void) {
       fchown(out, crontab_was.st_uid, crontab_was.st_gid) != 0 ||
       fchmod(out, crontab_was.st_mode & 07777) != 0 || fsync(out) != 0 || close(out) != 0 ||
       rename(next, crontab) != 0) {
-    printf("not ok %s could not be put back: %s\n", crontab, strerror(errno));
-    return 1;
+    return fault("/etc/crontab could not be put back: ", strerror(errno));
   }
   return 0;
 }
 
-/* How many lines there are behind the text of before; -1 when it is another one, or one of them has
- * not the command. */
-static int lines_added(void) {
-  const size_t length = (size_t)crontab_was.st_size;
-  struct stat status;
-  char *text = whole_text(crontab, &status);
-  const char *line = NULL;
-  int count = -1;
-  if (text != NULL && (size_t)status.st_size >= length &&
-      memcmp(text, crontab_before, length) == 0) {
-    count = 0;
-    for (line = strtok(text + length, "\n"); count >= 0 && line != NULL;
-         line = strtok(NULL, "\n")) {
-      count = strstr(line, ": platform_check") != NULL ? count + 1 : -1;
-    }
-  }
-  free(text);
-  return count;
+static int compare_lines(const void *one, const void *two) {
+  return strcmp(*(char *const *)one, *(char *const *)two);
 }
 
-/* The last line of the crontab: on Mondays, with any blanks, and the day's number or name. */
-static int last_line_is(int minute, int hour) {
+/* The lines of the text, which is cut into them, sorted. */
+static char **sorted_lines(char *text, size_t *count) {
+  const size_t length = strlen(text);
+  char **lines = calloc(length + 1, sizeof *lines);
+  char *line = text;
+  *count = 0;
+  if (lines == NULL) exit(USAGE);
+  while (line < text + length) {
+    lines[(*count)++] = line;
+    line += strcspn(line, "\n");
+    *line++ = '\0';
+  }
+  qsort(lines, *count, sizeof *lines, compare_lines);
+  return lines;
+}
+
+/* How many lines the crontab has that it had not before, wherever they are; -1 when one of before
+ * is gone, or a new one has not the command. The first of them into `first`. */
+static int lines_added(char *first, size_t room) {
   struct stat status;
   char *text = whole_text(crontab, &status);
+  char *old_text = strdup(crontab_before);
+  size_t counts[2] = {0, 0};
+  char **before = old_text != NULL ? sorted_lines(old_text, &counts[0]) : NULL;
+  char **now = text != NULL ? sorted_lines(text, &counts[1]) : NULL;
+  size_t old = 0;
+  size_t i = 0;
+  int added = now != NULL && before != NULL ? 0 : -1;
+  *first = '\0';
+  for (i = 0; added >= 0 && i < counts[1]; ++i) {
+    if (old < counts[0] && strcmp(before[old], now[i]) == 0) {
+      ++old;
+    } else if (strstr(now[i], ": platform_check") == NULL) {
+      added = -1;
+    } else if (added++ == 0) {
+      snprintf(first, room, "%s", now[i]);
+    }
+  }
+  if (old < counts[0]) added = -1;
+  free(before);
+  free(now);
+  free(old_text);
+  free(text);
+  return added;
+}
+
+/* Of a number or a name, 7 also for Sunday; -1 for what is neither. `*at` is behind it then. */
+static int weekday(const char **at) {
+  static const char names[][4] = {"sun", "mon", "tue", "wed", "thu", "fri", "sat"};
+  int day = 0;
+  if (**at >= '0' && **at <= '7') return *(*at)++ - '0';
+  for (day = 0; day < 7; ++day) {
+    if (strncasecmp(*at, names[day], 3) == 0) {
+      *at += 3;
+      return day;
+    }
+  }
+  return -1;
+}
+
+/* The weekdays of a field of a crontab, bit 0 = Sunday; 0 for what is none. */
+static int weekdays_of(const char *field) {
+  int days = 0;
+  if (strcmp(field, "*") == 0) return 127;
+  for (;;) {
+    int day = weekday(&field);
+    int last = day;
+    if (*field == '-') {
+      ++field;
+      last = weekday(&field);
+    }
+    if (day < 0 || last < day) return 0;
+    for (; day <= last; ++day) days |= 1 << day % 7;
+    if (*field == '\0') return days;
+    if (*field++ != ',') return 0;
+  }
+}
+
+/* Whether one line was added, of 07:30 on these days. */
+static int line_is_of(int weekdays) {
+  char line[256];
+  char days[64] = "";
   int found[2] = {-1, -1};
   int length = 0;
-  char day[4] = "";
-  char *line = NULL;
-  if (text == NULL) return 0;
-  length = (int)strlen(text);
-  if (length > 0 && text[length - 1] == '\n') text[length - 1] = '\0';
-  line = strrchr(text, '\n') != NULL ? strrchr(text, '\n') + 1 : text;
-  length = 0;
-  sscanf(line, "%d %d * * %3[A-Za-z0-9] root : platform_check%n", &found[0], &found[1], day,
-         &length);
-  length = length > 0 && line[length] == '\0' && found[0] == minute && found[1] == hour &&
-           (strcmp(day, "1") == 0 || strcasecmp(day, "mon") == 0);
-  free(text);
-  return length;
+  if (lines_added(line, sizeof line) != 1) return 0;
+  sscanf(line, "%d %d * * %63s root : platform_check%n", &found[0], &found[1], days, &length);
+  return length > 0 && line[length] == '\0' && found[0] == 30 && found[1] == 7 &&
+         weekdays_of(days) == weekdays;
 }
 
 static void check_crontab(void) {
   ZELO_SCHEDULE schedule;
   struct stat is_now;
+  char line[256];
+  int added = 0;
   int i = 0;
   memset(&schedule, 0, sizeof schedule);
   schedule.hour = 7;
@@ -689,20 +1051,34 @@ static void check_crontab(void) {
            fails(ZELOScheduleSet(&schedule, 1), 0x0D00) && crontab_is_as_before());
   schedule.weekdays = 2;
   schedule.hour = 7;
+  CONTRACT(ZELOScheduleSet, "no line when it is not enabled",
+           ZELOScheduleSet(&schedule, 0) == 0 && crontab_is_as_before());
   CONTRACT(ZELOScheduleSet, "a line of the time that runs the command as root",
-           ZELOScheduleSet(&schedule, 1) == 0 && last_line_is(30, 7));
-  CONTRACT(ZELOScheduleSet, "every other line stays, and one is new", lines_added() == 1);
+           (added = ZELOScheduleSet(&schedule, 1) == 0) && line_is_of(2));
+  CONTRACT(ZELOScheduleSet, "every other line stays, and one is new",
+           added && lines_added(line, sizeof line) == 1);
   CONTRACT(ZELOScheduleSet, "owner and mode stay",
-           stat(crontab, &is_now) == 0 && crontab_was.st_mode == is_now.st_mode &&
-               crontab_was.st_uid == is_now.st_uid);
+           added && stat(crontab, &is_now) == 0 && crontab_was.st_mode == is_now.st_mode &&
+               crontab_was.st_uid == is_now.st_uid && crontab_was.st_gid == is_now.st_gid);
   CONTRACT(ZELOUpdateCrontab, "0 when nothing is to be told",
            ZELOUpdateCrontab(": platform_check", 0, 0) == 0);
   CONTRACT(ZELOUpdateCrontab, "0 when cron is told, and when there is none",
            ZELOUpdateCrontab(": platform_check", 0, 1) == 0);
+  CONTRACT(QLIBCFileSetLine, "the line goes from the crontab",
+           added && QLIBCFileSetLine(crontab, ": platform_check", NULL, 0) == 1 &&
+               lines_added(line, sizeof line) == 0);
+  schedule.weekdays = 127;
+  CONTRACT(ZELOScheduleSet, "a line of every day",
+           ZELOScheduleSet(&schedule, 1) == 0 && line_is_of(127));
   QLIBCFileSetLine(crontab, ": platform_check", NULL, 0);
-  CONTRACT(QLIBCFileSetLine, "the line goes from the crontab", lines_added() == 0);
+  schedule.weekdays = 1;
+  CONTRACT(ZELOScheduleSet, "a line of Sundays",
+           ZELOScheduleSet(&schedule, 1) == 0 && line_is_of(1));
+  QLIBCFileSetLine(crontab, ": platform_check", NULL, 0);
+  schedule.weekdays = 2;
   for (i = 0; i < ENTRIES; ++i) ZELOScheduleSet(&schedule, 1);
-  CONTRACT(ZELOScheduleSet, "a line for each of a hundred calls", lines_added() == ENTRIES);
+  CONTRACT(ZELOScheduleSet, "a line for each of a hundred calls",
+           lines_added(line, sizeof line) == ENTRIES);
 }
 
 /* ---- --system PLUGINS: a plugin that is called
@@ -750,6 +1126,7 @@ static void remove_directories(char *path, size_t there) {
 /* Each group in a process of its own: one that crashes takes no other with it. The number of
  * faults. */
 static int run(const char *name, void (*group)(void)) {
+  char why[64];
   int status = 0;
   pid_t child = 0;
   snprintf(shared->current, CONTRACT_ROOM, "%s: the first call", name);
@@ -765,16 +1142,18 @@ static int run(const char *name, void (*group)(void)) {
     _exit(failed > 0 ? FAILED : HELD);
   }
   if (child < 0 || waitpid(child, &status, 0) != child) {
-    printf("not ok %s (no process: %s)\n", shared->current, strerror(errno));
-    return 1;
+    snprintf(why, sizeof why, " (no process: %s)", strerror(errno));
+    return fault(shared->current, why);
   }
   if (WIFSIGNALED(status)) {
-    printf("not ok %s (ended by signal %d)\n", shared->current, WTERMSIG(status));
-  } else if (WEXITSTATUS(status) != HELD && WEXITSTATUS(status) != FAILED) {
-    printf("not ok %s (ended with status %d)\n", shared->current, WEXITSTATUS(status));
+    snprintf(why, sizeof why, " (ended by signal %d)", WTERMSIG(status));
+    return fault(shared->current, why);
   }
-  fflush(stdout);
-  return !WIFEXITED(status) || WEXITSTATUS(status) != HELD;
+  if (WEXITSTATUS(status) != HELD && WEXITSTATUS(status) != FAILED) {
+    snprintf(why, sizeof why, " (ended with status %d)", WEXITSTATUS(status));
+    return fault(shared->current, why);
+  }
+  return WEXITSTATUS(status) != HELD;
 }
 
 static int run_power_times(void) {
@@ -790,10 +1169,7 @@ static int run_power_times(void) {
 static int run_crontab(void) {
   int faults = 0;
   crontab_before = whole_text(crontab, &crontab_was);
-  if (crontab_before == NULL) {
-    printf("not ok %s: cannot be read, so no line was added\n", crontab);
-    return 1;
-  }
+  if (crontab_before == NULL) return fault(crontab, ": cannot be read, so no line was added");
   faults = run("crontab", check_crontab);
   faults += put_back_crontab();
   free(crontab_before);
@@ -808,10 +1184,8 @@ static int run_plugins(char *plugins) {
   snprintf(called, sizeof called, "%s/called", directory);
   snprintf(failing, sizeof failing, "%s/failing", directory);
   snprintf(script, sizeof script, "#!/bin/sh\n: >%s\ntest ! -e %s\n", called, failing);
-  if (access(plugin, F_OK) == 0) {
-    printf("not ok %s: is there already, so no plugin was called\n", plugin);
-    return 1;
-  }
+  if (access(plugin, F_OK) == 0)
+    return fault(plugin, ": is there already, so no plugin was called");
   write_text(plugin, script);
   if (chmod(plugin, 0755) != 0) perror(plugin);
   faults = run("plugins that are called", check_called_plugins);
@@ -842,19 +1216,30 @@ int main(int argc, char **argv) {
                 {"lists", check_lists},
                 {"reading sections", check_reading},
                 {"changing sections", check_changing},
+                {"a file that is cut off", check_cut_off},
                 {"a copied file", check_copied},
+                {"many sections", check_many_sections},
                 {"symbolic links", check_links},
                 {"lines", check_lines},
-                {"processes", check_processes},
+                {"programs", check_exec},
+                {"a child of nobody", check_fork},
+                {"processes", check_alive},
+                {"forked children", check_forked},
+                {"other users", check_other_user},
                 {"plugins", check_plugins},
                 {"users", check_users},
-                {"Base64", check_base64}};
+                {"Base64", check_base64},
+                {"long Base64", check_long_base64}};
   char plugins[256] = "";
   int faults = 0;
   size_t i = 0;
   const int system = argc > 1 && strcmp(argv[1], "--system") == 0;
   if (argc > 3 || (argc > 1 && !system) || (argc == 3 && argv[2][0] != '/')) {
     fprintf(stderr, "usage: %s [--system [/DIRECTORY/OF/PLUGINS]]\n", argv[0]);
+    return USAGE;
+  }
+  if (system && geteuid() != 0) {
+    fprintf(stderr, "%s: only root can check what a machine has once\n", argv[0]);
     return USAGE;
   }
   if (argc == 3) snprintf(plugins, sizeof plugins, "%s", argv[2]);
@@ -876,5 +1261,6 @@ int main(int argc, char **argv) {
   if (system) faults += run_power_times() + run_crontab();
   if (plugins[0] != '\0') faults += run_plugins(plugins);
   remove_own_directory();
+  fprintf(stderr, "%d hold, %d do not\n", shared->sums[1], shared->sums[0]);
   return faults > 0;
 }

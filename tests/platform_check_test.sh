@@ -32,7 +32,8 @@ on_machine() {
 }
 
 finds_no_fault() {
-  on_machine '"$CHECK" "$@"' "$@" >"$WORK/own" && ! grep -v '^ok ' "$WORK/own"
+  on_machine '"$CHECK" "$@"' "$@" >"$WORK/own" 2>"$WORK/sum" && ! grep -v '^ok ' "$WORK/own" &&
+    same "$(cat "$WORK/sum")" "$(grep -c '^ok ' "$WORK/own") hold, 0 do not"
 }
 
 # A line of the wrong platform's contracts that are not named as faults.
@@ -110,6 +111,28 @@ names_a_call_that_exits() {
     $'not ok QLIBCSzListAlloc: an empty list, whatever the capacity (ended with status 0)\n1'
 }
 
+sums_up() {
+  same "$(on_machine 'wrongly "QLIBCExec: the exit status" >/tmp/out 2>&1
+    test "$(tail -n 1 /tmp/out)" = "$(grep -c "^ok " /tmp/out) hold, $(grep -c "^not ok " /tmp/out) do not" && echo same')" same
+}
+
+# In another place than our platform has it.
+takes_a_line_anywhere() {
+  same "$(on_machine 'wrongly "ZELOScheduleSet adds lines in front" --system | grep -cv "^ok "')" 0
+}
+
+takes_a_user_with_the_highest_id() {
+  same "$(on_machine 'echo "last:x:4294967294:65534::/:/bin/sh" >>/etc/passwd; "$CHECK" | grep "4294967294\|highest"')" \
+    "ok ZELOUserGetByUID: the highest id is looked up like any other"
+}
+
+# Only root is asked for what a machine has once; in a namespace without users nobody is root.
+refuses_who_is_not_root() {
+  same "$(on_machine 'before=$(state); unshare --user "$CHECK" --system 2>&1; echo "$?"
+    diff <(echo "$before") <(state) && echo same')" \
+    "$CHECK: only root can check what a machine has once"$'\n2\nsame'
+}
+
 wrong_call_is_refused() {
   local status=0
   "$CHECK" "$@" >/dev/null 2>&1 || status=$?
@@ -118,7 +141,7 @@ wrong_call_is_refused() {
 
 check "our platform keeps every contract that needs no system of its own" finds_no_fault
 check "and all others" finds_no_fault --system "$PLUGINS"
-check "there are more than a hundred of them" test "$(wc -l <"$WORK/own")" -ge 130
+check "there are many of them" test "$(wc -l <"$WORK/own")" -ge 175
 check "every fault is named" same "$(unnamed_faults)" ""
 check "a call that exits is named" names_a_call_that_exits
 check "without being asked for, nothing of a machine is changed, whatever the platform does" nothing_is_done
@@ -129,6 +152,10 @@ check "where there is no crontab, none is made" makes_no_crontab
 check "power times that cannot be read stay" keeps_lists_that_cannot_be_read
 check "directories of plugins that were there stay" keeps_directories_of_plugins
 check "so does a plugin" takes_no_plugin_away
+check "the last line is the sum" sums_up
+check "a line of the crontab may be anywhere" takes_a_line_anywhere
+check "a user may have the highest id" takes_a_user_with_the_highest_id
+check "what a machine has once is left to root" refuses_who_is_not_root
 check "a wrong call is refused" wrong_call_is_refused --sistem
 check "so is a directory without its path" wrong_call_is_refused --system plugins
 finish

@@ -1,11 +1,13 @@
 /*
  * To be preloaded into examples/platform_check: a platform that breaks one contract, the one that
  * WRONG_PLATFORM names as the check names it ("QLIBCExec: the exit status"). "CALL exits",
- * "CALL crashes" and "CALL hangs" are further ones.
+ * "CALL crashes" and "CALL hangs" are further ones; "ZELOScheduleSet adds lines in front" breaks
+ * none.
  */
 #include <dlfcn.h>
 #include <signal.h>
 #include <stdarg.h>
+#include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
 #include <sys/stat.h>
@@ -18,6 +20,8 @@ static int wrong(const char *fault) {
   const char *wanted = getenv("WRONG_PLATFORM");
   return wanted != NULL && strcmp(wanted, fault) == 0;
 }
+
+enum { MUCH = 10000 };
 
 /* The function that this one stands in for, as `real`. */
 #define REAL(name)                      \
@@ -33,10 +37,38 @@ static void set_mode(const char *path, mode_t mode) {
   if (chmod(path, mode) != 0) abort();
 }
 
+/* After a change by the call. */
+static void spoil_owner_and_mode(const char *call, const char *path) {
+  char fault[128];
+  snprintf(fault, sizeof fault, "%s: the mode stays", call);
+  if (wrong(fault)) set_mode(path, 0600);
+  snprintf(fault, sizeof fault, "%s: the owner stays", call);
+  if (wrong(fault) && chown(path, 0, 0) != 0) abort();
+}
+
+static int left_alone; /* in the child of QLIBCProcForkChildNoWait */
+
+static int wrong_in_child(const char *call, pid_t *first) {
+  char fault[128];
+  if (*first == 0) *first = getpid();
+  if (*first == getpid()) return 0;
+  snprintf(fault, sizeof fault, "%s: works in %s", call,
+           left_alone ? "the child of QLIBCProcForkChildNoWait" : "a forked child too");
+  return wrong(fault);
+}
+
+/* In a process that the first call was not made in. */
+#define WRONG_IN_CHILD(result, name)                  \
+  do {                                                \
+    static pid_t first;                               \
+    if (wrong_in_child(#name, &first)) return result; \
+  } while (0)
+
 /* ---- the error record ---- */
 
 void QLIBCErrSetEx(int code, const char *szFile, int line) {
   REAL(QLIBCErrSetEx);
+  WRONG_IN_CHILD(, QLIBCErrSetEx);
   if (szFile == NULL && wrong("QLIBCErrSetEx: no file counts as an empty one")) szFile = "none";
   real(code, szFile, line);
 }
@@ -80,6 +112,7 @@ int QLIBCSzHashSetValue(PSZHASH *ppHash, const char *szKey, const char *szValue)
   int result = 0;
   REAL(QLIBCSzHashSetValue);
   if (szKey == NULL) WRONG(0, "QLIBCSzHashSetValue: null is refused");
+  if (strlen(szValue) > MUCH) WRONG(-1, "QLIBCSzHashSetValue: a value of 16384 bytes");
   if (szKey != NULL) {
     const int is_there = QLIBCSzHashGetValue(*ppHash, szKey) != NULL;
     if (is_there) WRONG(0, "QLIBCSzHashSetValue: a value is replaced");
@@ -100,6 +133,7 @@ int QLIBCSzHashSetValue(PSZHASH *ppHash, const char *szKey, const char *szValue)
 
 const char *QLIBCSzHashGetValue(PSZHASH pHash, const char *szKey) {
   REAL(QLIBCSzHashGetValue);
+  WRONG_IN_CHILD(NULL, QLIBCSzHashGetValue);
   if (strcmp(szKey, "none") == 0 &&
       wrong("QLIBCSzHashGetValue: null for a key that is not there, which is no error")) {
     QLIBCErrSetEx(0x2000, "", 0);
@@ -135,6 +169,7 @@ PSZLIST QLIBCSzListAlloc(int capacity) {
 
 int QLIBCSzListPush(PSZLIST *ppList, const char *szText) {
   REAL(QLIBCSzListPush);
+  if (strlen(szText) > MUCH) WRONG(-1, "QLIBCSzListPush: a text of 16384 bytes");
   if (wrong("QLIBCSzListPush: the text is copied")) szText = "xext";
   if (strcmp(szText, "more") == 0) WRONG(1, "QLIBCSzListCount: how many texts there are");
   const int count = real(ppList, szText);
@@ -197,6 +232,7 @@ int QLIBCFileExist(const char *szPath) {
 int QLIBCFileTouch(const char *szPath) {
   struct stat found;
   REAL(QLIBCFileTouch);
+  WRONG_IN_CHILD(-1, QLIBCFileTouch);
   if (lstat(szPath, &found) != 0) {
     WRONG(0, "QLIBCFileTouch: an empty file is made");
   } else if (S_ISLNK(found.st_mode) && wrong("QLIBCFileTouch: a symbolic link is not followed")) {
@@ -209,6 +245,11 @@ int QLIBCFileTouch(const char *szPath) {
 
 int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
   REAL(QLIBCFileEnumSection);
+  WRONG_IN_CHILD(-1, QLIBCFileEnumSection);
+  if (wrong("QLIBCFileEnumSection: the names are appended")) {
+    QLIBCSzListFree(*ppList);
+    *ppList = QLIBCSzListAlloc(1);
+  }
   const int before = QLIBCSzListCount(*ppList);
   int count = real(szPath, ppList);
   if (count < 0 && QLIBCErrGet() == QLIBC_ERR_OPEN) {
@@ -221,6 +262,8 @@ int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
       wrong("QLIBCFileEnumSection: a file that is being copied is waited for")) {
     return -1;
   }
+  if (count == 2 && strcmp(QLIBCSzListGet(*ppList, before + 1), "empty") == 0)
+    WRONG(-1, "QLIBCFileEnumSection: a file of which no byte is there yet is waited for");
   if (count == 2 && (wrong("QLIBCFileEnumSection: the names in the order of the file") ||
                      wrong("QLIBCFileSetSection: the order stays"))) {
     char *first = strdup(QLIBCSzListGet(*ppList, before));
@@ -237,9 +280,12 @@ int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList) {
 
 int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHash) {
   REAL(QLIBCFileGetSection);
+  WRONG_IN_CHILD(-1, QLIBCFileGetSection);
   if (wrong("QLIBCFileGetSection: keys that the hash has already stay"))
     QLIBCHashRemoveAll(*ppHash);
   const int found = real(szPath, szSection, ppHash);
+  if (found < 0 && QLIBCErrGet() == QLIBC_ERR_IO)
+    WRONG(0, "QLIBCFileGetSection: a file that is cut off is told");
   if (found < 0) WRONG(0, "QLIBCFileGetSection: a file that is not there is told");
   if (found == 0) WRONG(1, "QLIBCFileGetSection: 0 when there is no such section");
   WRONG(found > 0 ? 2 : found, "QLIBCFileGetSection: 1 when the section was read");
@@ -251,6 +297,10 @@ int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHa
         wrong("QLIBCFileAddSection: every byte but zero reads back")) {
       QLIBCSzHashSetValue(ppHash, "bytes", "\x01\x02");
     }
+    if (wrong("QLIBCFileAddSection: a key with a blank reads back"))
+      QLIBCSzHashSetValue(ppHash, "run hour", "");
+    if (wrong("QLIBCFileAddSection: a value of 16384 bytes reads back"))
+      QLIBCSzHashSetValue(ppHash, "long", "x");
   }
   return found;
 }
@@ -259,6 +309,7 @@ int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash
   REAL(QLIBCFileAddSection);
   if (is_link(szPath)) WRONG(1, "QLIBCFileAddSection: a symbolic link is refused");
   if (access(szPath, F_OK) != 0) WRONG(0, "QLIBCFileAddSection: 1, and the file is made");
+  if (strcmp(szSection, "500") == 0) WRONG(1, "QLIBCFileAddSection: there is room for a thousand");
   if (strcmp(szSection, "2") == 0 && wrong("QLIBCFileAddSection: the other sections stay"))
     unlink(szPath);
   const int result = real(szPath, szSection, pHash, flags);
@@ -268,6 +319,7 @@ int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash
   if (result < 0 && QLIBCErrGet() == QLIBC_ERR_IO) {
     WRONG(1, "QLIBCFileAddSection: a file that is cut off is not built on");
   }
+  if (result == 1) spoil_owner_and_mode("QLIBCFileAddSection", szPath);
   return result;
 }
 
@@ -286,7 +338,7 @@ int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PS
   }
   const int result = real(szPath, szSection, flags, pHash, reserved);
   if (result == 1) {
-    if (wrong("QLIBCFileSetSection: the mode stays")) set_mode(szPath, 0600);
+    spoil_owner_and_mode("QLIBCFileSetSection", szPath);
     WRONG(2, "QLIBCFileSetSection: 1 when it was replaced");
     if (wrong("QLIBCFileSetSection: the other sections keep what they hold"))
       spoil_section(szPath, "2");
@@ -295,6 +347,8 @@ int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PS
       QLIBCExec("/bin/sh", "-c", put_back, "sh", szPath, NULL);
     }
   }
+  if (result < 0 && QLIBCErrGet() == QLIBC_ERR_IO)
+    WRONG(1, "QLIBCFileSetSection: a file that is cut off is not built on");
   if (result == 0)
     WRONG(1, "QLIBCFileSetSection: 0 when there is no such section, and nothing is written");
   return result;
@@ -307,6 +361,9 @@ int QLIBCFileRemoveSection(const char *szPath, const char *szSection) {
   const int result = real(szPath, szSection);
   if (result == 1 && wrong("QLIBCFileRemoveSection: the other sections keep what they hold"))
     spoil_section(szPath, "2");
+  if (result < 0 && QLIBCErrGet() == QLIBC_ERR_IO)
+    WRONG(1, "QLIBCFileRemoveSection: a file that is cut off is not built on");
+  if (result == 1) spoil_owner_and_mode("QLIBCFileRemoveSection", szPath);
   if (result == 1) WRONG(0, "QLIBCFileRemoveSection: 1 when it was removed");
   if (result == 0) WRONG(1, "QLIBCFileRemoveSection: 0 when there is none");
   return result;
@@ -333,7 +390,7 @@ int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue,
     WRONG(1, "QLIBCFileSetLine: a value with a line feed is refused");
   }
   const int result = real(szPath, szKey, szValue, flags);
-  if (result == 1 && wrong("QLIBCFileSetLine: the mode stays")) set_mode(szPath, 0600);
+  if (result == 1) spoil_owner_and_mode("QLIBCFileSetLine", szPath);
   return result;
 }
 
@@ -344,11 +401,15 @@ int QLIBCExec(const char *szProgram, ...) {
   va_list list;
   int i = 0;
   REAL(QLIBCExec);
+  WRONG_IN_CHILD(-1, QLIBCExec);
   va_start(list, szProgram);
   for (i = 0; i < 7 && (arguments[i] = va_arg(list, const char *)) != NULL; ++i) {
   }
   va_end(list);
   if (i == 4 && wrong("QLIBCExec: arguments arrive as they are")) arguments[3] = "a";
+  if (wrong("QLIBCExec: the environment arrives")) unsetenv("PLATFORM_CHECK");
+  if (wrong("QLIBCExec: a child of the caller is still there to be waited for"))
+    waitpid(-1, NULL, 0);
   const int result = real(szProgram, arguments[0], arguments[1], arguments[2], arguments[3],
                           arguments[4], (char *)NULL);
   if (result == 7) {
@@ -367,13 +428,26 @@ int QLIBCProcForkChildNoWait(void) {
   WRONG(fork() > 0, "QLIBCProcForkChildNoWait: there is no child to wait for");
   const int result = real();
   if (result == 1) WRONG(2, "QLIBCProcForkChildNoWait: 1 for the caller");
-  if (result == 0 && wrong("QLIBCProcForkChildNoWait: 0 for the child, which runs")) _exit(0);
+  if (result == 1 && wrong("QLIBCProcForkChildNoWait: the handling of SIGCHLD stays"))
+    signal(SIGCHLD, SIG_DFL);
+  if (result != 0) return result;
+  left_alone = 1;
+  if (wrong("QLIBCProcForkChildNoWait: 0 for the child, which runs")) _exit(0);
+  if (wrong("QLIBCProcForkChildNoWait: the child keeps descriptors")) {
+    int descriptor = 0;
+    for (descriptor = 3; descriptor < 1024; ++descriptor) close(descriptor);
+  }
+  if (wrong("QLIBCProcForkChildNoWait: the child keeps the directory") && chdir("/") != 0) abort();
+  if (wrong("QLIBCProcForkChildNoWait: the child keeps the session")) setsid();
+  if (wrong("QLIBCProcForkChildNoWait: the child keeps the umask")) umask(0);
   return result;
 }
 
 int QLIBCProcAlive(pid_t pid) {
   siginfo_t ended;
   REAL(QLIBCProcAlive);
+  WRONG_IN_CHILD(0, QLIBCProcAlive);
+  if (geteuid() != 0) WRONG(0, "QLIBCProcAlive: as before with the effective id of another");
   const int is_alive = real(pid);
   if (is_alive) WRONG(0, "QLIBCProcAlive: 1 for this process");
   if (!is_alive) {
@@ -430,13 +504,17 @@ int QLIBPluginExit(void **ppContext) {
 /* ---- users and Base64 ---- */
 
 int ZELOUserGetByUID(uid_t uid, PZELOUSER *ppUser) {
+  static pid_t first;
   REAL(ZELOUserGetByUID);
+  if (wrong_in_child("ZELOUserGetByUID", &first)) pause(); /* for a thread that is not there */
+  if (geteuid() != 0) WRONG(-1, "ZELOUserGetByUID: as before with the effective id of another");
   const int result = real(uid, ppUser);
   if (result == 0) {
     WRONG(1, "ZELOUserGetByUID: 0, and the user");
     if (wrong("ZELOUserGetByUID: his name, id, home directory and shell")) (*ppUser)->uid = 1;
   }
-  if (uid == 4294967294U) WRONG(0, "ZELOUserGetByUID: the highest id is one of a user");
+  if (uid == 4294967294U) WRONG(0, "ZELOUserGetByUID: the highest id is looked up like any other");
+  if (result < 0 && wrong("ZELOUserGetByUID: the pointer is left alone on failure")) *ppUser = NULL;
   if (result < 0) WRONG(0, "ZELOUserGetByUID: a user who is not there is told");
   return result;
 }
@@ -449,6 +527,7 @@ void ZELOUserFree(PZELOUSER pUser) {
 
 int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, int reserved) {
   REAL(SzBase64EncodeFull);
+  if (cbSrc > MUCH) WRONG(0, "SzBase64EncodeFull: 12287 bytes");
   if (cbSrc == 0) WRONG(0, "SzBase64EncodeFull: an empty source is an empty text");
   const int result = real(src, cbSrc, dst, cbDst, reserved);
   if (result == 0) WRONG(1, "SzBase64EncodeFull: 0 where there is no room");
@@ -462,6 +541,8 @@ int SzBase64EncodeFull(const char *src, size_t cbSrc, char *dst, size_t cbDst, i
 
 int ZELOEncodingBase64Decode(const char *src, size_t cbSrc, char *dst, size_t *pcbDst) {
   REAL(ZELOEncodingBase64Decode);
+  WRONG_IN_CHILD(0, ZELOEncodingBase64Decode);
+  if (cbSrc > MUCH) WRONG(0, "ZELOEncodingBase64Decode: 12287 bytes");
   const size_t room = *pcbDst;
   if (memchr(src, '\n', cbSrc) != NULL)
     WRONG(0, "ZELOEncodingBase64Decode: white space is passed over");
@@ -539,6 +620,9 @@ int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
   ZELO_SCHEDULE given = *pSchedule;
   REAL(ZELOScheduleSet);
   if (given.hour > 23 && wrong("ZELOScheduleSet: an hour of 24 is refused")) given.hour = 23;
+  if (given.weekdays == 127 && wrong("ZELOScheduleSet: a line of every day")) given.weekdays = 126;
+  if (given.weekdays == 1 && wrong("ZELOScheduleSet: a line of Sundays")) given.weekdays = 64;
+  if (enabled == 0 && wrong("ZELOScheduleSet: no line when it is not enabled")) enabled = 1;
   if (given.weekdays == 0 && wrong("ZELOScheduleSet: no line without a weekday"))
     given.weekdays = 127;
   if (given.weekdays == 2) {
@@ -547,11 +631,15 @@ int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled) {
     if (++lines == 50) WRONG(0, "ZELOScheduleSet: a line for each of a hundred calls");
   }
   const int result = real(&given, enabled);
-  if (result == 0 && given.weekdays != 0) {
+  if (result == 0 && enabled != 0 && given.weekdays != 0) {
     if (wrong("ZELOScheduleSet crashes")) abort();
     if (wrong("ZELOScheduleSet hangs")) pause();
     if (wrong("ZELOScheduleSet: every other line stays, and one is new")) {
       QLIBCExec("/bin/sh", "-c", "sed -i 1d /etc/crontab", NULL);
+    }
+    if (wrong("ZELOScheduleSet adds lines in front")) {
+      static const char move[] = "text=$(tail -n 1 $0; sed '$d' $0) && echo \"$text\" >$0";
+      QLIBCExec("/bin/sh", "-c", move, crontab, NULL);
     }
     if (wrong("ZELOScheduleSet: owner and mode stay")) set_mode(crontab, 0600);
   }

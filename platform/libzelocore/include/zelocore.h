@@ -114,7 +114,8 @@ int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList);
 enum { QLIBC_FILE_SYNC = 1 };
 
 /* 0 when the path does not exist or is null, else 1: also when nobody can tell,
- * since the disk fails or a directory may not be searched. */
+ * since the disk fails or a directory may not be searched. A link that leads
+ * nowhere does not exist. */
 int QLIBCFileExist(const char *szPath);
 /* Creates an empty file, or updates the times of an existing one. 0, or -1
  * (0x0D00, 0x0900). A symbolic link is not followed. A new file gets mode 0644
@@ -130,17 +131,18 @@ int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHa
 /* Replaces the whole content of an existing section by the hash, in place; the
  * other sections keep every byte, and so do comments and blank lines right before
  * the next one. 1 when replaced, 0 when there is no such section (nothing is
- * written), -1 on failure (0x0D00, 0x0900, 0x0B00, 0x2800, 0x0200; the file is
- * as it was). The flags are 0 or QLIBC_FILE_SYNC, `reserved` must be 0. A key
- * must not be empty, begin with `[`, `#` or `;`, begin or end with a blank, or
- * hold `=` or a control byte (0x0D00). */
+ * written), -1 on failure (0x0D00, 0x0900 also when there is no file, 0x0B00,
+ * 0x2800, 0x0200; the file is as it was). The flags are 0 or QLIBC_FILE_SYNC, `reserved` must be 0.
+ * A key must not be empty, begin with `[`, `#` or `;`, begin or end with a blank, or hold `=` or a
+ * control byte (0x0D00). */
 int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PSZHASH pHash,
                         int reserved);
 /* Appends a new section, to a new file when there is none. 1, or -1 as above
  * (0x0D00 also for a section that exists, and for a name that is empty, begins
  * or ends with a blank, or holds `]` or a control byte). */
 int QLIBCFileAddSection(const char *szPath, const char *szSection, PSZHASH pHash, int flags);
-/* Removes a section. 1 when removed, 0 when there is none, -1 on failure. */
+/* Removes a section, without waiting for the disk. 1 when removed, 0 when there
+ * is none, -1 on failure as above. */
 int QLIBCFileRemoveSection(const char *szPath, const char *szSection);
 
 /* ---- files of lines -------------------------------------------------------- */
