@@ -3,9 +3,9 @@
 import { button, el, fill, isFocusLost, setText } from "./dom.js";
 import { go, goInstead, href, taskPath } from "./address.js";
 import { showAccess } from "./access.js";
+import { comingItems, comingRows, comingWarning } from "./coming.js";
 import { clearFaults, confirm, tell, tellFault } from "./dialogs.js";
 import { Field, Group, check, select } from "./fields.js";
-import { distanceText, momentText } from "./moments.js";
 import { ScheduleFields } from "./schedule-fields.js";
 import { ask, askAbout, change } from "./tool.js";
 import { oneAtATime } from "./turns.js";
@@ -210,16 +210,17 @@ export class FormView {
 
   // Written only when it is another answer: it is read out then.
   showComing(due) {
-    const key = JSON.stringify(due);
+    const rows = comingRows(due, this.model.powerTimes);
+    const key = JSON.stringify([due, rows.map(({ isOff }) => isOff)]);
     if (key === this.comingShown) return;
     this.comingShown = key;
-    fill(this.coming, ...due.map((time) => el("li", {}, momentText(time) + " ",
-      el("span", { class: "beside" }, distanceText(time)))));
+    fill(this.coming, ...comingItems(rows));
   }
 
   comingNoteOf(due) {
     if (due.length === 0) return _("Not as it stands.");
-    return this.isOn.input.checked ? "" : _("But it is switched off, and does not run until it is switched on.");
+    return this.isOn.input.checked ? comingWarning(comingRows(due, this.model.powerTimes))
+      : _("But it is switched off, and does not run until it is switched on.");
   }
 
   // By its field, in words of the page: it says less of what else is wrong there.

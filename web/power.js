@@ -70,8 +70,19 @@ function askForTime(model, time, newDays, hour) {
   });
 }
 
+function staysOff(times) {
+  const used = times.filter((time) => time.enabled);
+  return used.some((time) => time.power === "off") && !used.some((time) => time.power === "on");
+}
+
+function staysOffText() {
+  return _("The machine goes off and, by its power times, never on again.");
+}
+
 async function removeTime(model, time) {
-  const isAgreed = await confirm({ title: _("Remove the power time?"), text: inWords(time), action: _("Remove"),
+  const isLastOn = !staysOff(model.powerTimes) && staysOff(model.powerTimes.filter((other) => other.id !== time.id));
+  const text = isLastOn ? inWords(time) + ". " + staysOffText() : inWords(time);
+  const isAgreed = await confirm({ title: _("Remove the power time?"), text, action: _("Remove"),
     subject: subjectOf(model, time), isDangerous: true });
   if (isAgreed) await attempt(() => change(["power", "remove", "--yes", String(time.id)]));
 }
@@ -232,8 +243,7 @@ export class PowerView {
     const next = times.filter((time) => time.power === "on" && time.enabled && time.next).map((time) => time.next).sort()[0];
     const { clock } = this.model;
     if (!next) {
-      fill(this.clock, times.some((time) => time.power === "off" && time.enabled)
-        ? el("div", { class: "note warn" }, el("p", {}, _("The machine goes off and, by its power times, never on again."))) : null);
+      fill(this.clock, staysOff(times) ? el("div", { class: "note warn" }, el("p", {}, staysOffText())) : null);
     } else if (clock.is_armed) {
       fill(this.clock, el("p", { role: "status" }, el("span", { class: "mark good", "aria-hidden": "true" }, "✓"),
         format(_("The machine goes on next $0 ($1). Its clock is armed."), momentText(next), distanceText(next))));

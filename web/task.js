@@ -4,7 +4,7 @@ import { removeTask, runNow, setEnabled, stopRuns } from "./actions.js";
 import { go, href, replaceOptions } from "./address.js";
 import { showAccess } from "./access.js";
 import { durationChart } from "./chart.js";
-import { distanceText, momentText } from "./moments.js";
+import { comingItems, comingRows, comingWarning } from "./coming.js";
 import { Runs } from "./runs.js";
 import { ask } from "./tool.js";
 import { inTurn, oneAtATime } from "./turns.js";
@@ -42,6 +42,7 @@ export class TaskView {
     this.makeHead();
     this.facts = el("dl", { class: "facts" });
     this.coming = el("ol", { class: "coming" });
+    this.comingWarning = el("p", { class: "fault", role: "status" });
     this.chart = el("div");
     this.note = el("p", { class: "beside" });
     this.more = button("", { class: "secondary" }, () => this.showMore());
@@ -54,7 +55,7 @@ export class TaskView {
     this.newest = null;
     this.columns = el("div", { class: "columns" },
       el("section", { "aria-label": _("Task") }, el("h3", {}, _("Task")), this.facts),
-      el("section", { "aria-label": _("Coming runs") }, el("h3", {}, _("Coming runs")), this.coming));
+      el("section", { "aria-label": _("Coming runs") }, el("h3", {}, _("Coming runs")), this.coming, this.comingWarning));
     this.history = el("section", { "aria-label": _("Runs") }, el("h3", {}, _("Runs")), this.chart, this.note, this.runs.element, this.left);
     fill(root, this.access, this.gone, this.head, this.columns, this.history);
     this.update();
@@ -167,15 +168,15 @@ export class TaskView {
     let none = task.enabled ? _("None") : _("None, as it is switched off");
     try {
       const { runs } = task.enabled ? await ask("next", String(this.id), "--count", COMING) : { runs: [] };
-      rows = runs.filter((run) => run.due).map((run) => [momentText(run.due), distanceText(run.due)]);
+      rows = comingRows(runs.map((run) => run.due).filter((due) => due), this.model.powerTimes);
     } catch (error) {
       none = error.message;
     }
     const key = JSON.stringify([rows, none]);
     if (this.comingShown === key) return;
     this.comingShown = key;
-    fill(this.coming, ...rows.map(([time, distance]) => el("li", {}, time + " ", el("span", { class: "beside" }, distance))),
-      rows.length === 0 ? el("li", { class: "none" }, none) : null);
+    fill(this.coming, ...comingItems(rows), rows.length === 0 ? el("li", { class: "none" }, none) : null);
+    setText(this.comingWarning, comingWarning(rows));
   }
 
   async loadRuns() {

@@ -2,6 +2,34 @@
 import { svg } from "./dom.js";
 
 const MINUTES = 60;
+const MINUTES_OF_DAY = 24 * 60;
+const MINUTES_OF_WEEK = 7 * MINUTES_OF_DAY;
+const DAYS = ["sun", "mon", "tue", "wed", "thu", "fri", "sat"];
+
+function minuteOfWeek(wall) {
+  return wall.getUTCDay() * MINUTES_OF_DAY + wall.getUTCHours() * 60 + wall.getUTCMinutes();
+}
+
+function minutesOfWeek({ days, at }) {
+  const [hour, minute] = at.split(":").map(Number);
+  return days.map((day) => DAYS.indexOf(day) * MINUTES_OF_DAY + hour * 60 + minute);
+}
+
+// Whether the machine, which is on now, is off at a later time: by the last power time until then. One that
+// goes off and never on again is switched on by somebody.
+export function isOffAt(powerTimes, wall, now) {
+  const used = powerTimes.filter((time) => time.enabled);
+  if (!used.some((time) => time.power === "on")) return false;
+  const left = (wall - now) / 60000;
+  let last = { ago: Infinity, power: "on" };
+  for (const time of used) {
+    for (const minute of minutesOfWeek(time)) {
+      const ago = (minuteOfWeek(wall) - minute + MINUTES_OF_WEEK) % MINUTES_OF_WEEK;
+      if (ago < left && ago < last.ago) last = { ago, power: time.power };
+    }
+  }
+  return last.power === "off";
+}
 
 // Minutes from 0 to `length` in which the machine is off: [{from, to}]. `events` are {at, power} in
 // order, `isOff` whether it is off at the beginning.

@@ -4,6 +4,7 @@
 What they stand on is in web_machine.py. WEB_PICTURES names a directory for pictures of the views.
 """
 
+import datetime
 import os
 import signal
 import sys
@@ -704,6 +705,21 @@ def kept(browser, server):
 # ---- the calendar and power -----------------------------------------------------------------
 
 
+@story("a task at whose times the machine is off says so")
+def off_then(browser, server):
+    z("power", "add", "off", "--daily", "23:30")
+    z("power", "add", "on", "--daily", "07:00")
+    day = (datetime.date.today() + datetime.timedelta(days=3)).isoformat()
+    number = add("--once", day, "03:00", "--name", "Lost")
+    browser.open(server, f"task/{number}")
+    browser.see("the machine is off then", ".coming")
+    browser.see("the task will not run")
+    browser.click("Edit")
+    browser.see("the machine is off then", ".coming")
+    browser.choose("Time", "12:00")
+    browser.see_not("the task will not run")
+
+
 @story("the calendar shows the runs of a week, the machine's off times as bands, and leads to the task")
 def calendar(browser, server):
     add("--daily", "12:10", "--name", "Noon")
@@ -787,6 +803,7 @@ def power(browser, server):
     z("power", "add", "on", "--daily", "07:00")
     browser.see("Every day at 07:00")
     browser.named("Remove Machine on: Every day at 07:00").send_keys(Keys.ENTER)
+    browser.see("never on again", "dialog")
     browser.dialog("Remove")
     browser.see_not("Every day at 07:00")
     browser.see_focused("the other time's button", lambda one: one.text == "Change")
@@ -1427,6 +1444,7 @@ def new_owner(browser, server):
     # At night the machine is off now, so the backup is moved.
     browser.click("Tasks")
     browser.click("Backup")
+    browser.see("the machine is off then", ".coming")
     browser.click("Edit")
     browser.see("Edit Backup")
     browser.choose("Time", "12:30")

@@ -95,10 +95,8 @@ seealso:
   - module: zelo.scheduler.tasks
 notes:
   - Changing tasks takes the rights of root.
-  - A task is removed by its number, right after it was looked up. When another program removes it at that moment and
-    saves another task, which gets the number, that one is removed instead, unless its application protects it; the
-    module fails then and says which, where the two have different names. C(prune) of M(zelo.scheduler.tasks)
-    looks up and removes in one step.
+  - A task is removed by its number, and only when that is still the task's. Where another program has removed it
+    meanwhile and saved another task, which got the number, nothing is done and the module fails.
 """
 
 EXAMPLES = r"""
