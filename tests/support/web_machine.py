@@ -250,6 +250,7 @@ class Browser:
         try:
             self.driver.get(server.url + "#/" + path)
         except TimeoutException:  # Chromium's renderer now and then never begins; the page is not to blame
+            self.driver.execute_cdp_cmd("Network.clearBrowserCookies", {})  # nobody was there, and the session has ended
             self.driver.get(server.url + "#/" + path)
         wait_for("the page is there", lambda: self.find("nav a"))
 

@@ -710,7 +710,7 @@ def off_then(browser, server):
     z("power", "add", "off", "--daily", "23:30")
     z("power", "add", "on", "--daily", "07:00")
     day = (datetime.date.today() + datetime.timedelta(days=3)).isoformat()
-    number = add("--once", day, "03:00", "--name", "Lost")
+    number = add("--once", day + "T03:00", "--name", "Lost")
     browser.open(server, f"task/{number}")
     browser.see("the machine is off then", ".coming")
     browser.see("the task will not run")
