@@ -75,34 +75,29 @@ export function notesPlace() {
   return place;
 }
 
-let isOfNextView = false;
-let isOfLastView = false; // of the view before this one
+let viewsLeft = 0; // that are shown before the note goes
 
 export function clearFaults() {
   if (place.querySelector(".bad")) fill(place);
 }
 
-// What was told for the view that is shown now stays.
 export function clearNotesOfView() {
-  if (!isOfNextView) clearFaults();
-  if (isOfLastView) fill(place);
-  isOfNextView = false;
-  isOfLastView = true;
+  if (viewsLeft === 0) fill(place);
+  else viewsLeft -= 1;
 }
 
-function note(kind, role, text) {
-  isOfLastView = false;
+function note(kind, role, text, views) {
+  viewsLeft = views;
   fill(place, el("div", { class: "note " + kind, role }, el("p", {}, text),
     button(_("Dismiss"), { class: "plain" }, () => fill(place))));
 }
 
-export function tellFault(text, { isOfNextView: isForNext = false } = {}) {
-  isOfNextView = isForNext;
-  note("bad", "alert", text);
+export function tellFault(text, { isOfNextView = false } = {}) {
+  note("bad", "alert", text, isOfNextView ? 1 : 0);
 }
 
 export function tell(text) {
-  note("good", "status", text);
+  note("good", "status", text, 1);
 }
 
 // Does something that may be refused. Whether it was done.

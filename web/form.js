@@ -201,7 +201,7 @@ export class FormView {
       return answer;
     } catch (error) {
       if (number === this.asked) {
-        this.showComing([]);
+        this.showComing([], []);
         setText(this.comingNote, error.message);
       }
       return null;
@@ -209,17 +209,16 @@ export class FormView {
   }
 
   // Written only when it is another answer: it is read out then.
-  showComing(due) {
-    const rows = comingRows(due, this.model.powerTimes);
+  showComing(due, rows) {
     const key = JSON.stringify([due, rows.map(({ isOff }) => isOff)]);
     if (key === this.comingShown) return;
     this.comingShown = key;
     fill(this.coming, ...comingItems(rows));
   }
 
-  comingNoteOf(due) {
-    if (due.length === 0) return _("Not as it stands.");
-    return this.isOn.input.checked ? comingWarning(comingRows(due, this.model.powerTimes))
+  comingNoteOf(rows) {
+    if (rows.length === 0) return _("Not as it stands.");
+    return this.isOn.input.checked ? comingWarning(rows)
       : _("But it is switched off, and does not run until it is switched on.");
   }
 
@@ -234,8 +233,10 @@ export class FormView {
 
   showPreview({ due, faults }) {
     const unseen = this.ownFaults();
-    this.showComing(unseen.size > 0 ? [] : due);
-    setText(this.comingNote, this.comingNoteOf(unseen.size > 0 ? [] : due));
+    const told = unseen.size > 0 ? [] : due;
+    const rows = comingRows(told, this.model.powerTimes);
+    this.showComing(told, rows);
+    setText(this.comingNote, this.comingNoteOf(rows));
     this.showFieldFaults(faults, unseen);
   }
 

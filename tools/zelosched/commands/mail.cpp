@@ -62,14 +62,14 @@ bool isAddress(const std::string &text) {
 
 // What the settings say of the address. They are a file that a shell reads, of which one form of
 // line is understood here: the one that this command writes, also within quotes.
-struct Settings {
+struct MailSettings {
   std::vector<std::string> others;  // the lines that say nothing of it
   std::string address;              // none: to the owners
   std::string fault;                // why that is not known
   mode_t mode = 0644;
 };
 
-bool takeAddress(const std::string &line, Settings *settings) {
+bool takeAddress(const std::string &line, MailSettings *settings) {
   if (line.compare(0, strlen(kAddress), kAddress) != 0) return false;
   std::string value = line.substr(strlen(kAddress));
   const bool isQuoted = value.size() > 1 && value.front() == value.back() &&
@@ -85,8 +85,8 @@ bool isComment(const std::string &line) {
   return first != std::string::npos && line[first] == '#';
 }
 
-Settings readMailSettings() {
-  Settings settings;
+MailSettings readMailSettings() {
+  MailSettings settings;
   struct stat info {};
   if (lstat(kSettings, &info) != 0) return settings;
   settings.mode = info.st_mode & ALLPERMS;
@@ -111,7 +111,7 @@ Settings readMailSettings() {
 
 // The file's other lines and its mode stay.
 void setAddress(const std::string &text) {
-  const Settings settings = readMailSettings();
+  const MailSettings settings = readMailSettings();
   if (!settings.fault.empty()) throw Failure(settings.fault + ": set the address there by hand");
   std::ostringstream contents;
   for (const std::string &line : settings.others) contents << line << '\n';
@@ -122,8 +122,7 @@ void setAddress(const std::string &text) {
 // What keeps the program from being run, where it is there; nothing when it is run.
 std::optional<std::string> faultOfProgram() {
   for (const NoticeProgram &program : noticePrograms()) {
-    const bool isItsDirectory = std::string_view(kMailProgram).starts_with(program.path + "/");
-    if (isItsDirectory || program.path == kMailProgram) {
+    if (program.path == kNoticeDirectory || program.path == kMailProgram) {
       return program.fault.empty() ? "" : program.path + " " + program.fault;
     }
   }
@@ -145,8 +144,9 @@ void requireLinkOrNothing() {
 
 void switchOn() {
   if (isOn()) return;
-  mkdir("/etc/zelosched", kDirectoryMode);
-  mkdir("/etc/zelosched/run-ended.d", kDirectoryMode);
+  const std::string directory = kNoticeDirectory;
+  mkdir(directory.substr(0, directory.rfind('/')).c_str(), kDirectoryMode);
+  mkdir(kNoticeDirectory, kDirectoryMode);
   unlink(kMailProgram);  // a link that leads nowhere
   if (symlink(mailProgram().c_str(), kMailProgram) < 0) {
     throw Failure(std::string("cannot make ") + kMailProgram + ": " + std::strerror(errno));
@@ -161,7 +161,7 @@ void switchOff() {
 }
 
 void tell(bool asJson) {
-  const Settings settings = readMailSettings();
+  const MailSettings settings = readMailSettings();
   if (asJson) {
     Json::Value top = topObject();
     top["mail"]["is_on"] = isOn();

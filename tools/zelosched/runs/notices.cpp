@@ -22,7 +22,6 @@
 
 namespace {
 
-constexpr char kDirectory[] = "/etc/zelosched/run-ended.d";
 constexpr std::chrono::seconds kPatience(30);
 constexpr useconds_t kLook = 20000;
 constexpr char kRunDirectory[] = "/run/zelosched";
@@ -195,8 +194,8 @@ pid_t start(const std::string &program, Environment environment, std::string *fa
   return 0;
 }
 
-// False when it went on for too long. Looks now and then rather than wait for an event: that needs
-// nothing which could be refused, and would leave us waiting for ever.
+// False when it went on for too long. Looks now and then: what else would tell of the end, such as
+// a file of the process, can be refused, and then nothing would end the wait.
 bool waitForEnd(pid_t pid) {
   const auto until = std::chrono::steady_clock::now() + kPatience;
   for (;;) {
@@ -241,11 +240,11 @@ bool hasMailer() {
 
 std::vector<NoticeProgram> noticePrograms() {
   struct stat directory {};
-  if (stat(kDirectory, &directory) != 0) return {};
-  if (!isRootsAlone(directory)) return {{kDirectory, "is not root's alone: nobody is told"}};
+  if (stat(kNoticeDirectory, &directory) != 0) return {};
+  if (!isRootsAlone(directory)) return {{kNoticeDirectory, "is not root's alone: nobody is told"}};
   std::vector<NoticeProgram> found;
-  for (const std::string &name : namesIn(kDirectory)) {
-    const std::string path = std::string(kDirectory) + "/" + name;
+  for (const std::string &name : namesIn(kNoticeDirectory)) {
+    const std::string path = std::string(kNoticeDirectory) + "/" + name;
     struct stat info {};
     if (stat(path.c_str(), &info) != 0 || !S_ISREG(info.st_mode)) continue;
     if ((info.st_mode & S_IXUSR) == 0) continue;

@@ -3,8 +3,11 @@
 
 #include "runs/history.h"
 
+#define NOTICE_DIRECTORY "/etc/zelosched/run-ended.d"
+inline constexpr char kNoticeDirectory[] = NOTICE_DIRECTORY;
+
 // What mails failures when it is among those that are told.
-inline constexpr char kMailProgram[] = "/etc/zelosched/run-ended.d/mail-on-failure";
+inline constexpr char kMailProgram[] = NOTICE_DIRECTORY "/mail-on-failure";
 inline constexpr char kMailer[] = "/usr/sbin/sendmail";
 bool hasMailer();
 
