@@ -126,6 +126,19 @@ def thousand_tasks():
     z("sync")
 
 
+def zone_where_it_is(hour):
+    """So that what a story sees does not depend on the time of day at which it is told."""
+    east = (hour - time.gmtime().tm_hour + 12) % 24 - 12
+    return f"Etc/GMT{-east:+d}"  # whose sign is the one of POSIX
+
+
+def set_zone(browser, name):
+    """The machine's and the browser's."""
+    subprocess.run(["ln", "-sf", "/usr/share/zoneinfo/" + name, "/etc/localtime"], check=True)
+    time.tzset()
+    browser.zone(name)
+
+
 # ---- cockpit --------------------------------------------------------------------------------
 
 
