@@ -297,7 +297,7 @@ TEST_F(RunEnvironmentTest, NoOtherOutputOfTheCallersReachesTheCommand) {
   for (const auto &[kind, make] : kinds) {
     SCOPED_TRACE(kind);
     std::filesystem::remove(kOutput);
-    EXPECT_EQ(outputAfter([&] { lendOutput(make()); }, id), kAllNothing);
+    EXPECT_EQ(outputAfter([lend = make] { lendOutput(lend()); }, id), kAllNothing);
   }
   std::filesystem::remove("/tmp/run_environment_test.fifo");
 }

@@ -18,7 +18,8 @@ readonly SCRIPTS=(json_python_test poweroff_feasible_check_test power_crontab_cr
 
 readonly MEASURING=(json_cost_test killed_test load_test)
 
-# Optimising would cost more time than it saves.
+# clang takes half of gcc's time where it watches. Optimising would cost more time than it saves.
+if command -v clang++ >/dev/null; then export CC=clang CXX=clang++; fi
 build() {
   BUILD_DIR=$SANITIZED JOBS=1 "$root/scripts/build" --preset=asan "${names[@]}" \
     >"$BUILD_DIR/sanitized.log" 2>&1 ||

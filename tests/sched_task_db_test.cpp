@@ -44,7 +44,7 @@ constexpr char kCreateTable[] =
     "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, "
     "timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);";
 constexpr char kLocked[] = "database is locked";
-constexpr ErrorRecord kNoError{0, ""};
+const ErrorRecord kNoError{0, ""};
 const ErrorRecord kBadArgument{0x0D00, "sched_task_db.cpp"};
 constexpr size_t kMostAttempts = 101;
 constexpr int kRunning = ZELO_SCHED_STATUS_RUNNING;

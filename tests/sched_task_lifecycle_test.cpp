@@ -31,7 +31,7 @@ constexpr long kId = 7;
 constexpr int32_t kFirst = ZELO_SCHED_BACKEND_SCHEDULE;
 constexpr int32_t kSecond = ZELO_SCHED_BACKEND_AUTOPOWER;
 constexpr int32_t kNobody = -9;
-constexpr ErrorRecord kNoError{0, ""};
+const ErrorRecord kNoError{0, ""};
 const ErrorRecord kFakesError{support::kFakeError, support::kFakeFile};
 
 void expectFailure(int result, const Lines &log, const ErrorRecord &error) {
@@ -158,7 +158,7 @@ TEST_P(OperationTest, AFailureOfTheBackendIsReported) {
 // An entry without the operation is nobody, and so is one behind those in use.
 TEST_P(OperationTest, ATaskThatNobodyTakesIsNotFound) {
   holdTask(0);
-  for (const size_t entry : {0, 3}) SchedBackends[entry].id = kNobody;
+  for (const size_t entry : {0U, 3U}) SchedBackends[entry].id = kNobody;
   GetParam().emptySlot(&SchedBackends[0]);
   EXPECT_EQ(callFor(kNobody), -1);
   EXPECT_EQ(logged(), line("No " + std::string(GetParam().word) + " backend" + GetParam().nobody +

@@ -22,7 +22,7 @@ using Lines = std::vector<std::string>;
 
 constexpr int kPre = ZELO_SCHED_PLUGIN_PRE;
 constexpr int kPost = ZELO_SCHED_PLUGIN_POST;
-constexpr ErrorRecord kNoError{0, ""};
+const ErrorRecord kNoError{0, ""};
 const ErrorRecord kBadArgument{0x0D00, "sched_task_plugin.cpp"};
 
 Lines operator+(Lines first, const Lines &second) {
