@@ -1,4 +1,4 @@
-// Replacing a file as a whole, so that nobody ever sees half of it.
+// Replacing a file as a whole, so that no reader sees a part of it.
 #ifndef SCHED_NEW_FILE_H
 #define SCHED_NEW_FILE_H
 
