@@ -22,7 +22,7 @@ void write(const uint8_t *data, size_t size) {
 
 }  // namespace
 
-// The file looks like a copy in progress; nothing would come of waiting for its end.
+// A file that looks like a copy in progress stays as it is, so waiting is useless.
 extern "C" int nanosleep(const timespec *, timespec *) {
   return 0;
 }

@@ -98,7 +98,7 @@ bool moveLockFromStandardDescriptors() {
 }
 
 // An anonymous pipe. A caller may open it for reading and writing, so that the command gets no
-// SIGPIPE when the reader ends; the command can then only read what the run has written.
+// SIGPIPE when the reader ends; all that can be read there is output of the run.
 bool isOwnPipe(int descriptor) {
   struct statfs where = {};
   return fstatfs(descriptor, &where) == 0 && where.f_type == PIPEFS_MAGIC;
@@ -214,7 +214,7 @@ constexpr Step kSteps[] = {
 
 int schedLeaveCaller() {
   resetSignals();
-  closelog();  // or the C library would use the number of its closed descriptor
+  closelog();  // or syslog would use its descriptor's number, which is closed below
   for (const Step &step : kSteps) {
     if (!step.take()) {
       SCHED_LOG_ERRNO("Failed to %s. ", step.what);

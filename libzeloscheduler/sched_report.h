@@ -26,7 +26,7 @@ enum SchedError : int {
   kErrMalformed = 0x4000,
 };
 
-// A location in the source, for a shared routine that reports failures at its caller's.
+// A source location, for a shared routine that reports failures at its caller's line.
 struct SchedSourceLocation {
   constexpr SchedSourceLocation(const char *szFile, int lineNumber)
       : file(szFile), line(lineNumber) {}

@@ -321,7 +321,7 @@ int copyWorkingCopy(const ScratchFile &scratch) {
       return -1;
     }
     const off_t size = schedSizeOf(scratch.path());
-    const bool mayBeEmpty = !schedAreTasksKept();  // a store that was made to take its name
+    const bool mayBeEmpty = !schedAreTasksKept();  // not cut off, but without tasks
     if (size == schedSizeOf(kWorkingCopy) && (size > 0 || mayBeEmpty)) {
       return 0;
     }

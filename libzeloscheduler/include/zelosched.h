@@ -443,7 +443,7 @@ ZELO_SCHED_API int ZELOSchedTaskPluginInit(ZELO_SCHED_PLUGIN *pPlugin, const cha
  * of these is logged. */
 ZELO_SCHED_API int ZELOSchedTaskPlugin(int action, ZELO_SCHED_PLUGIN *pPlugin);
 
-/* Releases what the platform holds for the context. 0, or -1. */
+/* Releases the platform's resources for the context. 0, or -1. */
 ZELO_SCHED_API int ZELOSchedTaskPluginExit(ZELO_SCHED_PLUGIN *pPlugin);
 
 /* ---- running, and the record of runs ------------------------------------------------ */

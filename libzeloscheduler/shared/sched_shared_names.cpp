@@ -17,7 +17,7 @@ constexpr mode_t kReadableByAll = 0644;
 constexpr mode_t kOwnersOnly = 0600;  // whoever can open it can delay every run
 constexpr mode_t kOpenDirectory = 0755;
 constexpr char kStorePath[] = "/tmp/scheduled_tasks";
-// So that a new store is not empty: an empty one beside a persistent copy counts as cut off.
+// Contents of a new store: an empty one beside a persistent copy counts as cut off.
 constexpr char kNoTasks[] = "# The scheduler's tasks.\n";
 
 // Reserved space, as another user can fill the file system, and a run that cannot be recorded is
