@@ -1,5 +1,5 @@
-// Creating a task beside others, and beside the work that a create cannot do without: three runs of
-// /bin/cp on the store and one synced rewrite of the crontab.
+// Creating a task in a store of others, compared with the work that a create cannot do without:
+// three runs of /bin/cp on the store and one synced rewrite of the crontab.
 #include <sys/stat.h>
 #include <unistd.h>
 #include <zelocore.h>
@@ -81,7 +81,7 @@ void fillStoreAndCrontab(int others) {
 void compareCreating(int others) {
   const std::string beside = " beside " + std::to_string(others);
   const auto setUp = [others] { fillStoreAndCrontab(others); };
-  // The work is done on what a create leaves.
+  // The compared work starts from the files that a create leaves.
   const auto setUpCreated = [others] {
     fillStoreAndCrontab(others);
     create();

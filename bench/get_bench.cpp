@@ -1,5 +1,5 @@
-// Reading one task, beside reading the file and nothing else: of a store that the process has read,
-// of one that it has not, and of one that was changed just now.
+// Reading one task, compared with just reading the file: from a store that the process has read,
+// from one that it has not, and from one that was changed just now.
 #include <zelosched.h>
 
 #include "support/row.h"

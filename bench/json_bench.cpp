@@ -1,5 +1,5 @@
-// A task to JSON, and back but for the save, beside JsonCpp alone writing and reading the same
-// texts.
+// Converting a task to JSON, and back without the save, compared with JsonCpp alone writing and
+// reading the same texts.
 #include <zelocore.h>
 #include <zelosched.h>
 
@@ -63,8 +63,7 @@ void readMembers() {
 
 using Operation = int (*)(ZELO_SCHED_TASK *);
 
-// What the backend is handed, it forgets; and it looks into no store for the defaults of a new
-// task.
+// Operations of a backend that reads and writes no store.
 int forget(ZELO_SCHED_TASK *task) {
   task->ID = 1;
   return 0;
@@ -81,7 +80,7 @@ void saveTo(Operation create, Operation get_default) {
 void makeRows() {
   constexpr double kMost = 1.2;
   fillStore(0);
-  const ZELO_SCHED_TASK *task = newTask(1).release();  // as long as the program
+  const ZELO_SCHED_TASK *task = newTask(1).release();  // never freed
   const Members members = membersOf(task);
   const Operation getDefault = SchedBackends[0].get_default;
   const auto convert = [task] {

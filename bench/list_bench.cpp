@@ -1,4 +1,4 @@
-// Listing, of a file that the process has not read yet, beside GLib's reader of such files.
+// Listing a file that the process has not read yet, compared with GLib's reader of such files.
 #include <glib.h>
 #include <zelosched.h>
 
@@ -9,7 +9,7 @@
 
 namespace {
 
-// The number of its keys.
+// Returns the number of its keys.
 gsize readGroup(GKeyFile *file, const char *group) {
   gsize count = 0;
   gchar **keys = g_key_file_get_keys(file, group, &count, nullptr);
@@ -56,6 +56,6 @@ void makeRows() {
   compareListing(10, 0.5);
   compareListing(100, 0.7);
   compareListing(1000, 0.8);
-  // Ten times, and a little for what no longer fits into the processor's caches.
+  // Ten times, and some for what no longer fits into the processor's caches.
   compareListing(10000, 0.8).atMost(12, "ZELOSchedTaskListGet, 1000 tasks");
 }

@@ -1,4 +1,4 @@
-// The memory that a list takes at its peak, beside its records and twice its file.
+// The peak memory of a list, compared with the size of its records and twice its file.
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <malloc.h>
@@ -19,7 +19,7 @@ namespace {
 
 size_t atPeak;
 
-// Page by page: the numbers that the kernel keeps of a process are some hundred KiB behind.
+// Counted page by page: the counters in /proc/self/status lag by some hundred KiB.
 size_t residentBytes() {
   constexpr char kLabel[] = "Rss:";
   constexpr size_t kKiB = 1024;
@@ -34,7 +34,7 @@ size_t residentBytes() {
 }
 
 size_t peakOfList(int count) {
-  list(count);  // what the process needs but once
+  list(count);  // allocates what a process allocates once
   forgetStore();
   malloc_trim(0);
   const size_t before = residentBytes();
@@ -43,7 +43,7 @@ size_t peakOfList(int count) {
   return atPeak - before;
 }
 
-// In a process of its own, which has not grown before.
+// In a child process, so that no measurement affects the heap of the next.
 size_t inChild(size_t (*measure)(int), int count) {
   int result[2];
   orDie(pipe(result) == 0, "pipe");
@@ -77,7 +77,8 @@ void compareMemory(int count) {
 
 }  // namespace
 
-// The last section's hash is the first thing that a list gives back, when all its tasks are there.
+// The first thing that a list frees is the last section's hash, when it has allocated all its
+// records.
 extern "C" __attribute__((visibility("default"))) void QLIBCSzHashFree(PSZHASH pHash) {
   static const auto real =
       reinterpret_cast<decltype(&QLIBCSzHashFree)>(dlsym(RTLD_NEXT, "QLIBCSzHashFree"));

@@ -1,5 +1,5 @@
-// A run from the call to the first instruction of its command, beside a shell that is forked and
-// does nothing.
+// A run, from the call to the first instruction of its command, compared with a shell that is
+// forked and does nothing.
 #include <fcntl.h>
 #include <pwd.h>
 #include <spawn.h>
@@ -27,16 +27,16 @@
 namespace {
 
 constexpr char kStarted[] = "/tmp/started";
-// Without another program, so that the shell's first instruction for it is the command's.
+// Only shell built-ins: no other program is started.
 constexpr char kCommand[] = ": > /tmp/started";
 constexpr char kWithoutKeeper[] = "--without-keeper";
 constexpr int kId = 1;
-constexpr int kPatience = 1000;  // milliseconds, with a run that is closing the database
+constexpr int kPatience = 1000;  // milliseconds, while a run closes the database
 
 sqlite3 *db;
 
-// The shell waits in its redirection for a reader, and the reader for it: not for ever, when no
-// command comes.
+// Opening a FIFO blocks until its other end is opened too. The alarm kills this program when the
+// command never starts.
 void awaitCommand() {
   constexpr unsigned kMostSeconds = 60;
   alarm(kMostSeconds);
@@ -57,7 +57,7 @@ bool isRunning() {
   return found > 0 && statusCode == ZELO_SCHED_STATUS_RUNNING;
 }
 
-// A run that has not been recorded as ended is a conflict for the next.
+// A run that has not been recorded as ended conflicts with the next.
 void awaitEnd() {
   constexpr useconds_t kPause = 200;
   while (isRunning()) {
@@ -78,7 +78,7 @@ void storeTask() {
   orDie(db != nullptr && sqlite3_busy_timeout(db, kPatience) == SQLITE_OK, "ZELOSchedDBInit");
 }
 
-// As the library opens it, which is measured elsewhere.
+// With the library's calls on the database, so that they count on both sides.
 void recordStart() {
   sqlite3 *own = ZELOSchedDBInit();
   ZELO_SCHED_STATUS other = {};
@@ -89,8 +89,8 @@ void recordStart() {
   orDie(recorded && sqlite3_close(own) == SQLITE_OK, "recording a start");
 }
 
-// What a run cannot do without: a child that nobody waits for, the record of its start, the owner
-// and the shell.
+// What a run cannot do without: a detached child, the record of its start, the look-up of the
+// owner and the shell.
 void runWithoutTheRest() {
   const int side = QLIBCProcForkChildNoWait();
   orDie(side >= 0, "QLIBCProcForkChildNoWait");
@@ -112,7 +112,7 @@ void forkShell() {
   orDie(shell > 0 && waitpid(shell, &status, 0) == shell && status == 0, "/bin/sh -c true");
 }
 
-// Whoever is left of a run, a keeper too, has ended: it would take time from the next.
+// Until all processes of a run have ended, the keeper too: they would slow the next one down.
 void awaitAll() {
   awaitEnd();
   while (waitpid(-1, nullptr, 0) > 0) {
@@ -132,7 +132,7 @@ void startProgram(const std::vector<const char *> &words) {
         words.front());
 }
 
-// The command waits for us, and the keeper for its end.
+// The command blocks on the FIFO until we open it; the keeper waits for its end.
 void runWithKeeper() {
   startProgram({ZELO_BIN_DIR "/zeloschedtask", "--run", "id=1", "--now"});
   awaitCommand();
@@ -159,7 +159,7 @@ size_t anonymousBytes(const std::string &process) {
   return std::stoul(memory.substr(place + strlen(kLabel))) * kKiB;
 }
 
-// What is left of zeloschedtask when that has ended is the keeper, a child of ours then.
+// When zeloschedtask has ended, the keeper is left, as a child of this process (a subreaper).
 size_t memoryOfKeeper() {
   awaitAll();
   startProgram({ZELO_BIN_DIR "/zeloschedtask", "--run", "id=1", "--now"});
@@ -175,7 +175,7 @@ size_t memoryOfKeeper() {
   return most;
 }
 
-// This program, as what starts a run without a keeper.
+// With kWithoutKeeper this program starts a run and exits.
 __attribute__((constructor)) void startWhenAsked(int argc, char **argv) {
   if (argc == 2 && strcmp(argv[1], kWithoutKeeper) == 0) {
     _exit(ZELOSchedTaskRun(kId, 0, 0) == 0 ? EXIT_SUCCESS : EXIT_FAILURE);

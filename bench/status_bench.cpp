@@ -1,4 +1,4 @@
-// Recording a run and its end, beside the same statements given to SQLite.
+// Recording a run and its end, compared with the same statements given to SQLite.
 #include <sqlite3.h>
 #include <unistd.h>
 #include <zelosched.h>
@@ -21,7 +21,7 @@ void orDieInSql(int result) {
   orDie(result == SQLITE_OK, sqlite3_errmsg(db));
 }
 
-// Both begin with an empty table and the library's own connection.
+// Both sides begin with an empty table and the library's own connection.
 void openEmpty() {
   sqlite3_close(db);
   unlink(kDatabase);
@@ -73,7 +73,7 @@ void recordInSql() {
 
 void makeRows() {
   fillStore(0);
-  task = newTask(1).release();  // as long as the program
+  task = newTask(1).release();  // never freed
   Row("ZELOSchedDBAddRecord, ZELOSchedDBSetStatus", Work{record, openEmpty, empty})
       .atMost(1.1, "the same statements, sqlite3_exec", Work{recordInSql, openEmpty, empty});
 }

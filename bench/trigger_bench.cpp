@@ -1,5 +1,5 @@
-// The next trigger time of each type of task, today and on a later day, beside the calls of the C
-// library that it takes.
+// The next trigger time of each type of task, today and on a later day, compared with the C
+// library calls that it takes.
 #include <benchmark/benchmark.h>
 #include <zelosched.h>
 
@@ -30,7 +30,7 @@ void readClockAndNormalize() {
   benchmark::DoNotOptimize(mktime(&fields));
 }
 
-// Today at the day's last minute, or at its first one, which has always gone by.
+// At 23:59 the run is still ahead today; at 00:00 it is over.
 void setUpTask(int type, bool isToday) {
   const time_t now = time(nullptr);
   const tm today = *localtime(&now);

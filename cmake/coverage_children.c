@@ -1,8 +1,8 @@
-/* In a build that counts what is run, the libraries' own calls of fork and _exit come here first:
- * children end without the exit handlers that write what was counted in them.
+/* Replaces fork and _exit in a coverage build: a child that calls _exit skips
+ * the exit handlers that write the coverage counters, so they are written here.
  *
- * The tests make calls fail, also those by which the counts are written. One that says so is asked
- * to let them be meanwhile. */
+ * A test program that makes C library calls fail defines zelo_tests_let_be,
+ * which suspends the failures while the counters are written. */
 #include <sys/syscall.h>
 #include <unistd.h>
 
@@ -22,7 +22,7 @@ static void dump(void) {
   }
 }
 
-/* What the parent has counted so far is the parent's to write. */
+/* The child's copies of the parent's counters are reset: the parent writes its own. */
 pid_t __gcov_fork(void) {
   const pid_t pid = fork();
   if (pid == 0) {

@@ -1,5 +1,5 @@
-# A manual page serves every function that its NAME section lists. Each of them gets a page of its
-# own name that leads there, so that "man FUNCTION" finds it.
+# A manual page documents every function in its NAME section. For each of them a page of its name
+# is made that includes (.so) the documented one, so that "man FUNCTION" finds it.
 #
 #   zelo_man_links(PAGE DIRECTORY): writes the links of PAGE into DIRECTORY
 function(zelo_man_links page directory)

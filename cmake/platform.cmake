@@ -1,5 +1,5 @@
-# A platform that is not ours (docs/porting.md): its libzelocore.so and libzelosdk.so below ZELO_PLATFORM. What
-# it has no header for is in ours.
+# A platform that is not ours (docs/porting.md): libzelocore.so and libzelosdk.so below
+# ZELO_PLATFORM. A header that is not there is taken from ours.
 if(ZELO_TESTS OR ZELO_BENCH)
   message(FATAL_ERROR "the tests are of our platform: set ZELO_TESTS and ZELO_BENCH to OFF")
 endif()
@@ -11,7 +11,7 @@ function(zelo_platform_library name)
   find_path(${name}_headers ${name}.h
     PATHS ${ZELO_PLATFORM}/include ${PROJECT_SOURCE_DIR}/platform/lib${name}/include
     REQUIRED NO_DEFAULT_PATH NO_CMAKE_FIND_ROOT_PATH)
-  # By its name, as the loader looks for it.
+  # With -l, as the linker would record the path of a library that has no SONAME.
   add_library(${name} INTERFACE)
   target_include_directories(${name} INTERFACE $<BUILD_INTERFACE:${${name}_headers}>
     $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)

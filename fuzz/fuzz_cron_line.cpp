@@ -1,4 +1,4 @@
-// The crontab line of any record: one line, and the others as they were.
+// The crontab line of any record: at most one line is added, and the others stay as they were.
 #include <fcntl.h>
 #include <unistd.h>
 #include <zelocore.h>

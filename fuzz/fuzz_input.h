@@ -1,4 +1,4 @@
-// What a fuzz target makes of its bytes.
+// Reads values of different types from the bytes of a fuzz target.
 #ifndef FUZZ_INPUT_H
 #define FUZZ_INPUT_H
 
@@ -49,7 +49,7 @@ class FuzzInput {
   size_t left_;
 };
 
-// Every field of a record, with any number in it.
+// A record with any values in its id, owner, state and schedule, and in some of its texts.
 inline ZELO_SCHED_TASK *anyTask(FuzzInput *input) {
   static ZELO_SCHED_TASK task;
   task = {};
@@ -71,7 +71,7 @@ inline ZELO_SCHED_TASK *anyTask(FuzzInput *input) {
   return &task;
 }
 
-// What must hold ends the run when it does not, and the fuzzer keeps the input.
+// Traps when a condition does not hold, so that the fuzzer keeps the input.
 inline void require(bool holds) {
   if (!holds) {
     __builtin_trap();

@@ -1,4 +1,4 @@
-// A task from a JSON text: refused whole or read whole.
+// Saving a task from any JSON text.
 #include <zelosched.h>
 
 #include <string>

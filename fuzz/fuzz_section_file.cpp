@@ -13,7 +13,6 @@ namespace {
 
 constexpr char kFile[] = "/tmp/fuzz_section_file";
 
-// Old enough not to be taken for a copy in progress.
 void write(const uint8_t *data, size_t size) {
   unlink(kFile);
   const int file = open(kFile, O_WRONLY | O_CREAT | O_TRUNC, 0600);
@@ -23,7 +22,7 @@ void write(const uint8_t *data, size_t size) {
 
 }  // namespace
 
-// Waiting for the rest of a copy is no use here.
+// A file that looks like a copy in progress stays as it is, so waiting is useless.
 extern "C" int nanosleep(const timespec *, timespec *) {
   return 0;
 }

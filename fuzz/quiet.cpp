@@ -1,4 +1,5 @@
-// Fuzz targets log nothing, start nothing and wait for nothing: what they try is how input is read.
+// Fuzz targets write no log, start no program and skip sleeping and syncing: they test how input
+// is read.
 #include <syslog.h>
 #include <unistd.h>
 #include <zelocore.h>
@@ -11,7 +12,7 @@ void syslog(int, const char *, ...) {}
 void vsyslog(int, const char *, va_list) {}
 void __syslog_chk(int, int, const char *, ...) {}
 
-// A store is therefore never published.
+// So no store is ever published.
 int QLIBCExec(const char *, ...) {
   return -1;
 }

@@ -1,4 +1,4 @@
-// Gives files to a fuzz target, for builds without a fuzzer: what was found once stays found.
+// Runs a fuzz target on files, in builds without a fuzzer: a regression test of the corpus.
 #include <cstdint>
 #include <cstdio>
 #include <fstream>

@@ -1,4 +1,4 @@
-// The table of backends: filled once in a process, in the order in which backends are asked.
+// The table of backends, filled once in a process, in the order in which they are asked.
 #include <zelosched.h>
 
 #include "sched_backend.h"

@@ -1,4 +1,4 @@
-// Reaching the backend that serves a call.
+// Finding the backend that serves a call.
 #ifndef SCHED_BACKEND_H
 #define SCHED_BACKEND_H
 
@@ -15,8 +15,7 @@
     }                                            \
   } while (0)
 
-// The index of the first entry with that id that offers the operation, or -1. An entry whose slot
-// is empty is passed over.
+// The index of the first entry with that id whose slot of the operation is not null, or -1.
 template <class Operation>
 int schedFindBackend(int32_t backendId, Operation ZELO_SCHED_BACKEND::*slot) {
   for (uint32_t i = 0; i < cBackend; ++i) {

@@ -1,6 +1,6 @@
-// Dates that roll over, and the minute that is shown as a task's next run. What that has in common
-// with the minutes at which the task does run is in the schedule library; here is what the
-// interface requires to be shown beside that.
+// Normalising dates, and the time that is shown as a task's next run. The schedule library
+// computes when a task runs; here are the cases in which the interface requires another time to be
+// shown.
 #include <zelosched.h>
 
 #include <cstring>
@@ -24,8 +24,8 @@ struct TriggerText {
   char text[64];  // five numbers of up to ten digits, and four characters between them
 };
 
-// With that many digits at least, behind `end`; the new end. snprintf would take more than all else
-// that is not the C library's.
+// Appends the number, with at least that many digits, and returns the new end. snprintf would take
+// longer than all the rest of this unit.
 char *appendNumber(char *end, uint32_t number, int digits) {
   if (number >= kTen || digits > 1) {
     end = appendNumber(end, number / kTen, digits - 1);
@@ -53,7 +53,7 @@ TriggerText written(const ZELO_SCHED_DATE &date) {
 
 enum class Today { kFound, kOver, kFailed };
 
-// The first run of today that is still ahead; one of this very minute has been started already.
+// The first run of today after the current minute; one of this minute has been started already.
 Today ZELOSchedTDayNextRunTime(const ZELO_SCHED_TASK *pTask, const ZELO_SCHED_DATE &now,
                                TriggerText *result) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", Today::kFailed);
@@ -71,7 +71,7 @@ Today ZELOSchedTDayNextRunTime(const ZELO_SCHED_TASK *pTask, const ZELO_SCHED_DA
   return Today::kOver;
 }
 
-// Without any day of the week the search ends eight days ahead; the display shows just that.
+// Without any day of the week the result is 8, which is then shown.
 uint32_t daysToNextWeekday(const ZELO_SCHED_TASK &task, uint32_t weekday) {
   uint32_t days = 1;
   while (days <= kDaysOfWeek && !schedIsWeekdayOn(task, (weekday + days) % kDaysOfWeek)) {
@@ -127,12 +127,12 @@ int ZELOSchedNextRunEstimate(const ZELO_SCHED_TASK &task, SchedTriggerClock *clo
   return 0;
 }
 
-// Of the other types the start date is passed over, though they do not run before it.
+// The start date of the other types is ignored, though they do not run before it.
 bool isStartShown(const ZELO_SCHED_TASK &task) {
   return schedHasDayOfMonth(task);
 }
 
-// A type that does not exist is shown like a weekly one.
+// An unknown type counts as weekly.
 bool isShownToday(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &now) {
   if (isStartShown(task)) {
     return schedIsDueDay(task, now);
@@ -177,14 +177,14 @@ int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate) {
   fields.tm_hour = static_cast<int>(pDate->hour);
   fields.tm_min = static_cast<int>(pDate->minute);
   fields.tm_isdst = 0;  // standard time, not "unknown": see the header on summer time
-  fields.tm_wday = -1;  // stays so when mktime fails; its result -1 may also be a moment
+  fields.tm_wday = -1;  // stays so when mktime fails; its result -1 is also a valid time
   const time_t seconds = mktime(&fields);
   if (fields.tm_wday < 0) {
     SCHED_LOG_ERRNO("mktime failed. ");
     SCHED_SET_ERROR(kErrSystem);
     return -1;
   }
-  // localtime would look for a change of the time zone once more, which mktime has just done.
+  // localtime would check the time zone for a change, which mktime has just done.
   struct tm local = {};
   if (localtime_r(&seconds, &local) == nullptr) {
     SCHED_LOG_ERRNO("localtime failed. ");

@@ -1,4 +1,4 @@
-// A connection to the status database that is closed on every way out.
+// A connection to the status database that is closed at the end of its scope.
 #ifndef SCHED_DB_GUARD_H
 #define SCHED_DB_GUARD_H
 

@@ -1,11 +1,11 @@
-// An application's name comes from whoever made the task, and its apostrophes stand in the
-// statements as they are. SQLite bounds neither the time nor the memory that preparing a statement
-// takes, and its authorizer is the caller's; so a text that would make another statement of the one
-// it stands in is refused before SQLite sees it, by what it has outside of apostrophes.
+// An application's name comes from whoever made the task, and is put into statements with its
+// apostrophes unescaped. The limits and the authorizer of the connection are the caller's, so a
+// text that would change the statement is refused before SQLite sees it, by its tokens outside of
+// apostrophes.
 //
-// What is let through has no semicolon, comma, bracket, comment or quoted identifier. So the
-// statement remains one, with its own values and its own end, and can call no function, name no
-// table and hold no query.
+// No semicolon, comma, parenthesis, comment or quoted identifier is allowed there. So it remains
+// one statement with the same values and the same end, without function calls, tables and
+// subqueries of the text's.
 #include "sched_db_text.h"
 
 #include <strings.h>
@@ -22,9 +22,9 @@ constexpr std::string_view kConditionWords[] = {"and",     "app",         "comme
                                                 "not",     "null",        "or",        "pid",
                                                 "task_id", "status_code", "status_id", "timestamp"};
 constexpr char kConditionOperators[] = "<=>!|";
-constexpr int kMostTokens = 64;  // each costs time for every row
+constexpr int kMostTokens = 64;  // each is evaluated for every row
 
-// Of a name or a number; SQLite takes every byte that is not ASCII for a letter.
+// A character of a name or a number; SQLite takes every byte that is not ASCII for a letter.
 bool isOfWord(char c) {
   const auto byte = static_cast<unsigned char>(c);
   return byte >= 0x80 || isalnum(byte) != 0 || c == '_' || c == '$';
@@ -45,8 +45,8 @@ bool isNumber(std::string_view word) {
   return std::all_of(word.begin(), word.end(), [](char c) { return c >= '0' && c <= '9'; });
 }
 
-// After the apostrophe that ends it, or at the end of the text. An apostrophe at that end is
-// doubled by the statement's own.
+// Past the apostrophe that ends it, or the end of the text. A last apostrophe forms a pair with
+// the one that follows in the statement.
 const char *endOfQuoted(const char *szQuoted) {
   for (const char *end = strchr(szQuoted, '\''); end != nullptr; end = strchr(end + 2, '\'')) {
     if (end[1] == '\0') {
@@ -85,9 +85,9 @@ bool isUnknownWord(std::string_view token) {
 
 }  // namespace
 
-// Where the text ends outside of apostrophes, the statement's own begins a text that has no end.
-// SQLite says so and does nothing, so that such a statement may reach it. It quotes the text then,
-// which must not say what it says of a locked database, for which a statement is tried again.
+// Where the text ends outside of apostrophes, the statement's own begins an unterminated literal,
+// which SQLite refuses. Its message quotes the text, which must therefore not contain the words by
+// which execute() recognises a locked database and tries again.
 bool isRefused(const char *szText, AfterText after, Refusal *pReason) {
   if (strchr(szText, '\'') != nullptr && strstr(szText, kLocked) != nullptr) {
     pReason->append("not authorized");

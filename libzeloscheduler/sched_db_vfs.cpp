@@ -1,12 +1,13 @@
-// What lies beside a database under the names that SQLite gives its journals is part of it: a
-// rollback journal is rolled back, and a file that it names is deleted; a write-ahead log hides
-// what the database holds. Where others can make files, that is theirs to choose, at any moment.
+// SQLite takes files beside a database that have the names of its journals for part of it: it
+// rolls back a rollback journal, deletes a file that the journal names, and reads a write-ahead
+// log in place of the database. In a directory where other users can make files, they could plant
+// these at any time.
 //
-// So the handle is opened through a VFS of ours, which passes everything on to the default one but
-// what concerns those names. sqlite3_open takes the default VFS, which is why ours is that one for
-// the length of the call, under the name of the other, so that what is attached later finds that.
-// The handle keeps its pointer to ours. No file is opened here that SQLite locks: closing it would
-// drop the locks of other handles of this process.
+// So the connection is opened with a VFS of ours, which passes all calls on to the default one
+// except those on these names. sqlite3_open uses the default VFS, so ours is registered as the
+// default during the call. It has the name of the other, so that databases attached later use that
+// one; the connection keeps its pointer to ours. No file that SQLite locks is opened here: closing
+// it would drop the locks of other connections of this process.
 #include "sched_db_vfs.h"
 
 #include <dlfcn.h>
@@ -22,8 +23,8 @@
 namespace {
 
 constexpr char kJournalSuffix[] = "-journal";
-constexpr char kMagic[] = "SQLite format 3";  // with its zero
-constexpr int kWriteVersion = 18;             // where it stands; the read version follows
+constexpr char kMagic[] = "SQLite format 3";  // with the terminating zero
+constexpr int kWriteVersion = 18;             // its offset; the read version follows
 constexpr char kVersionOfWal = 2;
 
 struct OwnFilesVfs {
@@ -59,8 +60,8 @@ File fileOf(const char *szName) {
   return suffix.front() == '-' ? File::kOtherOfOurs : File::kForeign;
 }
 
-// Of a handle of ours only temporary files are foreign, which are neither looked for nor deleted by
-// name, and super-journals, which a journal names.
+// The only foreign files of our connection are temporary files, which are not accessed by name,
+// and super-journals, which a journal names.
 bool isNotThere(File file) {
   return file == File::kOtherOfOurs || (file == File::kForeign && !own.servesOthers);
 }
@@ -72,8 +73,8 @@ bool isInWalMode(sqlite3_file *file) {
          (header[kWriteVersion] == kVersionOfWal || header[kWriteVersion + 1] == kVersionOfWal);
 }
 
-// Without shared memory, which the default VFS would open by a name of its own, SQLite keeps from
-// WAL mode, also where a caller asks for it.
+// Without the methods for shared memory, which the default VFS would open under a name of its own,
+// SQLite does not enter WAL mode, even when a caller asks for it.
 void takeSharedMemory(sqlite3_file *file) {
   own.methods = *file->pMethods;
   own.methods.iVersion = 1;
@@ -115,13 +116,13 @@ int openFile(sqlite3_vfs *, const char *szName, sqlite3_file *file, int flags, i
                                  : own.real->xOpen(own.real, szName, file, flags, pFlags);
 }
 
-// What was taken from the file system for the file stays so.
+// Allocates the blocks again that the file had before it was truncated.
 void keepRoom(int descriptor, const struct stat &before) {
   constexpr off_t kBlock = 512;  // the unit of st_blocks
   fallocate(descriptor, FALLOC_FL_KEEP_SIZE, 0, before.st_blocks * kBlock);
 }
 
-// A journal without contents is none, and keeps its name and its room taken.
+// SQLite takes an empty journal for none. Its name and its blocks stay taken.
 int emptyJournal(const char *szName, bool toDisk) {
   const int descriptor = open(szName, O_WRONLY | O_NOFOLLOW | O_CLOEXEC);
   if (descriptor < 0) {
@@ -159,7 +160,7 @@ int lookAtFile(sqlite3_vfs *, const char *szName, int flags, int *pIsThere) {
   return SQLITE_OK;
 }
 
-// The path is whole, and a link in its place is not followed.
+// The path is absolute already, and resolving it would follow a link.
 int completeName(sqlite3_vfs *, const char *szName, int size, char *szFullName) {
   if (fileOf(szName) != File::kDatabase) {
     return own.real->xFullPathname(own.real, szName, size, szFullName);
@@ -205,7 +206,7 @@ void passTheRest() {
   }
 }
 
-// For good: open handles point to it.
+// Never undone: open connections point to it.
 bool isPrepared(const char *szPath, HoldName hold) {
   if (own.real != nullptr) {
     return true;
@@ -230,8 +231,8 @@ bool isPrepared(const char *szPath, HoldName hold) {
   return true;
 }
 
-// The default VFS while it lives. Another thread that opens a database meanwhile keeps it as long
-// as that database is open, so then this library must not be unloaded.
+// Makes ours the default VFS while it lives. A database that another thread opens meanwhile keeps
+// pointing to it, so in a process with threads this library must not be unloaded.
 class DefaultVfs {
  public:
   DefaultVfs() {

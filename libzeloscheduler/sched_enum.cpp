@@ -1,4 +1,4 @@
-// Names for numbers: enumeration values, and on/off characters as lists of names.
+// Names for enumeration values, and on/off characters as lists of names.
 #include <strings.h>
 #include <zelosched.h>
 
@@ -78,7 +78,7 @@ const char *ZELOSchedMultiSelectFromText(const char *text, const char *const *na
   if (QLIBCStrSep(text, ",", items.handle()) <= 0) {
     return nullptr;
   }
-  // Callers keep `count` below the capacity; one that does not gets what fits.
+  // Callers keep `count` below the capacity; for a larger one the result is cut.
   for (size_t i = 0; i < count && i < kResultCapacity - 1; ++i) {
     result[i] = holdsIgnoringCase(items.get(), names[i]) ? kOn : kOff;
   }

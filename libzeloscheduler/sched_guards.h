@@ -1,4 +1,4 @@
-// Owners of what must be given back on every way out of a function.
+// Guards that release hashes, lists, memory and records at the end of a scope.
 #ifndef SCHED_GUARDS_H
 #define SCHED_GUARDS_H
 
@@ -20,8 +20,8 @@ struct MemoryDeleter {
   void operator()(void *memory) const { free(memory); }
 };
 
-// The platform may move a hash or a list when it grows, which is why its calls take the address of
-// the handle; handle() is that address. Not every platform frees null.
+// The platform may move a hash or a list when it grows, so its calls take the address of the
+// handle, which handle() returns. Some platforms do not accept null for freeing.
 template <class Handle, class Deleter>
 class PlatformHandle {
  public:

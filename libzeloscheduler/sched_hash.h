@@ -1,4 +1,4 @@
-// Filling a task from its hash form on behalf of another unit, which the log lines then name.
+// Filling a task from its hash form; log lines name the source location of the caller.
 #ifndef SCHED_HASH_H
 #define SCHED_HASH_H
 

@@ -6,8 +6,8 @@
 
 #include "sched_report.h"
 
-// A plugin cannot veto a change: what it answers is logged, under the source location of the
-// change, and goes no further.
+// A plugin cannot veto a change: its failure is only logged, with the source location of the
+// change.
 class SchedHook {
  public:
   SchedHook(const char *szAction, const ZELO_SCHED_TASK *pOrg, const ZELO_SCHED_TASK *pNew)
@@ -23,8 +23,8 @@ class SchedHook {
     }
   }
 
-  // Also for a hook that is not live: that the plugins could not be told is logged too. Why the
-  // change failed stays in the error record, whatever the plugins do.
+  // Also called for a hook that is not live, to log that no plugin was run. The error record of a
+  // failed change is restored after the plugins.
   void after(int result, SchedSourceLocation location) {
     const SchedErrorRecord reason;
     plugin_.result = result;

@@ -1,5 +1,5 @@
-// JsonCpp's older classes, whose way of writing is what this library's callers have always read.
-// They are marked as deprecated; that is silenced here and nowhere else.
+// JsonCpp's older classes, whose format is part of the interface. They are deprecated; in the
+// library the warnings are silenced only here.
 #ifndef SCHED_JSON_H
 #define SCHED_JSON_H
 
@@ -10,8 +10,7 @@
 #include <string>
 #include <string_view>
 
-// One of each serves for all texts of a call: what they allocate to begin with is most of what a
-// short text costs them.
+// One of each is used for all texts of a call: constructing one costs more than a short text.
 class SchedJsonWriter {
  public:
   std::string write(const Json::Value &value) { return writer_.write(value); }
@@ -22,8 +21,8 @@ class SchedJsonWriter {
 
 class SchedJsonReader {
  public:
-  // Comments are passed over. The reader can also keep them, but takes time that grows with the
-  // square of their number to do so, and the texts come from outside.
+  // Comments are ignored. Keeping them would take the reader time quadratic in their number, and
+  // the texts come from outside.
   bool read(std::string_view text, Json::Value *value) {
     constexpr bool kKeepComments = false;
     return reader_.parse(text.data(), text.data() + text.size(), *value, kKeepComments);

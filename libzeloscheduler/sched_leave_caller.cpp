@@ -1,4 +1,4 @@
-// What a run gives up of the process that asked for it.
+// What a run does not keep of the process that started it.
 #include "sched_leave_caller.h"
 
 #include <fcntl.h>
@@ -27,14 +27,14 @@ constexpr unsigned kLastDescriptor = ~0U;
 
 // ---- session and keys -------------------------------------------------------------------------
 
-// A platform's fork may have begun it already.
+// The platform's fork may have begun a session already.
 bool beginSession() {
   return setsid() >= 0 || getsid(0) == getpid();
 }
 
 // A command that has the caller's session keyring can read the keys in it, whoever it runs as.
-// Where the kernel has no keyrings, or a filter keeps them from the process, it keeps them from the
-// command too.
+// Without keyrings in the kernel, or with a seccomp filter against the call, the command cannot
+// read them either.
 bool beginKeyring() {
   return syscall(SYS_keyctl, KEYCTL_JOIN_SESSION_KEYRING, nullptr) >= 0 || errno == ENOSYS ||
          errno == EPERM;
@@ -42,8 +42,9 @@ bool beginKeyring() {
 
 // ---- capabilities -------------------------------------------------------------------------------
 
-// With this bit a change of users takes no capability away, neither from this process nor from a
-// set-uid program that the command starts. Where it is locked the exec of the command still does.
+// With this bit a change of the user ids takes no capability away, neither from this process nor
+// from a set-uid program that the command starts. Where the bit is locked, the exec of the command
+// still takes them.
 void letUserChangesTakeCapabilities() {
   const int bits = prctl(PR_GET_SECUREBITS);
   if (bits > 0 && (bits & SECBIT_NO_SETUID_FIXUP) != 0) {
@@ -51,12 +52,12 @@ void letUserChangesTakeCapabilities() {
   }
 }
 
-// EINVAL comes from a kernel that has none.
+// EINVAL: the kernel has no ambient capabilities.
 bool clearAmbientCapabilities() {
   return prctl(PR_CAP_AMBIENT, PR_CAP_AMBIENT_CLEAR_ALL, 0UL, 0UL, 0UL) == 0 || errno == EINVAL;
 }
 
-// The library of the C language has no call for these.
+// The C library has no functions for these system calls.
 bool clearInheritableCapabilities() {
   __user_cap_header_struct header = {};
   header.version = _LINUX_CAPABILITY_VERSION_3;
@@ -72,8 +73,8 @@ bool clearInheritableCapabilities() {
   return !isAnyInheritable || syscall(SYS_capset, &header, sets) == 0;
 }
 
-// The permitted and effective ones are still needed to become the owner, and end with the exec of
-// a command that is not root's. These would go through it.
+// The permitted and effective ones are still needed to become the owner; the exec of a command
+// that is not root's drops them. Ambient and inheritable ones would survive the exec.
 bool giveUpCapabilities() {
   letUserChangesTakeCapabilities();
   return clearAmbientCapabilities() && clearInheritableCapabilities();
@@ -81,8 +82,8 @@ bool giveUpCapabilities() {
 
 // ---- descriptors --------------------------------------------------------------------------------
 
-// A lock file's stream on a standard descriptor, which only a caller without that one has, makes
-// room.
+// Moves the lock file's stream off a standard descriptor, which it has where the caller had that
+// one closed.
 bool moveLockFromStandardDescriptors() {
   if (pfLock == nullptr || fileno(pfLock) >= kFirstOwnDescriptor) {
     return true;
@@ -92,19 +93,19 @@ bool moveLockFromStandardDescriptors() {
   if (stream == nullptr) {
     return false;
   }
-  pfLock = stream;  // the former one is left to the end of this short-lived process
+  pfLock = stream;  // the former stream is not closed: the process is short-lived
   return true;
 }
 
-// A pipe without a name. Its caller opens the writing end both ways lest the command is ended when
-// whoever reads it is; what can be read there is what the run has written.
+// An anonymous pipe. A caller may open it for reading and writing, so that the command gets no
+// SIGPIPE when the reader ends; all that can be read there is output of the run.
 bool isOwnPipe(int descriptor) {
   struct statfs where = {};
   return fstatfs(descriptor, &where) == 0 && where.f_type == PIPEFS_MAGIC;
 }
 
-// Whether it can be written to and, but for such a pipe, nothing else. One that is to be closed on
-// an exec was never meant for a command.
+// Whether it is open for writing only (such a pipe, also for reading). One with FD_CLOEXEC was
+// never meant for a command.
 bool isOutputOnly(int descriptor) {
   const int flags = fcntl(descriptor, F_GETFL);
   const int ownFlags = fcntl(descriptor, F_GETFD);
@@ -127,15 +128,15 @@ bool leadToNothing(int descriptor, int access) {
   return isLed;
 }
 
-// One that stayed closed would be given to the next file opened, and the command would then write
-// its output into a database.
+// The number of a closed one would be given to the next file opened, and a command could then
+// write its output into the database.
 bool replaceStandardDescriptors() {
   return moveLockFromStandardDescriptors() && leadToNothing(STDIN_FILENO, O_RDONLY) &&
          (isOutputOnly(STDOUT_FILENO) || leadToNothing(STDOUT_FILENO, O_WRONLY)) &&
          (isOutputOnly(STDERR_FILENO) || leadToNothing(STDERR_FILENO, O_WRONLY));
 }
 
-// One by one where the kernel, or a filter on its calls, does not know the call for all at once.
+// Where the kernel or a seccomp filter does not allow close_range.
 bool closeOneByOne(unsigned first, unsigned last) {
   const long most = sysconf(_SC_OPEN_MAX);
   if (most < 0) {
@@ -175,7 +176,7 @@ void resetSignals() {
   sigprocmask(SIG_SETMASK, &none, nullptr);
 }
 
-// Not to be killed before others is a privilege of the caller's, and so is to be killed last.
+// The caller's protection from the out-of-memory killer is not for the command.
 void resetOutOfMemoryScore() {
   const int score = open("/proc/self/oom_score_adj", O_WRONLY | O_CLOEXEC);
   if (score >= 0) {
@@ -184,13 +185,13 @@ void resetOutOfMemoryScore() {
   }
 }
 
-// None of these is a right, and a kernel may keep a process from raising its own: what is refused
-// stays as it is.
+// These give no access, and the kernel may refuse a process to raise its own priority: failures
+// are ignored.
 void resetScheduling() {
   const sched_param none = {};
   sched_setscheduler(0, SCHED_OTHER, &none);
   setpriority(PRIO_PROCESS, 0, 0);
-  // The kernel's header of these does not compile as C++ everywhere.
+  // From linux/ioprio.h, which does not compile as C++ everywhere.
   constexpr int kWhoProcess = 1;
   constexpr int kDiskPriorityOfNice = 0;
   syscall(SYS_ioprio_set, kWhoProcess, 0, kDiskPriorityOfNice);
@@ -213,7 +214,7 @@ constexpr Step kSteps[] = {
 
 int schedLeaveCaller() {
   resetSignals();
-  closelog();  // its descriptor is closed below; the C library would go on using the number
+  closelog();  // or syslog would use its descriptor's number, which is closed below
   for (const Step &step : kSteps) {
     if (!step.take()) {
       SCHED_LOG_ERRNO("Failed to %s. ", step.what);

@@ -1,5 +1,4 @@
-// The persistent fields of a task, one row each: what the hash form, the defaults and the list sort
-// know about a field they know from here.
+// The fields of a task, one row each, for the hash form, the defaults and the sorting of lists.
 #ifndef SCHED_PARM_TABLE_H
 #define SCHED_PARM_TABLE_H
 

@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <cstdlib>
 
-// Stands at the front of its memory; the records follow.
+// The head of a block of memory; the records follow it.
 struct SchedBlock {
   SchedBlock *next;
   size_t room;     // in records
@@ -23,10 +23,10 @@ static_assert(sizeof(SchedBlock) % alignof(ZELO_SCHED_TASK) == 0);
 
 namespace {
 
-// A record that is kept keeps its block, of two megabytes at most.
+// A record that is not freed keeps its whole block, of a little over 2 MB at most.
 constexpr size_t kMostInBlock = 64;
 
-// The newest in front: the records of a list are mostly freed in that order.
+// The newest first: the records of a list are mostly freed in that order.
 SchedBlock *blocks = nullptr;
 
 SchedBlock *newBlock(size_t room) {
@@ -39,7 +39,7 @@ SchedBlock *newBlock(size_t room) {
   return block;
 }
 
-// One holder less for the block that the record is in. False for a record that was allocated by
+// Drops a reference to the block that the record is in. False for a record that was allocated by
 // itself.
 bool release(const ZELO_SCHED_TASK *pTask) {
   for (SchedBlock **link = &blocks; *link != nullptr; link = &(*link)->next) {
@@ -87,7 +87,7 @@ TaskGuard SchedRecordSource::take() {
   }
   left_ -= left_ > 1 ? 1 : 0;
   if (block_ == nullptr) {
-    return schedRecordAlloc();  // where there may still be room for a single one
+    return schedRecordAlloc();  // there may still be memory for a single one
   }
   ++block_->holders;
   return TaskGuard(block_->records() + block_->taken++);

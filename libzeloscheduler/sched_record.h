@@ -1,4 +1,4 @@
-// Where task records come from and go back to.
+// Allocating and freeing task records.
 #ifndef SCHED_RECORD_H
 #define SCHED_RECORD_H
 
@@ -19,10 +19,10 @@ TaskGuard schedRecordAlloc();
 
 struct SchedBlock;
 
-// The records of one list. The allocator gives the memory of records that were taken one by one
-// back to the kernel after each list, and the page faults of the next one are then most of its
-// time. They are therefore taken from blocks of a few; a block is freed with the last of its
-// records, in whatever order they are freed.
+// The records of one list, taken from blocks. If each were allocated by itself, the allocator
+// would return their memory to the kernel after each list, and page faults would take most of the
+// time of the next. A block is freed with the last of its records, in whatever order they are
+// freed.
 class SchedRecordSource {
  public:
   explicit SchedRecordSource(int mostRecords);

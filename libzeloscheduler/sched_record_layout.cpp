@@ -1,8 +1,7 @@
-// Where the fields of the records lie that callers and the platform share with the library: a
-// change of any would let programs compiled before read other fields. The build fails when one
-// differs.
+// The layout of the records that callers and the platform share with the library: after a change,
+// programs compiled before would read other fields. The build fails when any differs.
 //
-// There are two layouts, as Debian's processors differ in the width of pointers and of long alone:
+// There are two layouts, as the processors differ only in the width of pointers and of long:
 // amd64, arm64 and s390x have 64 bits, armhf has 32.
 #include <zelosched.h>
 #include <zelosdk.h>
@@ -136,5 +135,5 @@ FIELD(ZELO_SCHEDULE, szCommand, 24, 1024, 24, 1024);
 
 static_assert(sizeof(long) == sizeof(void *), "the arguments that are long");
 static_assert(CHAR_BIT == 8 && sizeof(int) == 4 && sizeof(uid_t) == 4, "ids and results");
-// _TIME_BITS and _FILE_OFFSET_BITS, which a 32-bit build of its own may forget.
+// _TIME_BITS and _FILE_OFFSET_BITS, which another build for 32 bits may lack.
 static_assert(sizeof(time_t) == 8 && sizeof(off_t) == 8, "times after 2038, and large files");

@@ -1,5 +1,5 @@
-// How every unit checks an argument and reports a failure. The macros stand in for functions so
-// that each log line names the file and the line where the failure was seen.
+// Checking arguments and reporting failures. These are macros so that each log line has the file
+// and the line of the failure.
 #ifndef SCHED_REPORT_H
 #define SCHED_REPORT_H
 
@@ -26,7 +26,7 @@ enum SchedError : int {
   kErrMalformed = 0x4000,
 };
 
-// A location in the source, for a shared routine that reports under its caller's name.
+// A source location, for a shared routine that reports failures at its caller's line.
 struct SchedSourceLocation {
   constexpr SchedSourceLocation(const char *szFile, int lineNumber)
       : file(szFile), line(lineNumber) {}
@@ -41,18 +41,18 @@ struct SchedSourceLocation {
 
 #define SCHED_LOG(format, ...) SCHED_LOG_AT(SCHED_HERE, format __VA_OPT__(, ) __VA_ARGS__)
 
-// For a failed call of the C library: the line ends with what errno says.
+// For a failed call of the C library: the line ends with the text of errno.
 #define SCHED_LOG_ERRNO(format, ...) \
   SCHED_LOG(format "%s" __VA_OPT__(, ) __VA_ARGS__, strerror(errno))
 
-// Not every platform has a name there before the first failure.
+// On some platforms it is null before the first failure.
 inline const char *schedErrorFile() {
   const char *szFile = QLIBCErrorGetFile();
   return szFile != nullptr ? szFile : "";
 }
 
 // For a failure passed up from a callee: its error record is appended to the line and stays as it
-// is. `format` ends with whatever stands before the bracket.
+// is. `format` ends with the text before the bracket.
 #define SCHED_LOG_CALLEE_AT(location, format, ...)                           \
   SCHED_LOG_AT(location, format "[0x%04X %s:%d]" __VA_OPT__(, ) __VA_ARGS__, \
                static_cast<unsigned>(QLIBCErrGet()), schedErrorFile(), QLIBCErrorGetLine())
@@ -62,7 +62,7 @@ inline const char *schedErrorFile() {
 
 #define SCHED_SET_ERROR(code) QLIBCErrSetEx((code), __FILE_NAME__, __LINE__)
 
-// Keeps the error record of a failure while what follows it may set another.
+// Saves the error record of a failure, to restore it after calls that may set another.
 class SchedErrorRecord {
  public:
   SchedErrorRecord() : code_(QLIBCErrGet()), line_(QLIBCErrorGetLine()) {
@@ -82,8 +82,8 @@ class SchedErrorRecord {
     SCHED_SET_ERROR(kErrBadArgument);                   \
   } while (0)
 
-// `text` is the condition as the interface has it in the log: readers of the log match on it, so it
-// is given apart from the condition itself.
+// `text` is the condition as the interface has it in the log, where programs match on it; it need
+// not be that of the code.
 #define SCHED_CHECK_ARG(condition, text, result) \
   do {                                           \
     if (!(condition)) {                          \

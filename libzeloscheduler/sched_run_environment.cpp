@@ -20,8 +20,8 @@ constexpr char kDefaultShell[] = "/bin/sh";
 constexpr char kRootDirectory[] = "/";
 constexpr mode_t kFileModeMask = 022;
 
-// Of the caller's environment these stay: a command should speak the language and keep the time
-// zone of the machine. Nothing else of it reaches a command.
+// Only these variables of the caller's environment are passed to a command, for the language and
+// the time zone.
 constexpr const char *kKeptVariables[] = {
     "TZ",          "LANG",         "LANGUAGE",       "LC_ALL",
     "LC_CTYPE",    "LC_NUMERIC",   "LC_TIME",        "LC_COLLATE",
@@ -29,8 +29,7 @@ constexpr const char *kKeptVariables[] = {
     "LC_ADDRESS",  "LC_TELEPHONE", "LC_MEASUREMENT", "LC_IDENTIFICATION",
 };
 
-// The new environment, built beside the old one: it takes the old one's place only when it is
-// whole.
+// The new environment, which replaces the old one only when it is complete.
 class Environment {
  public:
   Environment() { add(kPath); }
@@ -66,8 +65,8 @@ class Environment {
   bool whole_ = true;
 };
 
-// Without a user record, which only a run that needed no switch of users can be, the command starts
-// with what does not depend on it.
+// Without a user record (possible only where the user need not be changed) the variables that
+// depend on it are left out or have defaults.
 bool installEnvironment(const ZELOUSER *user) {
   Environment environment;
   environment.addVariable("HOME", user != nullptr ? user->szHome : kRootDirectory);

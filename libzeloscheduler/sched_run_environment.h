@@ -9,8 +9,8 @@
 // -1 with the reason logged.
 int schedSetRunEnvironment(uid_t uid);
 
-// While it lives, the real ids are the effective ones. A shell whose real id differs takes the real
-// id back, which would give every task the rights of the process that started it.
+// While it lives, the real ids are the effective ones. A shell whose real id differs sets the
+// effective one back to it, which would give every task the rights of the process that started it.
 class SchedRealIds {
  public:
   SchedRealIds();

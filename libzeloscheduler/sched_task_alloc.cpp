@@ -1,4 +1,4 @@
-// A new record with the defaults of ordinary tasks, and its end.
+// Allocating a record with the defaults of ordinary tasks, and freeing it.
 #include <zelosched.h>
 
 #include "sched_record.h"

@@ -1,5 +1,5 @@
-// A task to and from its hash form, row by row of the field table. The command travels in Base64,
-// which is what lets it keep its line feeds.
+// A task to and from its hash form, row by row of the field table. The command is in Base64, which
+// keeps its line feeds.
 #include <zelocore.h>
 #include <zelosched.h>
 #include <zelosdk.h>
@@ -81,7 +81,7 @@ int encodeCommand(PSZHASH *ppHash) {
   return 0;
 }
 
-// The store keeps one value a line. Numbers and names have no line feeds to begin with.
+// The store has one value per line. Only texts can have line feeds.
 int replaceLineFeeds(PSZHASH *ppHash) {
   SCHED_CHECK_ARG(*ppHash != nullptr, "NULL != *ppHash", 0);
   for (const SchedParm *parm = parm_table; parm->szKey != nullptr; ++parm) {

@@ -1,5 +1,5 @@
-// A task as JSON: one object with a member for every key of its hash form. Each member's value is
-// the value written as JSON once before, so a reader decodes it twice.
+// A task as JSON: one object with a member for every key of its hash form. Each value is written
+// as a JSON string twice over, so a reader decodes it twice.
 #include <zelocore.h>
 #include <zelosched.h>
 
@@ -19,8 +19,8 @@ namespace {
 constexpr size_t kSmallestBuffer = ZELO_SCHED_JSON_SIZE_MIN;
 constexpr int kContainerCapacity = 512;
 
-// JSON has no way to carry a byte that is not UTF-8, and the writer takes whatever follows one for
-// a part of it. So each such byte is replaced by itself, and the characters around it stay.
+// JSON cannot represent a byte that is not UTF-8, and the writer takes the bytes after it for a
+// part of the character. So each such byte is replaced, and the characters around it stay.
 std::string wellFormed(std::string_view text) {
   constexpr std::string_view kReplacement = "\xEF\xBF\xBD";  // U+FFFD
   std::string result;

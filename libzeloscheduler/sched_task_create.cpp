@@ -1,4 +1,4 @@
-// A new task for the backend that the record names.
+// Creating a task with the backend that the record names.
 #include <zelosched.h>
 
 #include "sched_backend.h"
@@ -13,8 +13,8 @@ int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask) {
   if (create.served) {
     return create.result;
   }
-  // Plugins hear of a task that nobody took; of one that was created they do not. Why nobody took
-  // it stays in the error record, also when they cannot be told.
+  // Plugins are run only for a task that no backend took, not for one that was created. The error
+  // record says that no backend was found, whatever the plugins do.
   const SchedErrorRecord reason;
   SchedHook hook("task_create", nullptr, pTask);
   hook.after(-1, SCHED_HERE);

@@ -1,8 +1,8 @@
 // The status database: one row for every run of a task.
 //
-// Values stand in the statements unescaped, so an application's name can end its quotes and go on
-// as SQL of its own; sched_db_text.h says how far it may. The connection is the caller's: its
-// authorizer, limits and hooks are neither needed nor touched here.
+// Values are put into the statements unescaped, so an application's name can end its quotes and go
+// on as SQL, within the limits of sched_db_text.cpp. The connection is the caller's: its
+// authorizer, limits and hooks are not used or changed here.
 #include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/file.h>
@@ -41,7 +41,7 @@ bool isNamed(const char *szName, const char *szExpected) {
   return szName != nullptr && strcmp(szName, szExpected) == 0;
 }
 
-// Random, so that processes which collided do not collide again.
+// Random, so that processes that collided do not collide again.
 useconds_t lockedWait() {
   constexpr int32_t kSpread = 1000000;
   constexpr int32_t kShortest = 100000;
@@ -76,7 +76,7 @@ int execute(sqlite3 *db, const char *szSql, RowCallback takeRow, void *context) 
   }
 }
 
-// A statement that was cut could have lost its WHERE clause: it must not run.
+// A statement that was cut could lack its WHERE clause: it is not run.
 int execute(sqlite3 *db, const Statement &statement, RowCallback takeRow, void *context) {
   if (statement.wasCut()) {
     reportFailedStatement(statement.c_str(), "statement too long");
@@ -85,7 +85,7 @@ int execute(sqlite3 *db, const Statement &statement, RowCallback takeRow, void *
   return execute(db, statement.c_str(), takeRow, context);
 }
 
-// With a text of somebody's between its apostrophes.
+// For a statement with an unescaped text between apostrophes.
 int execute(sqlite3 *db, const Statement &statement, const char *szText, AfterText after,
             RowCallback takeRow, void *context) {
   Refusal reason;
@@ -96,7 +96,7 @@ int execute(sqlite3 *db, const Statement &statement, const char *szText, AfterTe
   return execute(db, statement, takeRow, context);
 }
 
-constexpr mode_t kOwnersOnly = 0600;  // a reader's lock would keep every run from being recorded
+constexpr mode_t kOwnersOnly = 0600;  // a reader's lock would prevent the recording of runs
 
 const SchedSharedName &nameOf(const char *szPath) {
   return strcmp(szPath, kSchedJournal.path) == 0 ? kSchedJournal : kSchedDatabase;
@@ -127,7 +127,8 @@ bool takeName(const SchedSharedName &name) {
   return false;
 }
 
-// A journal is made by nobody who may not write the database: it would be in its owner's way.
+// Only a process that may write the database makes the journal: one of another user would block
+// the database's owner.
 bool takeNames() {
   if (schedLookAt(kSchedDatabase, nullptr) == SchedNameState::kFree) {
     createDatabase();
@@ -135,9 +136,9 @@ bool takeNames() {
   return takeName(kSchedDatabase) && (eaccess(kDatabase, W_OK) != 0 || takeName(kSchedJournal));
 }
 
-// An empty database takes the place of the one that is there, which is then, together with its log,
-// in a directory that nobody else can enter: there its rows can still be read, and nobody can put a
-// journal beside it. The name is never free.
+// Exchanges the database for an empty one, so that the name is never free. The old one and its log
+// are moved into a directory that nobody else can enter: its rows can still be read there, and
+// nobody can plant a journal beside it.
 bool moveAside() {
   SchedMovedTo movedTo;
   if (!schedMoveAside(kSchedDatabase, &movedTo)) {
@@ -161,8 +162,8 @@ bool isInWalMode(sqlite3 *db) {
   return sqlite3_extended_errcode(db) == kInWalMode;
 }
 
-// In WAL mode SQLite would need files whose names others can hold. Processes that find it so take
-// turns, lest one moves aside what another has just made.
+// In WAL mode SQLite would need files whose names other users can take. A lock on the journal
+// keeps a process from moving the new database of another one aside.
 int openInPlaceOfWal(sqlite3 **ppHandle) {
   const int turn = open(kSchedJournal.path, O_RDWR | O_NOFOLLOW | O_CLOEXEC);
   if (turn < 0) {
@@ -181,7 +182,7 @@ int openInPlaceOfWal(sqlite3 **ppHandle) {
   return result;
 }
 
-// Cheaper than to empty it after each transaction, and its room stays ours.
+// Cheaper than emptying the journal after each transaction, and its blocks stay allocated.
 void keepJournal(sqlite3 *db) {
   sqlite3_stmt *statement = nullptr;
   if (sqlite3_prepare_v2(db, "PRAGMA journal_mode=PERSIST", -1, &statement, nullptr) == SQLITE_OK) {
@@ -190,7 +191,7 @@ void keepJournal(sqlite3 *db) {
   sqlite3_finalize(statement);
 }
 
-// A row of the table. The interface's record has 32 bits for the time, which end in 2038.
+// A row of the table. The time of the interface's record has only 32 bits, which end in 2038.
 struct Row : ZELO_SCHED_STATUS {
   long long started;
 };
@@ -254,7 +255,7 @@ int takeFirstLiveRow(void *context, int columns, char **values, char **names) {
   return 0;
 }
 
-// A run that died could not write so itself.
+// A run that was killed could not record its end.
 int reportedCode(const ZELO_SCHED_STATUS &row) {
   const bool gone = row.statusCode == ZELO_SCHED_STATUS_RUNNING && row.pid > 0 &&
                     QLIBCProcAlive(row.pid) != kAlive;

@@ -1,4 +1,4 @@
-// Overwriting a stored task, with plugins told before and after.
+// Overwriting a stored task, with plugins run before and after.
 #include <zelosched.h>
 
 #include "sched_backend.h"

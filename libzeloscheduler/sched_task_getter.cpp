@@ -1,4 +1,4 @@
-// The readers and getters that zeloschedgetter.h lists, one shape at a time.
+// The readers and getters that zeloschedgetter.h lists, one macro for each kind.
 #include <zelosched.h>
 
 #include "sched_report.h"

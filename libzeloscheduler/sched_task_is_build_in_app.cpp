@@ -1,5 +1,5 @@
-// The applications that come with the appliance's scheduler. The power schedule's own is not one of
-// them: its tasks are edited elsewhere.
+// The applications that come with the appliance's scheduler. That of the power schedule is not one
+// of them.
 #include <zelosched.h>
 
 #include <cstring>

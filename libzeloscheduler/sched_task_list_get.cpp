@@ -1,4 +1,4 @@
-// The tasks of every backend as one list, and the walk and the end of such a list.
+// The tasks of every backend as one list; walking and freeing such a list.
 #include <zelosched.h>
 
 #include "sched_backend.h"
@@ -11,7 +11,7 @@ int ZELOSchedTaskListGet(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER fil
   SCHED_INIT_BACKENDS_OR_RETURN(-1);
   TaskChain tasks;
   int total = 0;
-  // Kept from one backend to the next: one without a list counts the one before it again.
+  // Not reset for each backend: one without list_get adds the count of the one before it again.
   int added = 0;
   for (uint32_t i = 0; i < cBackend; ++i) {
     if (SchedBackends[i].list_get != nullptr) {

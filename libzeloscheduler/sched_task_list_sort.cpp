@@ -1,4 +1,4 @@
-// Sorting a list in place by one field, by linking its records anew.
+// Sorting a list by one field, by relinking its records.
 #include <zelosched.h>
 
 #include <cstdlib>

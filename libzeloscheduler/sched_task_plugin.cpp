@@ -1,4 +1,4 @@
-// Telling plugins of a change: the task as it was and as it is to be, as text arguments.
+// Running plugins for a change: the task as it was and as it is to be are their arguments.
 #include <zelocore.h>
 #include <zelosched.h>
 

@@ -1,4 +1,4 @@
-// Deleting a stored task, with plugins told before and after.
+// Deleting a stored task, with plugins run before and after.
 #include <zelosched.h>
 
 #include "sched_backend.h"

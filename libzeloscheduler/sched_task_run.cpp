@@ -1,5 +1,5 @@
-// One run of a stored task: checked here, then carried out in a detached child that waits for
-// conflicting runs, records itself, takes on the owner's rights and stores how it ended.
+// One run of a stored task. A detached child waits for conflicting runs, records its start, runs
+// the command with the owner's rights and records its end.
 #include <fcntl.h>
 #include <grp.h>
 #include <sys/file.h>
@@ -27,7 +27,7 @@ constexpr char kLockDirectory[] = "/tmp/lock";
 constexpr char kLockFile[] = "/tmp/lock/lock_sched_run";
 constexpr mode_t kLockDirectoryMade = 0700;  // until it is complete
 constexpr mode_t kLockDirectoryMode = 0755;
-constexpr mode_t kLockFileMode = 0600;  // whoever can open it can hold every run up
+constexpr mode_t kLockFileMode = 0600;  // whoever can open it can lock it and delay every run
 constexpr int kLockTries = 101;
 constexpr useconds_t kLockPause = 50000;
 constexpr int kMostRetries = 20;  // lock failures and conflicts together
@@ -48,7 +48,7 @@ int ZELOSchedCheckRunTime(const ZELO_SCHED_TASK &task, bool *pIsDue) {
 
 // ---- the run lock -----------------------------------------------------------------------------
 
-// Whoever owns the lock file, or can write to it or to its directory, could hold its lock for ever.
+// Whoever can open the lock file, or replace it in its directory, could hold its lock for ever.
 bool makeLockDirectory() {
   const SchedNameState state = schedLookAt(kSchedLockDirectory, nullptr);
   if (state != SchedNameState::kFree) {
@@ -58,7 +58,7 @@ bool makeLockDirectory() {
          chmod(kLockDirectory, kLockDirectoryMode) == 0;
 }
 
-// Neither a link is followed nor a pipe waited for.
+// Does not follow a link, nor block on a FIFO.
 FILE *openLockFile(int flags, const char *szMode) {
   const int descriptor =
       open(kLockFile, flags | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC, kLockFileMode);
@@ -69,7 +69,7 @@ FILE *openLockFile(int flags, const char *szMode) {
   const bool isUsable =
       fstat(descriptor, &info) == 0 && schedWhyForeign(kSchedLockFile, info) == nullptr;
   if (isUsable && (info.st_mode & ~static_cast<mode_t>(S_IFMT)) != kLockFileMode) {
-    fchmod(descriptor, kLockFileMode);  // who can read it can hold its lock
+    fchmod(descriptor, kLockFileMode);  // whoever can read it can lock it
   }
   FILE *stream = isUsable ? fdopen(descriptor, szMode) : nullptr;
   if (stream == nullptr) {
@@ -154,7 +154,7 @@ class LockGuard {
 
 // ---- waiting for conflicting runs ---------------------------------------------------------------
 
-// Random, so that runs which collided do not collide again: 3 to 30 seconds in steps of 3.
+// Random, so that runs that collided do not collide again: 3 to 30 seconds in steps of 3.
 unsigned retryWait() {
   constexpr int kSteps = 10;
   constexpr int kStep = 3;
@@ -185,8 +185,9 @@ Conflict findConflict(sqlite3 *db, const ZELO_SCHED_TASK &task, ZELO_SCHED_STATU
   return Conflict::kNone;
 }
 
-// Waits until nothing conflicts and records the run, both under the lock, so that of two runs that
-// conflict the second sees the first. 0 with the row's key, or -1: the run is given up.
+// Waits until nothing conflicts, and records the run. A task that excludes other runs is checked
+// and recorded under the lock, so that the second of two such runs sees the first. 0 with the
+// row's key, or -1: the run is given up.
 int recordStart(const ZELO_SCHED_TASK &task, int *pStatusID) {
   LockGuard lock(task.CanRunTaskSameTime == 0 || task.CanRunAppSameTime == 0);
   for (int retry = 0;;) {
@@ -224,7 +225,7 @@ int recordStart(const ZELO_SCHED_TASK &task, int *pStatusID) {
     const unsigned wait = retryWait();
     SCHED_LOG("Task %ld conflict with task %ld (running), retry = %d, wait %u secs.",
               static_cast<long>(task.ID), other.taskID, retry, wait);
-    // At most kMostRetries connections are left to the end of this short-lived process.
+    // Not closed: at most kMostRetries connections stay open until this process ends.
     static_cast<void>(db.release());
     sleep(wait);
   }
@@ -232,9 +233,8 @@ int recordStart(const ZELO_SCHED_TASK &task, int *pStatusID) {
 
 // ---- the owner's rights -------------------------------------------------------------------------
 
-// All four steps are taken whatever becomes of the ones before: after a failure nothing is run, and
-// the fewer rights are left by then the better. Only effective ids change; the real ones are the
-// way back.
+// All four steps are tried even after one has failed: no command is run then, and fewer rights are
+// left. Only the effective ids change, so that root can be restored from the real ones.
 bool becomeUser(const ZELOUSER &user) {
   bool ok = true;
   if (seteuid(0) != 0) {
@@ -402,5 +402,5 @@ int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled) {
     return 0;
   }
   ZELOSchedTaskRunEx(&task);
-  _exit(EXIT_SUCCESS);  // nothing of the caller's, exit handlers and buffers, happens twice
+  _exit(EXIT_SUCCESS);  // the caller's exit handlers and buffers must not run twice
 }

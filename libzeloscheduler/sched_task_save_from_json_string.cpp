@@ -1,5 +1,5 @@
-// A task saved from the JSON text that a browser sends back. The text comes from outside: whatever
-// it holds, nothing is saved unless all of it could be read.
+// Saving a task from the JSON text that a browser sends back. The text comes from outside: nothing
+// is saved unless all of it could be read.
 #include <zelocore.h>
 #include <zelosched.h>
 #include <zelosdk.h>
@@ -24,8 +24,8 @@
 namespace {
 
 constexpr int kHashCapacity = 512;
-// The longest text of a task is a few hundred KB, and a value that is read takes up to sixty times
-// its text: a text of more than this is meant to exhaust the machine.
+// The text of a task has a few hundred KB at most, and parsing takes up to sixty times the memory
+// of the text: a longer one could exhaust the machine.
 constexpr size_t kLongestText = size_t{4} << 20;
 constexpr char kCommandKey[] = "cmd";
 
@@ -33,7 +33,7 @@ bool isBlank(char c) {
   return c == ' ' || c == '\t' || c == '\r' || c == '\n';
 }
 
-// Goes past blanks and comments. False when the last comment does not end. As for the reader, a
+// Skips blanks and comments. False when a block comment is not closed. As for the reader, a
 // carriage return ends a line too.
 bool skipBlanks(std::string_view *text) {
   for (;;) {
@@ -58,7 +58,7 @@ bool isAllThereIs(std::string_view rest) {
   return skipBlanks(&rest) && rest.empty();
 }
 
-// The first character of a value says what it is.
+// The first character of a value tells its type.
 constexpr char kObject = '{';
 constexpr char kString = '"';
 
@@ -76,8 +76,8 @@ size_t lengthOfString(std::string_view text) {
   return std::min(length + 1, text.size());
 }
 
-// Whether there is an array or an object in the root object, given a text that could be read. In
-// what was read of it, one whose member is given again does not show any more.
+// Whether there is an array or an object in the root object of a text that could be parsed. The
+// parsed value does not have the one whose member is given again.
 bool isNested(std::string_view text) {
   constexpr size_t kRoot = 1;
   skipBlanks(&text);
@@ -97,7 +97,8 @@ constexpr unsigned kFirstHighSurrogate = 0xD800;
 constexpr unsigned kFirstLowSurrogate = 0xDC00;
 constexpr unsigned kLastSurrogate = 0xDFFF;
 
-// The number of the escape "\uXXXX" that the text begins with, or 0, which is no surrogate either.
+// The code of the escape "\uXXXX" at the beginning of the text, or 0, which is no surrogate
+// either.
 unsigned escapedNumber(std::string_view text) {
   constexpr size_t kMarkLength = 2;
   constexpr size_t kDigits = 4;
@@ -110,8 +111,8 @@ unsigned escapedNumber(std::string_view text) {
   return number;
 }
 
-// Half of a surrogate pair stands for no character. The reader takes a second half by itself, and
-// joins a first half with whatever escape follows.
+// Half of a surrogate pair is no character. The reader accepts a second half by itself, and joins
+// a first half with any escape that follows.
 bool hasHalfPair(std::string_view text) {
   constexpr size_t kEscapeLength = 6;
   for (size_t at = text.find('\\'); at < text.size(); at = text.find('\\', at)) {
@@ -130,8 +131,8 @@ bool hasHalfPair(std::string_view text) {
   return false;
 }
 
-// A value of another kind is not read, as one of many small values takes several times as long as
-// the texts of a task do. The reader throws where a text is nested too deeply.
+// A value of another type is not parsed, as one of many small values takes several times as long
+// as a task's texts. The reader throws when the nesting is too deep.
 bool parse(SchedJsonReader *reader, std::string_view text, char first, Json::Value *value) {
   try {
     return text.size() <= kLongestText && beginsWith(text, first) && reader->read(text, value) &&
@@ -142,7 +143,7 @@ bool parse(SchedJsonReader *reader, std::string_view text, char first, Json::Val
   }
 }
 
-// What a string value holds, without copying it.
+// The text of a string value, without a copy.
 std::string_view textOf(const Json::Value &string) {
   const char *begin = nullptr;
   const char *end = nullptr;
@@ -150,12 +151,12 @@ std::string_view textOf(const Json::Value &string) {
   return {begin, static_cast<size_t>(end - begin)};
 }
 
-// A text for C would end at a zero byte: refused, rather than saved cut.
+// A zero-terminated text would end at a zero byte: it is refused, not cut.
 bool isPlainText(std::string_view text) {
   return text.find('\0') == std::string_view::npos;
 }
 
-// The value that is written in a member's string, which must be a string again.
+// The value in a member's string, which must be a string again.
 bool decodeMember(SchedJsonReader *reader, const Json::Value &member, Json::Value *inner) {
   return member.isString() && parse(reader, textOf(member), kString, inner) &&
          isPlainText(textOf(*inner));
@@ -166,14 +167,14 @@ long long numberIn(const char *szText) {
   return strtoll(szText, nullptr, kDecimal);
 }
 
-// A number of a few digits, which nearly every one is.
+// Whether it is a number of a few digits, as nearly all are.
 bool isShort(const char *szNumber) {
   constexpr size_t kFitAlways = 9;
   return szNumber[0] >= '0' && szNumber[0] <= '9' && strlen(szNumber) <= kFitAlways;
 }
 
-// A field has 32 bits, and a number that does not fit would become another one in it: uid 0 of
-// 4294967296. What is no number at all is left to the conversion.
+// A field has 32 bits, and a number that does not fit would become another one: 4294967296 the uid
+// 0. A text that is no number is left to the conversion.
 bool fitsNumber(const SchedParm &parm, const char *szNumber) {
   uint32_t field = 0;
   char szKept[32];
@@ -182,8 +183,8 @@ bool fitsNumber(const SchedParm &parm, const char *szNumber) {
          numberIn(szKept) == numberIn(szNumber);
 }
 
-// Half a command is another command. Of the longest one that fits, the field drops padding at the
-// end, which carries nothing. What is no Base64 is left to the conversion.
+// A command that was cut is another command. Only padding at its end, which encodes nothing, may
+// be cut. A text that is not Base64 is left to the conversion.
 bool fitsCommand(std::string_view encoded) {
   constexpr size_t kLongest = sizeof(ZELO_SCHED_TASK::Command) - 1;
   constexpr char kPadding = '=';
@@ -212,8 +213,7 @@ bool eachFits(PSZHASH hash) {
   return true;
 }
 
-// What is malformed in itself is the conversion's to report, so that nothing of this question stays
-// in the error record.
+// Malformed values are reported by the conversion, so this check restores the error record.
 bool fitsFields(PSZHASH hash) {
   const SchedErrorRecord before;
   const bool fits = eachFits(hash);
@@ -233,8 +233,8 @@ bool fillHash(const Json::Value &root, SchedJsonReader *reader, HashGuard *hash)
   return fitsFields(hash->get());
 }
 
-// The task that is stored under the id may be another one by now: one that another program has put
-// there. Only the same one is overwritten, where it is stored.
+// The task that is stored under the id may be another program's new one by now. Only one with the
+// same app and name is overwritten, in its backend.
 bool findStored(ZELO_SCHED_TASK *pTask, ZELO_SCHED_TASK *pStored) {
   if (ZELOSchedTaskGetByID(pTask->ID, pStored) != 0 || strcmp(pStored->App, pTask->App) != 0 ||
       strcmp(pStored->Name, pTask->Name) != 0) {
@@ -248,9 +248,9 @@ bool hasLine(const ZELO_SCHED_TASK &task) {
   return task.Backend == ZELO_SCHED_BACKEND_SCHEDULE && task.State == ZELO_SCHED_STATE_ENABLED;
 }
 
-// A disabled task is judged like an enabled one: whoever enables it looks at its state alone. A
-// power time has no line of the scheduler's, and the platform judges it. A crontab without room is
-// no fault of a task that adds no line to it.
+// A disabled task is checked like an enabled one, as it may be enabled without another check. A
+// power time has no task line, and the platform checks it. A task that adds no line may be saved
+// even when the crontab is full.
 bool canBeKept(const ZELO_SCHED_TASK &task, const ZELO_SCHED_TASK *stored) {
   if (stored != nullptr && task.Backend == ZELO_SCHED_BACKEND_AUTOPOWER) {
     return true;
@@ -265,7 +265,7 @@ int refuse(const ZELO_SCHED_TASK &task) {
 }
 
 int save(ZELO_SCHED_TASK *pTask, bool create) {
-  // Only a power time is looked for before its schedule is refused.
+  // Only a possible power time is looked up before its schedule is checked.
   const bool mayBePower = !create && isPowerId(pTask->ID);
   if (!mayBePower && !schedIsCronLineReadable(*pTask)) {
     return refuse(*pTask);

@@ -1,4 +1,4 @@
-// The setters that zeloschedsetter.h lists, one shape at a time.
+// The setters that zeloschedsetter.h lists, one macro for each kind.
 #include <zelosched.h>
 
 #include "sched_report.h"

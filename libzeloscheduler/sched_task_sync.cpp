@@ -1,4 +1,4 @@
-// Writing every backend's tasks out to where they take effect.
+// Writing every backend's tasks to the crontab and the power hardware.
 #include <zelosched.h>
 
 #include "sched_backend.h"

@@ -1,4 +1,4 @@
-// Bounded text copies: what does not fit is cut, never overflowed.
+// Bounded text copies: what does not fit is cut.
 #ifndef SCHED_TEXT_H
 #define SCHED_TEXT_H
 

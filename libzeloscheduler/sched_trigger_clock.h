@@ -1,11 +1,11 @@
-// The next trigger times of many tasks at one moment: what a list of tasks shows.
+// The next trigger times of the tasks of a list, all for the same time.
 #ifndef SCHED_TRIGGER_CLOCK_H
 #define SCHED_TRIGGER_CLOCK_H
 
 #include <zelosched.h>
 
-// The moment, and the last day that was normalised. Reading the clock and normalising a date cost
-// the C library several system calls, which most tasks of a list would only repeat.
+// Caches the current time and the last date that was normalised. Both take system calls, which
+// most tasks of a list would only repeat.
 class SchedTriggerClock {
  public:
   // Reads the clock, once. 0 or -1.
@@ -22,7 +22,7 @@ class SchedTriggerClock {
   ZELO_SCHED_DATE normalized_ = {};
 };
 
-// ZELOSchedNextTriggerTime at the clock's moment.
+// ZELOSchedNextTriggerTime with the clock's time.
 int schedNextTriggerTime(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock);
 
 #endif

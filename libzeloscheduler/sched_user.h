@@ -1,4 +1,4 @@
-// Users of the system's user database, freed on every way out.
+// Users of the system's user database, with a guard that frees them.
 #ifndef SCHED_USER_H
 #define SCHED_USER_H
 

@@ -15,7 +15,7 @@ namespace {
 constexpr int kFirstYear = 1900;  // of struct tm
 constexpr int kDecimal = 10;
 
-// Reads digits and one kind of separator out of a text that has already been bounded.
+// Whether the text has only digits and that separator.
 bool consistsOf(const char *szText, char separator) {
   for (; *szText != '\0'; ++szText) {
     if ((*szText < '0' || *szText > '9') && *szText != separator) {
@@ -131,8 +131,8 @@ int ZELOSchedTimeParse(const char *szTimeOrg, ZELO_SCHED_DATE *pDate) {
 }
 
 void ZELOSchedRandInit(void) {
-  // A forked run is a process of its own: with the seed of the process that forked it, runs started
-  // together would all wait alike and collide again.
+  // A forked run seeds again: with its parent's seed, runs started together would wait equally
+  // long and collide again.
   static pid_t seededProcess = 0;
   const pid_t self = getpid();
   if (seededProcess == self) {

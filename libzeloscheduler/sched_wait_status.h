@@ -1,4 +1,4 @@
-// How a run ended, as every backend reports it.
+// How backends report the end of a run.
 #ifndef SCHED_WAIT_STATUS_H
 #define SCHED_WAIT_STATUS_H
 
@@ -6,8 +6,8 @@
 
 #include <cstdio>
 
-// What the wait status of the shell means: the code, and in the comment the exit code or the
-// signal. Three digits hold either.
+// Converts the wait status of the shell into the status code, and the exit code or the signal as
+// the comment. Either has at most three digits.
 inline void schedReportWaitStatus(int status, int *pStatusCode, char *szComment) {
   constexpr size_t kCommentCapacity = 4;
   constexpr int kStoppedByte = 0x7F;

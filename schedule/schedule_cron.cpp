@@ -10,7 +10,7 @@
 
 namespace {
 
-// Each writes behind `end` and returns the new end, where a zero byte stands.
+// Each writes a zero-terminated text at `end` and returns its new end.
 char *append(char *end, const char *text) {
   return stpcpy(end, text);
 }
@@ -23,7 +23,7 @@ char *append(char *end, Number number) {
   return end;
 }
 
-// A list has its numbers with a sign.
+// The numbers of a list are written as signed ones.
 char *appendItem(char *end, bool isFirst, uint32_t number) {
   return append(append(end, isFirst ? "" : ","), static_cast<int32_t>(number));
 }

@@ -4,7 +4,7 @@
 
 #include <zelosched.h>
 
-// What the line starts, and what marks a line as a task's.
+// The program that the line starts, whose name also marks a line as a task's.
 constexpr char kSchedCronProgram[] = "/tmp/zeloschedtask";
 
 struct SchedCronLine {
@@ -12,7 +12,7 @@ struct SchedCronLine {
 };
 
 // Minute, hours, day, month, weekdays, user and command, with tabs between them and no line feed.
-// Numbers out of range stand in it as they are.
+// Numbers out of range are written as they are.
 SchedCronLine schedCronLineOf(const ZELO_SCHED_TASK &task);
 
 struct SchedWeekdayList {
@@ -21,9 +21,8 @@ struct SchedWeekdayList {
 
 SchedWeekdayList schedWeekdayListOf(const ZELO_SCHED_TASK &task);
 
-// Debian's cron passes over the whole of /etc/crontab for one field that it cannot read, and then
-// starts nothing at all. A day that its month never has is none of them: cron reads it, and it
-// never comes.
+// Debian's cron ignores the whole of /etc/crontab, and starts nothing, when it cannot read one
+// field. It can read a day that its month never has (30 February), which then never comes.
 bool schedIsMinuteReadable(const ZELO_SCHED_TASK &task);
 bool schedAreHoursReadable(const ZELO_SCHED_TASK &task);
 bool schedIsDayReadable(const ZELO_SCHED_TASK &task);

@@ -16,9 +16,8 @@ int schedCompareDays(const ZELO_SCHED_DATE &a, const ZELO_SCHED_DATE &b);
 // The start date, without its weekday. It need not exist.
 ZELO_SCHED_DATE schedStartDay(const ZELO_SCHED_TASK &task);
 
-// Every character of the week but '0' turns its day on, and so does the end of a text of fewer than
-// seven: the days behind it are on as well. What lies there is left over from other tasks and says
-// nothing.
+// A day is off only where its character of the week is '0'. The days beyond the end of a text of
+// fewer than seven characters are on, whatever the bytes there are.
 bool schedIsWeekdayOn(const ZELO_SCHED_TASK &task, uint32_t weekday);
 
 // A bit for each day that is on, the lowest for Sunday.
@@ -28,8 +27,8 @@ unsigned schedWeekdayMaskOf(const ZELO_SCHED_TASK &task);
 bool schedHasDayOfMonth(const ZELO_SCHED_TASK &task);
 bool schedHasMonth(const ZELO_SCHED_TASK &task);
 
-// Whether cron starts the task on that day. A crontab line says nothing of years, and so nothing of
-// the start date: a task that runs once is started on its day every year.
+// Whether cron starts the task on that day. A crontab line has no year: cron starts a task before
+// its start date too, and one that runs once on its day of every year.
 bool schedIsCronDay(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &day);
 
 #endif

@@ -1,5 +1,5 @@
-// Whether a task that cron has started is to run. Cron starts one also before its start date, and
-// one that runs once every year; this turns them away.
+// Whether a task that cron has started is to run: cron starts one before its start date too, and
+// one that runs once in every year.
 #ifndef SCHEDULE_DUE_H
 #define SCHEDULE_DUE_H
 

@@ -18,8 +18,8 @@ struct SchedHours {
   const uint32_t *end() const { return hours + count; }
 };
 
-// At least one, in ascending order. The first is the task's whatever number it is. No run can be
-// due in an hour above 23, so the repeats end there.
+// At least one, in ascending order. The first is the task's RunHour, also one above 23; repeats
+// end at 23.
 SchedHours schedHoursOf(const ZELO_SCHED_TASK &task);
 
 #endif

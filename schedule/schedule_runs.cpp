@@ -25,7 +25,7 @@ uint32_t daysOfMonth(const ZELO_SCHED_DATE &day) {
   return kDays[day.month - 1] + (isLeap && day.month == kFebruary ? 1 : 0);
 }
 
-// No run is before it. Of the start date the day, and even the month, need not exist.
+// No run is before this day. The day and the month of the start date may be out of range.
 ZELO_SCHED_DATE firstDay(const ZELO_SCHED_TASK &task, const ZELO_SCHED_DATE &after) {
   ZELO_SCHED_DATE first = {};
   first.year = task.StartMonth > kMonthsOfYear ? task.StartYear + 1 : task.StartYear;

@@ -6,12 +6,11 @@
 
 #include <cstdint>
 
-// So many minutes later its last run of a day still comes on that day. For hours and minutes of a
-// day alone.
+// The most minutes by which the last run of a day can be moved without leaving it. The hour and
+// the minute of the task must be in range.
 uint32_t schedMostShift(const ZELO_SCHED_TASK &task);
 
-// Every run comes that much later; with at most schedMostShift none is lost, and none leaves its
-// day.
+// Moves every run by that much. With at most schedMostShift none is lost, and none leaves its day.
 void schedShift(ZELO_SCHED_TASK *task, uint32_t minutes);
 
 #endif

@@ -106,7 +106,7 @@ class Collector : public benchmark::BenchmarkReporter {
 
   bool isEmpty() const { return measured_.empty(); }
 
-  // Null for what was not asked for.
+  // Null for what the filter left out.
   const Amount *find(const std::string &what) const {
     const auto found = measured_.find(what);
     return found == measured_.end() ? nullptr : &found->second;
@@ -134,7 +134,7 @@ std::string written(Amount amount) {
   return text;
 }
 
-// The columns' widths are known to scripts/bench, which prints their headings.
+// scripts/bench prints the headings, with the same widths.
 void print(const Comparison &row, const Amount &what, const Amount &with) {
   const double ratio = what.number / with.number;
   printf("%-46s %10s  %-44s %10s %7.2f %7.2f  %s\n", row.what.c_str(), written(what).c_str(),
@@ -142,7 +142,7 @@ void print(const Comparison &row, const Amount &what, const Amount &with) {
          ratio <= row.most ? "yes" : "no");
 }
 
-// Their number. Of what was left out by a filter there is none.
+// Returns how many there are; a row is left out when the filter leaves out a side of it.
 int printRows(const Collector &collector) {
   int printed = 0;
   for (const Comparison &row : comparisons()) {
@@ -189,7 +189,7 @@ void orDie(bool ok, const char *what) {
               QLIBCErrorGetLine());
     }
     fputc('\n', stderr);
-    _exit(EXIT_FAILURE);  // also in a child, where nothing of the parent's may happen
+    _exit(EXIT_FAILURE);  // a child must not run the parent's exit handlers
   }
 }
 
@@ -202,10 +202,10 @@ int main(int argc, char **argv) {
   makeRows();
   Collector collector;
   if (benchmark::RunSpecifiedBenchmarks(&collector) == 0) {
-    return EXIT_FAILURE;  // it has said that there is none of that name
+    return EXIT_FAILURE;  // it has printed that no name matches
   }
   if (collector.isEmpty()) {
-    return EXIT_SUCCESS;  // they were only listed
+    return EXIT_SUCCESS;  // --benchmark_list_tests
   }
   if (printRows(collector) == 0) {
     fputs("no row has both its sides in the filter\n", stderr);

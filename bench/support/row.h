@@ -1,6 +1,6 @@
 // One row of the table that a benchmark program prints: something that the product does, and what
-// it is compared with. All of it is measured in one run, repetition by repetition in random order,
-// so that what else the machine does falls on both sides; the ratios are of medians.
+// it is compared with. Both are measured in one run, whose repetitions scripts/bench has
+// interleaved at random, so that other load on the machine affects both. Ratios are of medians.
 #ifndef BENCH_ROW_H
 #define BENCH_ROW_H
 
@@ -10,13 +10,13 @@
 
 struct Work {
   std::function<void()> work;
-  // Before the first time of each repetition, and before each time. Neither is measured. What has
-  // something to be done each time should take far longer than reading a clock does.
+  // Not measured: `setUp` is called before each repetition, `before` before each call of `work`.
+  // Work with a `before` is timed call by call, so it should take far longer than reading a clock.
   std::function<void()> setUp = nullptr;
   std::function<void()> before = nullptr;
 };
 
-// What is measured in bytes instead of time, once: the work says how many.
+// Measured in bytes, once, as `bytes` returns them.
 struct Footprint {
   std::function<size_t()> bytes;
 };
@@ -26,8 +26,8 @@ class Row {
   Row(const std::string &what, const Work &work);
   Row(const std::string &what, const Footprint &footprint);
 
-  // At most `ratio` times what it is compared with, which is measured for this row, or has been
-  // named by an earlier one.
+  // At most `ratio` times what it is compared with: work that is given here, or named by an
+  // earlier row.
   Row &atMost(double ratio, const std::string &what, const Work &work);
   Row &atMost(double ratio, const std::string &what, const Footprint &footprint);
   Row &atMost(double ratio, const std::string &what);

@@ -41,8 +41,8 @@ void write(const char *szPath, const std::string &text) {
         "writing a section file");
 }
 
-// All but the last one in one text, since adding them one by one would take minutes; then the last
-// one through the platform, which makes the file's form its own.
+// All but the last one are written as one text, since adding them one by one would take minutes.
+// The last one is added by the platform, which gives the file its header and trailer.
 void writeStore(int count, PSZHASH *hash, PSZLIST *keys) {
   const Task task = newTask(0);
   std::string text;

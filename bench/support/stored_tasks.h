@@ -14,14 +14,13 @@ struct TaskFree {
 };
 using Task = std::unique_ptr<ZELO_SCHED_TASK, TaskFree>;
 
-// A new task as a user might make one, which is different for each number.
+// A new task as a user might make one, different for each number.
 Task newTask(int number);
 
-// Makes the store one of `count` tasks, written last by the platform as one that grew is. Of none
-// there is no file.
+// Makes a store of `count` tasks, with the platform's header and trailer. For 0 there is no file.
 void fillStore(int count);
 
-// Waits until the store is older than what may still be a copy in progress.
+// Waits until the store is too old to be taken for a copy in progress.
 void growOld();
 
 // Makes the platform forget what it has read of the store, as in a process that has just started.
@@ -30,7 +29,7 @@ void forgetStore();
 // All tasks of the store, listed and freed.
 void list(int count);
 
-// Opens, reads and closes the store, into memory that nothing else is done to. Its size.
+// Opens, reads and closes the store. Its size.
 size_t readStore();
 
 #endif

@@ -1,6 +1,6 @@
-// The machine's power schedule as tasks. The platform keeps the two lists of power times, and
-// nothing is kept here: a task's id is made of its entry. Power-on times are the hardware's
-// business; power-off times become lines of the system crontab.
+// The machine's power schedule as tasks. The platform stores the two lists of power times, and a
+// task's id encodes its entry, so nothing is stored here. Power-on times set the alarm of the
+// real-time clock; power-off times become lines of the system crontab.
 #include <zelocore.h>
 #include <zelosched.h>
 #include <zelosdk.h>
@@ -27,7 +27,7 @@ namespace {
 
 constexpr char kName[] = "zeloautopower";
 constexpr char kCrontab[] = "/etc/crontab";
-// What cron runs at a power-off time, and what marks a crontab line as ours.
+// The program that cron runs at a power-off time, whose name marks a crontab line as ours.
 constexpr char kFeasibleCheck[] = "/usr/zelo/bin/zelo_poweroff_feasible_check";
 
 constexpr int kContainerCapacity = 1024;
@@ -42,7 +42,7 @@ constexpr char kDayOn = '1';
 
 // ---- the lists of the platform ----------------------------------------------------------------
 
-// Room for one entry more than is read, which is what an append to a full list takes.
+// Room for one entry more than is read, to append to a full list.
 struct PowerList {
   int type;
   int count;
@@ -59,8 +59,8 @@ int readList(int type, PowerList *list) {
 
 // ---- an entry as a task -----------------------------------------------------------------------
 
-// The values of a new task that differ from what the field table gives for a missing key, and those
-// that a hash must have. The start date is unset on purpose: power times have none.
+// The values of a new task that differ from the field table's defaults, and those of the keys that
+// a hash must have. Power times have no start date.
 struct DefaultValue {
   const char *szKey;
   const char *szValue;
@@ -73,7 +73,7 @@ constexpr DefaultValue kDefaults[] = {
     {"type", "daily"},
 };
 
-// A value that could not be set is reported as what it is to the reader of the hash: a missing key.
+// A value that could not be set is reported as a missing key.
 int get_default(ZELO_SCHED_TASK *pTask) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   HashGuard hash(QLIBCSzHashAlloc(kContainerCapacity));
@@ -106,7 +106,7 @@ void writeWeek(unsigned weekdays, ZELO_SCHED_TASK *pTask) {
   pTask->Week[kDaysOfWeek] = '\0';
 }
 
-// All but id and name, which the caller sets.
+// All fields but id and name, which the caller sets.
 int fillFromEntry(ZELO_SCHED_TASK *pTask, const ZELO_AUTOPOWER *psched, bool powerOff) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   SCHED_CHECK_ARG(psched != nullptr, "NULL != psched", -1);
@@ -134,8 +134,8 @@ int fillFromEntry(ZELO_SCHED_TASK *pTask, const ZELO_AUTOPOWER *psched, bool pow
 
 // ---- a task as an entry -----------------------------------------------------------------------
 
-// Hours and minutes that no clock shows are the platform's to refuse; what does not even fit into
-// the entry would become another time there, and goes no further.
+// The platform refuses hours and minutes that are out of range. A number that does not fit into a
+// byte is refused here, as the entry would have another time.
 int makeEntry(ZELO_AUTOPOWER *pSched, const ZELO_SCHED_TASK *pTask) {
   constexpr uint32_t kMostOfByte = std::numeric_limits<unsigned char>::max();
   SCHED_CHECK_ARG(pSched != nullptr, "((void *)0) != pSched", -1);
@@ -160,7 +160,7 @@ TaskGuard newRecord() {
   return task;
 }
 
-// Null, with the reason logged, on failure.
+// Null on failure, which is logged.
 TaskGuard taskOfEntry(const PowerList &list, int index) {
   const bool powerOff = list.type == ZELO_AUTOPOWER_OFF;
   TaskGuard task = newRecord();
@@ -198,7 +198,7 @@ int addTasksOf(int type, ZELO_SCHED_TASK_FILTER filter, TaskChain *tasks) {
       return -1;
     }
     if (filter != nullptr && filter(task.get()) == 0) {
-      // Never freed, so that a filter may keep the pointer.
+      // Deliberately leaked: a filter may keep the pointer.
       static_cast<void>(task.release());
       continue;
     }
@@ -229,8 +229,8 @@ int owns_id(long id) {
   return isPowerId(id) ? 1 : 0;
 }
 
-// The index of the first entry with that id in *pIndex, or kNoIndex. -1 when an entry before it has
-// no id.
+// Sets *pIndex to the index of the first entry with that id, or to kNoIndex. -1 when an entry
+// before it has no id.
 int findEntry(const PowerList &list, long id, int *pIndex) {
   *pIndex = kNoIndex;
   for (int i = 0; i < list.count; ++i) {
@@ -322,7 +322,7 @@ int addPowerOffLine(const ZELO_AUTOPOWER &entry) {
   return 0;
 }
 
-// Day names and time of the entry in words, which go nowhere.
+// Builds a text of the day names and the time, which nothing uses, and logs when it is cut.
 void describe(const ZELO_AUTOPOWER &entry, PowerDayNames *names) {
   if (names->of(entry.weekdays).wasCut()) {
     SCHED_LOG("Out of string size");
@@ -365,7 +365,7 @@ int applySchedule() {
 
 // ---- changing ---------------------------------------------------------------------------------
 
-// An entry without an id is passed over: it must not stand in the way of the others.
+// An entry without an id is skipped, so that the others can still be changed.
 int findEntryToSet(const PowerList &list, long id) {
   for (int i = 0; i < list.count; ++i) {
     const std::optional<long> entryId = powerIdOf(list.at(i));
@@ -378,7 +378,7 @@ int findEntryToSet(const PowerList &list, long id) {
   return kNoIndex;
 }
 
-// The last entry may be one more than a read can give: the platform says what becomes of it.
+// The list may then be one entry longer than a read returns: the platform stores or refuses it.
 int putEntry(PowerList *list, int index, const ZELO_SCHED_TASK *pTask) {
   ZELO_AUTOPOWER entry = {};
   if (makeEntry(&entry, pTask) < 0) {
@@ -398,8 +398,8 @@ void takeEntry(PowerList *list, int index) {
   --list->count;
 }
 
-// Writes the task into the entry of that id, or removes the entry when pTask is null. 1 when the
-// list changed, 0 when the id is not ours or there was nothing to remove, -1 on failure.
+// Writes the task into the entry of that id, or appends it; removes the entry when pTask is null.
+// 1 when the list changed, 0 when the id is not ours or there is nothing to remove, -1 on failure.
 int setById(long id, const ZELO_SCHED_TASK *pTask) {
   const std::optional<PowerTime> time = powerTimeOf(id);
   if (!time) {
@@ -443,7 +443,7 @@ int syncAfterChange() {
   return 0;
 }
 
-// Which list the task asks for; -1, with the reason logged, when it does not say.
+// The list that the task's arguments name; -1, which is logged, when they name none.
 int listOf(const ZELO_SCHED_TASK &task) {
   if (strcmp(task.AppArgs, "poweron") == 0) {
     return ZELO_AUTOPOWER_ON;
@@ -517,8 +517,8 @@ int remove(long id) {
 
 // ---- running ----------------------------------------------------------------------------------
 
-// Whether the machine may be switched off now. Switching it on is not done here: whoever runs this
-// is switched on.
+// Runs the check at a power-off time, which decides what follows. At a power-on time there is
+// nothing to do: the machine is on.
 int run(ZELO_SCHED_TASK *pTask, int *pStatusCode, char *szComment, size_t cbComment) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", -1);
   SCHED_CHECK_ARG(pStatusCode != nullptr, "((void *)0) != pStatusCode", -1);

@@ -1,5 +1,5 @@
-// Ordinary tasks: kept as sections of a section file, one a task, and started by the cron daemon
-// from lines in the system crontab that are written anew after every change.
+// Ordinary tasks: each is a section of a section file, and is started by the cron daemon from a
+// line in the system crontab. All these lines are rewritten after every change.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/types.h>
@@ -32,8 +32,8 @@ namespace {
 
 constexpr char kName[] = "zeloschedule";
 
-// Every read uses the working copy; the persistent one is there for the next boot, and the last
-// good one for when the power goes while that is written.
+// Every read uses the working copy. The persistent one is for the next boot, and the last good one
+// for a loss of power while the persistent one is written.
 constexpr char kWorkingCopy[] = "/tmp/scheduled_tasks";
 constexpr const auto &kPersistentCopy = kSchedPersistentStore;
 constexpr char kPersistentDirectory[] = "/usr/zelo/etc";
@@ -90,8 +90,8 @@ int setNextTrigger(ZELO_SCHED_TASK *pTask, SchedTriggerClock *clock) {
   return 0;
 }
 
-// Walks over the sections of the store. One bad section must not hide the others: the walk goes on
-// behind one that cannot be read, and one that is gone since the names were listed is passed over.
+// Iterates over the sections of the store. One that cannot be read does not end the iteration, and
+// one that was removed since the names were listed is skipped.
 class StoreWalk {
  public:
   // The number of sections, 0 without a store; -1 when they cannot be listed or memory is short.
@@ -117,7 +117,7 @@ class StoreWalk {
     return sections_ < 0 ? -1 : sections_;
   }
 
-  // To the next section. False at the end.
+  // Goes to the next section. False at the end.
   bool next() {
     while (next_ < sections_) {
       szSection_ = QLIBCSzListGet(names_.get(), next_++);
@@ -135,7 +135,7 @@ class StoreWalk {
   // Its lowest 32 bits, as of every stored number.
   int32_t sectionId() const { return static_cast<int32_t>(strtoll(szSection_, nullptr, kDecimal)); }
 
-  // The section that was read, as a task: its stored fields, and when it runs next. Each 0 or -1.
+  // The section that was read, as a task: its stored fields, and its next run. Each 0 or -1.
   int convert(ZELO_SCHED_TASK *pTask) { return ::convert(pTask, hash_.get()); }
   int setNextTrigger(ZELO_SCHED_TASK *pTask) { return ::setNextTrigger(pTask, &clock_); }
   int fill(ZELO_SCHED_TASK *pTask) { return convert(pTask) < 0 ? -1 : setNextTrigger(pTask); }
@@ -161,7 +161,7 @@ TaskGuard recordFor(const StoreWalk &walk, TaskGuard task) {
   return task;
 }
 
-// One record that serves for all tasks of a walk, emptied. 0 or -1.
+// Allocates the record that is used for all tasks of a walk, or zeroes it again. 0 or -1.
 int emptyRecordFor(const StoreWalk &walk, TaskGuard *task) {
   if (*task == nullptr) {
     *task = recordFor(walk, schedRecordAlloc());
@@ -239,8 +239,8 @@ int get_by_id(long id, ZELO_SCHED_TASK *pTask) {
 
 // ---- ids ----------------------------------------------------------------------------------------
 
-// A section that does not convert is nobody's, and its id is free. One that cannot be read just now
-// may be somebody's: a new task in its place would destroy it.
+// A section that does not convert is no task, and its id is free. One that cannot be read just now
+// may be a task, which a new one of its id would overwrite.
 int next_id(long *pID) {
   SCHED_CHECK_ARG(pID != nullptr, "((void *)0) != pID", -1);
   StoreWalk walk;
@@ -259,7 +259,7 @@ int next_id(long *pID) {
     }
     if (walk.convert(task.get()) == 0) {
       ids.add(task->ID);
-      walk.setNextTrigger(task.get());  // for what it logs: a task is not lost for want of a clock
+      walk.setNextTrigger(task.get());  // only to log a failure, which leaves the id taken
     }
   }
   if (!ids.isWhole()) {
@@ -277,9 +277,8 @@ int fail(SchedSourceLocation location, int code) {
 
 // ---- writing the store --------------------------------------------------------------------------
 
-// The private copy on which one write is made. Whatever stands under its name was left or planted
-// by someone else: it is neither written through nor taken over. A directory cannot be removed as a
-// file can, but root can have its place.
+// The private copy on which one write is made. A file that has its name already was left behind or
+// planted: it is removed and never written to. Only root can replace a directory there.
 class ScratchFile {
  public:
   ScratchFile() {
@@ -311,9 +310,9 @@ int copyFile(const char *szSource, const char *szTarget) {
   return result == 0 ? 0 : reportCopy(szSource, szTarget);
 }
 
-// A forced copy empties its target before it fills it. A scratch file that is empty, or shorter or
-// longer than the working copy, has therefore most likely been taken from under another process's
-// copy: to build on it would lose other tasks.
+// cp -f truncates its target before it writes. A scratch file that is empty, or shorter or longer
+// than the working copy, was therefore most likely read while another process was copying: a write
+// based on it would lose other tasks.
 int copyWorkingCopy(const ScratchFile &scratch) {
   constexpr int kTries = 20;
   constexpr useconds_t kPause = 5000;
@@ -322,7 +321,7 @@ int copyWorkingCopy(const ScratchFile &scratch) {
       return -1;
     }
     const off_t size = schedSizeOf(scratch.path());
-    const bool mayBeEmpty = !schedAreTasksKept();  // where only the name is taken
+    const bool mayBeEmpty = !schedAreTasksKept();  // not cut off, but without tasks
     if (size == schedSizeOf(kWorkingCopy) && (size > 0 || mayBeEmpty)) {
       return 0;
     }
@@ -380,7 +379,7 @@ int removeSection(const ScratchFile &scratch, const SectionName &section) {
   return removed > 0 ? 1 : 0;
 }
 
-// What is to become the persistent copy, whole and on the disk before that is touched.
+// Writes the last good copy, which must be on the disk before the persistent copy is overwritten.
 int keepLastGood(const ScratchFile &scratch) {
   const Stream source(fopen(scratch.path(), "re"));
   if (source == nullptr) {
@@ -400,8 +399,8 @@ int keepLastGood(const ScratchFile &scratch) {
   return schedSyncDirectory(kPersistentDirectory) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
-// A forced copy empties its target before it fills it. When the power goes in between, the tasks
-// that had been safe until then are in the last good copy, which is on the disk by now.
+// cp -f truncates its target before it writes. If the power fails in between, the tasks are in the
+// last good copy, which is on the disk by now.
 int copyToPersistent(const ScratchFile &scratch) {
   if (keepLastGood(scratch) < 0) {
     return reportCopy(scratch.path(), kPersistentCopy);
@@ -416,8 +415,8 @@ int copyToPersistent(const ScratchFile &scratch) {
   return 0;
 }
 
-// The persistent copy goes first: a failure in between leaves the working copy, which every read
-// uses, as it was.
+// The persistent copy is written first: after a failure the working copy, which every read uses,
+// is as it was.
 int publish(const ScratchFile &scratch) {
   if (copyToPersistent(scratch) < 0) {
     return -1;
@@ -428,7 +427,7 @@ int publish(const ScratchFile &scratch) {
   }
   const FileState before(kWorkingCopy);
   if (copyFile(scratch.path(), kWorkingCopy) < 0) {
-    // It was emptied, and there was no room to fill it again. The scratch file takes none.
+    // It was truncated, and the disk was full. Renaming the scratch file needs no space.
     if (!before.isThatOf(kWorkingCopy)) {
       rename(scratch.path(), kWorkingCopy);
     }
@@ -437,8 +436,8 @@ int publish(const ScratchFile &scratch) {
   return 1;
 }
 
-// The one way in which the store changes: one section written, or deleted when pTask is null. 1
-// when the store changed, 0 when there was nothing to delete, -1 on failure.
+// Every change of the store: writes one section, or deletes it when pTask is null. 1 when the
+// store changed, 0 when there was nothing to delete, -1 on failure.
 int write_store(long id, const ZELO_SCHED_TASK *pTask) {
   const ScratchFile scratch;
   const SectionName section(id);
@@ -513,7 +512,7 @@ void signalCron() {
 int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   const Stream old(fopen(kCrontab, "r"));
   if (old == nullptr) {
-    return -1;  // no crontab, nothing to write it like: none is made
+    return -1;  // without a crontab whose owner and mode to keep, none is made
   }
   struct stat info = {};
   if (fstat(fileno(old.get()), &info) != 0) {
@@ -522,7 +521,7 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   if (S_ISDIR(info.st_mode)) {
     return fail(SCHED_HERE, kErrOpen);
   }
-  // Cron starts as root whatever stands under that name: where it cannot be had, no line may stand.
+  // Cron starts the program of that name as root: unless the file is ours, no task has a line.
   const bool isProgramOurs = schedTakeName(kSchedTaskProgram);
   NewFile crontab(kCrontab, SCHED_HERE);
   if (crontab.open() < 0 || keepOtherLines(old.get(), &crontab) < 0 ||
@@ -537,9 +536,9 @@ int rewriteCrontab(const ZELO_SCHED_TASK *tasks) {
   return schedSyncDirectory(kCrontabDirectory) ? 0 : fail(SCHED_HERE, kErrIo);
 }
 
-// What says when each task runs, as a list of records in one array. They lie there in the order of
-// the store, which a sort by a number, which is by memory, leaves. The texts of a record, its
-// largest part, stay untouched, and so take no memory.
+// The schedule of each task, as a list of records in one array, in the order of the store. A sort
+// by a number, which is by address, keeps that order. The texts of the records are not written, so
+// that their pages take no memory.
 class Schedules {
  public:
   // The number of tasks, or -1.
@@ -599,8 +598,8 @@ class Schedules {
   ZELO_SCHED_TASK *head_ = nullptr;
 };
 
-// A crontab that could not be rewritten is told in the log alone: the task is stored, and the next
-// change or sync writes the crontab whole.
+// A crontab that could not be rewritten is only logged: the task is stored, and the next change or
+// sync rewrites the crontab.
 int writeCrontab() {
   Schedules tasks;
   const int count = tasks.read();
@@ -656,7 +655,7 @@ int create(ZELO_SCHED_TASK *pTask) {
   const int32_t formerId = pTask->ID;
   pTask->ID = static_cast<int32_t>(id);
   if (storeTask(pTask) < 0) {
-    // Still a new task: saving it again must create it, not edit the one that has the id by then.
+    // Still a new task: saving it again must create it, not edit another that has the id by then.
     pTask->ID = formerId;
     pTask->Name[0] = isNamed ? pTask->Name[0] : '\0';
     return -1;
@@ -686,8 +685,8 @@ int remove(long id) {
   return syncAfterChange() < 0 ? -1 : 1;
 }
 
-// The values of a new task that differ from what the field table gives for a missing key, and those
-// that a hash must have. The start date is unset on purpose: an editor fills it in.
+// The values of a new task that differ from the field table's defaults, and those of the keys that
+// a hash must have. The start date is for an editor to fill in.
 struct DefaultValue {
   const char *szKey;
   const char *szValue;

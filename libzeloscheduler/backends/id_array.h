@@ -1,11 +1,11 @@
-// Which ids tasks have, and which is free.
+// The ids of the tasks, and the smallest free one.
 #ifndef ID_ARRAY_H
 #define ID_ARRAY_H
 
 #include <cstddef>
 
-// In plain memory: no exception may arise here. It goes on counting when memory is short, for the
-// report.
+// In memory from calloc, as no exception may be thrown. When memory is short it only counts, for
+// the log.
 class IdArray {
  public:
   IdArray() = default;
@@ -13,12 +13,12 @@ class IdArray {
   IdArray(const IdArray &) = delete;
   IdArray &operator=(const IdArray &) = delete;
 
-  // Ids are positive. One that is not was written by another program, and is nobody's neighbour.
+  // An id below 1, which another program has written, is ignored.
   void add(long id);
   int count() const { return static_cast<int>(count_); }
   bool isWhole() const { return count_ <= capacity_; }
 
-  // The smallest from 1 on that no task has.
+  // The smallest id, from 1 on, that no task has.
   long smallestFree();
 
  private:

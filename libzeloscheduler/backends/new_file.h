@@ -1,4 +1,4 @@
-// Files that the store's backend replaces or watches, with what fails in the error record.
+// Files that the backend of the store replaces or watches; failures set the error record.
 #ifndef NEW_FILE_H
 #define NEW_FILE_H
 
@@ -10,8 +10,8 @@
 #include "sched_new_file.h"
 #include "sched_report.h"
 
-// A file that is replaced line by line. Each call gives 0, or -1 with its code at the location in
-// the error record.
+// The new contents of a file, written line by line. Each call gives 0, or -1 with its code and the
+// location in the error record.
 class NewFile {
  public:
   NewFile(const char *szPath, SchedSourceLocation location)
@@ -24,7 +24,7 @@ class NewFile {
     return file_.write(bytes) ? 0 : fail(kErrIo);
   }
 
-  // All that is left to be read.
+  // Copies the source from its current position to the end.
   int writeAllOf(FILE *source) {
     char block[1 << 14];
     size_t count = 0;
@@ -36,7 +36,7 @@ class NewFile {
     return ferror(source) == 0 ? 0 : fail(kErrIo);
   }
 
-  // A line must not be joined to a last line that has no line feed.
+  // Ends a last line that has no line feed before it adds one.
   int writeLine(const char *szLine) {
     if (!endsLine_ && write("\n") < 0) {
       return -1;
@@ -59,7 +59,7 @@ class NewFile {
   bool endsLine_ = true;
 };
 
-// A file's length and when it was written, by which one that was written again is told.
+// A file's length and time of modification, to find out whether it was written again.
 class FileState {
  public:
   explicit FileState(const char *szPath) { stat(szPath, &info_); }

@@ -1,4 +1,4 @@
-// The names of an entry's weekdays, for whoever looks at a sync in a debugger.
+// The names of an entry's weekdays, which no call shows.
 #ifndef POWER_DAY_NAMES_H
 #define POWER_DAY_NAMES_H
 
@@ -8,8 +8,8 @@
 
 constexpr const char *kPowerDayNames[] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
 
-// One walks through all the entries of a sync. Its bit starts at Sunday and goes on from entry to
-// entry, so that all but the first get no names.
+// One object serves for all entries of a sync. Its bit starts at Sunday and is not reset, so that
+// the entries after the first get no names.
 class PowerDayNames {
  public:
   using Text = BoundedText<32>;

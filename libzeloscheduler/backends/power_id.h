@@ -1,4 +1,4 @@
-// The id of a power task: its entry of the power schedule and the list that it stands in, as
+// The id of a power task: its entry of the power schedule, and the list that the entry is in, as
 // digits.
 //
 //   d WWW HH MM    d = 6 power-on, 8 power-off, and one more when the entry is enabled
@@ -52,8 +52,8 @@ constexpr std::optional<PowerTime> powerTimeOf(long id) {
        byte(id / kHundred % kHundred), byte(id % kHundred)}};
 }
 
-// Nothing for an entry with a byte too large for its digits: its id would name another entry, or
-// lie outside the backend's range.
+// No id for an entry with a number too large for its digits: it would be that of another entry, or
+// outside the backend's range.
 constexpr std::optional<long> powerIdOf(const PowerTime &time) {
   using namespace power_id;
   const long base = (time.list == ZELO_AUTOPOWER_OFF ? kFirstOff : kFirstLeading) * kLeadingUnit;

@@ -1,4 +1,4 @@
-// What the working copy of the store is, before any of it is read.
+// The state of the working copy of the store, before it is read.
 #ifndef STORE_STATE_H
 #define STORE_STATE_H
 
@@ -6,20 +6,20 @@
 
 #include "sched_shared_names.h"
 
-// What there is to be read or built on. A process of root's moves away what another user has put
-// there. The tasks that are kept for the next boot must then be put back before any is changed,
-// since the persistent copy is written as a whole: the store is made as one that is cut off.
+// The state of the store's name. A process of root's moves a file of another user away. If there
+// is a persistent copy, an empty store takes its place, which counts as cut off: a change would
+// overwrite the whole persistent copy, so its tasks must be restored first.
 SchedNameState schedLookAtStore();
 
-// A process that only reads takes the name all the same: while it is free, another user can move a
-// file of root's there. There are no tasks then, before and after.
+// A process that only reads makes a missing store too, without tasks: while the name is free,
+// another user can move a file of root's there.
 void schedTakeFreeStore();
 
-// A store without bytes was cut off by a copy that was killed when tasks are kept. Nobody must
-// build on that, nor take it for a store without tasks.
+// An empty store beside a persistent copy was truncated by a copy that was killed. It must not be
+// changed, nor read as a store without tasks.
 bool schedIsCutToNothing(const char *szStore);
 
-// 0 also of what cannot be looked at.
+// 0 also for a file that cannot be examined.
 off_t schedSizeOf(const char *szPath);
 
 #endif

@@ -7,43 +7,41 @@
  *  1. Records. A task is one ZELO_SCHED_TASK, flat and of fixed size. A record
  *     comes from ZELOSchedTaskAlloc and goes back through ZELOSchedTaskFree; a
  *     list comes from ZELOSchedTaskListGet, is walked with ZELOSchedTaskNext
- *     and goes back through ZELOSchedTaskListFree. The library never keeps a
- *     pointer to a caller's record after a call has returned.
+ *     and goes back through ZELOSchedTaskListFree. Only a hook context keeps
+ *     pointers to a caller's records after a call (ZELOSchedTaskPluginInit).
  *  2. Texts are zero-terminated and hold at most their capacity less one;
  *     what is longer is cut without an error.
  *  3. Results. 0 or a count that is not negative for success, -1 for failure.
  *     A lookup that may find nothing: 1 found, 0 not found, -1 error.
- *  4. Reasons. A failure leaves code, file and line in the platform's error
- *     record (QLIBCErrGet and its kin) and, but where a function says
- *     otherwise, a line in the system log at priority error that begins with
- *     the file and the line. The codes:
- *     0x0100 array allocation, 0x0200 record allocation, 0x0400 lock of runs or
- *     of changes not taken, 0x0500 run lock not released, 0x0900 file or database not opened,
- *     0x0B00 read or write failed, 0x0D00 bad argument, 0x2000 not found,
- *     0x2700 fstat failed, 0x2800 rename failed, 0x2A00 call on time or
- *     identity failed, 0x4000 malformed number, date or time.
+ *  4. Errors. Except where a function says otherwise, a failure leaves code,
+ *     file and line in the platform's error record (QLIBCErrGet and the like),
+ *     and a line in the system log at priority error that begins with the file
+ *     and the line. The codes:
+ *     0x0100 array allocation, 0x0200 record allocation, 0x0400 run lock or
+ *     change lock not taken, 0x0500 run lock not released, 0x0900 file or
+ *     database not opened, 0x0B00 read or write failed, 0x0D00 bad argument,
+ *     0x2000 not found, 0x2700 fstat failed, 0x2800 rename failed, 0x2A00 call
+ *     on time or identity failed, 0x4000 malformed number, date or time.
  *  5. Null. A pointer that must be given is tested; a null one is a failure
- *     with 0x0D00. Where null is allowed, the function says so.
- *  6. Outputs are untouched when a call fails, but for the record that a read
- *     was filling: discard it. ZELOSchedTaskCreate says what it may leave.
+ *     with 0x0D00. Where null is allowed or leaves no code, the function says so.
+ *  6. Outputs are untouched when a call fails, except a record that was being
+ *     filled: discard it. ZELOSchedTaskCreate says what it may leave.
  *  7. Threads. One thread of a process at a time. Processes may use the
  *     library side by side.
  *  8. Clock. All times are local time; the resolution is the minute.
- *  9. Turns. Creating, editing, removing and synchronising take turns with other
- *     processes. Whoever has not had his turn after 30 seconds fails with 0x0400,
- *     and nothing was read or changed.
+ *  9. Locking. Creating, editing, removing and synchronising hold a lock that
+ *     excludes other processes. A change that has not got it after 30 seconds is
+ *     not made, and fails with 0x0400 (ZELOSchedTaskSync only logs that).
  * 10. "/tmp". The live files are there, under fixed names. A process of root's
- *     takes a name that is free or another user's, and what stood there is then
- *     in a directory that only root can enter, which the log names; for any other
- *     process such a name is a failure (0x0900). A program with a "/tmp" of its
- *     own (systemd's PrivateTmp, a container) must not use the library: it would
- *     write a crontab for tasks that cron's machine does not have.
- * 11. Width. No record and no call depends on the width of time_t or off_t: a
- *     program may be built with any. Where long has 32 bits (armhf), ids as
- *     arguments and the times that ZELOSchedDBGetStatusByTaskID gives have so
- *     many: a run after January 2038 is given LONG_MAX, while the database and
- *     all else have its time. ZELO_SCHED_STATUS.timestamp has 32 bits everywhere
- *     and is filled by no call.
+ *     makes those that are missing and replaces one that is another user's, which
+ *     is moved into a directory that only root can enter and that the log names.
+ *     For any other process such a file is a failure (0x0900). A program with a
+ *     "/tmp" of its own (systemd's PrivateTmp, a container) must not use the
+ *     library: it would write a crontab for tasks that cron's "/tmp" lacks.
+ * 11. Width. No record and no call depends on the width of time_t or off_t. Where
+ *     long has 32 bits (armhf), so have the ids that are arguments and the time
+ *     that ZELOSchedDBGetStatusByTaskID gives, which is LONG_MAX for a run after
+ *     January 2038; the database has the right time.
  */
 #ifndef ZELOSCHED_H
 #define ZELOSCHED_H
@@ -145,9 +143,9 @@ ZELO_SCHED_API int ZELOSchedTaskFree(ZELO_SCHED_TASK *pTask);
  * backend left. */
 ZELO_SCHED_API int ZELOSchedTaskGetDefault(ZELO_SCHED_TASK *pTask);
 
-/* Fills a record with the stored task of that id, whichever backend holds it,
- * its next trigger time included. 0, or -1: 0x0D00, 0x2000 when no backend
- * holds the id, or what the backend left. */
+/* Fills a record with the stored task of that id, of whichever backend, its
+ * next trigger time included. 0, or -1: 0x0D00, 0x2000 when no backend has the
+ * id, or what the backend left. */
 ZELO_SCHED_API int ZELOSchedTaskGetByID(long id, ZELO_SCHED_TASK *pTask);
 
 /* ZELOSchedTaskGetDefault for id -1, ZELOSchedTaskGetByID for any other; an id
@@ -155,28 +153,29 @@ ZELO_SCHED_API int ZELOSchedTaskGetByID(long id, ZELO_SCHED_TASK *pTask);
 ZELO_SCHED_API int ZELOSchedTaskLoad(long id, ZELO_SCHED_TASK *pTask);
 
 /* Stores a new task with the backend that pTask->Backend names, which writes
- * the id it gave into the record (and a name, when that was empty). The
- * backend's result (0 or more), or -1: 0x0D00, 0x2000 when no backend has that
- * id, or what the backend left. After a failure the record has its new id when
- * the task was stored and what follows from it was not done; that of a power time
- * has it, and its new name, after any failure.
+ * the new id into the record (and a name, where that was empty). The backend's
+ * result (0 or more), or -1: 0x0D00, 0x2000 when no backend has that id, or
+ * what the backend left. After a failure the record has its new id if the task
+ * was stored but the crontab was not written. For a power time it may have the
+ * new id, and the new name, after any failure.
  *
- * A state or a type other than those of the record is not stored, here and in
- * ZELOSchedTaskEdit. The call succeeds all the same, but the task can then be neither
- * read nor listed, has no crontab line, and its id is given to the next new task,
- * which takes its place.
+ * A state or a type that the enumerations above lack is not stored, here and in
+ * ZELOSchedTaskEdit. The call still succeeds, but the task can then be neither
+ * read nor listed, has no crontab line, and its id is given to a later new
+ * task, which overwrites it.
  *
- * What the schedule says goes into the crontab as it is, here and in
- * ZELOSchedTaskEdit: the caller checks it. Debian's cron passes over the whole of
- * /etc/crontab, and starts nothing, for one enabled task with an hour above 23, a
- * minute above 59, a day other than 1 to 31 (once, monthly, yearly), a month other
- * than 1 to 12 (once, yearly) or no day of the week (weekly). So it does with a
- * crontab of more than 10000 lines, those of other programs and comments counted:
- * each enabled task adds one here, and in ZELOSchedTaskEdit one that was disabled,
- * however many there are. Who saves tasks for others counts the lines himself. */
+ * The schedule is written into the crontab unchecked, here and in
+ * ZELOSchedTaskEdit: the caller checks it. Debian's cron ignores the whole of
+ * /etc/crontab, and starts nothing, for one enabled task with an hour above 23,
+ * a minute above 59, a day other than 1 to 31 (once, monthly, yearly), a month
+ * other than 1 to 12 (once, yearly) or no day of the week (weekly). It also
+ * ignores a crontab of more than 10000 lines, comments and lines of other
+ * programs included. Each enabled task has one line, and no call here limits
+ * their number: a program that saves tasks for others counts the lines
+ * itself. */
 ZELO_SCHED_API int ZELOSchedTaskCreate(ZELO_SCHED_TASK *pTask);
 
-/* Overwrites the stored task of the record's id; plugins hear of it before and
+/* Overwrites the stored task of the record's id; plugins are run before and
  * after. The backend's result, or -1: 0x0D00, 0x2000 when the task or the
  * backend is not found, or what the backend left. */
 ZELO_SCHED_API int ZELOSchedTaskEdit(ZELO_SCHED_TASK *pTask);
@@ -185,15 +184,15 @@ ZELO_SCHED_API int ZELOSchedTaskEdit(ZELO_SCHED_TASK *pTask);
  * id. 0 or -1. */
 ZELO_SCHED_API int ZELOSchedTaskSave(ZELO_SCHED_TASK *pTask);
 
-/* Deletes the stored task of that id; plugins hear of it before and after. 0,
- * or -1: 0x2000 when the task is not found, or what the backend left. */
+/* Deletes the stored task of that id; plugins are run before and after. 0, or
+ * -1: 0x2000 when the task is not found, or what the backend left. */
 ZELO_SCHED_API int ZELOSchedTaskRemove(long id);
 
 /* Lists the tasks of every backend, each with its next trigger time; `filter`
- * may be null (all). When there are any, *pTaskList becomes the list, which
- * the caller frees with ZELOSchedTaskListFree; else it is left alone. A
- * backend that fails is logged and adds nothing. Their number (0 = none), or
- * -1: 0x0D00, or what the registration of the backends left. */
+ * may be null (all). When there are any, *pTaskList becomes the list, which the
+ * caller frees with ZELOSchedTaskListFree; else it is unchanged. A backend that
+ * fails is logged and adds nothing. The number of tasks, or -1: 0x0D00, or what
+ * the registration of the backends left. */
 ZELO_SCHED_API int ZELOSchedTaskListGet(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter);
 
 /* The record after pTask, or null after the last one and for null. */
@@ -214,10 +213,10 @@ ZELO_SCHED_API int ZELOSchedTaskIsBuildInApp(const ZELO_SCHED_TASK *pTask);
 
 /* Sorts a list in place by the field whose key is szKey ("name", "app", ...),
  * ascending for direction 1, else descending; equal records keep their order
- * ascending and reverse it descending. Text fields sort byte by byte. A number
- * or an enumeration orders the records by where they lie in memory, not by its
- * value. 0, also for an empty list, or -1: 0x0D00 for a null argument, 0x0100
- * when memory is short, no code and no log line for a key that no field has. */
+ * ascending and reverse it descending. Text fields sort byte by byte. For a
+ * number or an enumeration the records are sorted by their addresses, not by
+ * the value. 0, also for an empty list, or -1: 0x0D00 for a null argument,
+ * 0x0100 when memory is short, no code and no log line for an unknown key. */
 ZELO_SCHED_API int ZELOSchedTaskListSort(ZELO_SCHED_TASK **pTaskList, const char *szKey,
                                          int direction);
 
@@ -229,80 +228,76 @@ ZELO_SCHED_API int ZELOSchedTaskListSortEx(ZELO_SCHED_TASK **pTaskList, int inde
 
 /* Empties the hash and fills it from the task: numbers as decimal text, state
  * and type by name, the command in Base64, line feeds in every other text as
- * blanks. A state or a type without a name is left out, and no task can be filled
- * from the hash then. *ppHash is an existing hash (it may grow). 0, or -1: 0x0D00,
- * or what the platform left, with the hash partly filled. */
+ * blanks. A state or a type without a name is left out, and the hash can then
+ * not be read back. *ppHash is an existing hash (it may grow). 0, or -1:
+ * 0x0D00, or what the platform left, with the hash partly filled. */
 ZELO_SCHED_API int ZELOSchedInitHashFromTask(PSZHASH *ppHash, const ZELO_SCHED_TASK *pTask);
 
-/* Fills the task from a hash; `next`, `Backend` and `NextTriggerTime` are left
- * alone. "id", "run hour", "run min", "name", "app", "app name", "action",
- * "cmd", "state" and "type" must be there, the rest have defaults. Of a number
- * that does not fit 32 bits the lowest 32 are kept: "4294967297" is read as 1.
- * 0, or -1: 0x0D00, 0x4000 when a number without a sign ("owner", "run hour",
- * ...) has trailing characters, or what the platform left, with the record
- * partly filled. */
+/* Fills the task from a hash, except `next`, `Backend` and `NextTriggerTime`.
+ * "id", "run hour", "run min", "name", "app", "app name", "action", "cmd",
+ * "state" and "type" must be there, the rest have defaults. Of a number that
+ * does not fit 32 bits the lowest 32 are kept: "4294967297" is read as 1. 0, or
+ * -1: 0x0D00, 0x4000 when an unsigned number ("owner", "run hour", ...) has
+ * trailing characters, or what the platform left, with the record partly
+ * filled. */
 ZELO_SCHED_API int ZELOSchedInitTaskFromHash(ZELO_SCHED_TASK *pTask, PSZHASH pHash);
 
 /* ---- JSON: a task as a text for a browser ----------------------------------- */
 
 enum {
   ZELO_SCHED_JSON_SIZE_MIN = 40960, /* the smallest buffer that is accepted */
-  ZELO_SCHED_JSON_SIZE_ANY = 163840 /* a buffer in which every task fits whole */
+  ZELO_SCHED_JSON_SIZE_ANY = 163840 /* a buffer that every task fits into */
 };
 
 /* Writes the task as one JSON object on one line, with a line feed at its end.
  * Its members are the keys of the hash form ("id", "name", "run hour", "cmd" in
- * Base64, ...). Each member is a string that holds the value written as a JSON
- * string once before, so a reader decodes it twice: a name of a"b stands as
- * "name":"\"a\\\"b\"\n". All characters beyond ASCII are escaped. JSON has no way
- * to carry a byte that is not UTF-8: each becomes U+FFFD, in the command alone
- * every byte survives.
+ * Base64, ...). Each value is written as a JSON string twice over, so a reader
+ * decodes it twice: a name of a"b is written as "name":"\"a\\\"b\"\n". All
+ * characters beyond ASCII are escaped. JSON cannot represent a byte that is not
+ * UTF-8: each becomes U+FFFD, except in the command, which is in Base64.
  *
- * cbBuf is the size of szBuf in bytes, ZELO_SCHED_JSON_SIZE_MIN at the least.
- * What does not fit is cut without an error; in ZELO_SCHED_JSON_SIZE_ANY
- * everything fits. 0, or -1 with szBuf untouched: no code of its own for a null
- * argument or a small buffer, else what the callee left. */
+ * cbBuf is the size of szBuf in bytes, at least ZELO_SCHED_JSON_SIZE_MIN. What
+ * does not fit is cut without an error; every task fits into
+ * ZELO_SCHED_JSON_SIZE_ANY. 0, or -1 with szBuf untouched: no code of its own
+ * for a null argument or a small buffer, else what the callee left. */
 ZELO_SCHED_API int ZELOSchedTaskConvertToJson(const ZELO_SCHED_TASK *pTask, char *szBuf,
                                               size_t cbBuf);
 
 /* The same for the stored task of that id. 0, or -1 with szBuf untouched: no
  * code of its own for a negative id, null or a small buffer; 0x2000 when no
- * backend holds the id, or what the callee left. */
+ * backend has the id, or what the callee left. */
 ZELO_SCHED_API int ZELOSchedTaskConvertToJsonById(long id, char *szBuf, size_t cbBuf);
 
 /* Saves the task that a JSON text in that form describes. With `create` 0 it
- * overwrites the stored task of its id when that has the same app and name; in
- * every other case, and always with `create` not 0, it becomes a new task, which
- * the crontab backend keeps also when the text was made of a power task. So a
- * power task that was taken by its id ("Poweroff 0") is saved over itself, and the
- * same one from a list ("PowerOff task 0"), whose name is another, becomes an
- * ordinary task. Keys
- * that are missing have the defaults of the hash form; of a member given twice
- * the last counts; members that are no key of a task are passed over.
+ * overwrites the stored task of its id when that has the same app and name. In
+ * every other case, and always with `create` not 0, it becomes a new task of
+ * the backend `zeloschedule`, also when the text was made from a power task. So
+ * a power task that was read by its id ("Poweroff 0") is saved over itself, and
+ * one from a list ("PowerOff task 0"), which has another name, becomes an
+ * ordinary task. Missing keys have the defaults of the hash form; of a member
+ * given twice the last counts; members that are no key of a task are ignored.
  *
- * The text may come from anyone. A root that is no object, a member that is no
- * string or whose string is no JSON string, half of a surrogate pair, a zero
- * byte, too deep a nesting, anything but blanks and comments after the end, a
- * number that does not fit its field, a command of more than 12287 bytes, a
- * schedule that cron cannot read (see ZELOSchedTaskCreate; also that of a task
- * that is not enabled), an enabled task whose line would be one more than 9800 in
- * /etc/crontab (of which cron ignores all when it has more than 10000), and a text
- * of more than 4 MiB are failures, and then nothing is saved. Bytes that are not
- * UTF-8 are saved as they are; another text that is longer than its field is cut
- * to it.
+ * The text may come from anyone. These are failures, and nothing is saved: a
+ * root that is no object, a member that is no string or whose string is no JSON
+ * string, half of a surrogate pair, a zero byte, too deep a nesting, anything
+ * but blanks and comments after the end, a number that does not fit its field,
+ * a command of more than 12287 bytes, a schedule that cron cannot read (see
+ * ZELOSchedTaskCreate), even in a disabled task, an enabled task whose line
+ * would be the 9801st or later in /etc/crontab, and a text of more than 4 MiB.
+ * Bytes that are not UTF-8 are saved as they are; a text other than the command
+ * is cut to its field.
  *
- * Whose task it is, the text alone decides. One whose "owner" is missing, "" or
- * " 0", "-0" or another way to write nothing, or comes again as 0, is root's, and
- * its command runs as root; and one that repeats id, name and app of anybody's task,
- * which everybody can read, is saved over it. So a back end does not hand the text
- * of a user on: examples/save_for_user.c shows how it saves for him.
+ * The text alone determines the owner. A task whose "owner" is missing or
+ * empty, or reads as 0 (" 0", "-0", given again as 0), is root's, and its
+ * command runs as root. One with the id, name and app of another user's task,
+ * which everybody can read, overwrites that. So a web back end must not pass on
+ * the text of a user: examples/save_for_user.c shows how to save for him.
  *
  * The id of the saved task (0 or more), or -1: no code of its own for a null or
  * empty text or one that cannot be read, else what the callee left. An object
- * without members saves nothing and gives the id of a new record, which is -1,
- * without a log line. Looking for the stored task of an id that nobody has, as
- * that of a new task is, leaves a log line and 0x2000 also where a new task is
- * then created. */
+ * without members saves nothing and gives -1, the id of a new record, without a
+ * log line. Looking up an id that no stored task has, such as that of a new
+ * task, leaves a log line and 0x2000 even where a new task is then created. */
 ZELO_SCHED_API int ZELOSchedTaskSaveFromJson(const char *szJson, int create);
 
 /* ---- enumerations ----------------------------------------------------------- */
@@ -329,9 +324,9 @@ ZELO_SCHED_API int ZELOSchedEnumToValue(const ZELO_SCHED_ENUM *enum_list, const 
 ZELO_SCHED_API const char *ZELOSchedMultiSelectToText(const char *szFlags, const char *const *names,
                                                       size_t count);
 
-/* The way back: for each of the `count` names (below 4096) a '1' when the
- * comma-separated text holds it, ignoring case, else a '0'. The text lives in
- * a buffer that the next call overwrites. Null, without a log line, for a null
+/* The reverse: for each of the `count` names (below 4096) a '1' when the
+ * comma-separated text has it, ignoring case, else a '0'. The text lives in a
+ * buffer that the next call overwrites. Null, without a log line, for a null
  * argument, a count of 0, a text without items, and when memory is short. */
 ZELO_SCHED_API const char *ZELOSchedMultiSelectFromText(const char *text, const char *const *names,
                                                         size_t count);
@@ -362,23 +357,24 @@ ZELO_SCHED_API int ZELOSchedDateParse(const char *szDateOrg, ZELO_SCHED_DATE *pD
  * the other fields are left alone. 0, or -1: 0x0D00, 0x4000. */
 ZELO_SCHED_API int ZELOSchedTimeParse(const char *szTimeOrg, ZELO_SCHED_DATE *pDate);
 
-/* Rolls fields that are out of range over (32 January becomes 1 February) and
- * works out the weekday. The time is taken as standard time: in summer time it
- * comes back one hour later. 0, or -1 with the date left alone: 0x0D00; 0x2A00,
- * also when the year would be too great to be counted. */
+/* Normalises fields that are out of range (32 January becomes 1 February) and
+ * computes the weekday. The time is taken as standard time: in summer time it
+ * comes back one hour later. 0, or -1 with the date unchanged: 0x0D00; 0x2A00,
+ * also when the year is too great. */
 ZELO_SCHED_API int ZELOSchedDateNormalize(ZELO_SCHED_DATE *pDate);
 
 /* Seeds rand() from the time and the process id, once in a process. */
 ZELO_SCHED_API void ZELOSchedRandInit(void);
 
-/* Works out when the task runs next, after the current minute, into its
- * NextTriggerTime: "YYYY-MM-DD hh:mm", or "N/A" when it never does. 0, or -1
- * with the field left alone: 0x0D00, 0x2A00. */
+/* Computes the next run after the current minute into NextTriggerTime:
+ * "YYYY-MM-DD hh:mm", or "N/A" for a task that runs once and is over. 0, or -1
+ * with the field unchanged: 0x0D00, 0x2A00. */
 ZELO_SCHED_API int ZELOSchedNextTriggerTime(ZELO_SCHED_TASK *pTask);
 
 /* ---- backends ------------------------------------------------------------------ */
 
-/* One store of tasks. A slot may be empty: the backend does not offer it. */
+/* One store of tasks. A null slot is an operation that the backend does not
+ * offer. */
 typedef struct ZELO_SCHED_BACKEND {
   int32_t id;                                 /* the Backend field of its tasks */
   const char *szName;                         /* not a copy */
@@ -389,44 +385,45 @@ typedef struct ZELO_SCHED_BACKEND {
   int (*get_default)(ZELO_SCHED_TASK *pTask); /* below 0 = failure */
   int (*owns_id)(long id);                    /* 0 = certainly not this backend's */
   int (*get_by_id)(long id, ZELO_SCHED_TASK *pTask); /* 1 found, 0 not here, -1 error */
-  /* Carries the task out in the user context that the caller has set up, and
-   * reports a status code and a comment of at most cbComment - 1 characters;
-   * the buffer must have room for 4 at the least. Below 0 = failure. */
+  /* Runs the task in the user context that the caller has set up, and reports a
+   * status code and a comment of at most cbComment - 1 characters; the buffer
+   * has room for at least 4. Below 0 = failure. */
   int (*run)(ZELO_SCHED_TASK *pTask, int *pStatusCode, char *szComment, size_t cbComment);
   /* Attaches its tasks at the end of the list; their number, below 0 = failure. */
   int (*list_get)(ZELO_SCHED_TASK **pTaskList, ZELO_SCHED_TASK_FILTER filter);
 } ZELO_SCHED_BACKEND;
 
-/* The table, in the order in which backends are asked, and how many there are. */
+/* The table, in the order in which backends are asked, and the number of
+ * entries. */
 extern ZELO_SCHED_API ZELO_SCHED_BACKEND SchedBackends[16];
 extern ZELO_SCHED_API uint32_t cBackend;
 
 /* Registers the backends, once in a process; every call that needs them does
- * this by itself. 0, or -1 with the table empty, so that the next call tries
+ * this itself. 0, or -1 with the table empty, so that the next call tries
  * again. */
 ZELO_SCHED_API int ZELOSchedBackendInit(void);
 
-/* Fills an entry for the backend "zeloschedule", but for its id. 0, or -1:
+/* Fills an entry for the backend "zeloschedule", except its id. 0, or -1:
  * 0x0D00, no code for another name. */
 ZELO_SCHED_API int zeloschedule_init(const char *szName, ZELO_SCHED_BACKEND *pBackend);
 
-/* The same for the backend "zeloautopower", which shows the machine's power
- * schedule as tasks: "app args" says "poweron" or "poweroff", and the weekdays,
+/* The same for the backend "zeloautopower", which presents the machine's power
+ * schedule as tasks: "app args" is "poweron" or "poweroff", and the weekdays,
  * the hour and the minute are the entry's.
  *
- * The id of a power task is made of its content and changes with it: after an
- * edit the task is found under another id. It is
+ * The id of a power task encodes its content and changes with it: after an edit
+ * the task has another id. It is
  *   60000000 + 10000000 * enabled + 10000 * weekdays + 100 * hour + minute,
  * and 20000000 more for power-off; bit 0 of the weekdays is Sunday, so that
  * 71270730 is an enabled power-on at 07:30 of every day. */
 ZELO_SCHED_API int zeloautopower_init(const char *szName, ZELO_SCHED_BACKEND *pBackend);
 
-/* ---- hooks: telling plugins of changes ------------------------------------------- */
+/* ---- hooks: running plugins around changes ---------------------------------------- */
 
 /* The caller zeroes it, and frees it after ZELOSchedTaskPluginExit. */
 typedef struct ZELO_SCHED_PLUGIN {
   void *framework[3];          /* the platform's; the first is not null while live */
-  int32_t result;              /* told to the plugins as RESULT */
+  int32_t result;              /* passed to the plugins as RESULT */
   const ZELO_SCHED_TASK *pOrg; /* the task as it was, or null */
   const ZELO_SCHED_TASK *pNew; /* the task as it is to be, or null */
 } ZELO_SCHED_PLUGIN;
@@ -440,19 +437,19 @@ ZELO_SCHED_API int ZELOSchedTaskPluginInit(ZELO_SCHED_PLUGIN *pPlugin, const cha
                                            const ZELO_SCHED_TASK *pOrg,
                                            const ZELO_SCHED_TASK *pNew);
 
-/* Runs the plugins for PRE or POST. The platform's verdict (below 0 when one
+/* Runs the plugins for PRE or POST. The platform's result (below 0 when one
  * failed), or -1: 0x0D00 without tasks, no code for a context that was not
- * initialised, what the platform left when an argument could not be set; none of
- * these is logged. */
+ * initialised, what the platform left when an argument could not be set; none
+ * of these is logged. */
 ZELO_SCHED_API int ZELOSchedTaskPlugin(int action, ZELO_SCHED_PLUGIN *pPlugin);
 
-/* Releases what the platform holds for the context. 0, or -1. */
+/* Releases the platform's resources for the context. 0, or -1. */
 ZELO_SCHED_API int ZELOSchedTaskPluginExit(ZELO_SCHED_PLUGIN *pPlugin);
 
 /* ---- running, and the record of runs ------------------------------------------------ */
 
 enum {                             /* status codes of a run */
-       ZELO_SCHED_STATUS_NONE = 0, /* in ZELOSchedDBSetStatus: any old code */
+       ZELO_SCHED_STATUS_NONE = 0, /* in ZELOSchedDBSetStatus: any former code */
        ZELO_SCHED_STATUS_GONE = 1, /* was running, but its process is gone */
        ZELO_SCHED_STATUS_RUNNING = 2,
        ZELO_SCHED_STATUS_FINISHED = 3,    /* exit code 0 */
@@ -462,7 +459,8 @@ enum {                             /* status codes of a run */
        ZELO_SCHED_STATUS_EXIT_NONZERO = 7 /* comment = exit code */
 };
 
-/* What the running checks find. The caller zeroes it. */
+/* What the running checks find: found, pid, statusID and taskID. No call fills
+ * the other fields. The caller zeroes it. */
 typedef struct ZELO_SCHED_STATUS {
   int32_t found;     /* 1 = a live run was found */
   int32_t pid;       /* process that runs the task */
@@ -474,43 +472,45 @@ typedef struct ZELO_SCHED_STATUS {
   char szComment[1024];
 } ZELO_SCHED_STATUS;
 
-/* Runs a stored task in a child process of its own, which waits for conflicting
- * runs, takes on the owner's rights and records the run in the status database.
- * checkRunTime 1: only when the current minute is one of the task's.
- * skipDisabled 1: not when the task is disabled. 0 when a child was started or
- * there was nothing to do, or -1: 0x2000 when the task is not found, or what
- * the callee left. How the run went is told by the status database and the log
- * alone.
- * Of the caller's descriptors the command keeps 1 and 2 alone, and each of these
- * only where it is a pipe or a regular file, open for writing alone (a pipe without
- * a name, from pipe(2), may be open for reading too) and not to be closed on an
- * exec: it prints there, for as long as it likes, and who reads the
- * pipe decides how that is shown. Any other 1 or 2 (a terminal, a socket, open
- * for reading too, closed) is /dev/null in its place, and so is 0 always. The
- * names /dev/stdout and /dev/stderr can be opened only where the task's owner may
- * open what is behind them; a pipe is that of the user who made it. */
+/* Runs a stored task in a detached child process, which waits for conflicting
+ * runs, records the run in the status database and runs the command with the
+ * owner's rights. checkRunTime 1: only when the current minute is one of the
+ * task's. skipDisabled 1: not when the task is disabled. 0 when a child was
+ * started or there was nothing to do, or -1: 0x2000 when the task is not found,
+ * or what the callee left. How the run ended is only in the status database and
+ * the log.
+ *
+ * Of the caller's file descriptors the command inherits only 1 and 2, and each
+ * of these only if it is a pipe or a regular file, open for writing only (an
+ * anonymous pipe, from pipe(2), may be open for reading too) and without
+ * FD_CLOEXEC. The command may still write there when the call has returned. Any
+ * other 1 or 2 (a terminal, a socket, open for reading too, closed) is replaced
+ * by /dev/null, as 0 always is. The command can open /dev/stdout and
+ * /dev/stderr only where the task's owner may open the file or pipe; a pipe
+ * belongs to the user who made it. */
 ZELO_SCHED_API int ZELOSchedTaskRun(long id, int checkRunTime, int skipDisabled);
 
-/* The stream of the run lock file while this process holds the run lock. */
+/* The stream of the run lock file while this process holds the run lock, else
+ * null. */
 extern ZELO_SCHED_API FILE *pfLock;
 
 /* Opens the status database, creating it when it is missing. The caller closes
- * it with sqlite3_close, before the library is unloaded. The database is made with
- * mode 0600 and is therefore root's in practice. It and its rollback journal are
- * used only while they are root's or the caller's, and nothing else that lies
- * beside them: the connection knows no WAL mode and no transaction over attached
- * databases. A database in WAL mode is moved aside, which the log tells, and made
- * anew. The calls below run their statements on the connection and leave its
- * authorizer, limits, hooks and transaction as they are. Null on failure: 0x0900
- * when it cannot be opened, no code, and the connection left open, when the table
- * cannot be created. */
+ * it with sqlite3_close, before the library is unloaded. The database is made
+ * with mode 0600: only root and the user who made it can use it. It and its
+ * rollback journal are used only while they are root's or the caller's, and no
+ * other file beside them: the connection supports neither WAL mode nor
+ * transactions over attached databases. A database in WAL mode is moved aside,
+ * which is logged, and a new one is made. The calls below run their statements
+ * on the connection and leave its authorizer, limits, hooks and transaction as
+ * they are. Null on failure: 0x0900 when it cannot be opened, no code, and the
+ * connection left open, when the table cannot be created. */
 ZELO_SCHED_API sqlite3 *ZELOSchedDBInit(void);
 
 /* Looks for a run of the task, or of any task of the application, that is still
  * going. 0 with pStatus->found 1 (pid, statusID and taskID are the run's) or
- * untouched, or -1: 0x0D00, no code when the statement failed.
- * szApp stands in the statement as it is: an apostrophe of the name is doubled.
- * A text that ends its apostrophes may go on with comparisons of columns, numbers
+ * untouched, or -1: 0x0D00, no code when the statement failed. szApp is put
+ * into the statement unescaped: the caller doubles an apostrophe of the name. A
+ * text that ends the quoted one may go on with comparisons of columns, numbers
  * and texts, joined by AND, OR, NOT and ||; anything else fails the call. */
 ZELO_SCHED_API int ZELOSchedDBIsTaskRunning(sqlite3 *db, long id, ZELO_SCHED_STATUS *pStatus);
 ZELO_SCHED_API int ZELOSchedDBIsAppRunning(sqlite3 *db, const char *szApp,
@@ -529,10 +529,10 @@ ZELO_SCHED_API int ZELOSchedDBAddRecord(sqlite3 *db, const ZELO_SCHED_TASK *pTas
 ZELO_SCHED_API int ZELOSchedDBSetStatus(sqlite3 *db, int iStatusID, int orgStatusCode,
                                         int newStatusCode, const char *szComment);
 
-/* The status of one run, or of the latest run of a task. A run whose process is
- * gone reads as ZELO_SCHED_STATUS_GONE. szComment and pTimestamp (seconds since
- * the epoch) may be null. 1 found, 0 not found with the outputs untouched, -1:
- * 0x0D00, no code when the statement failed. */
+/* The status of one run, or of the latest run of a task. A running one whose
+ * process is gone reads as ZELO_SCHED_STATUS_GONE. szComment and pTimestamp
+ * (seconds since the epoch) may be null. 1 found, 0 not found with the outputs
+ * untouched, -1: 0x0D00, no code when the statement failed. */
 ZELO_SCHED_API int ZELOSchedDBGetStatusByStatusID(sqlite3 *db, int iStatusID, int *pStatusCode,
                                                   char *szComment, size_t cbComment);
 ZELO_SCHED_API int ZELOSchedDBGetStatusByTaskID(sqlite3 *db, long id, long *pTimestamp,

@@ -27,7 +27,7 @@ extern "C" {
 #endif
 
 /* int NAME(int32_t *pVal, const ZELO_SCHED_TASK *pTask): 1 in *pVal when the
- * field is exactly the value that stands in the line, else 0. */
+ * field has the value in the line, else 0. */
 ZELO_SCHED_YES_NO_READER(ZELOSchedCTaskIsOnce, Type, 0)
 ZELO_SCHED_YES_NO_READER(ZELOSchedCTaskIsDaily, Type, 1)
 ZELO_SCHED_YES_NO_READER(ZELOSchedCTaskIsWeekly, Type, 2)

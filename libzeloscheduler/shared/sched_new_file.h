@@ -1,4 +1,4 @@
-// Replacing a file as a whole, so that nobody ever sees half of it.
+// Replacing a file as a whole, so that no reader sees a part of it.
 #ifndef SCHED_NEW_FILE_H
 #define SCHED_NEW_FILE_H
 
@@ -13,9 +13,9 @@ struct FileCloser {
 };
 using Stream = std::unique_ptr<FILE, FileCloser>;
 
-// A file under a name that nobody can know, beside the one whose place it is to take, and gone
-// again unless it took it. What stands under that one's name is neither followed nor written
-// through. Each call gives false, with errno set, when it fails.
+// A file with a random name, beside the one that it is to replace, and removed unless it was
+// renamed. The old file is never opened, nor a link in its place followed. Each call gives false,
+// with errno set, when it fails.
 class SchedNewFile {
  public:
   explicit SchedNewFile(const char *szBeside);
@@ -27,10 +27,10 @@ class SchedNewFile {
 
   bool open();
   bool write(std::string_view bytes);
-  // Whole on the disk, and with this owner, group and mode (of which the permission bits count)
-  // before anyone can find it. Nothing can be written behind it.
+  // Writes the file to the disk, with this owner, group and mode (only its permission bits),
+  // before it is renamed. Nothing can be written after this.
   bool finish(const struct stat &like);
-  // The directory is left to schedSyncDirectory.
+  // Does not sync the directory: schedSyncDirectory does.
   bool rename(const char *szPath);
 
  private:
@@ -39,7 +39,7 @@ class SchedNewFile {
   Stream stream_;
 };
 
-// What was written, or what a rename made of a directory, is on the disk when the call returns.
+// The file, or the entries of the directory, are on the disk when the call returns.
 bool schedSyncFile(const char *szPath);
 bool schedSyncDirectory(const char *szPath);
 

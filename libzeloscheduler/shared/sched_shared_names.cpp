@@ -14,19 +14,18 @@
 namespace {
 
 constexpr mode_t kReadableByAll = 0644;
-constexpr mode_t kOwnersOnly = 0600;  // whoever can open it can keep every run waiting
+constexpr mode_t kOwnersOnly = 0600;  // whoever can open it can delay every run
 constexpr mode_t kOpenDirectory = 0755;
 constexpr char kStorePath[] = "/tmp/scheduled_tasks";
-// A store of no bytes beside a persistent copy that has some is one that was cut off, and is
-// refused.
+// Contents of a new store: an empty one beside a persistent copy counts as cut off.
 constexpr char kNoTasks[] = "# The scheduler's tasks.\n";
 
-// Another user can fill the file system, and a run that cannot be recorded is not begun. This is
-// room for some 10,000 runs, and for the journal of one.
+// Reserved space, as another user can fill the file system, and a run that cannot be recorded is
+// not started: for some 10,000 runs, and for the journal of one.
 constexpr off_t kRoomForRuns = 1 << 20;
 constexpr off_t kRoomForJournal = 1 << 17;
 
-constexpr int kTries = 1000;  // against somebody who is in the way again and again
+constexpr int kTries = 1000;  // against a process that takes the name again and again
 
 bool makeDirectory(const char *szPath, mode_t mode) {
   return mkdir(szPath, S_IRWXU) == 0 && chmod(szPath, mode) == 0;
@@ -46,7 +45,7 @@ bool writeAll(int descriptor, std::string_view contents) {
   return true;
 }
 
-// A file system that cannot give it now may have room when it is needed.
+// A failure is ignored: there may be space when it is needed.
 void reserve(const SchedSharedName &name, int descriptor) {
   if (name.reserve > 0) {
     fallocate(descriptor, FALLOC_FL_KEEP_SIZE, 0, name.reserve);
@@ -74,11 +73,11 @@ void removeEither(const char *szPath) {
   }
 }
 
-// What becomes of a file that is ours by now, where another was found before.
+// What becomes of the file in the name's place if that is ours by now.
 enum class Ours { kStays, kGoes, kIsKept };
 
-// A new file or directory of the name's kind, in a directory that nobody else can enter, and with
-// it gone unless something was moved there.
+// A new file or directory for the name, in a directory that nobody else can enter. Both are
+// removed at the end, unless a file was moved there to be kept.
 class Replacement {
  public:
   Replacement(const SchedSharedName &name, Ours ours) : name_(name), ours_(ours) {
@@ -87,7 +86,7 @@ class Replacement {
     isMade_ = isMade_ && make(name, path_);
   }
   ~Replacement() {
-    const int reason = errno;  // of what has failed, for the caller
+    const int reason = errno;  // of the failure, for the caller
     if (!isKept_) {
       removeEither(path_);
     }
@@ -98,7 +97,7 @@ class Replacement {
   Replacement &operator=(const Replacement &) = delete;
 
   bool isMade() const { return isMade_; }
-  // What stood there, when that is kept.
+  // The path of the file that was replaced, if it is kept.
   const char *movedTo() const { return isKept_ ? path_ : ""; }
 
   enum class Placed { kYes, kAgain, kNever };
@@ -120,7 +119,7 @@ class Replacement {
  private:
   bool move(unsigned flags) { return renameat2(AT_FDCWD, path_, AT_FDCWD, name_.path, flags) == 0; }
 
-  // Another process of ours may have taken the name since it was looked at: its file may be in use.
+  // Another process of ours may have taken the name since it was examined: its file may be in use.
   void settleExchanged() {
     struct stat info = {};
     const char *szWhy = lstat(path_, &info) == 0 ? schedWhyForeign(name_, info) : "is gone";
@@ -135,8 +134,8 @@ class Replacement {
     }
   }
 
-  // On a file system that cannot exchange. A file takes the place of any other in one step; what
-  // is in the way of that is moved away first, and somebody may be faster than we then.
+  // For a file system without RENAME_EXCHANGE. A file replaces any other file in one step. A
+  // directory is moved away first, and then another process may take the name.
   Placed placeWithoutExchange() {
     if (rename(path_, name_.path) == 0) {
       return Placed::kYes;
@@ -171,7 +170,7 @@ bool replace(const SchedSharedName &name, Ours ours, SchedMovedTo *pMovedTo = nu
   return placed == Placed::kYes;
 }
 
-// Whoever starts the program must find all of it, so it is not made in place.
+// A file with contents is not made in place: nobody must find a part of it.
 bool takeFree(const SchedSharedName &name) {
   return name.contents.empty() ? make(name, name.path) : replace(name, Ours::kStays);
 }

@@ -1,9 +1,10 @@
-// The names in "/tmp" that the library uses: whose they are, and how they become ours.
+// The names in "/tmp" that the library uses: whether the files are ours, and how to take the
+// names.
 //
-// The directory is everybody's and sticky: anybody can be first under a name there, but nobody can
-// remove or rename another user's file. So a name that is ours alone stays so until we give it up,
-// and one look at it holds; while it is free, the next look may find anything. Each name is
-// therefore looked at once before it is used, and taken as soon as it is found free.
+// The directory is writable by all users and sticky: any user can make a file with a free name,
+// but none can remove or rename another user's file. So a name that is ours stays ours until we
+// remove it, and one check is enough; a free one can be taken at any time. Each name is therefore
+// checked before it is used, and taken as soon as it is found free.
 #ifndef SCHED_SHARED_NAMES_H
 #define SCHED_SHARED_NAMES_H
 
@@ -16,62 +17,59 @@ struct SchedSharedName {
   const char *path;
   mode_t mode;
   bool isDirectory;
-  std::string_view contents;  // of a file that is made under the name
-  off_t reserve = 0;          // bytes that it takes from the file system beforehand
+  std::string_view contents;  // of a file that is made
+  off_t reserve = 0;          // bytes that are allocated beforehand
 };
 
 extern const SchedSharedName kSchedStore;
-extern const SchedSharedName
-    kSchedStoreToRestore;  // the same name; no task is read before a restore
+extern const SchedSharedName kSchedStoreToRestore;  // empty: refused until it is restored
 extern const SchedSharedName kSchedTaskProgram;
 extern const SchedSharedName kSchedLockDirectory;
 extern const SchedSharedName kSchedLockFile;
 extern const SchedSharedName kSchedDatabase;
 extern const SchedSharedName kSchedJournal;
 
-// Why others could have made it or can change it, as in "is another user's"; null when it is root's
-// or this process's user's, and nobody else's. One rule for all names, also for an open file.
+// Why another user could have made or can change it, such as "is another user's"; null when only
+// root or this process's user can. The one rule for all names, also for an open file.
 const char *schedWhyForeign(const SchedSharedName &name, const struct stat &info);
 
 enum class SchedNameState { kFree, kOurs, kForeign };
 
-// By one look, which never follows a link. What cannot be looked at is foreign, with the reason in
-// *pszWhy, which may be null.
+// By one lstat. What cannot be examined is foreign. The reason is in *pszWhy; pszWhy may be null.
 SchedNameState schedLookAt(const SchedSharedName &name, const char **pszWhy);
 
-// True when the name is ours in the end. A free one is made. For root, what stands in the way is
-// exchanged for what is made, in one step, and then found in a directory that only root can enter,
-// which the log names; an empty directory is removed. It logs nothing else, and sets no error code.
+// True when the name is ours in the end. A missing file is made. For root, a foreign one is
+// exchanged for a new one, in one step, and kept in a directory that only root can enter, which
+// the log names; an empty directory is removed. Logs nothing else, and sets no error code.
 bool schedTakeName(const SchedSharedName &name);
 
-// Takes the room that a file of ours shall have, where it was made in another way. Nobody may hold
-// a POSIX lock on it yet: closing the file would drop it.
+// Allocates the reserved space for a file of ours that was made in another way. This process must
+// hold no POSIX lock on it: closing the file here would drop it.
 void schedReserve(const SchedSharedName &name);
 
-// Makes it anew, in one step, whatever stands there: for root alone. True when the name has it;
-// where the log names what was moved away, it is in *pMovedTo, which may be null, and is ""
-// otherwise.
+// Replaces what has the name by a new file, in one step; only for root. True on success. *pMovedTo
+// is the path of a foreign file that was moved away, which the log names too, or ""; pMovedTo may
+// be null.
 using SchedMovedTo = char[128];
 bool schedReplaceName(const SchedSharedName &name, SchedMovedTo *pMovedTo);
 
-// Makes it anew and keeps what stood there, also when that is ours; where, is in *pMovedTo.
+// The same, but keeps also a file of ours; its new path is in *pMovedTo. Not only for root.
 bool schedMoveAside(const SchedSharedName &name, SchedMovedTo *pMovedTo);
 
-// The same for a name that nothing is expected under: what stands there, ours too, is removed, or
-// moved away when it is a directory. True when a new file of this process has the name.
+// For a name that should be free: a file there, even one of ours, is removed, and a directory is
+// moved away (only for root). True when a new file of this process has the name.
 bool schedMakeAnew(const SchedSharedName &name);
 
-// The tasks for the next boot, and the same with the last change, for when the power goes while the
-// first is written.
+// The tasks for the next boot, and a copy for a loss of power while the first is written.
 inline constexpr char kSchedPersistentStore[] = "/usr/zelo/etc/scheduled_tasks";
 inline constexpr char kSchedLastGoodStore[] = "/usr/zelo/etc/scheduled_tasks.last-good";
 
-// Whether tasks are kept for the next boot. A persistent copy without bytes was cut off, by a loss
-// of power, when there is a last good one.
+// Whether tasks are stored for the next boot. An empty persistent copy beside a last good one was
+// cut off by a loss of power.
 bool schedAreTasksKept();
 
-// Takes all names but the store's, when the process is root's: a name that is free could be given
-// to a file of root's that another user moved there.
+// Takes all names except the store's, when the process is root's: to a free name another user
+// could move a file of root's.
 void schedTakeNames();
 
 #endif

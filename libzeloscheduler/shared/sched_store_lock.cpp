@@ -21,7 +21,7 @@ constexpr mode_t kMode = 0600;
 constexpr int kTries = 6000;  // thirty seconds in all
 constexpr useconds_t kPause = 5000;
 
-// Whoever removes the file while we wait would let the next process lock another one.
+// If the file was removed while we waited, the next process would lock a new one.
 bool isStillThere(int file) {
   struct statx held = {};
   struct statx there = {};
@@ -31,7 +31,7 @@ bool isStillThere(int file) {
          held.stx_dev_minor == there.stx_dev_minor;
 }
 
-// The word before szEnd.
+// The number that ends at szEnd.
 pid_t lastNumber(const char *szLine, const char *szEnd) {
   const char *szNumber = szEnd;
   while (szNumber > szLine && isdigit(static_cast<unsigned char>(szNumber[-1])) != 0) {
@@ -40,8 +40,7 @@ pid_t lastNumber(const char *szLine, const char *szEnd) {
   return static_cast<pid_t>(strtol(szNumber, nullptr, 10));
 }
 
-// The kernel's list says it of whoever locked the file, with this library or without. It has no
-// entry of a process that is in another pid namespace.
+// From /proc/locks, which does not list processes of other pid namespaces.
 pid_t whoHolds(int file) {
   struct stat info = {};
   FILE *const locks = fstat(file, &info) == 0 ? fopen("/proc/locks", "re") : nullptr;
@@ -61,8 +60,7 @@ pid_t whoHolds(int file) {
     }
   }
   fclose(locks);
-  // It lists who took the lock, which may have handed it on and ended, as flock(1) does for a
-  // script.
+  // The process may have passed its descriptor on and ended, as flock(1) does for a script.
   const bool isThere = holder > 0 && (kill(holder, 0) == 0 || errno != ESRCH);
   return isThere ? holder : kSchedUnknownHolder;
 }
@@ -85,7 +83,7 @@ Turn tryLock(int *pFile) {
   return *pFile < 0 ? Turn::kNever : Turn::kWait;
 }
 
-// Waits for the lock; what is left in *pFile is to be closed.
+// Waits for the lock. The caller closes *pFile.
 Turn lock(int *pFile) {
   Turn turn = *pFile < 0 ? Turn::kNever : tryLock(pFile);
   for (int i = 0; i < kTries && turn == Turn::kWait; ++i) {

@@ -1,4 +1,4 @@
-// Turns at what tasks are kept in: the store, the power schedule and the system crontab.
+// The lock for changes of the store, the power schedule and the system crontab.
 #ifndef SCHED_STORE_LOCK_H
 #define SCHED_STORE_LOCK_H
 
@@ -6,14 +6,14 @@
 
 constexpr char kSchedStoreLockFile[] = "/run/zeloscheduler.lock";
 
-// Keeps two processes from changing these files at once: each would write what it read over the
-// other's change. The lock is on a file that nobody else can open: one that anyone could take would
-// keep everyone waiting. It is not taken twice: an operation that holds it calls what needs it and
-// does not take it.
+// Keeps two processes from changing these files at once, as each would overwrite the other's
+// change. The lock is on a file that only its owner, root, can open: any other user could block
+// all changes. It is not recursive: an operation that holds it calls functions that do not take
+// it.
 //
-// Whoever has not had his turn after 30 seconds, or cannot open or lock the file, must change
-// nothing: isHeld() is false, the code is 0x0400, and one log line says why, with the process that
-// holds it.
+// When the lock is not free within 30 seconds, or the file cannot be opened or locked, isHeld() is
+// false, the code is 0x0400, and one log line says why, with the process that holds it if known.
+// Nothing may be changed then.
 class StoreLock {
  public:
   StoreLock();
@@ -27,9 +27,9 @@ class StoreLock {
   int file_;
 };
 
-// The process that holds the lock on a file (flock), 0 when there is none. It waits for nothing.
+// The process that holds the lock (flock) on a file, 0 when there is none. Does not block.
 pid_t schedLockHolder(const char *szFile);
 
-constexpr pid_t kSchedUnknownHolder = -1;  // of another container, say
+constexpr pid_t kSchedUnknownHolder = -1;  // in another container, for example
 
 #endif

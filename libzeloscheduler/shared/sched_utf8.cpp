@@ -2,8 +2,8 @@
 
 namespace {
 
-// By its first byte: how long a character is, and the range of its second byte, which is what tells
-// overlong forms, surrogates and numbers beyond Unicode. Any further byte is 80 to BF.
+// By the first byte: the length of the character, and the range of its second byte, which excludes
+// overlong forms, surrogates and codes beyond Unicode. Any further byte is 80 to BF.
 struct Form {
   unsigned char firstLead;
   unsigned char lastLead;

@@ -8,11 +8,11 @@
 
 struct SchedCharacter {
   uint32_t code;
-  size_t bytes;  // 0: it is none
+  size_t bytes;  // 0: no character
 };
 
-// The one that the text begins with. Nothing that Unicode does not allow is one: no longer form
-// than needed, which could hide a control character, no surrogate, no number beyond its last.
+// The first character of the text. None for an overlong form, which could hide a control
+// character, a surrogate, or a code beyond Unicode.
 SchedCharacter schedFirstCharacter(std::string_view text);
 
 // The bytes of a character that begins with this one; 0 when none does.

@@ -1,4 +1,4 @@
-// Starting a program and learning how it ended, whatever the caller does with its own signals.
+// Starting a program and getting its exit status, whatever the caller does with its signals.
 #ifndef ZELOCORE_CHILD_H
 #define ZELOCORE_CHILD_H
 
@@ -8,11 +8,11 @@
 
 namespace zelo {
 
-// While it lives, a child that ends waits for us to take its status. A process that ignores
-// SIGCHLD, or has children reaped unseen, would lose it, so the default action stands in for that
-// long; and the signal is held back from this thread, lest the caller's handler takes the status
-// first. Children of the caller that end meanwhile are the price: one that it would have ignored
-// stays a zombie until the caller ends.
+// While it lives, a child that ends stays a zombie until we wait for it. SIGCHLD has its default
+// action for that long, since a process that ignores it, or sets SA_NOCLDWAIT, would lose the exit
+// status. The signal is blocked in this thread, lest the caller's handler takes the status first.
+// The price: where the caller ignores its children, one that ends meanwhile stays a zombie until
+// the caller ends.
 class ChildStatusGuard {
  public:
   ChildStatusGuard() noexcept;
@@ -26,9 +26,9 @@ class ChildStatusGuard {
   sigset_t mask_{};
 };
 
-// How a program starts: default actions for every signal and none blocked, as if from a shell.
-// posix_spawn shares the caller's memory until the program runs, so a large caller starts one as
-// fast as a small one.
+// How a program starts: with the default action for every signal and none blocked, as from a
+// shell. posix_spawn shares the caller's memory until the program runs, so a large caller starts
+// one as fast as a small one.
 class Launch {
  public:
   Launch() noexcept;
@@ -54,10 +54,10 @@ class Launch {
   bool failed_ = false;
 };
 
-// Waits for the child. False when its status went to someone else.
+// Waits for the child. False when its status cannot be had, such as after another wait for it.
 bool waitForChild(pid_t pid, int *status) noexcept;
 
-// As a shell gives it: the exit status, or 128 and the signal's number.
+// As a shell has it: the exit status, or 128 plus the signal's number.
 int exitCode(int status) noexcept;
 
 }  // namespace zelo

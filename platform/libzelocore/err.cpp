@@ -6,8 +6,8 @@
 
 namespace {
 
-// Base names of source files; a longer text is cut, since setting the record must work when memory
-// is short.
+// Enough for the names of source files. A longer one is cut, as setting the record must not
+// allocate memory.
 constexpr size_t kFileRoom = 256;
 
 struct ErrorRecord {

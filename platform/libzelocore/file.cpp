@@ -8,14 +8,14 @@
 
 namespace {
 
-// Never writable by others, whatever the caller's mask says: what is kept in these files is run
-// with its owner's rights.
+// Not writable by others, whatever the caller's umask: commands in these files are run with the
+// rights of their tasks' owners.
 constexpr mode_t kNewFileMode = 0644;
-// A FIFO or a device under the name must neither hang nor become the terminal.
+// A FIFO must not block the open, and a terminal must not become the controlling one.
 constexpr int kOpenFlags = O_WRONLY | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY | O_CLOEXEC;
 
-// Creating and opening are two steps because the kernel refuses O_CREAT on someone else's file in
-// a sticky directory, even where it may be written.
+// Two steps, because the kernel may refuse O_CREAT on another user's file in a sticky directory,
+// even one that may be written (fs.protected_regular).
 int openOrCreate(const char *path) {
   const int fd = open(path, kOpenFlags | O_CREAT | O_EXCL, kNewFileMode);
   return fd < 0 && errno == EEXIST ? open(path, kOpenFlags) : fd;
@@ -23,7 +23,7 @@ int openOrCreate(const char *path) {
 
 }  // namespace
 
-// A look that failed says nothing: what may be there must not be taken for missing and made anew.
+// A file that stat cannot examine may exist: it must not be taken for missing and made anew.
 int QLIBCFileExist(const char *szPath) {
   struct stat status;
   if (szPath == nullptr) {

@@ -9,7 +9,7 @@
 
 namespace zelo {
 
-// Reads a regular file; a link is refused, for a change would replace the link and not the file.
+// Reads a regular file. A link is refused, as a change would replace the link and not the file.
 // 0, or -1 (0x0900, 0x0B00).
 int readLineFile(const std::string &path, FileContents *file);
 
@@ -22,7 +22,7 @@ struct LineRange {
   bool found;
 };
 
-// The first line that holds the key, which must not be empty.
+// The first line that contains the key, which must not be empty.
 LineRange findLine(const std::string &text, std::string_view key) noexcept;
 
 // Appends a line, also to a text whose last line has no line feed.

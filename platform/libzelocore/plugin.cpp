@@ -1,4 +1,4 @@
-// Plugins: programs that root installed to be told of a change.
+// Plugins: programs that root installed, run before and after a change.
 #include <dirent.h>
 #include <fcntl.h>
 #include <poll.h>
@@ -21,7 +21,7 @@
 #include "child.h"
 #include "support.h"
 
-// glibc 2.36 forgets to say so itself.
+// The header of glibc 2.36 lacks the extern "C".
 extern "C" {
 #include <sys/pidfd.h>
 }
@@ -68,13 +68,13 @@ void clearWords(void **words) noexcept {
   words[kWordContext] = words[kWordMark] = words[kWordReserved] = nullptr;
 }
 
-// One name, not a way out of the plugins' directory.
+// A single path component, which cannot lead out of the plugins' directory.
 bool isPluginName(const char *name) noexcept {
   const std::string_view text = name != nullptr ? name : "";
   return !text.empty() && text.front() != '.' && text.find('/') == std::string_view::npos;
 }
 
-// A variable's name. PATH and what the dynamic linker obeys stay ours.
+// The name of an environment variable, but not PATH or one of the dynamic linker's.
 bool isArgumentKey(std::string_view key) noexcept {
   constexpr std::string_view kLetters = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz_";
   constexpr std::string_view kDigits = "0123456789";
@@ -136,8 +136,7 @@ int findPlugins(const std::string &directory, std::vector<std::string> *paths) {
 
 // ---- running them ----
 
-// Without a descriptor to wait on, which takes a full table, the child is asked after at this
-// pace.
+// The polling interval where no pidfd can be opened, as with a full descriptor table.
 constexpr auto kAskingPause = std::chrono::milliseconds(10);
 
 bool hasEnded(pid_t pid) noexcept {
@@ -193,8 +192,8 @@ bool runPlugin(const std::string &path, const Context &context, const char *stag
   const std::vector<char *> envp = pointers(variables);
 
   zelo::Launch launch;
-  // A group of its own, so that what it started can be ended with it. Its output goes nowhere: the
-  // caller's may be an answer to a browser.
+  // A process group of its own, so that what it started can be killed with it. Its output is
+  // discarded: the caller's may be an answer to a browser.
   launch.inOwnGroup();
   launch.open(STDIN_FILENO, "/dev/null", O_RDONLY);
   launch.open(STDOUT_FILENO, "/dev/null", O_WRONLY);

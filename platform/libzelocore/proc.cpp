@@ -1,4 +1,4 @@
-// Processes: running a program, leaving a child to itself, and telling whether a process lives.
+// Processes: running a program, forking a detached child, and whether a process is alive.
 #include <fcntl.h>
 #include <signal.h>
 #include <sys/types.h>
@@ -15,7 +15,7 @@
 
 namespace {
 
-// With the program itself; more is a list whose end was forgotten.
+// With the program itself. A longer list most likely lacks its end.
 constexpr size_t kMostArguments = 256;
 
 int runAndWait(const char *program, char *const *argv) noexcept {
@@ -29,9 +29,8 @@ int runAndWait(const char *program, char *const *argv) noexcept {
   return zelo::exitCode(status);
 }
 
-// In the process between: forks the one that stays and tells the caller how it went, through the
-// pipe because an exit status is lost on a caller that ignores SIGCHLD. Returns in the process
-// that stays only.
+// In the intermediate process: forks the detached child and reports success to the caller, through
+// the pipe, because a caller that ignores SIGCHLD gets no exit status. Returns in the child only.
 void forkAndLeave(int report) noexcept {
   const pid_t pid = fork();
   if (pid == 0) {
@@ -39,7 +38,7 @@ void forkAndLeave(int report) noexcept {
   }
   const char forked = pid > 0 ? 1 : 0;
   const ssize_t written = write(report, &forked, sizeof forked);
-  // Not exit: the buffers and exit handlers are the caller's.
+  // Not exit, which would run the caller's exit handlers and write its buffers.
   _exit(written == sizeof forked ? EXIT_SUCCESS : EXIT_FAILURE);
 }
 
@@ -58,8 +57,8 @@ bool exists(pid_t pid) noexcept {
 
 enum class Life { kUnknown, kAlive, kDead };
 
-// As the kernel's status page of the process tells it: the letter of its state, and whether the
-// number is that of a process and not of one of its threads.
+// From /proc/PID/status: the letter of its state, and whether the number is that of a process and
+// not of one of its threads.
 Life lifeOnStatusPage(pid_t pid) noexcept {
   constexpr size_t kRoom = 512;  // both lines are among the first
   char path[sizeof "/proc//status" + 3 * sizeof pid];
@@ -118,7 +117,7 @@ int QLIBCProcForkChildNoWait(void) {
     forkAndLeave(writing.get());
     return 0;
   }
-  // Or the end of the pipe would never be seen.
+  // Otherwise the read would never see the end of the pipe.
   writing.close();
   if (between < 0 || !reportsSuccess(reading.get())) {
     if (between > 0) {
@@ -126,7 +125,7 @@ int QLIBCProcForkChildNoWait(void) {
     }
     return zelo::fail(QLIBC_ERR_SYSTEM);
   }
-  // Fails where the caller's settings had it reaped already, which serves too.
+  // Fails where the caller ignores SIGCHLD and the kernel has reaped the child, which is as good.
   zelo::waitForChild(between, nullptr);
   return 1;
 }
@@ -136,6 +135,6 @@ int QLIBCProcAlive(pid_t pid) {
     return 0;
   }
   const Life life = lifeOnStatusPage(pid);
-  // Without a page it has just ended, or it is hidden from us.
+  // Without a readable status it has just ended, or /proc hides it from us.
   return life == Life::kAlive || (life == Life::kUnknown && exists(pid)) ? 1 : 0;
 }

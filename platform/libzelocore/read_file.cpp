@@ -8,7 +8,7 @@
 namespace zelo {
 namespace {
 
-// Far above any file of the platform, and below what would exhaust the machine.
+// Far above any file of the platform.
 constexpr off_t kMostFileBytes = off_t{1} << 30;
 
 bool sameTime(const timespec &a, const timespec &b) noexcept {
@@ -19,7 +19,7 @@ bool sameTime(const timespec &a, const timespec &b) noexcept {
 
 bool readAll(int fd, size_t expected, std::string *contents) {
   constexpr size_t kLeastStep = 4096;
-  contents->resize(expected + 1);  // the one more sees the end without another step
+  contents->resize(expected + 1);  // one byte more, so that the end is seen without growing
   for (size_t size = 0;;) {
     if (size == contents->size()) {
       contents->resize(size + size / 2 + kLeastStep);
@@ -45,7 +45,7 @@ bool sameContents(const struct stat &a, const struct stat &b) noexcept {
 }
 
 int readFile(const std::string &path, int flags, FileContents *file, SourceLocation where) {
-  // Not blocking, for a FIFO would hang the open.
+  // O_NONBLOCK, as opening a FIFO would block.
   const Descriptor opened(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | flags));
   if (!opened.valid()) {
     return fail(QLIBC_ERR_OPEN, where);

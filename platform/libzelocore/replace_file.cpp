@@ -14,7 +14,7 @@ namespace {
 constexpr mode_t kNewFileMode = 0644;
 constexpr mode_t kModeBits = 07777;
 
-// The file being written; removed unless it took its final name.
+// The file being written; removed unless it was renamed.
 class Temporary {
  public:
   explicit Temporary(const std::string &beside)
@@ -60,7 +60,7 @@ bool writeAll(int fd, std::string_view contents) noexcept {
   return true;
 }
 
-// The mask can only be read by setting it; the stricter one stands for the moment in between.
+// The umask can only be read by setting it; a strict one is set for that moment.
 mode_t currentMask() noexcept {
   constexpr mode_t kStrict = 0077;
   const mode_t mask = umask(kStrict);
@@ -68,7 +68,7 @@ mode_t currentMask() noexcept {
   return mask;
 }
 
-// The owner goes first: changing it clears mode bits.
+// The owner is set first: changing it clears mode bits.
 bool takeOver(int fd, const struct stat *old) noexcept {
   if (old == nullptr) {
     return fchmod(fd, kNewFileMode & ~currentMask()) == 0;

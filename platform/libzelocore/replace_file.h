@@ -1,4 +1,4 @@
-// Replacing a file as a whole, so that nobody ever sees half of it.
+// Replacing a file as a whole, so that no reader sees a part of it.
 #ifndef ZELOCORE_REPLACE_FILE_H
 #define ZELOCORE_REPLACE_FILE_H
 

@@ -1,8 +1,8 @@
 // Section files: reading them while others copy over them, and changing them.
 //
 // A list of n sections is one enumeration and n reads. The last file that was read is therefore
-// kept with an index of its sections, and each call costs one stat and one look-up for as long as
-// the file is the same.
+// cached with an index of its sections. While the file is the same, a call costs one stat and one
+// look-up.
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <time.h>
@@ -29,13 +29,12 @@ constexpr int64_t kNanosecond = 1;
 constexpr int64_t kMillisecond = 1'000'000 * kNanosecond;
 constexpr int64_t kSecond = 1000 * kMillisecond;
 
-// A copy in progress: one that is not done a second after its last write has lost its writer.
+// For how long after its last write a file may be a copy in progress.
 constexpr int64_t kCopyInProgress = kSecond;
 constexpr int64_t kPause = 4 * kMillisecond;
 constexpr int kMostPauses = kCopyInProgress / kPause;
 
-// Time stamps without nanoseconds come from a file system that counts whole seconds, or pairs of
-// them.
+// Time stamps without nanoseconds come from a file system that counts in steps of 1 or 2 s.
 constexpr int64_t kCoarseStamp = 2 * kSecond;
 // Kernel clocks differ by a tick or two among themselves; this is far more.
 constexpr int64_t kClockSlack = 2 * kSecond;
@@ -64,16 +63,15 @@ bool isSameFile(const CachedFile &cached, const std::string_view path,
   return cached.path == path && sameContents(cached.status, status);
 }
 
-// Equal stamps alone do not say that the file still holds what was read: stamps advance by clock
-// ticks, and a change in the tick of the last one leaves the same. The stamp must lie outside the
-// time from the reading until now, in which such a change would be stamped:
+// Equal time stamps alone do not prove that the file is unchanged: stamps advance by clock ticks,
+// and a change within the tick of the last one has the same stamp. A change since the reading has
+// a stamp between that time and now, so the file's stamp must lie outside of these:
 //
-// - before it, which is usual as soon as a tick has gone by; - or well after now, when the clock
-// was set back since the file was written. No change made now can carry a stamp that is still to
-// come, so that the file need not be read at every call until the clock has caught up.
+// - before them, as it usually does one tick after the last change;
+// - or well after now, when the clock was set back since the file was written. Then the file need
+//   not be read at every call until the clock has caught up.
 //
-// A clock that went back since the reading says nothing; the file is read again once, by the new
-// time.
+// When the clock was set back since the reading, nothing is proved and the file is read once more.
 bool stampsTell(const CachedFile &cached, const struct stat &status) noexcept {
   const int64_t stamp = nanoseconds(status.st_ctim);
   const int64_t granularity = status.st_ctim.tv_nsec == 0 ? kCoarseStamp : 0;
@@ -89,8 +87,8 @@ std::unique_ptr<CachedFile> &keptFile() {
   return cache;
 }
 
-// Only the change time is asked: every write sets it, and nobody can forge it. One in the future
-// tells nothing of the file's age, and does not wait.
+// By the change time, which every write sets and no caller can set. When it lies in the future,
+// the age is unknown and no reader waits.
 bool isYoung(const struct stat &status) noexcept {
   const int64_t age = nowBy(CLOCK_REALTIME) - nanoseconds(status.st_ctim);
   return -kCopyInProgress < age && age < kCopyInProgress;
@@ -129,8 +127,8 @@ std::unique_ptr<CachedFile> load(const char *path) {
   }
 }
 
-// In the tick of its last change a file is read at every call. That it still holds the same is
-// found sooner than where its sections lie.
+// A file is read at every call within the tick of its last change. Comparing its text is faster
+// than indexing it again.
 bool readsTheSame(CachedFile &cached) {
   const int64_t opened = nowBy(CLOCK_REALTIME_COARSE);
   FileContents read;
@@ -156,7 +154,7 @@ const SectionText *current(const char *path) {
     return nullptr;
   }
   if (cache == nullptr || !isCurrent(*cache, path, status)) {
-    cache.reset();  // first, so that two large files are never held at once
+    cache.reset();  // first, so that the old text takes no memory while the new one is loaded
     cache = load(path);
   }
   return cache == nullptr ? nullptr : &cache->text;
@@ -164,14 +162,14 @@ const SectionText *current(const char *path) {
 
 // ---- writing ----
 
-// A file that is about to be changed. Its writer works on a copy of its own, so nobody is waited
-// for, and it leaves the index of the readers' file alone.
+// A file that is about to be changed: read once, without waiting for a copy in progress, and kept
+// out of the readers' cache.
 struct Original {
   struct stat status;
   std::unique_ptr<const SectionText> text;
 };
 
-// A link is refused, for the change would replace the link and not the file. 0, or -1 (0x0900,
+// A link is refused, as the change would replace the link and not the file. 0, or -1 (0x0900,
 // 0x0B00).
 int readOriginal(const char *path, Original *original) {
   FileContents read;
@@ -186,7 +184,7 @@ int readOriginal(const char *path, Original *original) {
   return 0;
 }
 
-// What the caller asked for by flags that were checked.
+// For flags that were checked.
 Durability durabilityOf(int flags) noexcept {
   return (flags & QLIBC_FILE_SYNC) != 0 ? Durability::kSynced : Durability::kNone;
 }

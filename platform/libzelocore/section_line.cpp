@@ -23,7 +23,7 @@ bool hasBlankEdge(std::string_view text) noexcept {
   return isBlank(text.front()) || isBlank(text.back());
 }
 
-// A line with a bracket in front that names no section is no key either.
+// A line that begins with a bracket is no key line, even where it names no section.
 bool isNoKeyLine(std::string_view trimmed) noexcept {
   return isCommentOrEmpty(trimmed) || trimmed.front() == '[';
 }
@@ -62,9 +62,8 @@ void appendQuoted(std::string &out, std::string_view value) {
   out.push_back('"');
 }
 
-// The byte that the escape at the front of `text` stands for, which is removed. False, with
-// nothing removed, for anything that is not an escape: it stands as it is then, and so does an
-// escaped zero, which no text can hold.
+// Takes the escape at the front of `text`. False, with nothing taken, when there is none, or one
+// for a zero byte, which no text can contain: the backslash then stands for itself.
 bool takeEscape(std::string_view &text, char *byte) noexcept {
   constexpr size_t kHexSize = 4;  // \xNN
   if (text.size() < 2) {
@@ -104,17 +103,17 @@ bool unquote(std::string_view text, std::string &value) {
   return !text.empty();
 }
 
-// A text for C ends at its first zero byte.
+// Callers read zero-terminated texts, which end at the first zero byte.
 std::string_view upToZero(std::string_view text) noexcept {
   return text.substr(0, text.find('\0'));
 }
 
 struct KeyLine {
   std::string_view key;
-  std::string_view value;  // as it stands there
+  std::string_view value;  // not unquoted
 };
 
-// No key for a line that gives none.
+// The key is empty for a line without one.
 KeyLine parseKeyLine(std::string_view line) noexcept {
   const std::string_view trimmed = trim(line);
   const size_t equals = trimmed.find('=');
@@ -124,7 +123,7 @@ KeyLine parseKeyLine(std::string_view line) noexcept {
   return {trim(trimmed.substr(0, equals)), trimLeft(trimmed.substr(equals + 1))};
 }
 
-// As in a section with neither escapes nor zero bytes.
+// For a section with neither backslashes nor zero bytes.
 void readPlainLine(const KeyLine &line, QLIBC_SZHASH &hash) {
   const bool quoted = line.value.starts_with('"');
   const size_t quote = quoted ? line.value.find('"', 1) : line.value.size();
@@ -183,7 +182,7 @@ bool parseSectionLine(std::string_view trimmed, std::string_view *name) noexcept
   return !name->empty();
 }
 
-// One look over the section spares two at each of its lines.
+// Searching the section once for backslashes and zero bytes is faster than searching each line.
 void readKeys(std::string_view body, QLIBC_SZHASH &hash) {
   const bool plain =
       body.find('\\') == std::string_view::npos && body.find('\0') == std::string_view::npos;

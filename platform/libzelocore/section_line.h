@@ -1,4 +1,4 @@
-// The lines of a section file: what they say, and how a section is written.
+// The lines of a section file: reading them, and writing a section.
 #ifndef ZELOCORE_SECTION_LINE_H
 #define ZELOCORE_SECTION_LINE_H
 
@@ -35,18 +35,18 @@ size_t lineEnd(std::string_view text, size_t from) noexcept;
 // The line that lies from `begin` to `end`, without its line feed.
 std::string_view lineAt(std::string_view text, size_t begin, size_t end) noexcept;
 
-// Can stand between the brackets and be read back.
+// Whether a name can be written between brackets and read back.
 bool isSectionName(std::string_view name) noexcept;
-// Can stand before the equals sign and be read back.
+// Whether a key can be written before the equals sign and read back.
 bool isSectionKey(std::string_view key) noexcept;
 
 bool isCommentOrEmpty(std::string_view trimmed) noexcept;
-// False for a line that gives no name: it is an ordinary line then.
+// False for a line that gives no name, which is then an ordinary line.
 bool parseSectionLine(std::string_view trimmed, std::string_view *name) noexcept;
-// Sets every key of the lines behind the section's name. A line that gives none is passed over.
+// Sets every key of the lines after the section's name. A line without one is skipped.
 void readKeys(std::string_view body, QLIBC_SZHASH &hash);
 
-// The lines of a section: its name, and all keys in the order of the alphabet.
+// The lines of a section: its name, and all keys in byte order.
 std::string sectionOf(std::string_view name, const QLIBC_SZHASH &hash);
 
 }  // namespace zelo

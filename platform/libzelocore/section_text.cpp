@@ -11,8 +11,8 @@ SectionText::SectionText(std::string contents) : contents_(std::move(contents)) 
   form_ = judge();
 }
 
-// Brackets are rare beside bytes, so the search is for them, and whether one begins its line is
-// looked up backwards.
+// Brackets are rare, so the text is searched for them, and each is checked backwards for whether
+// it begins its line.
 void SectionText::indexSections() {
   const std::string_view text = contents_;
   for (size_t at = text.find('[', start_); at != std::string_view::npos;) {
@@ -72,8 +72,8 @@ void SectionText::read(const Section &section, QLIBC_SZHASH &hash) const {
   readKeys(std::string_view(contents_).substr(section.body, section.end - section.body), hash);
 }
 
-// Comments and blank lines that stand right before the next section are about that one, and stay
-// when this one is replaced or removed.
+// Comments and blank lines right before the next section belong to that one, and stay when this
+// one is replaced or removed.
 size_t SectionText::endOfReplaced(const Section &section) const noexcept {
   const std::string_view text = contents_;
   size_t end = section.body;
@@ -87,7 +87,7 @@ size_t SectionText::endOfReplaced(const Section &section) const noexcept {
   return end;
 }
 
-// The old trailer is the one line that is never kept. A last line without a line feed gets one.
+// Appends that part of the old text without its trailer. A last line without a line feed gets one.
 void SectionText::keep(std::string *changed, size_t begin, size_t end) const {
   const std::string_view text = contents_;
   const size_t trailerBegin = std::clamp(trailer_ ? trailer_->begin : end, begin, end);
@@ -99,7 +99,8 @@ void SectionText::keep(std::string *changed, size_t begin, size_t end) const {
   }
 }
 
-// The text with other lines between `begin` and `end`, of so many sections.
+// The text with `made` in place of what is between `begin` and `end`, and the trailer for so many
+// sections.
 std::string SectionText::replaced(size_t begin, size_t end, std::string_view made,
                                   size_t sections) const {
   std::string changed;

@@ -1,5 +1,5 @@
-// The text of a section file: where its sections lie, what they hold, and the text of a changed
-// file. Knows nothing of files.
+// The text of a section file: its sections, their keys, and the text of a changed file. No file is
+// read or written here.
 #ifndef ZELOCORE_SECTION_TEXT_H
 #define ZELOCORE_SECTION_TEXT_H
 
@@ -15,10 +15,10 @@
 
 namespace zelo {
 
-// What header and trailer say of a text.
+// What the header and the trailer tell about a text.
 enum class SectionForm {
   kEmpty,   // no bytes
-  kPlain,   // no header: never written by this library
+  kPlain,   // no header: not as this library writes it
   kSealed,  // header, and a trailer that agrees
   kEdited,  // header, but the trailer disagrees or something follows it
   kCutOff,  // header, or the beginning of one, without a trailer
@@ -39,7 +39,7 @@ class SectionText {
   SectionText &operator=(const SectionText &) = delete;
 
   std::string_view contents() const noexcept { return contents_; }
-  // What does not depend on the checksum, which takes as long as all else.
+  // Does not compute the checksum, which takes as long as all the rest.
   bool isCutOff() const noexcept { return form_ == SectionForm::kCutOff; }
   SectionForm form() const noexcept;
   const std::vector<Section> &sections() const noexcept { return sections_; }
@@ -65,7 +65,7 @@ class SectionText {
   std::optional<Trailer> trailer_;
   std::vector<Section> sections_;
   std::unordered_map<std::string_view, size_t> firstOfName_;  // index of the section
-  SectionForm form_ = SectionForm::kEmpty;                    // kSealed whatever the checksum is
+  SectionForm form_ = SectionForm::kEmpty;                    // kSealed whatever the checksum
 };
 
 }  // namespace zelo

@@ -16,12 +16,12 @@ inline constexpr std::string_view kHeader = "# zelo section file\n";
 struct Trailer {
   size_t begin;  // of its line
   size_t end;
-  uint64_t sections;  // as the file says, on every processor
-  uint64_t checksum;  // of all that stands before it
+  uint64_t sections;  // as written in the file
+  uint64_t checksum;  // of all bytes before it
 };
 
-// The last one that begins at `from` or behind it. What a hand appended may follow, so any line
-// can be it.
+// The last one that begins at or after `from`. Lines appended by hand may follow it, so it need
+// not be the last line.
 std::optional<Trailer> findTrailer(std::string_view text, size_t from) noexcept;
 
 // Whether the text, of so many sections, is the one that the trailer was made for.

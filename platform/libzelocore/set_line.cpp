@@ -7,7 +7,7 @@
 namespace zelo {
 namespace {
 
-// One that spans lines could never be found in one.
+// A key with a line feed cannot be found within a line.
 bool isKey(const char *key) noexcept {
   return key != nullptr && key[0] != '\0' && std::strchr(key, '\n') == nullptr;
 }

@@ -13,7 +13,7 @@
 
 namespace zelo {
 
-// A line of the source: that of the outermost caller, where it is a default argument.
+// A line of the source. As a default argument, here() gives the line of the call.
 struct SourceLocation {
   const char *file;
   int line;
@@ -24,16 +24,16 @@ struct SourceLocation {
   }
 };
 
-// Sets the error record to the caller's own file and line; always -1, so that a failing function
-// can return the call.
+// Sets the error record, with the caller's file and line. Always -1, so that a failing function
+// can return it.
 inline int fail(int code, SourceLocation where = SourceLocation::here()) noexcept {
   const char *slash = std::strrchr(where.file, '/');
   QLIBCErrSetEx(code, slash != nullptr ? slash + 1 : where.file, where.line);
   return -1;
 }
 
-// Runs the body of an exported function. The containers throw only for want of memory (bad_alloc,
-// length_error), hence the one code.
+// Runs the body of an exported function. The containers throw only when memory is short
+// (bad_alloc, length_error), hence the one code.
 template <typename Result, typename Body>
 Result atBoundary(Result failed, Body &&body,
                   SourceLocation where = SourceLocation::here()) noexcept {
@@ -55,7 +55,7 @@ class Descriptor {
   bool valid() const noexcept { return fd_ >= 0; }
   int get() const noexcept { return fd_; }
 
-  // For writers: some file systems report a full disk only here.
+  // Writers check it: some file systems report a full disk only here.
   bool close() noexcept { return fd_ < 0 || ::close(std::exchange(fd_, -1)) == 0; }
 
  private:

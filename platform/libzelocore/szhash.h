@@ -1,5 +1,5 @@
-// The inside of a text hash, for the units that fill one or write one out without going through
-// zero-terminated texts.
+// The implementation of a text hash, for units that fill or write one without zero-terminated
+// texts.
 #ifndef ZELOCORE_SZHASH_H
 #define ZELOCORE_SZHASH_H
 
@@ -11,7 +11,7 @@
 
 #include "zelocore.h"
 
-// Most keys differ in their length, and need no comparison of texts then.
+// Most keys differ in length, so that their texts need no comparison.
 struct ShorterFirst {
   using is_transparent = void;
   bool operator()(std::string_view a, std::string_view b) const noexcept {
@@ -19,13 +19,11 @@ struct ShorterFirst {
   }
 };
 
-// Ordered: keys come from outside (members of a JSON text, say), and nobody can choose any that
-// take longer to find than others. One block of memory serves for all entries of a task, and is
-// given back when the hash is emptied.
+// A tree, since keys come from outside (members of a JSON text, say) and could be chosen to
+// collide in a hash table. Memory is taken in blocks, and freed when the hash is emptied.
 struct QLIBC_SZHASH {
  public:
-  // The texts may lie in this very hash. Throws std::bad_alloc, and leaves the hash as it was
-  // then.
+  // The texts may be of this very hash. Throws std::bad_alloc, with the hash as it was.
   void set(std::string_view key, std::string_view value);
   void clear() noexcept;
 

@@ -1,4 +1,4 @@
-// Text lists: one arena of texts and where each begins.
+// Text lists: the texts in one arena, and the offset of each.
 #include "szlist.h"
 
 #include <algorithm>
@@ -76,7 +76,7 @@ int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList) {
   QLIBC_SZLIST &list = **ppList;
   const size_t before = list.count();
   const int pieces = zelo::atBoundary(-1, [&] {
-    // A copy, since the text may be one of the list's own, which moves.
+    // A copy, since the text may be one of the list's own, whose arena moves.
     const std::string text(szText);
     size_t start = text.find_first_not_of(szSep);
     while (start != std::string::npos) {

@@ -1,4 +1,4 @@
-// The inside of a text list, for the units that append texts without a terminating zero.
+// The implementation of a text list, for units that append texts without a terminating zero.
 #ifndef ZELOCORE_SZLIST_H
 #define ZELOCORE_SZLIST_H
 
@@ -13,10 +13,9 @@ struct QLIBC_SZLIST {
  public:
   explicit QLIBC_SZLIST(size_t capacity);
 
-  // The text may lie in this very list. Throws when memory is short, and leaves the list as it was
-  // then.
+  // The text may be of this very list. Throws when memory is short, with the list as it was.
   void push(std::string_view text);
-  // Takes back what was pushed since the list had `count` texts.
+  // Removes all texts but the first `count`.
   void truncate(size_t count) noexcept;
 
   size_t count() const noexcept { return starts_.size(); }

@@ -11,8 +11,8 @@
 
 namespace {
 
-// nettle asks for room for the longest text that a run of characters could decode to, white space
-// and all. Decoding in steps needs that room only here.
+// nettle wants room as if every character were decoded, white space included. Decoding in steps
+// keeps that room small and apart from the result.
 constexpr size_t kStepCharacters = 256;
 constexpr size_t kStepBytes = BASE64_DECODE_LENGTH(kStepCharacters);
 

@@ -28,7 +28,7 @@ bool isBetween(int32_t value, int32_t most) noexcept {
   return value >= 0 && value <= most;
 }
 
-// Cron would cut the command at a '%' and feed it the rest.
+// Cron ends the command at a '%' and passes the rest to its standard input.
 bool isCommand(const char (&command)[1024]) noexcept {
   const size_t length = strnlen(command, sizeof command);
   return length > 0 && length < sizeof command &&
@@ -74,8 +74,8 @@ int addLine(const ZELO_SCHEDULE &schedule) {
 
 // ---- the daemon ----
 
-// The daemon's process, 0 when there is none. A number that stands for a group of processes, for
-// all of them or for the first must not be signalled, whoever wrote it there.
+// The daemon's process, 0 when there is none. kill() would take 0 or a negative number for a
+// process group or all processes, and 1 is init: none of them is signalled.
 pid_t processOf(const std::string &pidFile) noexcept {
   constexpr int kDecimal = 10;
   constexpr long kFirstProcess = 1;

@@ -21,9 +21,9 @@ constexpr char kDisarmed[] = "0\n";
 constexpr size_t kMostAlarmBytes = 32;
 constexpr int kDecimal = 10;
 
-// A week, and another one for a weekday that the calendar of a place skips.
+// A week, and another one for a time zone that skips a day of the calendar.
 constexpr int kDaysAhead = 14;
-// A time that summer time skips at the end of a day comes after midnight.
+// Yesterday too: a time that the change to summer time skips before midnight comes after it.
 constexpr int kDaysBefore = 1;
 constexpr int kNoon = 12;
 constexpr int kUnknownSummerTime = -1;
@@ -49,8 +49,8 @@ time_t moment(const tm &day, const ZELO_AUTOPOWER &entry, int summerTime) noexce
   return mktime(&fields);
 }
 
-// Read as summer time and as standard time, at most one of the two is right on most days, both
-// where the clocks go back, none where they go forward.
+// The time is read as summer time and as standard time. One of them fits on most days, both when
+// the clock goes back, none when it goes forward.
 time_t momentOf(const tm &day, const ZELO_AUTOPOWER &entry) noexcept {
   const time_t summer = moment(day, entry, 1);
   const time_t standard = moment(day, entry, 0);
@@ -62,7 +62,7 @@ time_t momentOf(const tm &day, const ZELO_AUTOPOWER &entry) noexcept {
   return summerFits ? summer : standard;
 }
 
-// The date that lies so many days after the other; noon is on every clock.
+// The date so many days after the other, by way of noon, which no change of the clock skips.
 bool dayAfter(const tm &today, int days, tm *day) noexcept {
   tm fields{};
   fields.tm_year = today.tm_year;
@@ -73,7 +73,7 @@ bool dayAfter(const tm &today, int days, tm *day) noexcept {
   return localTime(mktime(&fields), day);
 }
 
-// 0, with the first moment after now or without one, or -1.
+// 0, with the first moment after now in *next if there is one, or -1.
 int nextMoment(const std::vector<ZELO_AUTOPOWER> &entries, std::optional<time_t> *next) {
   tzset();  // the appliance's zone may have been changed since the process began
   const time_t now = time(nullptr);
@@ -112,7 +112,7 @@ int writeAlarm(const std::string &text) {
   return 0;
 }
 
-// The kernel shows no number when no alarm is armed. One that cannot be read is taken for armed.
+// The kernel shows no number when no alarm is set. A file that cannot be read counts as armed.
 bool isArmed() {
   const Descriptor file(open(kWakeAlarm, O_RDONLY | O_CLOEXEC));
   std::string contents;
@@ -120,13 +120,12 @@ bool isArmed() {
          std::strtoll(contents.c_str(), nullptr, kDecimal) != 0;
 }
 
-// Only an alarm that is armed is written to: a machine that cannot be woken at all, with its clock
-// read-only, has nothing to disarm.
+// Written only when an alarm is armed: the file of a machine that cannot be woken is read-only.
 int disarm() {
   return QLIBCFileExist(kWakeAlarm) == 0 || !isArmed() ? 0 : writeAlarm(kDisarmed);
 }
 
-// The kernel refuses a time while another one is armed.
+// The kernel refuses a time while another alarm is armed.
 int arm(time_t moment) {
   return writeAlarm(kDisarmed) < 0 ? -1 : writeAlarm(std::to_string(moment) + '\n');
 }

@@ -13,7 +13,7 @@ namespace {
 
 constexpr char kFile[] = "/usr/zelo/etc/power_sched.conf";
 constexpr char kTimesKey[] = "times";
-// By the number of the list.
+// By ZELO_AUTOPOWER_ON and ZELO_AUTOPOWER_OFF.
 constexpr const char *kSections[] = {"poweron", "poweroff"};
 constexpr int kMalformed = 0x4000;
 
@@ -145,8 +145,8 @@ int readPowerList(int list, std::vector<ZELO_AUTOPOWER> *entries) {
   if (read == 0) {
     return 0;
   }
-  // Every list that is written has its times, if none. Without them the line was damaged, and what
-  // it held must not be written over by a list without it.
+  // A section that this library wrote has the key, also for an empty list. Without it the file was
+  // damaged: reading it as empty would let the next change overwrite its times.
   const char *times = QLIBCSzHashGetValue(hash.get(), kTimesKey);
   return times != nullptr && parse(times, entries) ? 0 : fail(kMalformed);
 }
@@ -168,7 +168,7 @@ int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries) {
   });
 }
 
-// Who reads a list has room for as many: one more would be stored, and never come.
+// The scheduler library reads as many; it would not see one more.
 constexpr int kMostEntries = 100;
 
 int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries) {

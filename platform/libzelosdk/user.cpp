@@ -12,7 +12,7 @@
 namespace {
 
 constexpr size_t kFirstRoom = 1024;
-// No honest entry comes near; a broken directory service may ask for ever.
+// Far above any real entry; a broken directory service may ask for more without end.
 constexpr size_t kMostRoom = size_t{1} << 20;
 
 struct Freer {
@@ -21,7 +21,7 @@ struct Freer {
 template <typename T>
 using Owned = std::unique_ptr<T, Freer>;
 
-// The database says "no such user" in as many ways as it has sources.
+// getpwuid_r reports a missing user by different codes, depending on the source of the entries.
 bool meansNoSuchUser(int error) noexcept {
   return error == 0 || error == ENOENT || error == ESRCH || error == EBADF || error == EPERM;
 }
@@ -30,7 +30,7 @@ const char *textOf(const char *text) noexcept {
   return text != nullptr ? text : "";
 }
 
-// Copies the text to `*at` and moves that behind it.
+// Copies the text to `*at` and moves `*at` past it.
 char *append(char **at, const char *text) noexcept {
   char *copy = *at;
   *at = stpcpy(copy, textOf(text)) + 1;

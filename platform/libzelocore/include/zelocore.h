@@ -8,7 +8,7 @@
  *     set it. A function that succeeds does not touch the record.
  *  3. Texts handed in are copied; texts handed out belong to the object that
  *     they came from and live until that object is changed or freed.
- *  4. One thread at a time: the record and the caches are process-wide.
+ *  4. One thread at a time: the record and the file cache are process-wide.
  *  5. No C++ exception leaves the library.
  */
 #ifndef ZELOCORE_H
@@ -19,7 +19,7 @@
 #ifdef __cplusplus
 extern "C" {
 #endif
-/* What stands here leaves the library; all else is hidden. */
+/* What is declared here is exported; all else is hidden. */
 #pragma GCC visibility push(default)
 
 /* ---- error record -------------------------------------------------------- */
@@ -47,7 +47,7 @@ int QLIBCErrorGetLine(void);
 
 /* ---- text hashes ---------------------------------------------------------- */
 
-/* A text-to-text hash. Without order. */
+/* A hash from text to text. Its order is unspecified. */
 typedef struct QLIBC_SZHASH *PSZHASH;
 /* A growable list of texts. */
 typedef struct QLIBC_SZLIST *PSZLIST;
@@ -62,7 +62,7 @@ int QLIBCSzHashSetValue(PSZHASH *ppHash, const char *szKey, const char *szValue)
 /* The value of szKey, or NULL when the hash lacks it (no error is set then; a
  * null argument sets 0x0D00). Valid until the hash is changed or freed. */
 const char *QLIBCSzHashGetValue(PSZHASH pHash, const char *szKey);
-/* Removes every entry; the hash keeps its room. NULL is allowed. */
+/* Removes every entry and frees their memory. NULL is allowed. */
 void QLIBCHashRemoveAll(PSZHASH pHash);
 /* Appends every key to *ppList. Their number, or -1 (0x0D00, 0x0200). */
 int QLIBCSzHashEnumKey(PSZHASH pHash, PSZLIST *ppList);
@@ -95,17 +95,17 @@ int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList);
  *
  * A file that these functions wrote begins with a header comment and ends with
  * a trailer comment that carries the number of sections and a checksum. A
- * reader that meets a file without bytes, or one whose header has no trailer
- * or a trailer that disagrees, waits a few milliseconds and reads again while
- * the file is younger than a second: someone is copying over it. What is still
- * so then is judged by its form: a header without a trailer is a file cut off,
- * and every section call fails on it with 0x0B00; a trailer that disagrees, or
- * a file without the header, was edited by hand and is taken as it is.
+ * reader that finds an empty file, or a header without a trailer or with one
+ * that disagrees, takes it for a copy in progress while the file is younger
+ * than a second: it waits a few milliseconds and reads again. After that, a
+ * header without a trailer is a file that was cut off, and every section call
+ * fails on it with 0x0B00. A file whose trailer disagrees, or without a header,
+ * was edited by hand and is read as it is.
  *
  * A change makes a new file, with the old one's owner and mode, and renames it
- * over the old one. Only regular files are read and changed; a symbolic link
- * is followed for reading and refused (0x0900) for a change. Who changes a file
- * waits for nobody: it must be a copy of its own.
+ * over the old one. Only regular files are read and changed; a symbolic link is
+ * followed for reading and refused (0x0900) for a change. A change does not
+ * wait for a copy in progress: nobody else may write the file meanwhile.
  */
 
 /* For the functions that change a file: the change is on the disk when the call
@@ -113,12 +113,12 @@ int QLIBCStrSep(const char *szText, const char *szSep, PSZLIST *ppList);
  * half of it and never empty. */
 enum { QLIBC_FILE_SYNC = 1 };
 
-/* 0 when the path does not exist or is null, else 1: also when nobody can tell,
- * since the disk fails or a directory may not be searched. A link that leads
- * nowhere does not exist. */
+/* 0 when the path does not exist or is null, else 1, also when stat fails for
+ * another reason (an error of the disk, a directory that may not be searched).
+ * A dangling symbolic link does not exist. */
 int QLIBCFileExist(const char *szPath);
 /* Creates an empty file, or updates the times of an existing one. 0, or -1
- * (0x0D00, 0x0900). A symbolic link is not followed. A new file gets mode 0644
+ * (0x0D00, 0x0900). A symbolic link is not followed. A new file has mode 0644
  * at most. */
 int QLIBCFileTouch(const char *szPath);
 /* Appends the name of every section to *ppList, in file order. Their number,
@@ -129,12 +129,13 @@ int QLIBCFileEnumSection(const char *szPath, PSZLIST *ppList);
  * sections with the same name the first is meant. */
 int QLIBCFileGetSection(const char *szPath, const char *szSection, PSZHASH *ppHash);
 /* Replaces the whole content of an existing section by the hash, in place; the
- * other sections keep every byte, and so do comments and blank lines right before
- * the next one. 1 when replaced, 0 when there is no such section (nothing is
- * written), -1 on failure (0x0D00, 0x0900 also when there is no file, 0x0B00,
- * 0x2800, 0x0200; the file is as it was). The flags are 0 or QLIBC_FILE_SYNC, `reserved` must be 0.
- * A key must not be empty, begin with `[`, `#` or `;`, begin or end with a blank, or hold `=` or a
- * control byte (0x0D00). */
+ * other sections keep every byte, and so do comments and blank lines right
+ * before the next one. 1 when replaced, 0 when there is no such section
+ * (nothing is written), -1 on failure (0x0D00, 0x0900 also when there is no
+ * file, 0x0B00, 0x2800, 0x0200; the file is as it was). The flags are 0 or
+ * QLIBC_FILE_SYNC, `reserved` must be 0. A key must not be empty, begin with
+ * `[`, `#` or `;`, begin or end with a blank, or hold `=` or a control byte
+ * (0x0D00). */
 int QLIBCFileSetSection(const char *szPath, const char *szSection, int flags, PSZHASH pHash,
                         int reserved);
 /* Appends a new section, to a new file when there is none. 1, or -1 as above
@@ -147,15 +148,15 @@ int QLIBCFileRemoveSection(const char *szPath, const char *szSection);
 
 /* ---- files of lines -------------------------------------------------------- */
 
-/* Changes the first line of any text file that holds szKey somewhere. Without a
- * value (NULL) that line is removed; with one it is replaced by the value, which
- * is appended as a new last line when no line holds the key. Every other line is
- * kept byte for byte, and so are the file's owner and mode; the change is always
- * on the disk when the call returns (QLIBC_FILE_SYNC), and a symbolic link is
- * refused. 1 when the file was changed; 0 when there is nothing to remove, also
- * when there is no file; -1 with the file as it was (0x0D00 for an empty key, a
- * value with a line feed and for flags other than 0, 0x0900 also when there is no
- * file to set a value in, 0x0B00, 0x2800, 0x0200). */
+/* Changes the first line of a text file that contains szKey. Without a value
+ * (NULL) that line is removed; with one it is replaced by the value, which is
+ * appended as a new last line when no line contains the key. Every other line
+ * is kept byte for byte, and so are the file's owner and mode; the change is
+ * always on the disk when the call returns (QLIBC_FILE_SYNC), and a symbolic
+ * link is refused. 1 when the file was changed; 0 when there is nothing to
+ * remove, also when there is no file; -1 with the file as it was (0x0D00 for an
+ * empty key, a value with a line feed and for flags other than 0, 0x0900 also
+ * when there is no file to set a value in, 0x0B00, 0x2800, 0x0200). */
 int QLIBCFileSetLine(const char *szPath, const char *szKey, const char *szValue, int flags);
 
 /* ---- processes ------------------------------------------------------------ */
@@ -177,14 +178,14 @@ int QLIBCProcAlive(pid_t pid);
 /* ---- plugins --------------------------------------------------------------
  *
  * A plugin of NAME is an executable regular file in
- * "/usr/zelo/libexec/plugins/NAME.d/" that root owns and nobody else may
- * write. Each is run, in name order, with the action name and "pre" or "post"
- * as arguments and the hook arguments as environment variables. One that runs
+ * "/usr/zelo/libexec/plugins/NAME.d/" that root owns and nobody else may write.
+ * Each is run, in name order, with the action name and "pre" or "post" as
+ * arguments and the hook arguments as environment variables. One that runs
  * longer than 30 seconds is ended, with all that it started, and counts as
  * failed. Its working directory is "/", its standard input and output are
  * "/dev/null", and its environment has a fixed PATH beside the hook arguments.
- * A directory that is not there means that there are no plugins; one that
- * others than root may write is refused.
+ * Without the directory there are no plugins; one that others than root may
+ * write is refused.
  */
 
 enum { QLIBPLUGIN_PRE = 4, QLIBPLUGIN_POST = 5 };

@@ -15,7 +15,7 @@
 #ifdef __cplusplus
 extern "C" {
 #endif
-/* What stands here leaves the library; all else is hidden. */
+/* What is declared here is exported; all else is hidden. */
 #pragma GCC visibility push(default)
 
 /* ---- users ----------------------------------------------------------------- */
@@ -75,10 +75,10 @@ typedef struct ZELO_AUTOPOWER {
   unsigned char minute;   /* 0 to 59 */
 } ZELO_AUTOPOWER;
 
-/* Copies at most `capacity` entries of a list. Their number, 0 also when nothing
- * was ever stored, or -1: 0x0D00 for a list that does not exist and bad
- * arguments, 0x4000 for a file that holds something else than power times, or
- * what reading the file left (0x0900, 0x0B00, 0x0200). */
+/* Copies at most `capacity` entries of a list. Their number, 0 also when
+ * nothing was ever stored, or -1: 0x0D00 for a list that does not exist and bad
+ * arguments, 0x4000 for a file with something else than power times, or what
+ * reading the file left (0x0900, 0x0B00, 0x0200). */
 int ZELOAutoPowerConfGet(int list, int capacity, ZELO_AUTOPOWER *pEntries);
 /* Replaces a list; the other one stays. 0, or -1: 0x0D00 for a list that does not
  * exist, a negative count, more than 100 entries and one out of its ranges, or
@@ -88,12 +88,12 @@ int ZELOAutoPowerConfSet(int list, int count, const ZELO_AUTOPOWER *pEntries);
 /* Arms the machine's real-time clock, through the kernel's file
  * "/sys/class/rtc/rtc0/wakealarm", for the first moment after now at which an
  * enabled entry of the power-on list is due; disarms it when there is none. The
- * hardware holds one moment only: call this after every change of the list (the
- * scheduler library does), and before the machine goes off.
+ * clock has one alarm: call this after every change of the list (the scheduler
+ * library does), and before the machine goes off.
  *
  * Times are local. One that the change to summer time skips is due by so much
  * later (02:30 at 03:30); one that comes twice is due the first time. The
- * real-time clock is taken to keep UTC.
+ * real-time clock is assumed to keep UTC.
  *
  * 0, also when there is nothing to arm on a machine without such a clock, or -1:
  * 0x0900 when a time is wanted and there is no such clock, or the file cannot be
@@ -123,11 +123,12 @@ typedef struct ZELO_SCHEDULE {
  * 0x2800, 0x0200. */
 int ZELOScheduleSet(const ZELO_SCHEDULE *pSchedule, int enabled);
 
-/* Makes the cron daemon take up what changed in the lines of that command. `stop`
- * is reserved and 0: runs of the command that are under way go on. `reload` 1
- * sends the daemon of "/var/run/crond.pid" a hang-up signal, 0 leaves it to find
- * the change by itself. 0, also when there is no daemon, or -1: 0x0D00, 0x2A00
- * when the daemon cannot be signalled, 0x0900 when its file cannot be read. */
+/* Makes the cron daemon reload its crontabs after the lines of that command
+ * changed. `stop` is reserved and 0: runs of the command that are under way go
+ * on. `reload` 1 sends the daemon of "/var/run/crond.pid" a hang-up signal, 0
+ * leaves it to notice the change by itself. 0, also when there is no daemon, or
+ * -1: 0x0D00, 0x2A00 when the daemon cannot be signalled, 0x0900 when its file
+ * cannot be read. */
 int ZELOUpdateCrontab(const char *szCommand, int stop, int reload);
 
 #pragma GCC visibility pop
