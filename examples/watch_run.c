@@ -11,7 +11,7 @@
 #include <zelosched.h>
 
 enum {
-  PATIENCE_IN_SECONDS = 600, /* a run that waits for another one takes its time */
+  PATIENCE_IN_SECONDS = 600, /* a run may have to wait for another one */
   LOOKS_PER_SECOND = 10
 };
 
