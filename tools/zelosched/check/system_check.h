@@ -11,6 +11,5 @@ Findings checkSharedNames();
 // Whether each line of /etc/zelosched.conf can be read.
 Findings checkSettings();
 
-// Whether a process keeps changes of tasks waiting. Takes two seconds for each lock that stays
-// held.
+// Whether a process keeps changes of tasks waiting. Takes two seconds for each lock that it holds.
 Findings checkTurns();

@@ -40,8 +40,7 @@ Task taskOf(const Json::Value &object) {
   return task;
 }
 
-// The stored task of the id, if it is the same by the rule of the library's
-// ZELOSchedTaskSaveFromJson.
+// The stored task of the id, if it is the same by the rule of ZELOSchedTaskSaveFromJson.
 Task storedOf(const ZELO_SCHED_TASK &task) {
   Task stored = findTask(task.ID);
   const bool isSame = stored != nullptr && stored->Backend == task.Backend &&

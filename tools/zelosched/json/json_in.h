@@ -17,9 +17,8 @@ std::string firstError(const std::string &errors);
 // So many tasks can be read at once.
 inline constexpr size_t kMostTasks = 10000;
 
-// Limits the memory of the parser, as a value takes far more of it than a text such as "0,". Throws
-// Failure for more values than so many tasks have, or for a zero byte, at which the parser would
-// stop.
+// Limits the memory of the parser, in which a value takes far more than a text such as "0,". Throws
+// Failure for more values than so many tasks have, or for a zero byte, where the parser would stop.
 void requireFewValues(const std::string &text);
 
 // An object or an array, as the standard has it, in UTF-8, without two members of one name. Throws

@@ -22,9 +22,8 @@ std::vector<StoredMember> storedMembersOf(const ZELO_SCHED_TASK &task);
 std::vector<std::string> lossyKeysOf(const ZELO_SCHED_TASK &task);
 
 // From the form of ZELOSchedTaskConvertToJson, whose members are JSON texts themselves, or from one
-// of plain texts and numbers, with the command as "cmd" or in Base64 as "cmd base64". Members that
-// are no key are ignored; optional keys that are missing have the defaults of the hash form. Throws
-// Failure.
+// of plain texts and numbers, with the command as "cmd" or in Base64 as "cmd base64". Unknown
+// members are ignored; missing optional keys have the defaults of the hash form. Throws Failure.
 void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task);
 
 // The objects of a text: an array, one object, or one a line. Throws Failure, also for more of them

@@ -1,5 +1,4 @@
-// The environment and the limits that cron gives to programs, so that a run by hand is like a
-// scheduled one.
+// The environment and the limits that cron gives to programs, for runs by hand.
 #pragma once
 
 #include <cstdint>

@@ -1,5 +1,4 @@
-// The sweep: records what keepers could not write into the history, and what other programs have
-// run.
+// The sweep: adds to the history what keepers could not write, and what other programs have run.
 #pragma once
 
 #include "store/task_list.h"
@@ -15,8 +14,7 @@ void sweepRuns(const TaskList &list);
 // outstanding notices, and drops what is too old. Reports what failed; returns the exit status.
 int keepHistory();
 
-// Sends the outstanding notices: of runs whose end the sweep recorded, and of missed times. Throws
-// Failure.
+// Sends the notices of runs whose end the sweep recorded, and of missed times. Throws Failure.
 void tellOfRuns();
 
 // Whether this user has the rights to read the status database and the history.

@@ -12,8 +12,8 @@ class ProcessTree {
  public:
   // Those below `root`, without it, without `spared` ones and what is below these.
   explicit ProcessTree(pid_t root, std::set<pid_t> spared = {});
-  // For a keeper: without the run's own process, but with those below it, and without the notice
-  // programs.
+  // For a keeper: without the run's own process and the notice programs, but with the processes
+  // below the former.
   ProcessTree(pid_t root, std::set<pid_t> spared, std::set<pid_t> passedOver);
 
   // Lists the processes again. Returns how many there are.

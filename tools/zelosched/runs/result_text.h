@@ -8,8 +8,7 @@
 // Of a run of the history.
 std::string resultInWords(const RunRecord &run);
 
-// Of a row of the status database: "finished", "failed with exit code 3", "killed by signal SIGKILL
-// (9)", ...
+// "finished", "failed with exit code 3", "killed by signal SIGKILL (9)", ...
 std::string resultInWords(int statusCode, const std::string &comment);
 
 // Whether the run has ended, and not well.

@@ -1,5 +1,4 @@
-// The runs that the library has recorded. The status database is only read, and not created by
-// reading it.
+// The runs that the library has recorded. The status database is only read, and not created.
 #pragma once
 
 #include <cstdint>
@@ -46,8 +45,7 @@ class RunDatabase {
   // Recorded after that one, in the order of their ids.
   std::vector<Run> after(int64_t statusId) const;
   std::optional<Run> runOfId(int64_t statusId) const;
-  // A running run for which a run of this task, or of this application, has to wait. Not that of
-  // process `pid`.
+  // A run, other than that of process `pid`, for which one of this task or application has to wait.
   std::optional<Run> inTheWayOf(std::optional<int64_t> taskId, std::optional<std::string> app,
                                 int64_t pid) const;
   // The run of a process that was recorded after `statusId`; the last one.

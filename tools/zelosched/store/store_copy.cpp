@@ -91,8 +91,7 @@ StoreCopy doubtful(const std::string &why, int tasks, bool isHeaded) {
   return {StoreCopy::kDoubtful, why, tasks, isHeaded};
 }
 
-// A copy that cannot be checked is used where there is no better one, but is never the last good
-// one.
+// A copy that cannot be checked is used where there is no better one, but not as the last good one.
 StoreCopy judgeText(const std::string &contents, int tasks) {
   try {
     const std::string anew = writtenAnew(contents);

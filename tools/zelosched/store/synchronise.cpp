@@ -13,8 +13,7 @@
 
 namespace {
 
-// A power list that cannot be read is reported at the end, and does not keep tasks from the
-// crontab.
+// A power list that cannot be read is reported at the end, after the tasks are in the crontab.
 void writeTasksOut() {
   requireTasksAreBack();
   const std::string fault = unreadableTask(TaskList(TaskList::Unreadable::kIsLeftOut));

@@ -26,9 +26,8 @@ bool isPowerListReadable(int list) {
   return ZELOAutoPowerConfGet(list, 1, &first) >= 0;
 }
 
-// The library skips a backend that fails, whose tasks must not seem to be removed. It also skips a
-// task that cannot be read, which must not keep the others from being listed; that leaves other
-// codes.
+// The library skips a backend that fails, whose tasks must not seem to be removed. It also skips an
+// unreadable task, which must not keep the others from being listed; that leaves other codes.
 bool hasBackendFailed() {
   const int code = QLIBCErrGet();
   if (code == 0) return false;

@@ -9,8 +9,7 @@ std::string installedTaskProgram();
 // The path of this program; empty when /proc cannot be read.
 std::string ownProgram();
 
-// Whether we run in a unit of the service manager, which may restrict us, and ends what we leave
-// behind.
+// Whether we run in a unit of the service manager, which may restrict us and end our children.
 bool isUnit();
 
 // Starts a program that puts itself into the background, or, within a unit, has the service manager

@@ -6,8 +6,7 @@
 #include <vector>
 
 // The text with everything escaped that a terminal would interpret or not show: control characters
-// (\n, \t, \x1b, ...), marks of writing direction, invisible characters, and bytes that are not
-// UTF-8.
+// (\n, \t, \x1b, ...), marks of writing direction, invisible characters, and invalid UTF-8.
 std::string printable(std::string_view text);
 
 // The same of several lines: line feeds and tabs stay.
