@@ -1,6 +1,6 @@
 /*
- * watch_run ID - runs a stored task now and waits for its end, as the status
- * database tells it.
+ * watch_run ID - runs a stored task now and waits for its end, which it reads from
+ * the status database.
  *
  *   cc watch_run.c $(pkg-config --cflags --libs zeloscheduler sqlite3) -o watch_run
  */

@@ -1,4 +1,4 @@
-// JSON texts: what can stand in one, and how one is written.
+// JSON texts: what one can contain, and how it is written.
 #pragma once
 
 #include <ctime>

@@ -98,7 +98,7 @@ MachineThen machineAt(const std::vector<Span> &up, time_t moment) {
                                                                      : MachineThen::kOff;
 }
 
-// Up to which moment a time that was passed over counts as missed.
+// The moment up to which a time without a run counts as missed.
 int64_t judgedUntil(const KeptDatabase &kept, int64_t now) {
   const std::optional<Boot> boot = bootOf(kept, bootId());
   const int64_t certain = boot && boot->started ? *boot->started : 0;

@@ -17,7 +17,7 @@ struct RunRequest {
   bool wantsOutput = false;
 };
 
-// A run that was started, and its keeper, which goes on whether or not anybody listens.
+// A run that was started, with the events of its keeper, which does not depend on this object.
 class StartedRun {
  public:
   // Throws Failure.

@@ -1,4 +1,4 @@
-// Ending a run that waits or goes on.
+// Ending a run that waits or is running.
 #pragma once
 
 #include <chrono>
