@@ -40,8 +40,8 @@ std::optional<Boot> bootOf(const KeptDatabase &kept, const std::string &id) {
   return Boot{query.optionalNumber(0), query.number(1), query.optionalNumber(2).has_value()};
 }
 
-// The first time in a boot that the clock is set, it was wrong before. Later, the time was changed
-// by hand, and what was due before was due.
+// The first jump of the clock in a boot means that it was wrong before. A later one is a change by
+// hand: earlier due times were right.
 void noteClock(const KeptDatabase &kept, const std::string &id, const Boot &boot, int64_t now) {
   const int64_t began = now - uptime();
   const bool hasMoved = std::abs(began - boot.began) > kClockMoved;

@@ -97,8 +97,8 @@ Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds gr
   return isOver ? Stopped::kKilled : Stopped::kNot;
 }
 
-// Then the row may be out of date: a run whose process was killed leaves one that says running, and
-// its pid may be that of another process by now, even of another run.
+// Such a row is ignored, as it may be out of date: a run whose process was killed leaves one that
+// says running, and its pid may be that of another process by now, even of another run.
 bool isInHistory(const Run &row) {
   const KeptDatabase kept(KeptDatabase::kRead);
   if (!kept.isThere()) return false;
