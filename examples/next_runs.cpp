@@ -1,7 +1,6 @@
 // next_runs - every task with the time of its next run, in the order of their names.
 //
-// The library's interface is plain C. An owner for what it hands out takes C++ a dozen lines; take
-// them as they are.
+// The library's interface is plain C. A class of a dozen lines owns what it returns; copy it.
 #include <zelosched.h>
 
 #include <iostream>

@@ -2,25 +2,24 @@
  * platform_check [--system [PLUGINS]] - calls each function of the platform that the
  * scheduler library calls, and says which contract does not hold.
  *
- *   platform_check              in a directory of its own below /tmp; nothing else is
- *                               changed, whatever the platform does of what it should not
- *   platform_check --system     as root, where nothing can be harmed, for it changes what
- *                               a machine has once: power times, the alarm of its clock, the
- *                               crontab. They are put back, also after a crash.
+ *   platform_check              in a directory of its own below /tmp; changes nothing else
+ *   platform_check --system     as root, on a test machine: changes also what a machine has
+ *                               once, that is power times, the alarm of its clock and the
+ *                               crontab. They are put back, also when a call crashes.
  *   platform_check --system /usr/zelo/libexec/plugins/platform_check.d
  *                               puts a plugin into that directory too, where this platform
  *                               looks for those of "platform_check"
  *
  * Prints one line for each contract, "ok CALL: contract" or "not ok CALL: contract", and the sum,
  * "N hold, M do not", as the last line, on standard error.
- * What crashes, hangs or exits in the calls of a group is named, and the next group goes on.
- * 0 when all hold, 1 when one does not, 2 for a wrong call, and for --system of who is not root.
+ * A group of calls that crashes, hangs or exits is reported, and the next group is run.
+ * Exits with 0 when all hold, 1 when one does not, 2 for wrong arguments or missing rights.
  *
  *   cc platform_check.c -I/opt/appliance/include -I../platform/libzelocore/include \
  *     -I../platform/libzelosdk/include -L/opt/appliance/lib -lzelosdk -lzelocore \
  *     -Wl,-rpath,/opt/appliance/lib -o platform_check
  *
- * On armhf with -D_FILE_OFFSET_BITS=64 -D_TIME_BITS=64 too.
+ * On armhf add -D_FILE_OFFSET_BITS=64 -D_TIME_BITS=64.
  */
 #include <dirent.h>
 #include <errno.h>
@@ -37,18 +36,18 @@
 #include <zelocore.h>
 #include <zelosdk.h>
 
-/* A group that came to its end exits so: a status that no call of a platform has a reason for. */
+/* HELD and FAILED: exit statuses of a complete group, which no platform call should exit with. */
 enum { USAGE = 2, HELD = 87, FAILED = 88 };
 enum { PATIENCE = 60, ROOM = 65536, CONTRACT_ROOM = 128, ENTRIES = 100, KEPT = 1000, GUARD = 0x5a };
 enum { LONG = 16384, LIMIT = 5, SOMEONE = 1, MANY = 1000 };
 
-/* What the groups, each a process of its own, leave to this one. */
+/* Shared memory for the results of the groups, each of which is a child process. */
 static struct {
   char current[CONTRACT_ROOM]; /* the contract that is being checked */
   int sums[2];                 /* of the contracts that do not hold, and of those that do */
   int worked;                  /* in a child: 1, or -1 when not; 0 as long as it has not ended */
   int kept[4];                 /* by a child: descriptors, directory, session, umask */
-  int counts[2];               /* the power times of before, -1 while nothing was changed */
+  int counts[2];               /* of the power times before; -1 when they are not known */
   ZELO_AUTOPOWER times[2][KEPT];
 } * shared;
 
@@ -63,7 +62,7 @@ static void contract(int holds) {
   ++shared->sums[holds];
 }
 
-/* What does not hold, and why. 1, the number of faults. */
+/* Reports a fault. Returns 1, the number of faults. */
 static int fault(const char *what, const char *why) {
   printf("not ok %s%s\n", what, why);
   fflush(stdout);
@@ -71,7 +70,7 @@ static int fault(const char *what, const char *why) {
   return 1;
 }
 
-/* Noted before the call is made, in case it does not come back. */
+/* The contract is noted before the call, which may not return. */
 #define CONTRACT(call, what, condition)                              \
   do {                                                               \
     snprintf(shared->current, CONTRACT_ROOM, "%s: %s", #call, what); \
@@ -99,7 +98,7 @@ static void write_text(const char *path, const char *text) {
   }
 }
 
-/* Of a file of any length, with a zero byte behind it; null without one. */
+/* The contents of a file, with a zero byte behind them; null when it cannot be read. */
 static char *whole_text(const char *path, struct stat *status) {
   FILE *stream = fopen(path, "re");
   char *text = NULL;
@@ -115,7 +114,7 @@ static char *whole_text(const char *path, struct stat *status) {
   return text;
 }
 
-/* Whether bytes that no call may write to are as they were set. */
+/* Whether guard bytes, which no call may write to, are unchanged. */
 static int untouched(const void *bytes, size_t count) {
   size_t i = 0;
   while (i < count && ((const unsigned char *)bytes)[i] == GUARD) ++i;
@@ -133,7 +132,7 @@ static const char *read_text(const char *path) {
   return text;
 }
 
-/* As long as the command of a task gets in the store. */
+/* As long as the command of a task can be in the store. */
 static const char *long_text(void) {
   static char text[LONG + 1];
   memset(text, 'x', LONG);
@@ -324,7 +323,7 @@ static void give_file_away(void) {
   is_someones = chown(file, SOMEONE, SOMEONE) == 0;
 }
 
-/* After a change, if it was one. */
+/* For use after a call that should have changed the file; `changed`: it did. */
 #define KEEPS_OWNER_AND_MODE(call, changed)                                         \
   do {                                                                              \
     struct stat is_now;                                                             \
@@ -394,7 +393,7 @@ static void check_changing(void) {
   QLIBCSzHashFree(two);
 }
 
-/* As a copy is whose writer was killed. */
+/* A file that is cut off, as when its writer was killed. */
 static void check_cut_off(void) {
   PSZHASH hash = hash_with("key", "value");
   struct stat whole;
@@ -443,7 +442,7 @@ static void check_many_sections(void) {
   CONTRACT(QLIBCFileAddSection, "there is room for a thousand", many_sections() == MANY);
 }
 
-/* The sections of a file of which the first bytes are there, and the others a moment later. */
+/* The sections of a file of which some bytes are there, and the others come a moment later. */
 static const char *copied_sections(const char *second, int parts) {
   PSZHASH hash = hash_with("key", "value");
   const char *found = NULL;
@@ -477,7 +476,7 @@ static void check_copied(void) {
            is(copied_sections("empty", 0), "1 empty "));
 }
 
-/* Who changes a file through a link would change another one, or take the link away. */
+/* A change through a symbolic link would change another file, or replace the link. */
 static void check_links(void) {
   PSZHASH one = hash_with("key", "one");
   PSZHASH two = hash_with("key", "two");
@@ -553,7 +552,7 @@ static void check_exec(void) {
   signal(SIGCHLD, SIG_DFL);
 }
 
-/* What a child finds that is not the caller's alone. */
+/* Records in the child what it has inherited. */
 static void note_what_is_kept(int descriptor, pid_t session) {
   struct stat here;
   struct stat ours;
@@ -682,7 +681,7 @@ static const struct {
              {"ZELOUserGetByUID", user_works},
              {"ZELOEncodingBase64Decode", decoding_works}};
 
-/* 1 when it does in the child that this makes, before the time is over. */
+/* Whether the call works in a forked child, within the time limit. */
 static int works_in_child(int (*works)(void), int (*forks)(void)) {
   int result = 0;
   int i = 0;
@@ -721,7 +720,7 @@ static void check_forked(void) {
   unlink(file);
 }
 
-/* As root, with the effective id of another, as a run has who may not read all that root may. */
+/* As root with another user's effective id, which may not read all that root may, as in a run. */
 static void check_other_user(void) {
   const int user = user_works();
   const int alive = QLIBCProcAlive(getppid()) == 1;
@@ -830,10 +829,9 @@ static void check_base64(void) {
                 untouched(back + 4, sizeof back - 4)));
 }
 
-/* ---- --system: what a machine has once ---------------------------------------------------------
- */
+/* ---- --system: what a machine has once ------------------------------------------------------- */
 
-/* Into what the next group finds, also when this one crashes. */
+/* Into shared memory, where the next group finds them also when this one crashes. */
 static void keep_power_times(void) {
   int got[2];
   int list = 0;
@@ -923,7 +921,7 @@ static int crontab_is_as_before(void) {
   return same;
 }
 
-/* As a whole, and without the platform. 0 or 1, the number of faults. */
+/* Atomically, and without the platform. Returns the number of faults. */
 static int put_back_crontab(void) {
   static const char next[] = "/etc/crontab.platform_check";
   int out = -1;
@@ -943,7 +941,7 @@ static int compare_lines(const void *one, const void *two) {
   return strcmp(*(char *const *)one, *(char *const *)two);
 }
 
-/* The lines of the text, which is cut into them, sorted. */
+/* The sorted lines of the text, which is cut into them. */
 static char **sorted_lines(char *text, size_t *count) {
   const size_t length = strlen(text);
   char **lines = calloc(length + 1, sizeof *lines);
@@ -959,8 +957,8 @@ static char **sorted_lines(char *text, size_t *count) {
   return lines;
 }
 
-/* How many lines the crontab has that it had not before, wherever they are; -1 when one of before
- * is gone, or a new one has not the command. The first of them into `first`. */
+/* How many lines were added to the crontab; -1 when an old one is gone, or a new one has not the
+ * command. The first new one is copied to `first`. */
 static int lines_added(char *first, size_t room) {
   struct stat status;
   char *text = whole_text(crontab, &status);
@@ -989,7 +987,7 @@ static int lines_added(char *first, size_t room) {
   return added;
 }
 
-/* Of a number or a name, 7 also for Sunday; -1 for what is neither. `*at` is behind it then. */
+/* A weekday by number (0 and 7: Sunday) or by name; -1 for neither. `*at` is moved behind it. */
 static int weekday(const char **at) {
   static const char names[][4] = {"sun", "mon", "tue", "wed", "thu", "fri", "sat"};
   int day = 0;
@@ -1081,9 +1079,7 @@ static void check_crontab(void) {
            lines_added(line, sizeof line) == ENTRIES);
 }
 
-/* ---- --system PLUGINS: a plugin that is called
- * ---------------------------------------------------
- */
+/* ---- --system PLUGINS: a plugin that is called ----------------------------------------------- */
 
 static char plugin[300]; /* none without a directory to put it into */
 static char called[300];
@@ -1102,7 +1098,7 @@ static void check_called_plugins(void) {
   QLIBPluginExit(context);
 }
 
-/* Makes each directory of the path that is not there, and what ends there says which. */
+/* Makes the missing directories of the path. Returns the length of the part that was there. */
 static size_t make_directories(char *path) {
   size_t there = 0;
   char *slash = path;
@@ -1119,11 +1115,9 @@ static void remove_directories(char *path, size_t there) {
   while (strlen(path) > there && rmdir(path) == 0) *strrchr(path, '/') = '\0';
 }
 
-/* ---- all of them
- * ---------------------------------------------------------------------------------
- */
+/* ---- all of them ----------------------------------------------------------------------------- */
 
-/* Each group in a process of its own: one that crashes takes no other with it. The number of
+/* Runs a group in a child process, so that a crash does not affect others. Returns the number of
  * faults. */
 static int run(const char *name, void (*group)(void)) {
   char why[64];
@@ -1194,7 +1188,7 @@ static int run_plugins(char *plugins) {
   return faults;
 }
 
-/* Whatever a group that crashed has left there. */
+/* With all that a crashed group has left there. */
 static void remove_own_directory(void) {
   DIR *stream = opendir(directory);
   struct dirent *entry = NULL;
@@ -1250,7 +1244,7 @@ int main(int argc, char **argv) {
     perror(directory);
     return USAGE;
   }
-  /* What was changed is put back before this ends. */
+  /* Ignored, so that what was changed is put back. */
   signal(SIGINT, SIG_IGN);
   signal(SIGTERM, SIG_IGN);
   signal(SIGHUP, SIG_IGN);

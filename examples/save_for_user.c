@@ -8,7 +8,7 @@
  * A text from a browser is not handed on to ZELOSchedTaskSaveFromJson, which saves
  * it for whomever it names: for root, where its "owner" is missing or no number,
  * and over anybody's task whose id, name and app it repeats. Here each field is
- * looked at, and set on a record of our own.
+ * checked, and set on a record of our own.
  *
  *   cc save_for_user.c $(pkg-config --cflags --libs zeloscheduler) -o save_for_user
  */
@@ -21,8 +21,8 @@
 
 enum { USAGE = 2, DECIMAL = 10 };
 
-/* What a user may set. The crontab takes numbers as they are, and one hour of 24
- * stops cron for everybody; a text that is longer than its field would be cut. */
+/* What a user may set. The crontab takes numbers as they are, and one hour of 24 can
+ * stop cron for everybody; a text that is longer than its field would be cut. */
 typedef struct FIELD {
   const char *key;
   unsigned long most; /* of a number; of a text, its length */
@@ -41,7 +41,7 @@ static const FIELD fields[] = {
 };
 enum { OWNER, ID, COUNT = sizeof(fields) / sizeof(fields[0]) };
 
-/* Plain decimal and nothing else: to strtoul alone "", " 0" and "-0" are the number
+/* Plain decimal and nothing else: strtoul alone reads "", " 0" and "-0" as 0, the uid
  * of root. */
 static int read_number(const char *text, unsigned long most, unsigned long *number) {
   if (strspn(text, "0123456789") != strlen(text) || text[0] == '\0') return -1;
@@ -67,8 +67,8 @@ static int read_pairs(char **pairs, const char *values[COUNT]) {
   return 0;
 }
 
-/* Each enabled task is a line of the crontab, and of one with more than 10,000 lines
- * cron ignores all: nobody may fill it. */
+/* Each enabled task is a line of the crontab, and cron ignores a crontab of more than
+ * 10,000 lines: no user may fill it. */
 enum { MOST_TASKS_OF_A_USER = 50 };
 
 static unsigned long counted_uid;
@@ -130,7 +130,7 @@ static int fill(ZELO_SCHED_TASK *task, const char *values[COUNT]) {
   return 0;
 }
 
-/* Between the look at the stored task and its change, another process can remove
+/* Between reading the stored task and changing it, another process can remove
  * it and store a new one, which may get the same id and is then overwritten: it is
  * lost, but nobody gains another one's rights, as what is saved has the user's uid.
  * A back end whose tasks nobody else changes prevents that with a lock of its own

@@ -7,7 +7,7 @@
 #include <stdlib.h>
 #include <zelosched.h>
 
-/* A filter is given the task and nothing else, hence not a variable of main. */
+/* A filter is given the task and nothing else, hence a global variable. */
 static uint32_t wanted_owner;
 
 static int is_wanted(const ZELO_SCHED_TASK *task) {

@@ -1,6 +1,6 @@
 /*
- * watch_run ID - runs a stored task now and waits for its end, as the status
- * database tells it.
+ * watch_run ID - runs a stored task now and waits for its end, which it reads from
+ * the status database.
  *
  *   cc watch_run.c $(pkg-config --cflags --libs zeloscheduler sqlite3) -o watch_run
  */
@@ -11,7 +11,7 @@
 #include <zelosched.h>
 
 enum {
-  PATIENCE_IN_SECONDS = 600, /* a run that waits for another one takes its time */
+  PATIENCE_IN_SECONDS = 600, /* a run may have to wait for another one */
   LOOKS_PER_SECOND = 10
 };
 

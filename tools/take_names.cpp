@@ -1,12 +1,12 @@
-// take-names: makes the names in /tmp that the library uses root's, for package scripts and boot
-// steps.
+// take-names: makes root the owner of the names in /tmp that the library uses, for package scripts
+// and boot steps.
 //
-//   take-names            takes those that are free or another user's
-//   take-names --anew     for a first installation: nothing that stands there can be ours, but a
-//                         store that is as the persistent copy says
-//   take-names --stand-in puts the stand-in in the place of the program that crontab lines start
+//   take-names            takes names that are free or another user's
+//   take-names --anew     for a first installation: replaces whatever has these names, but for a
+//                         store that equals the persistent copy
+//   take-names --stand-in replaces the program that crontab lines start by the stand-in
 //
-// Exits with 1 when one could not be had.
+// Exits with 1 when a name could not be taken.
 #include <unistd.h>
 
 #include <cstdio>
@@ -36,7 +36,7 @@ bool replace(const SchedSharedName &name) {
   return isReplaced;
 }
 
-// The one that is kept for the next boot is written first, so a store of ours is never ahead of it.
+// The library writes the persistent copy first, so that its store is not ahead of that copy.
 bool replaceStore() {
   const std::string kept = contentsOf(kSchedPersistentStore);
   if (!kept.empty() && schedLookAt(kSchedStore, nullptr) == SchedNameState::kOurs &&
@@ -51,7 +51,7 @@ bool said(const SchedSharedName &name, bool isTaken) {
   return isTaken;
 }
 
-// Between the two copies of a change the store is behind what is kept.
+// Under the lock, since the store is behind the persistent copy while a change is being written.
 bool takeStore(bool isAnew) {
   const StoreLock turn;
   if (!turn.isHeld()) {

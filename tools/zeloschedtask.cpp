@@ -1,7 +1,7 @@
-// zeloschedtask - cron's way into the scheduler. The lines that the library keeps in /etc/crontab
-// start it as root at a task's minutes. It decides nothing by itself: whether the task is due and
-// enabled is the library's business, since a crontab line cannot say it all (a year, for one). The
-// run is started and looked after by a process of its own (keeper/keeper.h).
+// zeloschedtask - the program that cron starts. The lines that the library keeps in /etc/crontab
+// start it as root at a task's minutes. The library checks whether the task is due and enabled,
+// since a crontab line cannot say it all (a year, for one). A process of its own starts the run and
+// waits for its end (keeper/keeper.h).
 #include <fcntl.h>
 #include <syslog.h>
 #include <unistd.h>
@@ -50,14 +50,14 @@ int usage() {
   return kExitUsage;
 }
 
-// A full disk or a closed pipe shows at the flush at the latest.
+// The flush reports a full disk or a closed pipe if the writes before it did not.
 int show(const char *text, const char *more) {
   const bool shown =
       std::fputs(text, stdout) >= 0 && std::fputs(more, stdout) >= 0 && std::fflush(stdout) == 0;
   return shown ? EXIT_SUCCESS : EXIT_FAILURE;
 }
 
-// Decimal digits with an optional minus, nothing before, between or after.
+// After the prefix: decimal digits with an optional minus, and nothing else.
 std::optional<int64_t> parseNumber(std::string_view argument, std::string_view prefix) {
   if (!argument.starts_with(prefix)) return std::nullopt;
   const std::string_view digits = argument.substr(prefix.size());
@@ -80,7 +80,7 @@ int run(const RunOrder &order) {
   return EXIT_FAILURE;
 }
 
-// A descriptor that we were given, and the command must not have.
+// A file descriptor that the caller passed. The task's command must not inherit it.
 bool takeDescriptor(std::string_view argument, std::string_view prefix, int *descriptor) {
   const std::optional<int64_t> number = parseNumber(argument, prefix);
   if (!number || *number <= STDERR_FILENO || *number > INT_MAX) return false;
@@ -105,7 +105,7 @@ bool takeOption(std::string_view argument, RunOrder *order) {
   return true;
 }
 
-// What only root may ask for follows "--now".
+// The options from "--now" on are for root alone, which main checks.
 std::optional<RunOrder> orderOf(int argc, char **argv) {
   constexpr int kFirstMore = 3;
   if (argc < kFirstMore || std::strcmp(argv[1], "--run") != 0) return std::nullopt;

@@ -13,8 +13,7 @@ export function watchAccess(changed) {
   tell();
 }
 
-// Cockpit asks what the machine's own rules ask for, mostly the password. The page is loaded anew
-// by Cockpit when the access is there.
+// Cockpit asks for what the machine requires, mostly the password. Then the page reloads.
 function askForAccess() {
   const client = cockpit.dbus(null, { bus: "internal" });
   const superuser = client.proxy("cockpit.Superuser", "/superuser");
@@ -54,7 +53,7 @@ function askForAccess() {
     superuser.Start(bridge).then(() => window.location.reload()).catch((error) => showFault(cockpit.message(error)));
   }
 
-  // The first way is sudo, which the shell takes too.
+  // The first bridge, which is usually sudo.
   superuser.wait(() => {
     const [first] = superuser.Bridges || [];
     if (first) start(first);

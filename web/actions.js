@@ -5,7 +5,7 @@ import { oneAtATime } from "./turns.js";
 import { titleOf } from "./words.js";
 import { _, format, short } from "./text.js";
 
-// The task that was shown, and no other one that has its number meanwhile.
+// The task that was shown, and no other one that has been given its number meanwhile.
 function named(task) {
   return [String(task.id), "--if-name=" + task.name];
 }
@@ -43,7 +43,7 @@ export async function stopRuns(model, task) {
   return isAgreed && attempt(() => change(["stop", ...named(task)]));
 }
 
-// Whether it is gone.
+// Whether it was removed.
 export async function removeTask(model, task) {
   const isAgreed = await confirm({
     title: format(_("Remove $0?"), short(titleOf(task))),

@@ -1,7 +1,7 @@
-// Where in the page somebody is, which the address tells, so that it can be linked.
+// The present view, which is in the address, so that it can be linked.
 const cockpit = window.cockpit;
 
-// One that cannot be read is that of the first view.
+// An address that cannot be parsed is replaced by that of the first view.
 function readable() {
   try {
     return cockpit.location;
@@ -22,7 +22,7 @@ export function go(path, options = {}) {
   cockpit.location.go(path, options);
 }
 
-// Going back does not lead to where one is now.
+// Replaces the entry of the browser's history: going back does not lead to the present view.
 export function goInstead(path) {
   cockpit.location.replace(path);
 }

@@ -14,9 +14,9 @@ const HOURS = 24;
 const DAY = 24 * 60 * 60 * 1000; // ms
 const SHOWN = 3; // runs in a cell; the others are a click away
 const HOUR = DAY / HOURS;
-const MOST = 10000; // runs that the tool tells at once
+const MOST = 10000; // runs that the tool lists at most
 
-// One that falls into a time at which the machine is off will not come.
+// A run at a time when the machine is off is marked, as it will not happen.
 function runLink(run) {
   const name = titleOf({ id: run.task, name: run.task_name });
   const title = run.isOff ? format(_("$0: the machine is off then"), short(name, 200)) : short(name, 200);
@@ -59,7 +59,7 @@ export class CalendarView {
     }
   }
 
-  // By themselves: of many runs of tasks not all are told.
+  // In a request of their own: of very many runs of tasks not all are listed.
   askForPower() {
     const times = this.model.powerTimes.filter((time) => time.enabled);
     return times.length === 0 ? { runs: [] } : ask("next", ...times.map((time) => String(time.id)), "--within", "7d");
@@ -75,7 +75,7 @@ export class CalendarView {
     const last = first + DAYS * DAY; // of the seventh day; in seven days from now there are runs of the eighth
     const runs = [...power, ...all.filter((run) => !run.power)].filter((run) => run.due)
       .map((run) => ({ ...run, wall: moment(run.due).wall })).filter((run) => run.wall.getTime() < last);
-    // What comes after the last one that was told is not known.
+    // Runs after the last listed one are unknown.
     const end = all.length >= MOST ? all[all.length - 1].due : null;
     const firstUnknown = end ? Math.floor((moment(end).wall.getTime() - first) / HOUR) + 1 : DAYS * HOURS;
     const events = runs.filter((run) => run.power).map((run) => ({ at: minutes(run.wall), power: run.power }));

@@ -9,7 +9,7 @@ const WIDTH = 600;
 const HEIGHT = 90;
 const LEAST = 2; // a run of no time is seen too
 
-// `runs`: the latest first. Nothing where there is nothing to compare.
+// `runs`: the latest first. Null where there are fewer than two to compare.
 export function durationChart(runs, open) {
   const shown = runs.filter((run) => run.duration_seconds !== null).slice(0, MOST).reverse();
   if (shown.length < 2) return null;

@@ -4,7 +4,7 @@ import { distanceText, moment, momentText, wallNow } from "./moments.js";
 import { isOffAt } from "./week.js";
 import { _ } from "./text.js";
 
-// What the list says of each time, and whether the machine is on then.
+// What the list says of each time, and whether the machine is off then.
 export function comingRows(due, powerTimes) {
   return due.map((time) => {
     const isOff = isOffAt(powerTimes, moment(time).wall, wallNow());

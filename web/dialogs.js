@@ -3,8 +3,8 @@ import { button, el, fill, isFocusLost, newId } from "./dom.js";
 import { oneAtATime } from "./turns.js";
 import { _ } from "./text.js";
 
-// A dialog with a heading; `close` of it ends it. The browser keeps the focus inside, closes it by
-// Escape and gives the focus back, to the view when what had it has gone.
+// A modal dialog with a heading, which close() ends. The browser keeps the focus inside, closes it
+// by Escape, and returns the focus. The view gets it where the element that had it is gone.
 export function openDialog(title, ...content) {
   const id = newId();
   const dialog = el("dialog", { "aria-labelledby": id }, el("h2", { id }, title), ...content);
@@ -43,11 +43,11 @@ export function confirm({ title, text, action, subject = null, isDangerous = fal
   });
 }
 
-// A form in a dialog: `save` is called once for however many clicks, and throws what stands in the way.
-// `more` are buttons beside the usual ones, each made for the dialog.
+// A form in a dialog: `save` is not called again while it runs, gives false to keep the dialog
+// open, and throws an error to show. `more` makes further buttons for the dialog.
 export function openForm({ title, fields, save, subject = null, more = () => [] }) {
   const fault = el("p", { class: "fault", role: "alert" });
-  let isSaving = false; // what is saved may take another id by that
+  let isSaving = false; // saving may change the id
   const submit = oneAtATime(async () => {
     isSaving = true;
     try {
@@ -66,16 +66,16 @@ export function openForm({ title, fields, save, subject = null, more = () => [] 
   if (subject) closeWithout({ ...subject, isThere: () => isSaving || subject.isThere() }, dialog);
 }
 
-// Read out when they appear. What was done stays until it is dismissed, the next one comes, or a second view
-// is shown: the first may be the one that it led to. What was not done stays until something else is, or
-// another view is shown.
+// Screen readers announce notes. A note of success stays until it is dismissed, the next one comes,
+// or the second view after it is shown: the first may be where the action led. A note of a fault
+// stays until the next action, or another view.
 const place = el("div", { class: "notes" });
 
 export function notesPlace() {
   return place;
 }
 
-let viewsLeft = 0; // that are shown before the note goes
+let viewsLeft = 0; // that are shown before the note is removed
 
 export function clearFaults() {
   if (place.querySelector(".bad")) fill(place);
@@ -100,7 +100,7 @@ export function tell(text) {
   note("good", "status", text, 1);
 }
 
-// Does something that may be refused. Whether it was done.
+// Runs a step and shows its error. Whether it succeeded.
 export async function attempt(step) {
   clearFaults();
   try {

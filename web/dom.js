@@ -65,7 +65,7 @@ export function focusIn(element) {
   return Boolean(found);
 }
 
-// Whether what had the focus has gone or is hidden: who uses the keys would begin anew.
+// Whether the focused element is gone or hidden, so that a keyboard user would start again.
 export function isFocusLost() {
   const { activeElement } = document;
   return !activeElement || activeElement === document.body || !activeElement.checkVisibility();

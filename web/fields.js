@@ -22,7 +22,7 @@ export class Field {
     return this.places.some((own) => place === own || place.startsWith(own + "[") || place.startsWith(own + "."));
   }
 
-  // What stands there is no number or no whole date, so that the browser gives nothing.
+  // Whether the input is no number or no complete date, for which the browser gives an empty value.
   isUnreadable() {
     return [this.input, ...this.input.querySelectorAll("input")].some((input) => input.validity && input.validity.badInput);
   }
@@ -60,7 +60,7 @@ export function select(choices, value) {
   return input;
 }
 
-// The days of the week, of which `chosen` says which are on: their names, as schedules have them.
+// The days of the week. `chosen` has the names of those that are on, as in schedules.
 export class DaysField extends Group {
   constructor(chosen, options) {
     const boxes = DAYS.map((day, i) => check(weekdayText(i, "short"), chosen.includes(day)));

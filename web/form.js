@@ -1,5 +1,5 @@
-// Adding a task, and changing one. The tool is asked at each change what it would say to it, and
-// says when the task would run; nothing is saved by that.
+// Adding a task, and changing one. At each change the tool is asked for a preview: the faults, and
+// when the task would run. It saves nothing.
 import { button, el, fill, isFocusLost, setText } from "./dom.js";
 import { go, goInstead, href, taskPath } from "./address.js";
 import { showAccess } from "./access.js";
@@ -18,8 +18,8 @@ const PLACE = "tasks[0].";
 
 const UNITS = () => [["s", _("seconds")], ["m", _("minutes")], ["h", _("hours")], ["d", _("days")]];
 
-// People first: they are who tasks are for. The owner that the task has is there even when the machine
-// does not list him.
+// People before accounts of programs. The task's owner is among them even when the machine does not
+// list that user.
 function ownerChoices(owners, current) {
   const name = (owner) => (owner.full_name && owner.full_name !== owner.owner
     ? `${visible(owner.owner)} (${short(owner.full_name, 60)})` : visible(owner.owner));
@@ -40,7 +40,7 @@ export class FormView {
     this.update();
   }
 
-  // The form is made once. What comes in later is told, and does not touch what was typed.
+  // The form is made once. Later changes of the task are reported, and do not touch what was typed.
   update() {
     if (!this.model.isLoaded || this.model.mayChange === null) return;
     const task = this.id === null ? null : this.model.taskOf(this.id);
@@ -142,7 +142,7 @@ export class FormView {
     return { name, command, owner, enabled, schedule, time_limit, overlap, app };
   }
 
-  // An owner without a name has a number.
+  // An owner without a name is a number, not a text.
   ownerValue() {
     const owner = this.owner.input.value;
     return this.task && String(this.task.owner) === owner ? this.task.owner : owner;
@@ -168,7 +168,7 @@ export class FormView {
     if (this.id === null) return value;
     const isOther = ([name]) => JSON.stringify(value[name]) !== JSON.stringify(this.start[name]);
     const changes = Object.fromEntries(Object.entries(value).filter(isOther));
-    if ("app" in changes) changes.app_name = null; // which is the name of the one before
+    if ("app" in changes) changes.app_name = null; // it belongs to the former application
     return changes;
   }
 
@@ -189,7 +189,7 @@ export class FormView {
     this.timer = window.setTimeout(() => this.preview(), PAUSE);
   }
 
-  // What the tool says to what stands there. The answer to an older question is passed over.
+  // Asks for a preview of what was typed. Answers to earlier requests are ignored.
   async preview() {
     this.asked = (this.asked || 0) + 1;
     const number = this.asked;
@@ -208,7 +208,7 @@ export class FormView {
     }
   }
 
-  // Written only when it is another answer: it is read out then.
+  // Updated only when it changes, as screen readers announce it then.
   showComing(due, rows) {
     const key = JSON.stringify([due, rows.map(({ isOff }) => isOff)]);
     if (key === this.comingShown) return;
@@ -222,7 +222,7 @@ export class FormView {
       : _("But it is switched off, and does not run until it is switched on.");
   }
 
-  // By its field, in words of the page: it says less of what else is wrong there.
+  // The faults that the page finds, by field. They hide the tool's faults of the same field.
   ownFaults() {
     const found = this.schedule.faults();
     for (const field of this.fields) {
@@ -270,7 +270,7 @@ export class FormView {
     this.saveOnce();
   }
 
-  // First what the tool would say, beside the fields; then it is saved. What was typed stays in any case.
+  // Shows the faults of a preview at the fields, or saves where there are none.
   async trySaving() {
     this.isSaving = true;
     this.isSubmitted = true;
@@ -289,7 +289,7 @@ export class FormView {
       this.showFaults([error.message]);
     }
     this.isSaving = false;
-    if (!this.isClosed) this.update(); // what came in meanwhile
+    if (!this.isClosed) this.update(); // changes that came in meanwhile
   }
 
   async store() {
@@ -300,7 +300,7 @@ export class FormView {
     try {
       said = await change(words, this.text());
     } catch (error) {
-      // A new one may be saved and something else wrong, which is told with its number.
+      // A new task may have been saved in spite of the error: then its id was printed.
       if (this.id !== null || !/^\d+$/.test((error.output || "").trim())) throw error;
       said = error.output;
       fault = error.message;
@@ -321,7 +321,7 @@ export class FormView {
     else field.input.focus();
   }
 
-  // What became of the task meanwhile.
+  // Reports what others have changed of the task meanwhile.
   tellOf(task) {
     const now = JSON.stringify([task && task.name, task && this.settingsOf(task)]);
     if (now === this.toldOf) return;

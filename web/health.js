@@ -1,4 +1,4 @@
-// What is wrong, worst first, each with what helps; or one line.
+// The findings, worst first, each with its remedies; or one line when all is well.
 import { button, el, fill, focusIn, isFocusLost, place, setAttribute, setText } from "./dom.js";
 import { attempt } from "./dialogs.js";
 import { change } from "./tool.js";
@@ -12,7 +12,7 @@ const cockpit = window.cockpit;
 
 const OF_PAST_RUN = ["failed-run", "gave-up", "missed-run"];
 
-// By how the machine was then, where that is known.
+// By the state of the machine at that time, where it is known.
 const MISSED = {
   off: () => _("$0 was due $1, $2, and did not run, as the machine was off."),
   on: () => _("$0 was due $1, $2, and did not run, though the machine was on."),
@@ -48,7 +48,7 @@ function textOf({ kind, severity, text, run, due, machine }, task) {
   return visible(text);
 }
 
-// What helps by a command, {command: label}: there is a button for it.
+// Remedies that are commands, {command: label}: each has a button.
 const COMMANDS = { sync: () => _("Write the crontab again"), restore: () => _("Put it back") };
 
 function commandOf({ remedy }) {
@@ -56,7 +56,7 @@ function commandOf({ remedy }) {
   return found ? found[1] : null;
 }
 
-// What helps, as {key, label, act}.
+// The buttons of a finding, as {key, label, act}.
 function actionsOf(finding, task, mayChange) {
   const { kind, run } = finding;
   const actions = [];
@@ -86,7 +86,7 @@ const SEVERITIES = {
   unknown: () => _("Unknown"),
 };
 
-// One finding. Its buttons stay the same ones as long as they are offered, and with them the focus.
+// One finding. Its buttons stay the same elements as long as they are offered, and keep the focus.
 class Row {
   constructor() {
     this.severity = el("span");
@@ -102,7 +102,7 @@ class Row {
     setAttribute(this.severity, "class", "severity " + finding.severity);
     setText(this.severity, SEVERITIES[finding.severity]());
     setText(this.text, text);
-    // Where there is a button for it, it is not told.
+    // A remedy that has a button is not shown as text.
     const isTold = finding.remedy && !OF_PAST_RUN.includes(finding.kind) && !commandOf(finding);
     setText(this.remedy, isTold ? ": " + visible(finding.remedy) : "");
     const kept = new Map();
@@ -124,9 +124,9 @@ class Row {
   }
 }
 
-const MOST = 10; // shown at first, so that much that is wrong does not push the tasks away
+const MOST = 10; // shown at first, so that the tasks below stay in view
 
-// The one that it is about, and no other that has its number by now.
+// The task that it is about, and no other one that has its number by now.
 function taskOf(finding, model) {
   const task = finding.task === null ? null : model.taskOf(finding.task);
   return task && task.name === finding.task_name ? task : null;
@@ -177,7 +177,7 @@ export class Health {
     focusIn(this.list.children[before]);
   }
 
-  // Each with a key by which it is known again.
+  // Each with a key that identifies it in later updates.
   shownOf(found, model, mayChange) {
     const times = new Map();
     return found.map((finding) => {
@@ -190,7 +190,7 @@ export class Health {
     });
   }
 
-  // To the row that is in the place of the one that had it.
+  // To the row in the place of the one that had the focus.
   giveFocus(i) {
     const row = this.list.children[Math.min(i, this.list.children.length - 1)];
     if (!row || !focusIn(row)) this.element.focus();

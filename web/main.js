@@ -1,4 +1,4 @@
-// The page: which view is shown, and when it is shown anew.
+// The page: which view is shown, and when it is updated.
 import { el, fill, isFocusLost, setAttribute, setText } from "./dom.js";
 import { go, here, href } from "./address.js";
 import { watchAccess } from "./access.js";
@@ -59,7 +59,7 @@ class Page {
     return Boolean(this.view && this.view.isChanged && this.view.isChanged());
   }
 
-  // The address is another one already; who stays is led back.
+  // The address has changed already, and is set back when the user stays.
   async askToLeave() {
     const stayed = this.path;
     const isAgreed = await confirm({ title: _("Leave without saving?"), text: _("What you have changed here is lost."),
@@ -109,12 +109,12 @@ class Page {
       this.showTitle();
     }
     setText(this.zone, zoneNote() || "");
-    // What had the focus may have gone by what came in.
+    // The update may have removed the focused element.
     if (hadFocus && isFocusLost() && !document.querySelector("dialog")) this.root.focus({ preventScroll: true });
     this.waitForNext();
   }
 
-  // At the time of the next run the list is another one, whether or not anything runs.
+  // At the time of the next run the list changes, whether or not that run happens.
   waitForNext() {
     window.clearTimeout(this.next);
     const seconds = Math.min(this.model.secondsToNext() + 1, MOST_WAIT);
@@ -144,7 +144,7 @@ function start() {
   document.documentElement.lang = language();
   document.documentElement.dir = cockpit.language_direction || "ltr";
   followTheme();
-  here(); // which mends an address that cannot be read
+  here(); // replaces an address that cannot be parsed
   new Page().start();
 }
 

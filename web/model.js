@@ -1,9 +1,9 @@
-// What the page knows of the machine: one copy, which all views show.
+// The state of the machine as far as the page knows it, shared by all views.
 import { ask } from "./tool.js";
 import { moment, now, setMachineTime } from "./moments.js";
 import { inTurn } from "./turns.js";
 
-// What stays the same when only time has passed.
+// The status without what changes with time alone.
 function lasting(status) {
   return JSON.stringify({ ...status, now: null });
 }
@@ -11,16 +11,16 @@ function lasting(status) {
 export class Model extends EventTarget {
   constructor() {
     super();
-    this.isAnswered = false; // the machine was asked once at least, whatever it said
+    this.isAnswered = false; // the machine was asked at least once, with or without success
     this.isLoaded = false; // there are tasks to show, which may be old
-    this.isListed = false; // they are those of now
+    this.isListed = false; // the tasks are up to date
     this.tasks = [];
     this.isPowerLoaded = false;
     this.powerTimes = [];
     this.clock = null;
     this.status = null; // not known
     this.mail = null;
-    this.fault = null; // sentences when the machine could not be asked
+    this.fault = null; // error messages when the machine could not be asked
     this.mayChange = null; // not known yet
     // Asks the machine.
     this.refresh = inTurn(async () => {
@@ -33,13 +33,13 @@ export class Model extends EventTarget {
     return this.tasks.find((task) => task.id === id) || null;
   }
 
-  // The store is not as it should be: what is shown may be nothing, and nothing can be added.
+  // Whether the tasks cannot be read: the list may be empty or old, and nothing can be added.
   get isDamaged() {
     return !this.isListed || (this.status !== null &&
       this.status.findings.some((finding) => finding.kind === "copies" && finding.severity === "critical"));
   }
 
-  // What one of the questions has no answer to, the others may have.
+  // A request that fails does not affect the others.
   async load() {
     const [list, power, status, mail] = await Promise.allSettled([
       ask("list", "--all"), ask("power", "list"), ask("status"), ask("mail")]);
@@ -61,7 +61,7 @@ export class Model extends EventTarget {
     this.isAnswered = true;
   }
 
-  // Whether the machine is another than is known, in what no file tells.
+  // Whether the status has changed, also in what no watched file shows.
   async isOther() {
     const status = await ask("status").catch(() => null);
     return lasting(status) !== lasting(this.status);

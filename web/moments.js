@@ -9,7 +9,7 @@ const FORM = /^(\d{4})-(\d\d)-(\d\d)T(\d\d):(\d\d):(\d\d)(Z|[+-]\d\d:\d\d)$/;
 
 let skew = 0; // seconds that the machine's clock is ahead of the browser's
 let offset = null; // minutes that the machine's zone is ahead of UTC
-let isZoneOther = false; // the browser had another offset at some time that was told
+let isZoneOther = false; // the browser has another offset at some time that was parsed
 
 function offsetOf(text) {
   if (text === "Z") return 0;
@@ -58,8 +58,8 @@ function zoneText(minutes) {
   return `UTC${minutes < 0 ? "-" : "+"}${hours}:${String(size % 60).padStart(2, "0")}`;
 }
 
-// A sentence when the browser has other times than the machine, now or at one that was told, as in
-// summer; else null.
+// A sentence when the browser's offset differs from the machine's, now or at a time that was
+// parsed, as in summer; else null.
 export function zoneNote() {
   if (offset === null || !isZoneOther) return null;
   const own = ownOffset(now());

@@ -5,12 +5,12 @@ import { _, format, ngettext, visible } from "./text.js";
 
 const cockpit = window.cockpit;
 
-const MOST = 64000; // characters shown of what goes on, and of beginning and end of what has ended
-const PAUSE = 200; // ms between two drawings: a run may print faster than anybody reads
-const PIECES = 100; // more are put together
+const MOST = 64000; // characters shown of a run under way, and of beginning and end of an ended one
+const PAUSE = 200; // ms between two updates, as a run may print very fast
+const PIECES = 100; // text nodes: more are merged
 
-// What the beginning or the end of it may stand for at most, so that not all is decoded. Base64 has four
-// characters for three bytes, and a character has four bytes at most.
+// As much Base64 as MOST characters can take, so that not all is decoded: a character has at most
+// four bytes, and three bytes take four characters of Base64.
 const MOST_BASE64 = Math.ceil((MOST * 4) / 3) * 4;
 
 // Bytes that are no text are shown as U+FFFD. `cut` gives the part that is shown.
@@ -32,7 +32,7 @@ export class Output {
     this.note = el("p", { class: "beside", role: "status" });
     this.element = el("div", { class: "output-of-run" }, this.text, this.note);
     this.stop = null;
-    // What nobody sees is not followed; whoever looks again gets it from the beginning on.
+    // A hidden page does not follow a run; when it is shown again, it starts from the beginning.
     this.look = () => {
       if (cockpit.hidden) this.stopFollowing();
       else if (this.run.state === "running") this.load();
@@ -84,7 +84,7 @@ export class Output {
     return format(_("All that is kept of it shows: $0"), "zelosched " + this.words().join(" "));
   }
 
-  // As it comes, from the beginning on; of much only the end.
+  // Shows the output as it comes, from the beginning on; of very much only the end.
   follow() {
     let coming = "";
     let timer = null;
@@ -114,7 +114,7 @@ export class Output {
     this.stop = end;
   }
 
-  // What is there stays, but for the oldest of it where it is too much.
+  // Appends to what is shown, and removes the oldest where it is too much.
   append(more) {
     if (more === "") return;
     const { text } = this;
@@ -135,7 +135,7 @@ export class Output {
     const isNews = run.state !== this.run.state;
     this.run = run;
     if (!isNews) return;
-    if (wasRunning && run.state === "ended" && this.stop) return; // what follows shows the end too
+    if (wasRunning && run.state === "ended" && this.stop) return; // the follower shows the end too
     this.load();
   }
 

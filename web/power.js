@@ -1,4 +1,4 @@
-// The times at which the machine goes on and off.
+// The times at which the machine switches on and off.
 import { button, el, fill, setAttribute, setText } from "./dom.js";
 import { showAccess } from "./access.js";
 import { attempt, confirm, openForm } from "./dialogs.js";
@@ -39,7 +39,7 @@ function subjectOf(model, time) {
   };
 }
 
-// Of a new one: on which days, and at which hour.
+// Adds a power time, with `newDays` and `hour` filled in, or changes `time`.
 function askForTime(model, time, newDays, hour) {
   const direction = new Field(_("The machine goes"), select([["off", _("off")], ["on", _("on")]], time ? time.power : "off"));
   direction.input.disabled = time !== null;
@@ -47,7 +47,7 @@ function askForTime(model, time, newDays, hour) {
   const at = new Field(_("Time"), el("input", { type: "time", class: "short",
     value: time ? time.at : String(hour).padStart(2, "0") + ":00" }));
 
-  // Nothing where something is missing, which stands beside its field.
+  // False, with a message at the field, where something is missing.
   async function save() {
     const chosen = days.value();
     days.tell(chosen.length === 0 ? [_("Choose one day at least.")] : []);
@@ -147,7 +147,7 @@ class Week {
       time.days.map((day) => ({ at: DAYS.indexOf(day) * HOURS * 60 + minutesOf(time.at), power: time.power })));
     events.sort((a, b) => a.at - b.at);
     const isComplete = ["on", "off"].every((power) => events.some((event) => event.power === power));
-    // The week goes round: how it begins is how it ends.
+    // The week repeats: it begins in the state in which it ends.
     return isComplete ? offTimes(events, WEEK, events[events.length - 1].power === "off") : [];
   }
 

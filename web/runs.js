@@ -76,7 +76,7 @@ class Row {
 }
 
 export class Runs {
-  // `opened` is told the number of the run whose output is shown, or null.
+  // `opened` is called with the number of the run whose output is shown, or null.
   constructor(opened) {
     this.opened = opened;
     this.rows = new Map();
@@ -100,7 +100,7 @@ export class Runs {
     this.openWanted();
   }
 
-  // Its output is shown as soon as it is there; of the others none is.
+  // Shows the output of that run as soon as it is listed, and of no other one.
   want(number) {
     this.wanted = number;
     this.openWanted();

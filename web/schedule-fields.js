@@ -1,4 +1,4 @@
-// The fields that say when a task runs, and the schedule that they say.
+// The fields of a schedule, and its JSON form.
 import { el } from "./dom.js";
 import { DaysField, Field, select } from "./fields.js";
 import { monthText, wallNow } from "./moments.js";
@@ -60,7 +60,7 @@ export class ScheduleFields {
     this.until.element.hidden = this.every.input.value === "";
   }
 
-  // What is wrong by what is seen here, in words of the page, by its field.
+  // The faults that the page itself finds, by field.
   faults() {
     const schedule = this.value();
     const found = new Map();
@@ -75,7 +75,7 @@ export class ScheduleFields {
     return found;
   }
 
-  // As the tool reads it. What is empty or no number goes to it as it is, so that it says what is wrong.
+  // As JSON for the tool, which reports what is empty or no number: that is passed on as it is.
   value() {
     const type = this.type.input.value;
     const asNumber = (text) => (/^\d+$/.test(text) ? Number(text) : text);

@@ -2,11 +2,11 @@
 import { el, setAttribute } from "./dom.js";
 import { _, format } from "./text.js";
 
-// For a column of a table. `set(row, isOn)` tells whether it was done, `nameOf(row)` what is switched.
+// For a column of a table. `set(row, isOn)` gives whether it succeeded, `nameOf(row)` a name.
 export function switchCell({ mayChange, set, nameOf }) {
-  const wishes = new Map(); // how what is being switched shall be, by its id: the element may show another row by then
+  const wishes = new Map(); // wanted states by id, while requests run
 
-  // One request at a time; who switches again meanwhile gets what he chose last.
+  // One request at a time. If the switch is used meanwhile, the last choice is applied next.
   async function follow(row, isOn) {
     const isGoing = wishes.has(row.id);
     wishes.set(row.id, isOn);

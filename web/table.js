@@ -1,16 +1,16 @@
-// A table whose rows stay the same elements as long as they are shown, so that what comes in from
-// elsewhere takes away neither the focus nor a selection.
+// A table whose rows stay the same elements as long as they are shown, so that an update keeps the
+// focus and a selection.
 import { button, el, focusIn, isFocusLost, place, setAttribute, setText } from "./dom.js";
 import { format, ngettext } from "./text.js";
 
-const PAGE = 60; // rows shown at once: more are slow to lay out, and nobody reads them
+const PAGE = 60; // rows shown at once: more are slow to lay out
 
-// A column is {key, label, make(cell), isSortable}; make returns what shows a row in that cell.
+// A column is {key, label, make(cell), isSortable}; make gives a function that shows a row there.
 export class Table {
   constructor({ caption, columns, sorted }) {
     this.columns = columns;
     this.rows = new Map(); // by their keys, in their order
-    this.spare = []; // making a row takes more time than filling it
+    this.spare = []; // unused rows: making one takes longer than filling it
     this.shown = PAGE;
     this.keyOf = (row) => row.id;
     this.heads = new Map();
@@ -50,15 +50,15 @@ export class Table {
     return { element, update: (row) => updates.forEach((update) => update(row, element)) };
   }
 
-  // Another choice of rows: from the first page on, and in the elements as they stand, since the focus
-  // is where the choice is made, and filling rows takes less time than moving them.
+  // Shows another choice of rows, from the first page on. It fills the elements in their order,
+  // which is faster than moving them; the focus is where the choice is made, not in a row.
   showOthers(rows) {
     this.shown = PAGE;
     const free = [...this.rows.values()];
     this.showIn(rows, () => free.shift() || this.spare.pop() || this.makeRow());
   }
 
-  // The same rows as they are now.
+  // Shows the same rows, updated.
   show(rows) {
     const { rows: before } = this;
     const keys = new Set(rows.slice(0, this.shown).map(this.keyOf));
@@ -94,7 +94,7 @@ export class Table {
     return { row: [...this.body.children].indexOf(cell.parentElement), cell: cell.cellIndex };
   }
 
-  // Its row has gone: the same cell of the one that is in its place.
+  // For a row that is gone: to the same cell of the row in its place.
   giveFocus({ row, cell }) {
     const instead = this.body.children[Math.min(row, this.body.children.length - 1)];
     if (instead && !focusIn(instead.children[cell])) focusIn(instead);

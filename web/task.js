@@ -83,7 +83,7 @@ export class TaskView {
     this.load();
   }
 
-  // What one of them prints is not followed any more.
+  // Also stops following their output.
   dropRuns() {
     this.runs.show([]);
     this.runs.element.hidden = true;
@@ -91,7 +91,7 @@ export class TaskView {
     this.shownRuns = null;
   }
 
-  // The buttons stay the same ones, since one of them may have the focus, or have it given back by a dialog.
+  // The buttons stay the same elements, as one may have the focus, or get it back from a dialog.
   makeHead() {
     this.name = el("bdi");
     this.outcome = el("span");
@@ -189,7 +189,7 @@ export class TaskView {
     }
     try {
       const { runs, why } = await this.askForRuns();
-      if (this.isClosed || !this.task || this.task.name !== task.name) return; // it is another one by now
+      if (this.isClosed || !this.task || this.task.name !== task.name) return; // it is another one
       this.shownRuns = runs;
       setText(this.note, why || (runs.length === 0 ? _("It has not run yet.") : ""));
       this.runs.element.hidden = runs.length === 0;
@@ -202,7 +202,7 @@ export class TaskView {
     }
   }
 
-  // The last ones, and the one whose output is wanted where that is older; why it is not there.
+  // The last runs, and the wanted one where that is older; `why` says why it is not there.
   async askForRuns() {
     const latest = async () => (await ask("history", "--task", String(this.id), "--limit", String(this.limit))).runs;
     const { task, wanted } = this;
@@ -223,7 +223,7 @@ export class TaskView {
     }
   }
 
-  // More than are asked for may be there.
+  // There may be more runs than were asked for.
   showLeft(runs) {
     const next = MOST_RUNS - RUNS;
     this.left.hidden = this.limit === MOST_RUNS || runs.length < this.limit;

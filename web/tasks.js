@@ -128,7 +128,7 @@ export class TasksView {
       el("p", {}, _("The machine could not be asked for its tasks. They are shown as they were.")));
     this.list = el("section", { "aria-label": _("Tasks") }, this.old, this.tools(), this.empty, this.table.element, this.mails.element);
     fill(root, this.access, this.health.element, this.list);
-    // Before a link leads away from here.
+    // Called before a link leads to another view.
     this.flush = () => this.remembering && this.remember();
     document.addEventListener("click", this.flush, true);
     this.update();
@@ -147,7 +147,7 @@ export class TasksView {
   choose(options) {
     Object.assign(this.options, options);
     this.showRows(true);
-    // Not at each key: the address is the browser's, and writing it takes longer than the table.
+    // Not at each key, as changing the address takes longer than updating the table.
     window.clearTimeout(this.remembering);
     this.remembering = window.setTimeout(() => this.remember(), 300);
   }
@@ -178,7 +178,7 @@ export class TasksView {
     });
   }
 
-  // What is looked through, made once for each task that comes from the machine.
+  // The text that is searched, made once for each task object.
   textOf(task) {
     if (!this.texts.has(task)) {
       this.texts.set(task, [task.name, task.command, task.owner, task.app || "", task.app_name || "", task.action || ""]

@@ -6,14 +6,14 @@ const cockpit = window.cockpit;
 const PROGRAM = "zelosched";
 
 class ToolError extends Error {
-  // What was printed all the same.
+  // `output`: what was printed in spite of the error.
   constructor(message, output = "") {
     super(visible(message));
     this.output = output;
   }
 }
 
-// Without what is about the words that the page has chosen.
+// The messages, without the program's name and the usage line.
 function inSentences(message) {
   return message.split(/^usage: /m)[0].split("\n").map((line) => line.replace(/^zelosched( [a-z-]+)?: /, "").trim())
     .filter((line) => line !== "").join("\n");
@@ -25,8 +25,8 @@ function start(words, input) {
   return call;
 }
 
-// What the program prints, and why it failed or null. A program that could not be started at all
-// is thrown.
+// What the program printed, and why it failed, or null. Throws where there is no exit status, as
+// when the program could not be started.
 function outcome(words, input) {
   return new Promise((resolve, reject) => {
     start(words, input)
@@ -42,12 +42,12 @@ function outcome(words, input) {
   });
 }
 
-// The answer to a question as JSON. Some answers come with a status that says how bad they are.
+// The JSON that a command prints. Some commands print it with an exit status other than 0.
 export function ask(...words) {
   return askAbout(undefined, ...words);
 }
 
-// The same about something that is not stored.
+// The same, with an input for the command.
 export async function askAbout(input, ...words) {
   const { output, fault } = await outcome([...words, "--json"], input);
   if (output.trim() === "") throw new ToolError(fault || "");
@@ -59,7 +59,7 @@ export function whenChanged(listener) {
   changed = listener;
 }
 
-// Changes something, and gives what the program says to that, when the page knows what came of it.
+// Runs a command that changes something. Gives its output after the page has been updated.
 export async function change(words, input) {
   const { output, fault } = await outcome(words, input);
   await changed();
@@ -67,7 +67,7 @@ export async function change(words, input) {
   return output;
 }
 
-// Shows each text as it comes; gives what stops it, and `done` is called when there is no more.
+// Calls `show` with each piece of output, and `done` at the end. Gives a function that stops it.
 export function follow(words, show, done) {
   const call = start(words);
   call.stream(show);

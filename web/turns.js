@@ -1,7 +1,7 @@
-// Work that is never done twice at once.
+// Work that does not run twice at the same time.
 
-// A function that starts the work, and does nothing while that goes on: of two clicks one counts. Works
-// of different keys go on beside each other.
+// A function that starts the work, and does nothing while that runs: of two clicks one counts. Work
+// with different keys runs in parallel.
 export function oneAtATime(work, keyOf = () => null) {
   const going = new Set();
   return async (...given) => {
@@ -16,8 +16,8 @@ export function oneAtATime(work, keyOf = () => null) {
   };
 }
 
-// A function that starts the work, or has it done once more when it is going on: what has changed
-// meanwhile may have come too late for it.
+// A function that starts the work, or has it repeated once when it is running, as that may have
+// missed the last change.
 export function inTurn(work) {
   let isWanted = false;
   let going = null;

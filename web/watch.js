@@ -1,4 +1,4 @@
-// Says when something has changed on the machine, as long as somebody looks at the page.
+// Reports changes on the machine as long as the page is visible.
 const cockpit = window.cockpit;
 
 // The tasks, the power times, what becomes of runs, mails about failures, and cron's start.
@@ -11,12 +11,12 @@ const FILES = [
   "/etc/zelosched/run-ended.d/mail-on-failure",
   "/run/crond.pid",
 ];
-const QUIET = 150; // ms in which what changes is one change: it writes several files
-const LOOK = 10000; // ms between looks at what no file tells, such as that cron was killed
-const ALL = 30000; // ms between asking for all, which shows anew how long ago things are
+const QUIET = 150; // ms in which changed files count as one change
+const LOOK = 10000; // ms between checks of what no file shows, such as that cron was killed
+const ALL = 30000; // ms between full updates, which also update relative times
 
 export class Watch {
-  // `changed` asks the machine for all, `looked` for what no file tells.
+  // `changed` asks the machine for all, `looked` for what no file shows.
   constructor(changed, looked) {
     this.changed = changed;
     this.looked = looked;
@@ -53,7 +53,7 @@ export class Watch {
     this.timer = null;
   }
 
-  // What follows soon is of the same change.
+  // Further files soon after count as the same change.
   note() {
     if (this.timer === null) {
       this.timer = window.setTimeout(() => {

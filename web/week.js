@@ -15,8 +15,8 @@ function minutesOfWeek({ days, at }) {
   return days.map((day) => DAYS.indexOf(day) * MINUTES_OF_DAY + hour * 60 + minute);
 }
 
-// Whether the machine, which is on now, is off at a later time: by the last power time until then. One that
-// goes off and never on again is switched on by somebody.
+// Whether the machine, which is on now, is off at a later time: by the last power time before it.
+// One without power-on times is taken for switched on by hand.
 export function isOffAt(powerTimes, wall, now) {
   const used = powerTimes.filter((time) => time.enabled);
   if (!used.some((time) => time.power === "on")) return false;

@@ -1,10 +1,10 @@
-// What a task and its runs are, in words.
+// Tasks and runs in words.
 import { _, format, ngettext, visible } from "./text.js";
 import { dateText, monthText, weekdayText } from "./moments.js";
 
 export const DAYS = ["mon", "tue", "wed", "thu", "fri", "sat", "sun"];
 
-// Days one after the other are told as a range, also over a Sunday.
+// Three or more consecutive days become a range, also across Sunday.
 export function daysText(days) {
   const on = DAYS.map((day) => days.includes(day));
   const count = on.filter((isOn) => isOn).length;
@@ -19,7 +19,7 @@ export function daysText(days) {
   return DAYS.map((day, i) => (on[i] ? weekdayText(i, width) : null)).filter((text) => text).join(", ");
 }
 
-// A date that does not exist is told as it is stored.
+// A date that cannot be parsed is shown as it is stored.
 function dateInWords(text) {
   const date = new Date(text + "T00:00:00Z");
   return Number.isNaN(date.getTime()) ? text : dateText(date);
@@ -50,7 +50,7 @@ export function scheduleText(schedule) {
 
 const BLANK = /^[\s\u200c\u200d]*$/;
 
-// What a task is called: one whose name shows nothing by its number.
+// The name of a task, or its number where the name is blank.
 export function titleOf(task) {
   return BLANK.test(task.name) ? format(_("Task $0"), task.id) : visible(task.name);
 }
@@ -72,7 +72,7 @@ export function outcomeText(run) {
   }
 }
 
-// A word by which the style knows it: good, bad, busy or none.
+// The CSS class of a run: good, bad, busy or none.
 export function gradeOf(run) {
   if (!run) return "none";
   if (run.state !== "ended") return "busy";

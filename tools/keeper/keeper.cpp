@@ -44,25 +44,25 @@ namespace {
 
 constexpr int64_t kMinute = 60;  // seconds
 
-// The owner may open it for writing by the names of the standard streams.
+// So that the task's owner can open /dev/stdout and /dev/stderr for writing.
 constexpr mode_t kPipeMode = 0622;
-constexpr size_t kMostAtOnce = size_t{64} << 10;  // what a pipe holds
+constexpr size_t kMostAtOnce = size_t{64} << 10;  // the usual capacity of a pipe
 
-// Milliseconds between two looks at what others write.
+// Milliseconds between two polls of /proc and of the databases: at first, and at most.
 constexpr int kFirstLook = 5;
 constexpr int kLook = 200;
-constexpr double kWaitsAfter = 0.1;  // seconds after which a run without a command waits, perhaps
-constexpr double kTurnPause = 2;     // seconds between two looks at who is in its way
+constexpr double kWaitsAfter = 0.1;  // seconds without a command after which a run may be waiting
+constexpr double kTurnPause = 2;     // seconds between two queries for the conflicting run
 constexpr int kStatusPatience = 50;  // milliseconds: the pipe must not fill up meanwhile
 constexpr int kLastPatience = 10000;
 constexpr std::chrono::milliseconds kHistoryPatience(50);
 constexpr double kSavePause = 0.2;    // seconds
-constexpr double kRetryPause = 5;     // seconds, where it cannot be written at all
-constexpr double kSaveAtEnd = 60;     // seconds in which the end of a run is to be written
-constexpr double kFirstWait = 3;      // seconds: nobody waits for a shorter time
-constexpr double kDrain = 60.0 * 60;  // seconds
-constexpr double kGrace = 10;         // seconds
-constexpr int kMostKills = 1000;      // of what starts new processes as fast as it is killed
+constexpr double kRetryPause = 5;     // seconds, after an error other than a busy database
+constexpr double kSaveAtEnd = 60;     // seconds for which writing the end of a run is retried
+constexpr double kFirstWait = 3;      // seconds: the library's shortest wait for a conflicting run
+constexpr double kDrain = 60.0 * 60;  // seconds for which pipes are served after the run
+constexpr double kGrace = 10;         // seconds from SIGTERM to SIGKILL
+constexpr int kMostKills = 1000;      // against processes that fork as fast as they are killed
 
 double seconds() {
   timespec now{};
@@ -76,7 +76,7 @@ int millisecondsUntil(double moment) {
   return static_cast<int>(std::max(moment - seconds(), 0.0) * kMilli) + 1;
 }
 
-// By the clock above, and never later than it began: a tick is the time before it.
+// When the process was started, by the same clock, rounded down to a clock tick.
 std::optional<double> beganAt(pid_t pid) {
   const unsigned long long ticks = statOf(pid).started;
   if (ticks == 0) return std::nullopt;
@@ -123,7 +123,7 @@ void leaveSignals() {
   struct sigaction action = {};
   action.sa_handler = SIG_DFL;
   for (int signal = 1; signal < NSIG; ++signal) sigaction(signal, &action, nullptr);
-  // Who told us to look after a run may be gone, and so may be who wants to see what it prints.
+  // The caller's terminal may hang up, and a reader of our pipes may exit.
   action.sa_handler = SIG_IGN;
   for (const int signal : {SIGHUP, SIGINT, SIGQUIT, SIGPIPE, SIGTSTP, SIGTTOU}) {
     sigaction(signal, &action, nullptr);
@@ -154,13 +154,13 @@ void leaveCaller(const std::vector<int> &kept) {
   closeAllBut(kept);
 }
 
-// The end to read from. The other one becomes standard output and error, and is open for reading
-// too: as long as the run has it, nobody who writes is ended since nobody reads.
+// The read end. The other one becomes standard output and error, and is open for reading too: so
+// processes of the run get no SIGPIPE when the keeper is killed.
 int makePipe() {
   int ends[2];
   if (pipe2(ends, O_CLOEXEC) != 0) return -1;
   fchmod(ends[1], kPipeMode);
-  // What was there a moment ago, the command may have read itself: it has the pipe for reading too.
+  // The command can read from the pipe too, and may take bytes that poll() has announced to us.
   fcntl(ends[0], F_SETFL, O_NONBLOCK);
   const std::string name = "/proc/self/fd/" + std::to_string(ends[1]);
   const int both = open(name.c_str(), O_RDWR | O_CLOEXEC);
@@ -183,8 +183,8 @@ std::vector<pid_t> ownChildren() {
   return found;
 }
 
-// What the command leaves behind becomes ours too, behind it. One that is about to end has no
-// program any more, and is not over yet.
+// The child that is the run's process. As a subreaper we also get orphans of its command, later in
+// the list. A process that exits has no executable before it is a zombie, hence the retries.
 pid_t runsProcess() {
   constexpr int kLooks = 1000;
   constexpr useconds_t kPause = 1000;
@@ -212,9 +212,9 @@ void keepFromOutOfMemory() {
 class Keeper {
  public:
   explicit Keeper(const RunOrder &order) : order_(order) {}
-  // Starts the run, tells how that went, and keeps it.
+  // Starts the run, reports that, and stays until its end.
   void start(int report);
-  // Takes the place of one that was killed.
+  // Takes over a run whose keeper was killed.
   bool adopt(int64_t run);
 
  private:
@@ -249,10 +249,10 @@ class Keeper {
   KeptRun run_;
   Task task_;
   OutputFile output_;
-  std::string uncopied_;  // what the reader of the copy has not taken yet
+  std::string uncopied_;  // bytes that could not be written to the copy yet
   int pipe_ = -1;
   int signals_ = -1;
-  int processFile_ = -1;  // of one that is no child
+  int processFile_ = -1;  // pidfd of a run that is not our child
   double began_ = 0;
   double ended_ = 0;
   std::optional<double> started_;
@@ -273,7 +273,7 @@ class Keeper {
 
 void Keeper::start(int report) {
   leaveCaller({report, order_.tellTo, order_.copyTo});
-  // Nobody else writes there.
+  // O_NONBLOCK affects every writer to this pipe; we are the only one.
   if (order_.copyTo >= 0) fcntl(order_.copyTo, F_SETFL, O_NONBLOCK);
   prctl(PR_SET_CHILD_SUBREAPER, 1);
   openlog("zeloschedtask", LOG_PID, LOG_CRON);
@@ -292,7 +292,7 @@ void Keeper::start(int report) {
   run_.process = processNamed(process);
   static_cast<void>(write(report, &told, sizeof told) < 0);
   close(report);
-  if (process == 0) return;  // nothing was due
+  if (process == 0) return;  // the task is not due, or disabled
   sigset_t children;
   sigemptyset(&children);
   sigaddset(&children, SIGCHLD);
@@ -356,7 +356,7 @@ bool Keeper::adopt(int64_t number) {
   return true;
 }
 
-// It may have been removed since; then only its number is known.
+// A task that has been removed since is known by its number alone.
 void Keeper::learnOfTask() {
   run_.boot = bootId();
   run_.keeper = processNamed(getpid());
@@ -417,11 +417,11 @@ void Keeper::copyOn() {
       uncopied_.erase(0, static_cast<size_t>(count));
     } else if (errno == EAGAIN) {
       return;
-    } else if (errno != EINTR) {  // nobody wants it any more
+    } else if (errno != EINTR) {  // its reader has closed it
       closeCopy();
     }
   }
-  if (isSaved_) closeCopy();  // nothing comes any more
+  if (isSaved_) closeCopy();  // nothing more is copied
 }
 
 void Keeper::closeCopy() {
@@ -446,7 +446,7 @@ size_t Keeper::readOnce(size_t most) {
   return 0;
 }
 
-// What there is now: who goes on writing has been left behind by the run.
+// What is in the pipe now. Processes that the run has left behind may go on writing.
 void Keeper::passRest() {
   int left = 0;
   if (pipe_ < 0 || ioctl(pipe_, FIONREAD, &left) != 0) return;
@@ -457,8 +457,8 @@ void Keeper::passRest() {
   }
 }
 
-// Waits so long for something to happen, and takes it. While the reader of the copy takes nothing,
-// the run has to wait when its pipe is full, as in a shell's pipeline; its keeper does not.
+// Waits so long for events, and handles them. While the copy's pipe is full, the run's pipe is not
+// read, so that the run blocks as in a shell's pipeline; the keeper does not block.
 void Keeper::pump(int milliseconds) {
   const bool isRead = !isCopyHeldUp() || isSaved_;
   pollfd wanted[] = {{isRead ? pipe_ : -1, POLLIN, 0},
@@ -493,8 +493,8 @@ void Keeper::reap() {
   }
 }
 
-// The command has begun when the run's process has a child. Its row would say so too; but whoever
-// reads the status database just when the run writes it delays the run by up to a second.
+// The command has begun when the run's process has a child. Its row would say so too; but reading
+// the status database while the run writes to it delays the run by up to a second.
 void Keeper::lookWhetherItRuns() {
   const std::vector<pid_t> commands = childrenOf(static_cast<pid_t>(run_.process.pid));
   if (commands.empty()) {
@@ -522,7 +522,7 @@ void Keeper::lookForTurn() {
   std::optional<Run> other;
   try {
     other = RunDatabase(kStatusPatience).inTheWayOf(taskId, app, run_.process.pid);
-  } catch (const Failure &) {  // it is for the eye alone
+  } catch (const Failure &) {  // it is asked again
   }
   if (!other && seconds() - began_ < kFirstWait) return;
   hasWaited_ = true;
@@ -532,7 +532,7 @@ void Keeper::lookForTurn() {
   tell("waiting " + std::to_string(whose));
 }
 
-// The row of a process that had the same number before is in the history, as another keeper's.
+// Whether the row is of an earlier process with this pid, which its keeper has recorded.
 bool isOfAnother(const Run &row, const KeptRun &run) {
   try {
     const KeptDatabase kept(KeptDatabase::kRead);
@@ -547,7 +547,7 @@ bool isOfAnother(const Run &row, const KeptRun &run) {
   }
 }
 
-// When the run's process is over: its row, and how it ended itself, tell what happened.
+// After the end of the run's process: its row and its wait status give the outcome.
 void Keeper::readStatus() {
   const bool isKilled = waitStatus_ && WIFSIGNALED(*waitStatus_);
   const bool isSeen = waitStatus_.has_value();
@@ -561,7 +561,7 @@ void Keeper::readStatus() {
   if (row && (row->taskId != run_.task || isOfAnother(*row, run_))) row.reset();
   if (row) {
     takeStatus(*row, &run_);
-    // It leaves its row as it was when it cannot become the owner, for one.
+    // The row still says "running" where the process could not become the owner, for one.
     if (run_.outcome == Outcome::kNone || run_.outcome == Outcome::kLost) {
       run_.outcome = isKilled || !isSeen ? Outcome::kLost : Outcome::kNotStarted;
     }
@@ -578,7 +578,7 @@ void Keeper::readStatus() {
   if (row || hasBegun) measure();
 }
 
-// By 'stop', by a removal of its task, or by whoever waited for it.
+// By 'stop', by the removal of its task, or by a 'run' that was interrupted.
 bool Keeper::isCancelled() const {
   const bool isByUs =
       waitStatus_ && WIFSIGNALED(*waitStatus_) && WTERMSIG(*waitStatus_) == kSignalOfCancelling;
@@ -591,14 +591,14 @@ void Keeper::measure() {
   if (started_) {
     run_.duration = std::round((ended_ - *started_) * kMilli) / kMilli;
   } else if (run_.start && *run_.end >= *run_.start) {
-    run_.duration = static_cast<double>(*run_.end - *run_.start);  // nobody saw it begin
+    run_.duration = static_cast<double>(*run_.end - *run_.start);  // no keeper saw it begin
   }
 }
 
 // ---- what is written
 
-// Where the sweep has found the run before its keeper could write it: its row becomes the keeper's,
-// with what others have noted there. 0 for none.
+// The number of the run where the sweep recorded it before its keeper could: the keeper updates
+// that row. 0 for none.
 int64_t numberBySweep(const KeptDatabase &kept, const KeptRun &run) {
   Query query(kept,
               "SELECT run FROM run WHERE state < 2 AND pid = ?1 AND task = ?2 AND boot = ?3"
@@ -614,7 +614,7 @@ bool Keeper::save(bool isEnd) {
   try {
     const KeptDatabase kept(KeptDatabase::kChange, kHistoryPatience);
     Transaction transaction(kept);
-    // What the history gives it, a number or a generation, it has when that is committed.
+    // run_ takes its number and generation from the history only after the commit.
     KeptRun written = run_;
     if (written.run == 0) written.run = numberBySweep(kept, written);
     RunFilter filter;
@@ -668,8 +668,8 @@ void Keeper::saveWhenDue() {
   if (isDirty_ && seconds() >= nextSave_) save(false);
 }
 
-// What cannot be written is left to the sweep, with what it printed, and with the telling: it
-// writes the end of each run that is in the history and whose keeper is gone.
+// What cannot be written is left to the sweep, with the output and the notices: the sweep writes
+// the end of each run in the history whose keeper is gone.
 void Keeper::saveEnd() {
   while (!save(true)) pump(kLook);
   isSaved_ = true;
@@ -702,8 +702,8 @@ void Keeper::tellPrograms() {
 
 // ---- afterwards
 
-// Past its time limit nothing of a run goes on, nor when somebody has killed its process: what it
-// has started could neither be seen then nor stopped, and the next run would start beside it.
+// After the time limit, or when the run's process was killed, its other processes are ended too:
+// they could not be listed or stopped any more, and the next run would overlap with them.
 void Keeper::endWhatIsLeft() {
   const bool isToEnd = run_.outcome == Outcome::kTimeLimit || run_.outcome == Outcome::kLost;
   if (!isToEnd || processFile_ >= 0) return;
@@ -717,7 +717,7 @@ void Keeper::endWhatIsLeft() {
   }
 }
 
-// The sweep leaves a run alone while its keeper is there, which another process is not.
+// The sweep passes over a run while its keeper is alive, so a child drains for a run left to it.
 void Keeper::drain() {
   if (isLeftToSweep() && fork() > 0) return;
   const double until = seconds() + kDrain;
@@ -740,8 +740,8 @@ bool readWhole(int file, Report *report) {
   return true;
 }
 
-// Of a keeper that was killed before it could tell: as its parent, and the one that takes in
-// orphans, we have its run now, when there is one. That begins a session of its own at once.
+// For a keeper that was killed before it reported: as its parent and a subreaper, we have become
+// the parent of the run's process, if there is one. That has a session of its own at once.
 bool hasRunBegun(pid_t keeper) {
   constexpr int kLooks = 1000;
   constexpr useconds_t kPause = 1000;
@@ -757,7 +757,7 @@ bool hasRunBegun(pid_t keeper) {
       usleep(kPause);
     }
   }
-  return true;  // something goes on
+  return true;  // a child is left, perhaps the run
 }
 
 int passReportOn(const Report &report) {

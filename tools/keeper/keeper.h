@@ -1,6 +1,6 @@
-// The keeper of a run: the process that starts it, reads what it prints, and writes into the
-// history how it went. The run does not depend on it: it goes on when its keeper is killed, and it
-// takes place when none can be made or nothing can be written.
+// The keeper of a run: the process that starts it, reads its output, and records its outcome in the
+// history. The run does not depend on it: it goes on when its keeper is killed, and it is started
+// when no keeper can be forked or the history cannot be written.
 #pragma once
 
 #include <cstdint>
@@ -13,15 +13,15 @@ struct RunOrder {
   bool isAnyTime = false;  // otherwise only when the task is due in this minute
   bool isDisabledSkipped = true;
   Trigger trigger = Trigger::kSchedule;
-  std::optional<int64_t> due;  // this minute, when it is not said
-  // What somebody who waits wants to know; -1 for none. Lines (run_events.h), and all that the run
-  // prints until its end.
+  std::optional<int64_t> due;  // unset: the current minute for kSchedule, else none
+  // File descriptors for a caller that waits, -1 for none: for the events (run_events.h), and for
+  // what the run prints until its end.
   int tellTo = -1;
   int copyTo = -1;
 };
 
-// Has a keeper start the run. What ZELOSchedTaskRun gave, with its error record.
+// Forks a keeper, which starts the run. Returns what ZELOSchedTaskRun did, with its error record.
 int runWithKeeper(const RunOrder &order);
 
-// In the place of a keeper that was killed, in a process of its own. The exit status.
+// Forks a new keeper for a run whose keeper was killed. Returns the exit status.
 int keepOn(int64_t run);

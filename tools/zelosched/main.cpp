@@ -1,4 +1,4 @@
-// zelosched - the administrator's way to the scheduled tasks.
+// zelosched - the administrator's command line for the scheduled tasks.
 #include <fcntl.h>
 #include <syslog.h>
 #include <unistd.h>
@@ -18,8 +18,8 @@ namespace {
 
 constexpr char kUsageLine[] = "usage: zelosched COMMAND [ARGUMENT...]\n";
 
-// A file that is opened later would take the number of a closed stream, and what is printed would
-// end up in it. Standard output and error are opened the wrong way round, so that printing fails.
+// A file that is opened later would get the descriptor of a closed stream, and be printed to. Each
+// is opened in the wrong direction, so that its use fails.
 void occupyStandardStreams() {
   constexpr int kWays[] = {O_WRONLY, O_RDONLY, O_RDONLY};
   for (int stream = STDIN_FILENO; stream <= STDERR_FILENO; ++stream) {
@@ -67,7 +67,7 @@ int runCommand(int argc, char **argv) {
   return runWithOptions(*command, argc - 1, argv + 1);
 }
 
-// A full disk or a closed pipe shows at the flush at the latest.
+// The flush reports a full disk or a closed pipe if the writes before it did not.
 int afterPrinting(int status) {
   const bool flushed = std::fflush(stdout) == 0;
   const int reason = errno;

@@ -28,7 +28,7 @@ def plural_function(header):
 
 
 def plurals_of(source):
-    """The plural form of each text that has one: the compiled file does not tell it."""
+    """The plural form of each text that has one, which gettext's catalogue lacks."""
     with open(source, encoding="utf-8") as file:
         text = re.sub(r'"\n"', "", file.read())
     pairs = re.findall(r'^msgid "((?:[^"\\]|\\.)*)"\nmsgid_plural "((?:[^"\\]|\\.)*)"', text, re.M)

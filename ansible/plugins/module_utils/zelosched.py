@@ -1,4 +1,4 @@
-"""What the modules have in common: calling zelosched apply, and telling what it told."""
+"""What the modules share: they call zelosched and return its results."""
 from __future__ import absolute_import, division, print_function
 
 __metaclass__ = type
@@ -6,10 +6,10 @@ __metaclass__ = type
 import json
 import re
 
-VERSION = 1  # of the vocabulary, zelosched-json(5)
+VERSION = 1  # of the JSON format, zelosched-json(5)
 TO_DO = 3  # the exit status of a dry run that found something to do
-TIMED_OUT = 124  # that of timeout(1)
-SECONDS_TO_END = 10  # for a program that is told to end
+TIMED_OUT = 124  # the exit status of timeout(1) when the time is up
+SECONDS_TO_END = 10  # from SIGTERM to SIGKILL
 
 CHANGES = ("created", "changed", "unchanged", "removed", "failed")
 
@@ -20,15 +20,14 @@ COMMON_OPTIONS = {
     "timeout": {"type": "int", "default": 600},
 }
 
-# What zelosched escapes too: control characters, the marks that turn the direction of writing or break
-# lines, and what cannot be seen; and halves of characters, which no terminal can be sent. A line's end is
-# none of them here.
+# Control characters, marks of writing direction and line breaks, common invisible characters (of
+# which zelosched escapes more), and lone surrogates, which cannot be encoded. Not the line feed.
 UNSAFE = re.compile("[\x00-\x09\x0b-\x1f\x7f-\x9f\xad\u061c\u200b\u200e\u200f\u2028-\u202e\u2060-\u2064"
                     "\u2066-\u2069\ud800-\udfff\ufeff\ufff9-\ufffb\U000e0000-\U000e007f]")
 
 
 def shown(text):
-    """The text, of which a terminal obeys nothing but the ends of lines."""
+    """The text with these escaped, so that a terminal interprets nothing but line feeds."""
     return UNSAFE.sub(lambda found: json.dumps(found.group())[1:-1], text)
 
 
@@ -37,13 +36,13 @@ def executable_of(module):
 
 
 def said(error):
-    """The sentences that zelosched said, without its name."""
+    """The messages of zelosched, without its name in front."""
     return "\n".join(line[len("zelosched: "):] if line.startswith("zelosched: ") else line
                      for line in error.strip().splitlines())
 
 
 def call(module, arguments, text=None, good=(0,)):
-    """What the program printed, and whether it ended well."""
+    """What the program printed. The module fails unless its exit status is in `good`."""
     limit = module.params["timeout"]
     if limit < 0:
         module.fail_json(msg="timeout: %d is no number of seconds" % limit)
@@ -55,7 +54,7 @@ def call(module, arguments, text=None, good=(0,)):
     try:
         told_by_then = told(module, out)
     except ValueError:
-        pass  # most failures tell nothing but the reason
+        pass  # most failures print a message and no object
     message = said(error) or "zelosched ended with %d" % status
     if status == TIMED_OUT:
         message = "zelosched was ended after %d s: 'timeout' allows no more" % limit
@@ -63,7 +62,7 @@ def call(module, arguments, text=None, good=(0,)):
 
 
 def answer_of(out, member, types):
-    """The object that the program printed, and its list of objects, whose members have these types."""
+    """The object that the program printed, and its list `member`, of objects with these types."""
     try:
         answer = json.loads(out)
     except (ValueError, RecursionError):
@@ -91,7 +90,7 @@ MAYBE_TEXT = (str, type(None))
 
 
 def told(module, out):
-    """The changes that an apply told, which it does also when some of them failed."""
+    """The module's result of what `apply --json` printed, also when some changes failed."""
     answer, changes = answer_of(out, "changes", {"id": (int, type(None)), "name": str, "app": MAYBE_TEXT,
                                                  "change": str, "differences": list})
     if not isinstance(answer.get("crontab_written"), bool):
@@ -142,7 +141,7 @@ def set_of(tasks):
 
 
 def apply_set(module, text, apps=()):
-    """Makes the tasks be as the set says; of the applications, no others. What became of them."""
+    """Applies the set, and removes what it lacks of these applications. The module's result."""
     arguments = ["apply", "-", "--json", "--diff"]
     if module.check_mode:
         arguments.append("--dry-run")

@@ -5,15 +5,15 @@ __metaclass__ = type
 
 DOCUMENTATION = r"""
 module: task
-short_description: Look after one scheduled task
+short_description: Create, change or remove one scheduled task
 description:
-  - Creates, changes or removes one scheduled task, which is known by its application and its name.
+  - Creates, changes or removes one scheduled task, which is identified by its application and its name.
   - What is not given stays as it is on the machine, or is the default of a new task.
   - For many tasks, M(zelo.scheduler.tasks) is quicker, and removes those that are no longer wanted.
 version_added: 4.0.0
 options:
   name:
-    description: Its name, which lists show.
+    description: The name of the task.
     type: str
     required: true
   app:
@@ -21,7 +21,7 @@ options:
     type: str
     default: ''
   state:
-    description: Whether there is to be such a task.
+    description: Whether the task is to exist.
     type: str
     choices: [present, absent]
     default: present
@@ -30,7 +30,7 @@ options:
     type: str
   schedule:
     description:
-      - When it runs, in the words of zelosched-json(5), which the examples show.
+      - When it runs, in the format of zelosched-json(5); see the examples.
       - Write times in quotes, as YAML takes C(10:30) for a number.
     type: dict
   command:
@@ -43,7 +43,7 @@ options:
     description: Whether it runs at its times.
     type: bool
   overlap:
-    description: Whether a run may overlap others, C(task) of the same task, C(app) of its application.
+    description: Whether a run may overlap other runs.
     type: dict
     suboptions:
       task:
@@ -62,26 +62,10 @@ options:
     description: What the task does, for display.
     type: str
   ui:
-    description: How user interfaces show and offer it, in the words of zelosched-json(5).
+    description: How user interfaces show and offer it, in the format of zelosched-json(5).
     type: dict
-  stagger:
-    description:
-      - Spreads the times over so many minutes or hours, such as C(30m) or C(2h), by the machine and the task, so that
-        many machines do not begin at once. The same machine always gets the same times.
-    type: str
-  force:
-    description: Also changes and removes a task that its application hides or protects.
-    type: bool
-    default: false
-  executable:
-    description: The program, where it is not in the usual place.
-    type: path
-  timeout:
-    description:
-      - The program is ended when it goes on for longer than so many seconds; 0 for no limit. What is changed by then
-        stays changed, and another play does the rest.
-    type: int
-    default: 600
+extends_documentation_fragment:
+  - zelo.scheduler.common
 attributes:
   check_mode:
     description: Can run in C(check_mode) and predict what would be changed, without changing anything.
@@ -95,8 +79,8 @@ seealso:
   - module: zelo.scheduler.tasks
 notes:
   - Changing tasks takes the rights of root.
-  - A task is removed by its number, and only when that is still the task's. Where another program has removed it
-    meanwhile and saved another task, which got the number, nothing is done and the module fails.
+  - A task is removed by its number, and only while the task of that number has this name and application. Where
+    another program has meanwhile given the number to another task, nothing is removed and the module fails.
 """
 
 EXAMPLES = r"""
@@ -120,13 +104,13 @@ EXAMPLES = r"""
 
 RETURN = r"""
 changes:
-  description: What became of the task; empty when it is absent and was.
+  description: What became of the task; empty where it was to be absent and did not exist.
   returned: always
   type: list
   elements: dict
   contains:
     id:
-      description: The number of the task on the machine; null of one that is not created yet.
+      description: The number of the task on the machine; null where it does not exist yet.
       type: int
     name:
       description: Its name.
@@ -188,7 +172,7 @@ def remove(module):
     if not force and not task["ui"]["can_delete"]:
         module.fail_json(msg="the application of %s does not let it be removed by hand" % title)
     if not module.check_mode:
-        # The number may have been given to another task meanwhile.
+        # Another task may have been given the number meanwhile.
         call(module, ["remove", "--yes", "--if-name=" + name, "--if-app=" + app] + force + [str(task["id"])])
     change = {"id": task["id"], "name": name, "app": task["app"], "change": "removed"}
     result = {"changed": True, "changes": [change]}

@@ -5,17 +5,18 @@ __metaclass__ = type
 
 DOCUMENTATION = r"""
 module: tasks
-short_description: Make a set of scheduled tasks be as it is described
+short_description: Make the scheduled tasks match a set
 description:
-  - Creates and changes scheduled tasks until they are as the set says, by one C(zelosched apply) for the whole set.
+  - Creates and changes scheduled tasks until they match the set, by one C(zelosched apply) for the whole set.
   - A task is known by its application and its name. What the set does not say of a task stays as it is on the
     machine, or is the default of a new task.
-  - When one task of the set cannot be saved, nothing is changed, and every fault is told.
+  - When a task of the set has a fault, nothing is changed, and every fault is reported. When a task cannot be saved
+    for another reason, the others are saved all the same, and the module fails.
 version_added: 4.0.0
 options:
   tasks:
     description:
-      - The tasks, in the words of zelosched-json(5). Of each, C(name), C(owner), C(schedule) and C(command) must be
+      - The tasks, in the format of zelosched-json(5). Of each, C(name), C(owner), C(schedule) and C(command) must be
         given.
       - Write times in quotes, as YAML takes C(10:30) for a number.
       - One of I(tasks) and I(set) must be given.
@@ -29,30 +30,12 @@ options:
     type: raw
   prune:
     description:
-      - A list of applications of which every task that the set lacks is removed. A text alone is refused.
+      - A list of applications of which every task that the set lacks is removed. A text instead of a list is refused.
       - An empty text in the list stands for the tasks that belong to no application.
     type: raw
     default: []
-  stagger:
-    description:
-      - Spreads the times over so many minutes or hours, such as C(30m) or C(2h), by the machine and the task, so that
-        many machines do not begin at once. The same machine always gets the same times.
-    type: str
-  force:
-    description:
-      - Also changes and removes tasks that their application hides or protects.
-    type: bool
-    default: false
-  executable:
-    description:
-      - The program, where it is not in the usual place.
-    type: path
-  timeout:
-    description:
-      - The program is ended when it goes on for longer than so many seconds; 0 for no limit. What is changed by then
-        stays changed, and another play does the rest.
-    type: int
-    default: 600
+extends_documentation_fragment:
+  - zelo.scheduler.common
 attributes:
   check_mode:
     description: Can run in C(check_mode) and predict what would be changed, without changing anything.
@@ -95,13 +78,13 @@ EXAMPLES = r"""
 
 RETURN = r"""
 changes:
-  description: What became of each task, also of those that stayed as they were.
+  description: What became of each task, also of unchanged ones.
   returned: always
   type: list
   elements: dict
   contains:
     id:
-      description: The number of the task on the machine; null of one that is not created yet.
+      description: The number of the task on the machine; null where it does not exist yet.
       type: int
     name:
       description: Its name.
@@ -120,7 +103,7 @@ from ansible_collections.zelo.scheduler.plugins.module_utils.zelosched import CO
 
 
 def pruned(module):
-    """The applications; an empty text, which a variable without a value is, must not be taken for one."""
+    """The applications. Not a text: an empty variable would stand for the tasks of no application."""
     apps = module.params["prune"]
     if not isinstance(apps, list) or not all(isinstance(app, str) for app in apps):
         module.fail_json(msg="prune: must be a list of the names of applications, such as [backup]")

@@ -1,4 +1,4 @@
-// Whether the machine will go on at its next power-on time.
+// Whether the machine will switch itself on at its next power-on time.
 #pragma once
 
 #include <ctime>
@@ -7,7 +7,7 @@
 
 #include "store/task_list.h"
 
-// The alarm of the machine's clock.
+// The alarm of the real-time clock.
 struct Alarm {
   bool isThere = false;
   bool isArmed = false;
@@ -15,5 +15,5 @@ struct Alarm {
 };
 Alarm readAlarm();
 
-// A sentence when a power-on time is enabled and the machine's clock is not armed, else nothing.
+// A sentence when a power-on time is enabled and the alarm is not armed, else nothing.
 std::string alarmFault(const TaskList &list);

@@ -5,5 +5,5 @@
 
 Findings checkCopies();
 
-// What the next restore falls back on.
+// Whether the last good copy, which a restore falls back on, equals the persistent one.
 Findings checkLastGoodCopy();

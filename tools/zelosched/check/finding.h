@@ -1,4 +1,4 @@
-// What a look at the machine found.
+// The results of the checks.
 #pragma once
 
 #include <cstdint>
@@ -17,18 +17,18 @@ enum class Severity {
 
 struct Finding {
   Severity severity;
-  const char *kind;         // a word by which programs tell it from others
+  const char *kind;         // identifies the kind of finding for programs
   std::string text;         // a sentence
   std::string remedy = {};  // what helps against it
-  int64_t task = 0;         // whose it is, when it is one task's
+  int64_t task = 0;         // the task that it is about, or 0
   std::string taskName = {};
-  std::optional<RunRecord> run = {};  // when it is about one
+  std::optional<RunRecord> run = {};  // the run that it is about
   std::optional<int64_t> due = {};    // the moment that was missed
-  std::string machine = {};           // how it was then, "off" or "on", where that is known
+  std::string machine = {};           // "off" or "on" at that moment, or empty if unknown
 };
 using Findings = std::vector<Finding>;
 
-// For people who read nothing else: with the remedy.
+// The text with the remedy.
 std::string sentenceOf(const Finding &finding);
 
 // "ok", "unknown", "warning" or "critical".

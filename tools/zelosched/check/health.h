@@ -3,5 +3,6 @@
 
 #include "check/finding.h"
 
-// A check that cannot be made does not hide the others: why it cannot is a warning.
+// A check that throws Failure becomes a warning, and the others follow: those of the tasks only
+// where the tasks can be listed.
 Findings examineHealth();

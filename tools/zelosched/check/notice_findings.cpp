@@ -6,7 +6,7 @@
 
 namespace {
 
-// What keeps it from telling anybody; empty when nothing is known to.
+// Why the program does not notify anybody; empty when no fault is known.
 std::string faultOf(const NoticeProgram &program) {
   if (!program.fault.empty()) return program.fault;
   if (program.path == kMailProgram && !hasMailer()) {

@@ -1,4 +1,4 @@
-// Whether those who want to know of a run's end are told.
+// Whether the programs that are notified of a run's end work.
 #pragma once
 
 #include "check/finding.h"

@@ -67,7 +67,7 @@ class RunCheck {
     return findings_.back();
   }
 
-  // Of a task that is still there and enabled; one that was disabled worries nobody.
+  // Null for a removed or a disabled task, of which a failed last run is not reported.
   const TaskRecord *enabledTask(int64_t id) const {
     const auto found = tasks_.find(id);
     return found != tasks_.end() && isEnabled(*found->second) ? found->second : nullptr;
@@ -120,7 +120,7 @@ class RunCheck {
     if (isWell) findings_.push_back({Severity::kOk, kMissedRun, "no run was missed"});
   }
 
-  // Five times as long as such a run usually takes, or a day.
+  // Longer than a day, or than five times the median of the task's last runs.
   static bool isLong(const KeptDatabase &kept, const KeptRun &run, double seconds) {
     constexpr int64_t kRunsCompared = 10;
     constexpr double kTimesAsLong = 5;
@@ -135,7 +135,7 @@ class RunCheck {
       }
       if (durations.size() == kRunsCompared) break;
     }
-    if (durations.size() < 2 || seconds < kMinute) return false;  // too little to compare with
+    if (durations.size() < 2 || seconds < kMinute) return false;  // too few, or too short
     const auto middle = durations.begin() + static_cast<ptrdiff_t>(durations.size() / 2);
     std::nth_element(durations.begin(), middle, durations.end());
     return seconds > kTimesAsLong * *middle;

@@ -1,11 +1,11 @@
-// What became of the runs.
+// Findings about runs.
 #pragma once
 
 #include "check/finding.h"
 #include "store/task_list.h"
 
-// Whose last run failed or gave up, which were missed, and which go on, and for how long.
+// Tasks whose last run failed or gave up, missed runs, and runs under way.
 Findings checkRuns(const TaskList &list);
 
-// Of a run that is over or did not happen, which can be acknowledged.
+// About a run that failed, gave up or was missed, which can be acknowledged.
 bool isAboutPastRun(const Finding &finding);

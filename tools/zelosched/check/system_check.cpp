@@ -35,12 +35,12 @@ std::string firstWord(const std::string &path) {
   return text.substr(0, text.find_first_of(" \n"));
 }
 
-// A number that another program has got since must not pass for cron's.
+// The pid in the file may be another program's by now.
 bool isCron(int64_t pid) {
   return firstWord("/proc/" + std::to_string(pid) + "/comm").find("cron") != std::string::npos;
 }
 
-// One that has it for a moment is no fault.
+// The process that keeps the lock for two seconds, or 0.
 pid_t lastingHolder(const char *lockFile) {
   constexpr int kTries = 100;
   constexpr useconds_t kPause = 20000;

@@ -11,5 +11,5 @@ Findings checkSharedNames();
 // Whether each line of /etc/zelosched.conf can be read.
 Findings checkSettings();
 
-// Whether somebody keeps changes of tasks waiting. It takes up to two seconds when one does.
+// Whether a process keeps changes of tasks waiting. Takes two seconds for each lock that it holds.
 Findings checkTurns();

@@ -77,7 +77,7 @@ std::string noWeekday(const ZELO_SCHED_TASK &task) {
 
 // ---- what makes the task itself useless -----------------------------------------------------
 
-// The line ends with the last hour of the day all the same.
+// In the crontab line such an hour counts as 23.
 std::string badLastHour(const ZELO_SCHED_TASK &task) {
   if (task.RepeatHour == 0 || task.LastWorkHour <= kLastHourOfDay) return "";
   return invalid("last hour", task.LastWorkHour, "0 to 23");
@@ -98,13 +98,13 @@ std::string neverExists(const ZELO_SCHED_TASK &task) {
          (isOnce ? " in " + number(task.StartYear) : "") + ": write a day that it has";
 }
 
-// Of a start date, a zero stands for the beginning.
+// In a start date, a month or a day of zero stands for the first.
 bool canStart(const ZELO_SCHED_TASK &task) {
   if (task.StartMonth != 0 && task.StartDay != 0) return dateExists(task);
   return task.StartMonth <= kMonthsOfYear && task.StartDay <= kMostDaysOfMonth;
 }
 
-// Of the other types the day is the schedule, or the date is, which is looked at above.
+// For the other types, the date is the schedule itself, which the checks above look at.
 std::string badStart(const ZELO_SCHED_TASK &task) {
   const bool isFree = task.Type == ZELO_SCHED_TYPE_DAILY || task.Type == ZELO_SCHED_TYPE_WEEKLY;
   const bool isMonthly = task.Type == ZELO_SCHED_TYPE_MONTHLY;
@@ -158,7 +158,7 @@ std::string longCommand(const ZELO_SCHED_TASK &task) {
          std::to_string(kMostCommandBytes) + " can be stored: put it into a script";
 }
 
-// The store keeps a value a line: a line feed would be a blank in what is stored.
+// The store has one line for each value: a line feed is stored as a blank.
 std::string lineFeed(const ZELO_SCHED_TASK &task) {
   const struct {
     const char *what;
@@ -202,7 +202,7 @@ void collect(const Check (&checks)[count], const ZELO_SCHED_TASK &task,
   }
 }
 
-// A minute that the change to summer time leaves out.
+// A minute that the change to summer time skips.
 bool isSkipped(const ZELO_SCHED_TASK &task) {
   const std::chrono::year_month_day date(std::chrono::year(static_cast<int>(task.StartYear)),
                                          std::chrono::month(task.StartMonth),

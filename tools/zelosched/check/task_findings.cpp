@@ -30,7 +30,7 @@ bool isPowerOff(const ZELO_SCHED_TASK *task) {
 
 Findings checkTasksAreReadable(const TaskList &list) {
   const std::optional<int> sections = countSections(kWorkingCopy);
-  if (!sections) return {};  // which is told of the copies
+  if (!sections) return {};  // checkCopies reports that
   const auto stored = std::count_if(list.tasks().begin(), list.tasks().end(),
                                     [](const ZELO_SCHED_TASK *task) { return !isPower(*task); });
   if (stored == *sections) return {};

@@ -9,5 +9,5 @@ Findings checkTaskFields(const TaskList &list);
 Findings checkCrontab(const TaskList &list);
 Findings checkCrontabLength();
 
-// What power times need beside cron: an armed clock, and the program that switches off.
+// What power times need beside cron: an armed alarm, and the program that switches off.
 Findings checkPower(const TaskList &list);

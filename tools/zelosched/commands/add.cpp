@@ -43,7 +43,7 @@ int runAdd(int argc, char **argv) {
     throw UsageError("'--stagger' goes by the task's name: add --name");
   }
   const uint32_t minutes = window ? minutesOfWindow(*window) : 0;
-  // Before the others have to wait: who writes it may take his time.
+  // Before the lock is taken: the input may take long to come.
   const std::string text = isRead ? readInput(kStandardInput) : "";
   const ChangeLock lock;
   const Task task = newTask(ZELO_SCHED_BACKEND_SCHEDULE);

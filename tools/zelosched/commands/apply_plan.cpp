@@ -12,8 +12,8 @@
 
 namespace {
 
-// By application and name, byte for byte: case and the ways in which Unicode writes one character
-// make other tasks.
+// Application and name, compared byte by byte: names that differ in case or in Unicode
+// normalization are different tasks.
 using Key = std::pair<std::string, std::string>;
 
 Key keyOf(const TaskRecord &task) {
@@ -30,7 +30,7 @@ Stored tasksByKey(const TaskList &list) {
   return stored;
 }
 
-// Which of them is meant cannot be told.
+// The fault of several tasks with the same application and name; empty for one task.
 std::string rivalry(const std::vector<const TaskRecord *> &tasks) {
   if (tasks.size() < 2) return "";
   return titleOf(*tasks[0]) + " and " + titleOf(*tasks[1]) +
@@ -56,7 +56,7 @@ void requirePermissions(const ApplyStep &step, bool insists) {
   }
 }
 
-// The last hour of a task that was spread is not that of the file.
+// Whether the text says all of the repetition: the last hour of a staggered task has been moved.
 bool saysRepetition(const TaskText &text) {
   const Json::Value &schedule = text.object["schedule"];
   return schedule.isMember("every_hours") &&
@@ -75,7 +75,7 @@ class Planner {
 
   void take(TaskText text) {
     const size_t before = faults_->size();
-    // On the defaults, whatever is stored: a file is right or wrong by itself.
+    // Checked on the defaults, so that these faults do not depend on the stored task.
     Task fresh = std::make_unique<TaskRecord>(*defaults_);
     fillTask(text, fresh.get(), faults_);
     if (faults_->size() > before) return;
@@ -97,7 +97,7 @@ class Planner {
     }
   }
 
-  // Those of an application that no text was for.
+  // Adds the removal of the application's tasks that the file lacks.
   void prune(const std::string &app) {
     for (const auto &[key, tasks] : stored_) {
       if (key.first != app || places_.contains(key)) continue;
@@ -111,7 +111,7 @@ class Planner {
   }
 
   std::vector<ApplyStep> steps() {
-    // Removals first, as ids and lines of the crontab become free by them.
+    // Removals first, as they free ids and crontab lines.
     std::stable_partition(steps_.begin(), steps_.end(),
                           [](const ApplyStep &step) { return step.change == Change::kRemoved; });
     std::stable_partition(steps_.begin(), steps_.end(), [](const ApplyStep &step) {
@@ -155,7 +155,7 @@ class Planner {
   Stored stored_;
   const ApplyRules &rules_;
   JsonFaults *faults_;
-  Task defaults_;                      // the library reads all tasks to make one
+  Task defaults_;                      // made once: the library reads all tasks for it
   std::map<Key, std::string> places_;  // of the texts
   std::vector<ApplyStep> steps_;
 };

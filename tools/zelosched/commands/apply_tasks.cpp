@@ -36,17 +36,17 @@ const TaskRecord &taskOf(const ApplyStep &step) {
   return step.after != nullptr ? *step.after : *step.before;
 }
 
-// As long as it has no number.
+// The title of a task that has no id yet.
 std::string titleOfNew(const TaskRecord &task) {
   return "a task (" + printable(task.Name) + ")";
 }
 
-// Of each step a line, or in the end one object of them all.
+// Prints a line for each step, or one JSON object at the end.
 class Report {
  public:
   explicit Report(const ApplyRules &rules) : rules_(rules) {}
 
-  // How many steps were told.
+  // How many steps were reported.
   size_t count() const { return count_; }
 
   void add(const ApplyStep &step) {
@@ -124,7 +124,7 @@ class Report {
   bool isCrontabWritten_ = false;
 };
 
-// A whole object of JSON stands on standard output, and nothing beside it.
+// With --json, standard output has the JSON object and nothing else.
 FILE *streamForRuns(const ApplyRules &rules) {
   return rules.isJson ? stderr : stdout;
 }
@@ -156,7 +156,7 @@ void take(const ApplyStep &step, const ApplyRules &rules, Report *report) {
   report->add(step);
 }
 
-// What goes on of a task that does not run any more.
+// Reports the runs under way of a task that was disabled or removed.
 void tellOfRuns(const ApplyStep &step, const ApplyRules &rules) {
   const bool isDisabled =
       step.change == Change::kChanged && isEnabled(*step.before) && !isEnabled(*step.after);
@@ -165,7 +165,7 @@ void tellOfRuns(const ApplyStep &step, const ApplyRules &rules) {
   }
 }
 
-// The exit status. One step that fails does not keep the others from being taken.
+// Returns the exit status. A step that fails does not stop the others.
 int takeAll(const std::vector<ApplyStep> &steps, const ApplyRules &rules, Report *report) {
   int status = kDone;
   for (const ApplyStep &step : steps) {
@@ -185,7 +185,7 @@ bool hasChanges(const std::vector<ApplyStep> &steps) {
                      [](const ApplyStep &step) { return step.change != Change::kUnchanged; });
 }
 
-// One that was killed has perhaps stored the tasks, and not their lines.
+// An earlier command that was killed may have stored tasks without their crontab lines.
 int mendCrontab(Report *report) {
   return attempt([&] {
     if (crontabFault(TaskList()).empty()) return;
@@ -207,8 +207,7 @@ int tellOnly(const std::vector<ApplyStep> &steps, const TaskList &stored, Report
 int applyTasks(const std::string &text, const ApplyRules &rules) {
   JsonFaults faults;
   const std::vector<TaskText> texts = taskTextsOf(text, &faults);
-  // From the first look at the tasks to the last change, for two that take turns to end as if one
-  // had begun after the other.
+  // Held from the first read to the last change, so that concurrent commands are serialized.
   std::optional<ChangeLock> lock;
   if (!rules.isDryRun) lock.emplace();
   requireTasksAreBack();

@@ -1,10 +1,10 @@
-// Making the stored tasks be as a file says, for several sub-commands.
+// Makes the stored tasks match a file, for several sub-commands.
 #pragma once
 
 #include <string>
 
 #include "commands/apply_plan.h"
 
-// The text is version 1 of the vocabulary. Tells each task; the exit status. Throws Failure, with
-// nothing changed, when any of it cannot be done.
+// Reports each task, and returns the exit status. Throws Failure, with nothing changed, when the
+// text has a fault; a step that fails later does not stop the others.
 int applyTasks(const std::string &text, const ApplyRules &rules);

@@ -34,7 +34,7 @@ void catchUp(const MissedTask &missed, bool isDryRun) {
     request.due = missed.due;
     request.isDisabledSkipped = true;
     const StartedRun run(*missed.task, request);
-    // The run may have to wait for its turn, unrecorded so far.
+    // The run may have to wait for its turn, without a record in the history yet.
     acknowledge(KeptDatabase(KeptDatabase::kChange), missed.task->ID, Acknowledged::kMissed);
   }
   std::printf("%s was due at %s: %s\n", titleOf(*missed.task).c_str(),

@@ -21,7 +21,7 @@ std::span<const Command *const> commands();
 // Null when there is none of that name.
 const Command *findCommand(std::string_view name);
 
-// Each is defined in the unit of its name.
+// Each is defined in the unit of its name, kDisableCommand in enable.cpp.
 extern const Command kListCommand;
 extern const Command kShowCommand;
 extern const Command kNextCommand;

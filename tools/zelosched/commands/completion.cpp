@@ -15,7 +15,7 @@ namespace {
 
 // ---- what there is to complete --------------------------------------------------------------
 
-// The words that an option's value can be; of every other option any text can.
+// The values that are suggested for an option.
 struct Words {
   const char *option;
   const char *words;
@@ -72,7 +72,7 @@ bool readOption(const std::string &line, HelpOption *option) {
   return true;
 }
 
-// They stand at the beginnings of the lines of its help.
+// Read from its help text, where each begins a line.
 std::vector<HelpOption> optionsOf(const Command &command) {
   std::vector<HelpOption> options = {{"help", 'h', false, "say how it is used"}};
   const std::string help = command.help;
@@ -85,7 +85,7 @@ std::vector<HelpOption> optionsOf(const Command &command) {
   return options;
 }
 
-// "TASK... [--json]": what stands for itself is in capitals.
+// In a synopsis such as "TASK... [--json]", operands are in capitals.
 bool takes(const Command &command, const char *operand) {
   return std::strstr(command.synopsis, operand) != nullptr;
 }
@@ -231,7 +231,7 @@ else
 fi
 )ZSH";
 
-// Within single quotes, with a backslash before what means something to _arguments and _describe.
+// For single quotes, with a backslash before characters special to _arguments and _describe.
 std::string zshText(const std::string &text) {
   std::string out;
   for (const char c : text) {
@@ -324,7 +324,7 @@ complete -c zelosched -n '__zelosched_power add' -a 'on off'
 complete -c zelosched -n '__zelosched_power remove' -a '(__zelosched_tasks power)'
 )FISH";
 
-// Within single quotes.
+// For single quotes.
 std::string fishText(const std::string &text) {
   std::string out;
   for (const char c : text) {
@@ -401,7 +401,7 @@ int runCompletion(int argc, char **argv) {
     print();
     return kDone;
   }
-  // For the scripts themselves.
+  // Called by the scripts.
   const bool isList = words.size() == 1 || (words.size() == 2 && words[1] == "power");
   if (isList && words[0] == "ids") return printTasks(printIds, words);
   if (isList && words[0] == "names") return printTasks(printNames, words);

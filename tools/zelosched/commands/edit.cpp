@@ -23,7 +23,7 @@ constexpr Option kOptions[] = {TASK_OPTIONS, {"stdin"}, {"force"}, EXPECTED_TASK
 void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &before,
                         const ZELO_SCHED_TASK &task) {
   const bool insists = arguments.has("force");
-  const bool isRead = arguments.has("stdin");  // which names all, changed or not
+  const bool isRead = arguments.has("stdin");  // which may give a member its old value
   requirePermission(before, before.CanEditFromUI, "edited", insists);
   if (arguments.has("name") || (isRead && std::strcmp(before.Name, task.Name) != 0)) {
     requirePermission(before, before.CanEditName, "renamed", insists);

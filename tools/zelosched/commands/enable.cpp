@@ -15,7 +15,7 @@ namespace {
 constexpr Option kEnableOptions[] = {EXPECTED_TASK_OPTIONS};
 constexpr Option kDisableOptions[] = {{"stop"}, EXPECTED_TASK_OPTIONS};
 
-// A task that would do harm may be disabled, which ends the harm, but not enabled.
+// A task with faults may be disabled, but not enabled.
 void setState(int64_t id, int32_t state, const ExpectedTask &expected) {
   const ChangeLock lock;
   const Task task = loadTask(id);

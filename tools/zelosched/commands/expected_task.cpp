@@ -8,7 +8,7 @@
 
 namespace {
 
-// Of a text that is not UTF-8, a caller who reads JSON has one that is like it.
+// A text that is not UTF-8 has replaced bytes in the JSON that a caller may have read.
 bool isLike(const std::optional<std::string> &expected, const char *text) {
   return !expected || *expected == text || *expected == jsonText(text).asString();
 }

@@ -1,5 +1,5 @@
-// What a caller takes a task for: between his look at the list and the command, its id may have
-// been given to another one.
+// The name and application that a caller expects: since the caller listed the tasks, the id may
+// have been given to another one.
 #pragma once
 
 #include <optional>
@@ -23,8 +23,7 @@ class ExpectedTask {
   explicit ExpectedTask(const Arguments &arguments)
       : name_(arguments.value("if-name")), app_(arguments.value("if-app")) {}
 
-  // Throws Failure when the task is another one. Where it is to be changed, under the lock of
-  // changes.
+  // Throws Failure when the task is another one. Before a change, call it under ChangeLock.
   void require(const TaskRecord &task) const;
   bool isAny() const { return name_ || app_; }
 

@@ -36,7 +36,7 @@ void printWire(const ZELO_SCHED_TASK &task) {
 
 // ---- tasks for import -----------------------------------------------------------------------
 
-// What a file cannot hold must not seem to be in it.
+// Refuses a task that the format cannot hold.
 void requireExportable(const ZELO_SCHED_TASK &task) {
   if (isPower(task)) throw Failure(titleOf(task) + " is a power time, which no export holds");
   const std::vector<std::string> members = lossyMembersOf(task);
@@ -46,7 +46,7 @@ void requireExportable(const ZELO_SCHED_TASK &task) {
   }
 }
 
-// By the key of a task, so that a later export of the same tasks is the same text.
+// The sort key, so that two exports of the same tasks are the same text.
 std::pair<std::string, std::string> keyOf(const Json::Value &object) {
   const Json::Value &app = object["app"];
   return {app.isString() ? app.asString() : "", object["name"].asString()};

@@ -1,4 +1,4 @@
-// One step for each of several tasks: one that fails does not keep the others from being done.
+// One step for each of several tasks. One that fails does not stop the others.
 #pragma once
 
 #include <cstdint>

@@ -37,7 +37,7 @@ std::string startText(const KeptRun &run) {
   return minuteText(localMinute(*moment)) + seconds;
 }
 
-// Of one that goes on, by the wall clock.
+// For a run under way, by the wall clock.
 std::optional<int64_t> durationOf(const KeptRun &run) {
   if (run.duration) return static_cast<int64_t>(*run.duration);
   if (run.state != RunState::kRunning || !run.start) return std::nullopt;
@@ -81,7 +81,7 @@ void printAsJson(const std::vector<KeptRun> &runs) {
   printTop(top);
 }
 
-// One that was removed has no name any more, but its runs are there.
+// A removed task can be given by its id, not by its name.
 std::optional<int64_t> taskOf(const Arguments &arguments) {
   std::vector<std::string> operands = arguments.operands();
   if (const std::optional<std::string> named = arguments.value("task")) operands.push_back(*named);
@@ -108,7 +108,7 @@ int runHistory(int argc, char **argv) {
     if (argc > 2) throw UsageError("'--keep' stands alone");
     return keepHistory();
   }
-  // For the sweep, which cannot do it itself in its unit.
+  // Started by the sweep, whose unit restricts what it can do.
   if (arguments.has("tell")) return attempt(tellOfRuns);
   RunFilter filter;
   filter.task = taskOf(arguments);
@@ -117,7 +117,7 @@ int runHistory(int argc, char **argv) {
     filter.since = momentOf(*since);
   }
   filter.limit = arguments.number("limit", 1, kMostRuns).value_or(kUsualLimit);
-  // What it cannot take over is said, and what is kept is shown all the same.
+  // When the sweep fails, that is reported, and the history is shown all the same.
   int status = geteuid() == 0 ? attempt([] { sweepRuns(); }) : kDone;
   std::vector<KeptRun> runs;
   const int read = attempt([&] { runs = keptRuns(filter); });

@@ -40,7 +40,7 @@ Task taskOf(const Json::Value &object) {
   return task;
 }
 
-// As the library decides it when it saves from JSON: the stored task of the id, if it is the same.
+// The stored task of the id, if it is the same by the rule of ZELOSchedTaskSaveFromJson.
 Task storedOf(const ZELO_SCHED_TASK &task) {
   Task stored = findTask(task.ID);
   const bool isSame = stored != nullptr && stored->Backend == task.Backend &&
@@ -63,7 +63,7 @@ std::string orderOf(size_t index, size_t count) {
   return "object " + std::to_string(index + 1) + " of " + std::to_string(count);
 }
 
-// Nothing is saved unless every object is a task that may be saved, beside the others of the file.
+// Nothing is saved unless every object can be, together with the others of the file.
 std::vector<Task> readTasks(const std::vector<Json::Value> &objects, bool areNew) {
   std::vector<Task> tasks;
   PowerRoom room;
@@ -87,8 +87,8 @@ std::vector<Task> readTasks(const std::vector<Json::Value> &objects, bool areNew
   return tasks;
 }
 
-// Not some, until the first one that writes the crontab is refused. A line that another of them
-// takes away may still be there when one is added, so it is not counted.
+// Checked before the first save, so that not only some are saved. A line that one task removes does
+// not count, as it may still be there when another is added.
 void requireSavable(const std::vector<Task> &tasks, bool areNew) {
   const bool hasLine =
       std::any_of(tasks.begin(), tasks.end(), [](const Task &task) { return !isPower(*task); });

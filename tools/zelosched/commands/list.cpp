@@ -73,7 +73,7 @@ const SortKey &sortKey(const std::string &name) {
   throw UsageError("'--sort' takes one of " + names);
 }
 
-// What the options ask for.
+// The tasks that the options select.
 class Choice {
  public:
   Choice(const Arguments &arguments, const LatestRuns &runs) : arguments_(arguments), runs_(runs) {
@@ -121,7 +121,7 @@ std::vector<Row> rowsOf(const Choice &choice, const TaskList &list, const Latest
   return rows;
 }
 
-// "24 Dec", or all of a date that is a year away.
+// "24 Dec", or the whole date where it is a year away.
 std::string dayInBrief(const LocalMinute &minute, const LocalMinute &now) {
   constexpr const char *kMonths[] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun",
                                      "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
@@ -133,8 +133,7 @@ std::string dayInBrief(const LocalMinute &minute, const LocalMinute &now) {
   return std::to_string(day) + " " + kMonths[month - 1];
 }
 
-// "Mon 08:30", or the day of one that is a week away: it is the first of that day, whose time the
-// schedule tells.
+// "Mon 08:30", or the date alone where it is a week away: the schedule says at what time.
 std::string nextText(const Row &row, const LocalMinute &now) {
   constexpr int kWeek = 7;
   constexpr size_t kShortName = 3;

@@ -30,15 +30,15 @@ std::string leftOutLine(int64_t bytes) {
   return "\n[" + std::to_string(bytes) + " bytes are left out here]\n";
 }
 
-// The one that was asked for, or the last one of the task that has started: one that waits for its
-// turn, or was cancelled then, has printed nothing.
+// The run of that number, or the task's last one that has started: a run that waits for its turn,
+// or was cancelled then, has printed nothing.
 KeptRun chooseRun(int64_t id, std::optional<int64_t> number) {
   RunFilter filter;
   if (number) {
     filter.run = number;
   } else {
     filter.task = id;
-    filter.until = static_cast<int64_t>(time(nullptr));  // later ones are of a clock that was wrong
+    filter.until = static_cast<int64_t>(time(nullptr));  // later ones are by a wrong clock
   }
   constexpr int64_t kMostWaiting = 50;
   filter.limit = kMostWaiting;
@@ -63,12 +63,12 @@ bool isUnderWay(int64_t number, ProcessName *keeper) {
   return !runs.empty();
 }
 
-// Without its keeper nobody says that a run has ended.
+// Where its keeper was killed, the sweep notes that a run has ended.
 void sweepWithoutKeeper(const ProcessName &keeper) {
   if (geteuid() != 0 || isAlive(keeper)) return;
   try {
     sweepRuns();
-  } catch (const Failure &) {  // the next time, perhaps
+  } catch (const Failure &) {  // it is tried again
   }
 }
 
@@ -104,7 +104,7 @@ void follow(const KeptRun &run, const OutputFile &file, RunOutput *output) {
   output->finish();
 }
 
-// Of a run that goes on, what it has printed so far.
+// For a run under way, what it has printed so far.
 Output outputSoFar(const KeptRun &run) {
   if (run.state != RunState::kEnded) {
     const OutputFile file = OutputFile::open(run.process);
@@ -122,8 +122,7 @@ Output outputSoFar(const KeptRun &run) {
   return {};
 }
 
-// Where bytes were left out, a character may have been cut in two: what is left of it is left out
-// too.
+// Where bytes were left out, a character may have been cut: the rest of it is left out too.
 Output withoutCutCharacters(Output printed) {
   if (printed.leftOut == 0) return printed;
   const auto isInside = [](char byte) {

@@ -32,7 +32,7 @@ constexpr char kUsualProgram[] = "/usr/share/zelosched/mail-on-failure";
 constexpr char kAddress[] = "MAIL_TO=";
 constexpr mode_t kDirectoryMode = 0755;
 
-// Beside where this program is installed.
+// Relative to where this program is installed.
 std::string mailProgram() {
   const std::string own = ownProgram();
   const std::string beside =
@@ -41,8 +41,8 @@ std::string mailProgram() {
   return realpath(beside.c_str(), whole) != nullptr ? whole : kUsualProgram;
 }
 
-// It is a line of a file that root's shell reads: nothing that means something to that. A user of
-// this machine, or user and host.
+// A user of this machine, or user and host. No character that is special to a shell, as root's
+// shell reads the settings.
 bool isAddress(const std::string &text) {
   constexpr size_t kLongest = 254;
   const auto isWord = [](char c) {
@@ -60,12 +60,12 @@ bool isAddress(const std::string &text) {
          (at == whole.npos || isPart(whole.substr(at + 1)));
 }
 
-// What the settings say of the address. They are a file that a shell reads, of which one form of
-// line is understood here: the one that this command writes, also within quotes.
+// The address in the settings. A shell reads this file; here, only the form of line that this
+// command writes is understood, also with quotes.
 struct MailSettings {
-  std::vector<std::string> others;  // the lines that say nothing of it
-  std::string address;              // none: to the owners
-  std::string fault;                // why that is not known
+  std::vector<std::string> others;  // all other lines
+  std::string address;              // empty: to the owners
+  std::string fault;                // why the address is not known
   mode_t mode = 0644;
 };
 
@@ -119,7 +119,7 @@ void setAddress(const std::string &text) {
   placeFile(kSettings, contents.str(), settings.mode);
 }
 
-// What keeps the program from being run, where it is there; nothing when it is run.
+// Why the program is not run, or an empty text when it is; nothing where it is not there.
 std::optional<std::string> faultOfProgram() {
   for (const NoticeProgram &program : noticePrograms()) {
     if (program.path == kNoticeDirectory || program.path == kMailProgram) {
@@ -134,7 +134,7 @@ bool isOn() {
   return fault && fault->empty();
 }
 
-// Only a link is ours to make and to take away.
+// The command makes and removes a link only, not a file.
 void requireLinkOrNothing() {
   struct stat info {};
   if (lstat(kMailProgram, &info) != 0 || S_ISLNK(info.st_mode)) return;
@@ -147,7 +147,7 @@ void switchOn() {
   const std::string directory = kNoticeDirectory;
   mkdir(directory.substr(0, directory.rfind('/')).c_str(), kDirectoryMode);
   mkdir(kNoticeDirectory, kDirectoryMode);
-  unlink(kMailProgram);  // a link that leads nowhere
+  unlink(kMailProgram);  // a link whose program is missing or not run
   if (symlink(mailProgram().c_str(), kMailProgram) < 0) {
     throw Failure(std::string("cannot make ") + kMailProgram + ": " + std::strerror(errno));
   }

@@ -20,7 +20,7 @@
 namespace {
 
 constexpr Option kOptions[] = {{"output", Option::kValue, 'o'}};
-constexpr mode_t kMode = 0644;  // the collector is no process of root's
+constexpr mode_t kMode = 0644;  // the collector does not run as root
 
 MetricsText::Labels labelsOf(const TaskRecord &task) {
   return {{"task_id", std::to_string(task.ID)}, {"task", task.Name}, {"app", task.App}};
@@ -148,7 +148,7 @@ void addHealth(MetricsText *text) {
   }
 }
 
-// What cannot be read is left out, and told as a problem of the health.
+// What cannot be read is left out, and becomes a problem of the health.
 std::string allMetrics() {
   MetricsText text;
   const auto tasks = [&] {

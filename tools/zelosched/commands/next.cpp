@@ -42,7 +42,7 @@ class FirstRuns {
  public:
   explicit FirstRuns(const LocalMinute &now) : now_(now) {}
 
-  // All of them stay as long as this does.
+  // The object owns what is added.
   void add(Task task) {
     add(*task);
     named_.push_back(std::move(task));
@@ -54,7 +54,7 @@ class FirstRuns {
     all_ = std::move(list);
   }
 
-  // None of them after `last`.
+  // So many at most, and none after `last`.
   std::vector<Entry> take(size_t count, const std::optional<LocalMinute> &last) {
     std::priority_queue queue(isLater, std::vector<Source *>());
     const auto advance = [&](Source *source) {
@@ -94,7 +94,7 @@ class FirstRuns {
   std::vector<Source> sources_;
 };
 
-// A disabled task is told.
+// A disabled task is reported.
 void addNamed(int64_t id, FirstRuns *runs) {
   Task task = loadTask(id);
   if (isEnabled(*task)) {

@@ -1,4 +1,4 @@
-// The arguments of a sub-command, and what is said when they are wrong.
+// The arguments of a sub-command, and the errors of wrong ones.
 //
 //   constexpr Option kOptions[] = {{"json"}, {"limit", Option::kValue}};
 //   const Arguments arguments(argc, argv, kOptions);

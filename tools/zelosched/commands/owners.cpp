@@ -16,7 +16,7 @@ namespace {
 
 constexpr Option kOptions[] = {{"json"}};
 constexpr uid_t kNobody = 65534;
-constexpr uid_t kFirstPerson = 1000;  // of Debian: those below are of programs
+constexpr uid_t kFirstPerson = 1000;  // on Debian; lower ones are of programs
 
 struct Owner {
   uid_t uid;
@@ -25,13 +25,13 @@ struct Owner {
   bool isPerson;
 };
 
-// The first field of what "finger" would show.
+// The first field of the GECOS text.
 std::string fullNameOf(const passwd &entry) {
   const std::string all = entry.pw_gecos != nullptr ? entry.pw_gecos : "";
   return all.substr(0, all.find(','));
 }
 
-// Those that the machine lists; a directory of users elsewhere may know more than it lists.
+// Those that getpwent() lists; a directory service may know more.
 std::vector<Owner> owners() {
   std::vector<Owner> found;
   setpwent();

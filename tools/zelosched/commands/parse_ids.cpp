@@ -21,7 +21,7 @@ int64_t idOfNumber(const std::string &word) {
   return *id;
 }
 
-// The list is read for the first name.
+// Reads the list when the first name is looked up.
 class Names {
  public:
   int64_t idOf(const std::string &name) {

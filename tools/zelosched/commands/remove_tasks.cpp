@@ -19,7 +19,7 @@ bool isYes(const std::string &answer) {
   return answer == "y" || answer == "Y" || answer == "yes";
 }
 
-// Asked on standard error, so that it is seen whatever the output is.
+// Asked on standard error, so that it is seen when the output is redirected.
 bool isConfirmed(const ZELO_SCHED_TASK &task) {
   std::fprintf(stderr, "Remove %s? [y/N] ", titleOf(task).c_str());
   std::fflush(stderr);
@@ -28,8 +28,8 @@ bool isConfirmed(const ZELO_SCHED_TASK &task) {
   return isYes(answer);
 }
 
-// The id may have been given to another task since. The name of a power time is its place in the
-// list, which is another one as soon as one before it is removed.
+// The id may have been given to another task since. The name of a power time is its position in the
+// list, which changes when one before it is removed.
 bool isSame(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other) {
   const auto membersOf = [](const ZELO_SCHED_TASK &task) {
     std::vector<StoredMember> members = storedMembersOf(task);
@@ -53,7 +53,7 @@ void tellRemoved(const ZELO_SCHED_TASK &task) {
   std::printf("%s removed\n", titleOf(task).c_str());
 }
 
-// The lock is not held while an answer is waited for.
+// The lock is not held while the user is asked.
 Task askAndRemove(int64_t id, const RemoveRules &rules) {
   Task task = loadRemovable(id, rules);
   if (!isConfirmed(*task)) throw Failure(titleOf(*task) + " stays");

@@ -1,4 +1,4 @@
-// Removing tasks with a question before each.
+// Removing tasks, with a question before each where that is wanted.
 #pragma once
 
 #include <cstdint>
@@ -14,17 +14,17 @@ struct RemoveRules {
   bool isSure;         // without a question
   bool insists;        // whatever the application allows
   bool powerOnly;      // a task that is no power time is refused
-  bool stops = false;  // ends the runs of it that go on
+  bool stops = false;  // ends its runs under way
   ExpectedTask expected = {};
 };
 
 using TaskStep = std::function<void(const TaskRecord &task)>;
 
-// Takes the step that removes it, and tells of it. A run that waits for its turn must not begin
-// when the task is gone: neither one from before, nor one that read the task just then. What goes
-// on is looked after when others may change tasks again. Throws Failure.
+// Removes the task by `remove` and reports it by `tell`. Waiting runs are cancelled before and
+// again after the removal, as a run may have read the task in between. Runs under way are left to
+// the caller. Throws Failure.
 void removeAndCancel(const TaskRecord &task, const TaskStep &remove, const TaskStep &tell,
                      FILE *to = stdout);
 
-// The exit status. Throws UsageError when there is nobody to ask.
+// Returns the exit status. Throws UsageError when a question is needed and there is no terminal.
 int removeTasks(const std::vector<int64_t> &ids, const RemoveRules &rules);

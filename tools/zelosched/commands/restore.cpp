@@ -35,15 +35,15 @@ Failure refused(const std::string &path, const StoreCopy &copy) {
   return Failure(path + " " + copy.why + ": it is not used");
 }
 
-// The one to fall back on at a later boot. It is rewritten only where it differs: it stands on
-// memory that wears.
+// The copy to fall back on at a later boot. It is written only where it differs, as it may be on
+// flash memory, which wears out.
 void keepLastGood() {
   const std::string contents = contentsOf(kPersistentCopy);
   if (judgeStore(kLastGoodCopy).isWhole() && contentsOf(kLastGoodCopy) == contents) return;
   placeFile(kLastGoodCopy, contents, kStoreMode);
 }
 
-// In one step, whatever stands there: nobody can be faster.
+// Atomically, whatever is there, so that no other user can take the name in between.
 void replaceName(const SchedSharedName &name) {
   SchedMovedTo movedTo;
   if (!schedReplaceName(name, &movedTo)) {
@@ -58,7 +58,7 @@ void placeWorkingCopy(const char *source) {
   std::printf("%s was put back from %s\n", kWorkingCopy, source);
 }
 
-// The name is never left free: another user could move a file there that is root's.
+// The name must not stay free: another user could move a file of root's there.
 void takeWorkingName() {
   if (!schedTakeName(kSchedStoreToRestore)) {
     throw Failure(std::string("cannot take ") + kWorkingCopy + ": " + std::strerror(errno) +
@@ -88,13 +88,12 @@ void putLastGoodBack(const StoreCopy &persistent) {
     throw Failure(what + ". The tasks are those of " + kLastGoodCopy +
                   ": look through them, and save one to write both copies anew");
   }
-  // It was written before the persistent copy was touched, so it lacks nothing that was
-  // acknowledged.
+  // It is written before the persistent copy, so it lacks no change that was reported as saved.
   placeFile(kPersistentCopy, contentsOf(kLastGoodCopy), kStoreMode);
   complain(what + ". The tasks are those of " + kLastGoodCopy + ", and all copies agree again");
 }
 
-// Tasks may be gone from it.
+// Whether the doubtful copy has no fewer tasks than the last good one.
 bool isNoLessThanLastGood(const StoreCopy &persistent) {
   const StoreCopy lastGood = judgeStore(kLastGoodCopy);
   return !lastGood.isUsable() || (persistent.isHeaded && persistent.tasks >= lastGood.tasks);
@@ -107,7 +106,7 @@ void putDoubtfulBack(const StoreCopy &persistent) {
                 ": look through them, and save one to write both copies anew");
 }
 
-// A working copy that stands may hold a change that the persistent one lacks.
+// Keeps a usable working copy, which every program reads, and mends the other copies by it.
 void keepWorkingCopy(const StoreCopy &working, const StoreCopy &persistent) {
   const char *const what = working.isWhole() ? "is there and whole" : "is there";
   if (persistent.isWhole()) {
@@ -117,7 +116,7 @@ void keepWorkingCopy(const StoreCopy &working, const StoreCopy &persistent) {
   }
   std::printf("%s %s: it stays\n", kWorkingCopy, what);
   const std::string why = persistent.why.empty() ? "is missing" : persistent.why;
-  // As the next change would: what is cut off has nothing that the working copy lacks.
+  // As the next change would: a copy that is cut off has nothing that the working copy lacks.
   const bool isCutOff =
       persistent.condition == StoreCopy::kDamaged || persistent.condition == StoreCopy::kMissing;
   if (working.isWhole() && isCutOff) {
@@ -142,7 +141,7 @@ void replaceWorkingCopy(const StoreCopy &persistent) {
   }
 }
 
-// Names are taken at boot, and by whoever is first to read the tasks, before they are put back.
+// Such a store was made to reserve the name, before the tasks were put back.
 bool onlyHoldsTheName(const StoreCopy &working) {
   return working.condition == StoreCopy::kEmpty || (working.tasks == 0 && !working.isHeaded);
 }
@@ -153,7 +152,7 @@ void putStoreBack(bool isForced) {
   const StoreCopy working = judgeWorkingStore(kWorkingCopy);
   if (!working.isUsable() && !working.why.empty()) complain(refused(kWorkingCopy, working).what());
   const StoreCopy persistent = judgeStore(kPersistentCopy);
-  // Even by force, tasks that are fit are given up for none but those saved last.
+  // Even --force replaces a usable working copy only by a whole persistent copy.
   if (working.isUsable() && !onlyHoldsTheName(working) && !(isForced && persistent.isWhole())) {
     keepWorkingCopy(working, persistent);
   } else {
@@ -161,7 +160,7 @@ void putStoreBack(bool isForced) {
   }
 }
 
-// Last, since there may be very many. Nobody is changing the store meanwhile.
+// Last, since there may be very many. Under the lock, as a change in progress has such a copy.
 void clearScratch() {
   const StoreLock turn;
   if (!turn.isHeld()) throw failedTo("take scratch copies away");
@@ -186,7 +185,7 @@ int runRestore(int argc, char **argv) {
   arguments.requireNoCommand();
   const bool isForced = arguments.has("force");
   const ChangeLock lock;
-  // As much as can be shall run.
+  // A step that fails does not stop the others.
   const int results[] = {
       attempt(putProgramBack), attempt([&] { putStoreBack(isForced); }),
       takeSharedNames(),       attempt(removeLeftovers),

@@ -26,15 +26,14 @@ namespace {
 constexpr Option kOptions[] = {
     {"wait", Option::kNone, 'w'}, {"output"}, {"force"}, EXPECTED_TASK_OPTIONS};
 constexpr std::chrono::milliseconds kPause(50);
-constexpr std::chrono::seconds kPatience(2);  // with a keeper that has just been started
+constexpr std::chrono::seconds kPatience(2);  // for the first events of a new keeper
 constexpr char kClearLine[] = "\r\033[K";
 
 using Clock = std::chrono::steady_clock;
 
 // ---- waiting --------------------------------------------------------------------------------
 
-// Whoever has waited long enough shall not find the shell's prompt behind a line of ours, and a run
-// that has not begun by then shall not begin.
+// An interrupt clears the progress line, and cancels a run that has not begun.
 volatile sig_atomic_t interruptedBy = 0;
 constexpr int kInterrupts[] = {SIGINT, SIGTERM, SIGHUP};
 
@@ -42,7 +41,7 @@ void noteInterrupt(int signal) {
   interruptedBy = signal;
 }
 
-// Without SA_RESTART: what waits is to come back. A second one ends us at once.
+// Without SA_RESTART, so that blocking calls return. A second signal ends us at once.
 void catchInterrupts() {
   struct sigaction action = {};
   action.sa_handler = noteInterrupt;
@@ -54,7 +53,7 @@ void catchInterrupts() {
   }
 }
 
-// One line that is written over, on a terminal only.
+// One line that is overwritten, on a terminal only.
 class Progress {
  public:
   explicit Progress(std::string title) : title_(std::move(title)) {}
@@ -90,7 +89,7 @@ std::string titleOfTask(int64_t id) {
   try {
     const Task task = findTask(id);
     if (task) return titleOf(*task);
-  } catch (const Failure &) {  // its number says enough
+  } catch (const Failure &) {  // the id is shown instead
   }
   return "task " + std::to_string(id);
 }
@@ -112,7 +111,7 @@ std::string whatItDoes(const RunEvents &events) {
   }
   signal(interruptedBy, SIG_DFL);
   raise(interruptedBy);
-  _exit(kFailed);  // where the signal is held back
+  _exit(kFailed);  // where the signal is blocked
 }
 
 // Its keeper was killed: the run goes on, and its row says how it ends.
@@ -165,7 +164,7 @@ void runAndWait(const ZELO_SCHED_TASK &task, bool showsOutput) {
   std::puts(result.c_str());
 }
 
-// Whether it waits is known at once, or it does not.
+// Waits only until it is known whether the run waits for its turn.
 void runUnseen(const ZELO_SCHED_TASK &task) {
   StartedRun run(task, {});
   const Clock::time_point until = Clock::now() + kPatience;
@@ -195,7 +194,7 @@ int runRun(int argc, char **argv) {
   const Arguments arguments(argc, argv, kOptions);
   arguments.requireNoCommand();
   const std::vector<int64_t> ids = parseIds(arguments.operands());
-  // What a plain user's run leaves in /tmp would be in the way of everybody's.
+  // Files of a plain user's run in /tmp would block the runs of others.
   if (geteuid() != 0) throw Failure("running tasks takes root's rights");
   return forEachId(ids, [&](int64_t id) { runOne(id, arguments); });
 }

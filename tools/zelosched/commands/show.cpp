@@ -38,7 +38,7 @@ std::string lastRunInWords(const ZELO_SCHED_TASK &task, const LatestRuns &runs) 
   return begin ? minuteText(localMinute(*begin)) + ", " + brief : brief;
 }
 
-// A zero stands for the beginning: of the year, or of the month.
+// A month or a day of zero stands for the first.
 std::string startDate(const ZELO_SCHED_TASK &task) {
   char text[64];
   std::snprintf(text, sizeof text, "%04u-%02u-%02u", task.StartYear, std::max(task.StartMonth, 1U),
@@ -92,7 +92,7 @@ void print(const ZELO_SCHED_TASK &task, const LatestRuns &runs) {
   }
 }
 
-// Power times are other objects than tasks, and stand in a list of their own.
+// Power times are other objects than tasks, in a list of their own.
 void add(const ZELO_SCHED_TASK &task, const LatestRuns &runs, Json::Value *top) {
   const std::optional<LocalMinute> next = nextRun(task, localMinute(time(nullptr)));
   if (isPower(task)) {

@@ -95,7 +95,7 @@ void acknowledgeWarnings(const Findings &findings, std::optional<int64_t> task, 
 int acknowledgeAll(const Arguments &arguments) {
   if (arguments.has("json")) throw UsageError("'--acknowledge' does not take '--json'");
   if (geteuid() != 0) throw Failure("acknowledging takes root's rights");
-  // Which also notes the tasks that nobody has looked at so far.
+  // This also records tasks that the history does not know yet.
   const Findings findings = checkRuns(TaskList(TaskList::Unreadable::kIsLeftOut));
   const bool isQuiet = arguments.has("quiet");
   if (arguments.operands().empty()) {

@@ -111,7 +111,7 @@ void applyCommand(const Arguments &arguments, ZELO_SCHED_TASK *task) {
   setText(task->Command, "command", stored);
 }
 
-// A power time is nothing but when.
+// A power time has a schedule and nothing else.
 void requirePowerOptions(const Arguments &arguments) {
   const bool isOther = hasOther(arguments) || arguments.afterDashes() ||
                        hasAny(arguments, std::begin(kRefinements), std::end(kRefinements)) ||

@@ -5,8 +5,7 @@
 
 #include "commands/options.h"
 
-// A macro, as the two tables of options differ in a few entries only and an array cannot be added
-// to: the options that both have.
+// The options that both have. A macro, since one array cannot be part of another one's initializer.
 #define TASK_OPTIONS                                                                              \
   {"once", Option::kValue}, {"daily", Option::kValue}, {"weekly", Option::kTwoValues},            \
       {"monthly", Option::kTwoValues}, {"yearly", Option::kTwoValues}, {"every", Option::kValue}, \

@@ -51,7 +51,7 @@ std::string firstError(const std::string &errors) {
   std::getline(lines, what);
   const size_t word = where.find_first_not_of("* ");
   const size_t sentence = what.find_first_not_of(' ');
-  constexpr size_t kLongest = 200;  // it quotes what it does not like, however long that is
+  constexpr size_t kLongest = 200;  // the parser quotes the faulty text, however long
   return (word == std::string::npos ? "" : where.substr(word)) +
          (sentence == std::string::npos ? "" : ": " + what.substr(sentence, kLongest));
 }

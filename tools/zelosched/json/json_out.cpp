@@ -18,7 +18,7 @@ namespace {
 
 constexpr char kReplacement[] = "\xEF\xBF\xBD";
 
-// The order in which people read them; others come behind, by their names.
+// The order of members in the output; others follow, by their names.
 constexpr const char *kOrder[] = {"version",      "dry_run",
                                   "severity",     "kind",
                                   "text",         "id",
@@ -56,7 +56,7 @@ size_t rankOf(const std::string &name) {
   return found == ranks.end() ? ranks.size() : found->second;
 }
 
-// Nothing that could upset a terminal: all beyond ASCII is escaped.
+// Quoted, with control characters and all beyond ASCII escaped.
 std::string quoted(const std::string &text) {
   return Json::valueToQuotedString(text.c_str());
 }
@@ -67,7 +67,8 @@ bool isFlat(const Json::Value &value) {
   });
 }
 
-// Values that hold others stand on lines of their own down to a depth, and on one below it.
+// When indented, the items of a value that holds a non-empty list or object have a line each; every
+// other value is on one line.
 class Writer {
  public:
   enum Form { kOneLine, kIndented };
@@ -97,7 +98,7 @@ class Writer {
       case Json::stringValue:
         out_ += quoted(value.asString());
         return;
-      case Json::realValue:  // seconds, of which nobody measures less than thousandths
+      case Json::realValue:  // seconds, to a millisecond
         out_ += Json::valueToString(value.asDouble(), 3, Json::PrecisionType::decimalPlaces);
         return;
       default:
@@ -203,7 +204,7 @@ Json::Value jsonTextOrNull(std::string_view text) {
 }
 
 Json::Value jsonTime(time_t moment) {
-  constexpr int kLastYear = 9999 - 1900;  // that can be written so
+  constexpr int kLastYear = 9999 - 1900;  // the last one in this form
   tm fields{};
   localtime_r(&moment, &fields);
   if (fields.tm_year > kLastYear) return {};

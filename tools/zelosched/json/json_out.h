@@ -1,4 +1,4 @@
-// JSON texts: what can stand in one, and how one is written.
+// JSON texts: what one can contain, and how it is written.
 #pragma once
 
 #include <ctime>
@@ -10,7 +10,7 @@ namespace Json {
 class Value;
 }
 
-// Of the vocabulary that zelosched-json(5) describes; each top object names it.
+// The version of the format that zelosched-json(5) describes; each top object has it.
 inline constexpr int kJsonVersion = 1;
 
 bool isUtf8(std::string_view text);
@@ -18,7 +18,7 @@ bool isUtf8(std::string_view text);
 // The text as JSON can carry it: each byte that is no UTF-8 becomes U+FFFD.
 Json::Value jsonText(std::string_view text);
 
-// Of bytes that are no text. Throws Failure.
+// The Base64 of any bytes. Throws Failure.
 std::string base64(std::string_view bytes);
 
 // Null for an empty one.
@@ -30,15 +30,15 @@ Json::Value jsonTime(time_t moment);
 // {"version": 1}, to which lists are added.
 Json::Value topObject();
 
-// The members of an object in the order in which people read them.
+// The names of an object's members, in the order of the output.
 std::vector<std::string> namesOf(const Json::Value &object);
 
 Json::Value jsonList(const std::vector<Json::Value> &values);
 
-// To the standard output: the values of the lists of a top object on a line each.
+// Prints a top object, with each element of its lists on a line.
 void printTop(const Json::Value &top);
 
-// The same on as many lines as it takes to compare two of them line by line.
+// The same, indented, so that two outputs can be compared line by line.
 void printIndented(const Json::Value &top);
 
 // An array to the standard output, an object a line.

@@ -21,7 +21,7 @@ Json::Value numberOrNull(const std::optional<Number> &number) {
 
 Json::Value jsonOf(const RunRecord &run) {
   Json::Value object(Json::objectValue);
-  // The status database, which runs come from before the history has them, knows no such number.
+  // A run that the history does not have yet has no number.
   object["run"] = run.run > 0 ? Json::Value(Json::Int64(run.run)) : Json::Value();
   object["task"] = Json::Int64(run.task);
   object["task_name"] = jsonText(run.taskName);

@@ -1,4 +1,4 @@
-// A run in the JSON vocabulary that zelosched-json(5) describes.
+// A run in the JSON format that zelosched-json(5) describes.
 #pragma once
 
 #include "runs/run_record.h"

@@ -9,7 +9,7 @@ namespace {
 
 using Differences = std::vector<MemberDifference>;
 
-// The members of either, those of an object within under "its name.theirs".
+// Compares the members of both; those of nested objects have places such as "schedule.at".
 void compare(const std::string &place, const Json::Value &before, const Json::Value &after,
              Differences *differences) {
   if (before == after) return;

@@ -13,10 +13,10 @@ struct MemberDifference {
   Json::Value after;
 };
 
-// By the members of a file of tasks, in their order. Null stands for no task, of which all members
-// are null.
+// By the members of a file of tasks, in their order. A null pointer stands for no task: all of its
+// members are null.
 std::vector<MemberDifference> differencesOf(const ZELO_SCHED_TASK *before,
                                             const ZELO_SCHED_TASK *after);
 
-// Whether a file can tell them apart, or bytes that a file cannot hold do.
+// Whether a file says the same of both, and the same members have bytes that are not UTF-8.
 bool areAlike(const ZELO_SCHED_TASK &one, const ZELO_SCHED_TASK &other);

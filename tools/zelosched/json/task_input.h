@@ -1,4 +1,4 @@
-// One task as JSON, as a program that shows a form has it.
+// One task as JSON, as a program with a form passes it by --stdin or --preview.
 #pragma once
 
 #include <zelosched.h>
@@ -7,14 +7,14 @@
 
 #include "json/task_json.h"
 
-// Takes a file with one task and sets what it names, on the defaults or on a stored task, of which
-// nothing need be named, as fillTask does. Throws Failure for what is no JSON at all.
+// Reads a text with one task and sets the members that it has, as fillTask does. For a stored task
+// no member is required. Throws Failure for what is not JSON.
 void fillFromText(const std::string &text, ZELO_SCHED_TASK *task, JsonFaults *faults);
 
-// The same for who saves: every fault is told, and thrown as one Failure.
+// The same before a save: reports every fault, and throws one Failure.
 void fillFromText(const std::string &text, ZELO_SCHED_TASK *task);
 
-// No fault is in the schedule, or in what says where the task is.
+// Whether every fault is in a member of the task other than its schedule.
 bool isScheduleSound(const JsonFaults &faults);
 
 inline constexpr char kPlaceOfOnceDate[] = "tasks[0].schedule.date";

@@ -29,7 +29,7 @@ namespace {
 
 struct TextMember {
   const char *name;
-  const char *what;  // for people
+  const char *what;  // for messages
   char *(*field)(ZELO_SCHED_TASK &task);
   size_t capacity;
 };
@@ -69,7 +69,7 @@ constexpr FlagMember kUiFlags[] = {
 };
 constexpr int32_t kYes = 1;
 
-// Told by zelosched; passed over in a file.
+// Printed by zelosched, and ignored in a file.
 constexpr const char *kReadOnly[] = {"id",       "owner_uid", "next_run",
                                      "last_run", "running",   "problems"};
 
@@ -97,8 +97,8 @@ bool dateExists(uint32_t year, uint32_t month, uint32_t day) {
       .ok();
 }
 
-// The first day of the schedule on or after the start date. A zero stands for the beginning: of the
-// month, of the year, or for no start at all.
+// The first day of the schedule on or after the start date. A year of zero is no start date; a
+// month or a day of zero stands for the first.
 Json::Value startOf(const ZELO_SCHED_TASK &task) {
   if (task.StartYear == 0) return {};
   uint32_t year = task.StartYear;
@@ -174,7 +174,7 @@ Json::Value minuteOrNull(const std::optional<LocalMinute> &minute) {
   return minute ? jsonOf(*minute) : Json::Value();
 }
 
-// Of a run that the history does not know yet, the task is known here.
+// Adds the task's name and owner to a run that was recorded without them.
 RunRecord completed(const RunRecord &run, const ZELO_SCHED_TASK &task) {
   RunRecord record = run;
   if (record.taskName.empty()) record.taskName = task.Name;
@@ -195,7 +195,7 @@ bool isOneOf(const char *const (&names)[count], const std::string &name) {
   return std::find(std::begin(names), std::end(names), name) != std::end(names);
 }
 
-// An object whose members are taken one by one; those that nobody has asked for are none.
+// An object whose members are read one by one; finish() reports the others as unknown.
 class Members {
  public:
   Members(std::string place, const Json::Value &object, JsonFaults *faults,
@@ -219,7 +219,7 @@ class Members {
     return value;
   }
 
-  // One that this object cannot have, though others like it can.
+  // Reports a member that other objects of this kind may have, but not this one.
   void refuse(const char *name, const std::string &why) {
     if (find(name) != nullptr) faultOf(name, why);
   }
@@ -250,7 +250,7 @@ class Members {
   std::vector<std::string> asked_;
 };
 
-// Nothing when it is no text that can be stored, which is told.
+// Nothing, and a fault, for what is no text that can be stored.
 std::optional<std::string> readText(const Json::Value &value, const char *name, Members *members) {
   std::string fault;
   if (!value.isString()) {
@@ -402,9 +402,9 @@ void readRepetition(Members *members, ZELO_SCHED_TASK *task) {
     task->LastWorkHour = 0;
   } else if (every != nullptr) {
     if (task->RepeatHour == 0) task->LastWorkHour = kLastHourOfDay;
-    // More than a day is one run a day, as another program may have saved it.
+    // More than a day means one run a day; another program may have saved such a task.
     const auto hours = readNumber(*every, "every_hours", 1, UINT32_MAX, members);
-    task->RepeatHour = hours.value_or(1);  // which is told, and nothing else is to be because of it
+    task->RepeatHour = hours.value_or(1);  // avoids faults that follow from this one
   }
   if (until == nullptr) return;
   if (until->isNull()) {
@@ -422,7 +422,7 @@ void readRepetition(Members *members, ZELO_SCHED_TASK *task) {
   }
 }
 
-// The day that the schedule itself names; 0 for what it does not.
+// The date that the schedule itself has; 0 for each part that it has not.
 Date readDay(const std::string &type, Members *members) {
   Date day{};
   if (type == "once") {
@@ -528,7 +528,7 @@ void readSchedule(const Json::Value &value, const std::string &place, JsonFaults
   members.finish();
 }
 
-// In a file of many tasks their places are hard to count.
+// The name of the task, whose index is hard to find in a long file.
 std::string ownedText(Members *members) {
   const Json::Value *name = members->find(kName.name);
   const bool isNamed = name != nullptr && name->isString() && !name->asString().empty();

@@ -1,4 +1,4 @@
-// Tasks in the JSON vocabulary that zelosched-json(5) describes.
+// Tasks in the JSON format that zelosched-json(5) describes.
 #pragma once
 
 #include <json/value.h>
@@ -13,14 +13,14 @@
 
 // ---- writing --------------------------------------------------------------------------------
 
-// What a file of tasks holds of one.
+// The members of a task in a file of tasks.
 Json::Value settingsOf(const ZELO_SCHED_TASK &task);
 
-// All that is known of it. What this user may not see of its runs is left out.
+// All that is known of a task. Its runs are left out where this user may not see them.
 Json::Value jsonOf(const ZELO_SCHED_TASK &task, const std::optional<LocalMinute> &next,
                    const LatestRuns &runs);
 
-// A time at which the machine goes on or off.
+// A time at which the machine switches on or off.
 Json::Value powerTimeOf(const ZELO_SCHED_TASK &task, const std::optional<LocalMinute> &next);
 
 Json::Value jsonOf(const LocalMinute &minute);
@@ -42,16 +42,16 @@ struct TaskText {
   Json::Value object;
 };
 
-// The tasks of a file, whose top object is looked at. Throws Failure for what is no JSON at all.
+// The tasks of a file, whose top object is checked. Throws Failure for what is not JSON.
 std::vector<TaskText> taskTextsOf(const std::string &text, JsonFaults *faults);
 
-// Puts the times of the day of that task in place of those that the text has.
+// Replaces the times of day in the text by those of the task.
 void setTimes(const ZELO_SCHED_TASK &task, TaskText *text);
 
 // Sets what the text names, on the defaults or on a stored task. Members that are absent keep what
 // the task has; another kind of schedule, or another day of it, takes the start date away. Without
 // a fault the task is fit to be saved.
-enum class Needed { kAll, kNone };  // of what a file must say of each task
+enum class Needed { kAll, kNone };  // whether required members may be absent
 void fillTask(const TaskText &text, ZELO_SCHED_TASK *task, JsonFaults *faults,
               Needed needed = Needed::kAll);
 

@@ -31,7 +31,7 @@ struct FreeList {
   void operator()(QLIBC_SZLIST *list) const { QLIBCSzListFree(list); }
 };
 
-// The keys whose values are numbers, with what their fields hold; each of the others is a text.
+// The keys whose values are numbers, with the ranges of their fields; all others are texts.
 struct NumberKey {
   const char *key;
   int64_t least;
@@ -70,7 +70,7 @@ const NumberKey *numberKey(std::string_view key) {
   return found != std::end(kNumberKeys) ? found : nullptr;
 }
 
-// The text that a member of the doubly encoded form holds.
+// The text of a member that is itself encoded as JSON.
 bool decodeTwice(const Json::Value &member, std::string *text) {
   if (!member.isString()) return false;
   std::string errors;
@@ -87,7 +87,7 @@ bool isWireForm(const Json::Value &object) {
                      [&](const Json::Value &member) { return decodeTwice(member, &text); });
 }
 
-// One that does not fit would become another number: uid 0 of 4294967296.
+// A number that does not fit would wrap around: 4294967296 to uid 0.
 void requireNumber(const std::string &key, const std::string &text) {
   const NumberKey *known = numberKey(key);
   if (known == nullptr) return;
@@ -117,7 +117,7 @@ std::string memberText(const std::string &key, const Json::Value &member, bool i
   return text;
 }
 
-// Half a command is another command. What is no Base64 is left to the conversion.
+// Refuses a command that would be cut off. Invalid Base64 is left to the conversion.
 void requireWholeCommand(const std::string &encoded) {
   std::string command(encoded.size() + 1, '\0');
   size_t length = command.size();
@@ -135,7 +135,7 @@ struct Names {
   std::vector<std::string> names;
 };
 
-// What the hash form passes over must not become some other value.
+// The conversion ignores an unknown name, which would leave another value.
 void checkName(const std::string &key, const std::string &text) {
   static const Names kEnumerations[] = {
       {"state", {"disabled", "enabled"}},
@@ -176,7 +176,7 @@ void checkLength(const std::string &key, const std::string &text) {
 constexpr const char *kRequiredKeys[] = {"run hour", "run min", "name",  "app", "app name",
                                          "action",   "cmd",     "state", "type"};
 
-// What a schedule cannot do without; the library would take a default of its own.
+// The keys that a schedule needs; for a missing one the library would take a default.
 constexpr struct {
   const char *type;
   const char *key;

@@ -10,7 +10,7 @@ namespace Json {
 class Value;
 }
 
-// What is stored of a task, by its keys.
+// A key of the hash form of a task, and its value.
 struct StoredMember {
   std::string key;
   std::string value;
@@ -21,10 +21,9 @@ std::vector<StoredMember> storedMembersOf(const ZELO_SCHED_TASK &task);
 // The keys whose texts have bytes that JSON cannot carry.
 std::vector<std::string> lossyKeysOf(const ZELO_SCHED_TASK &task);
 
-// From the form of ZELOSchedTaskConvertToJson, which is told by its members being JSON texts
-// themselves, or from one of plain texts and numbers, with the command as "cmd" or in Base64 as
-// "cmd base64". Members that are no key are passed over; keys that are missing have the defaults of
-// the hash form. Throws Failure.
+// From the form of ZELOSchedTaskConvertToJson, whose members are JSON texts themselves, or from one
+// of plain texts and numbers, with the command as "cmd" or in Base64 as "cmd base64". Unknown
+// members are ignored; missing optional keys have the defaults of the hash form. Throws Failure.
 void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task);
 
 // The objects of a text: an array, one object, or one a line. Throws Failure, also for more of them

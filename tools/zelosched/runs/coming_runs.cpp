@@ -54,10 +54,9 @@ LocalMinute localMinute(time_t moment) {
   return {sys_days(date), fields.tm_hour, fields.tm_min};
 }
 
-// A minute begins by the distance from UTC that holds a day before it or by the one that holds a
-// day after it; where both lead to a moment, the first of these leads to the earlier one. mktime
-// finds that one only when it is told that the minute is in summer time, and then searches for
-// years where there is none: 40 us a minute instead of 0.2.
+// The minute has the UTC offset of a day before it or of a day after it; where both give a moment,
+// the former gives the earlier one. mktime() needs tm_isdst = 1 to find that one, and is slow with
+// it in a time zone without summer time.
 std::optional<time_t> momentOf(const LocalMinute &minute) {
   constexpr time_t kMinute = 60;
   constexpr time_t kHour = 60 * kMinute;

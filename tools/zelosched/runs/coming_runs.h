@@ -1,7 +1,7 @@
 // The minutes at which a task will run.
 //
-// The days and hours are the library's, but where the next trigger time that it works out for
-// display names a minute at which nothing runs, the next one at which something does is told here:
+// They follow the library's days and hours. They differ from its next trigger time, which is for
+// display, where the task does not run at that one:
 //   - a daily or weekly task whose start date is still ahead does not run before it;
 //   - cron passes over a month that lacks the day (the 31st of April is shown as 1 May), and over a
 //     weekly task without days;

@@ -55,7 +55,7 @@ Variables ownVariables() {
   return variables;
 }
 
-// Lines NAME=value, as they stand in all of these files; others are passed over.
+// Reads the lines NAME=value of a file, and ignores others.
 void addVariables(const char *path, Variables *variables) {
   std::ifstream file(path);
   std::string line;
@@ -96,7 +96,7 @@ int64_t cronProcess() {
   const bool isThere =
       pid && *pid > 0 && *pid <= INT32_MAX && QLIBCProcAlive(static_cast<pid_t>(*pid)) == kAlive;
   if (!isThere) return 0;
-  // A number that another program has got since must not pass for cron's.
+  // The pid in the file may be another program's by now.
   const std::string name = firstWord("/proc/" + std::to_string(*pid) + "/comm");
   return name.find("cron") == std::string::npos ? 0 : *pid;
 }

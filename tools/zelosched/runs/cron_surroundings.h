@@ -1,17 +1,17 @@
-// What cron gives the programs that it starts, so that a run by hand tells how the night will be.
+// The environment and the limits that cron gives to programs, for runs by hand.
 #pragma once
 
 #include <cstdint>
 #include <string>
 #include <vector>
 
-// "NAME=value": ours, with cron's own variables, the locale and time zone of the machine, and what
-// /etc/crontab sets in the place of ours. (Of the others none reaches a command.)
+// "NAME=value": our environment, with cron's own variables, the machine's locale and time zone, and
+// the settings of /etc/crontab in place of ours. (The library passes only some on to a command.)
 std::vector<std::string> environmentOfCron();
 
-// Gives this process the limits of cron's. Without a cron that runs they stay as they are. It
-// allocates nothing: a process that was forked may call it.
+// Sets the resource limits of this process to those of cron's; 0 changes nothing. It allocates
+// nothing, so that a forked child may call it.
 void takeLimitsOfCron(int64_t cron);
 
-// Its process; 0 when it does not run.
+// The process of cron; 0 when it does not run.
 int64_t cronProcess();

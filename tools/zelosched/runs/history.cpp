@@ -22,14 +22,14 @@ constexpr char kInsert[] =
     " ended, duration, state, outcome, exit_code, signal, output_bytes, boot, status_id, pid,"
     " pid_born, keeper, keeper_born, told, moment)"
     " VALUES(?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?, ?)";
-// When it was asked to stop is never taken back.
+// Without stop_asked, which noteStop() writes.
 constexpr char kUpdate[] =
     "UPDATE run SET task = ?, generation = ?, task_name = ?, app = ?, owner = ?, started_by = ?,"
     " due = ?, queued = ?, start = ?, ended = ?, duration = ?, state = ?, outcome = ?,"
     " exit_code = ?, signal = ?, output_bytes = ?, boot = ?, status_id = ?, pid = ?,"
     " pid_born = ?, keeper = ?, keeper_born = ?, told = ?, moment = ? WHERE run = ?";
 
-// The sweep's row of the same run.
+// Deletes the sweep's row of the same run.
 constexpr char kGiveWay[] =
     "DELETE FROM run WHERE start = ? AND status_id = ? AND pid = ? AND task = ? AND run <> ?";
 
@@ -98,7 +98,7 @@ std::optional<int64_t> generationOf(const KeptDatabase &kept, int64_t task) {
   return query.next() ? std::optional<int64_t>(query.number(0)) : std::nullopt;
 }
 
-// Of a task that is there, its own; of one that is not, all that had the id.
+// For an existing task, its own runs; for a removed one, all runs of tasks that had the id.
 std::string conditionOf(const KeptDatabase &kept, const RunFilter &filter,
                         std::vector<int64_t> *values) {
   std::string condition = " WHERE 1";
@@ -156,7 +156,7 @@ void dropOutputs(const KeptDatabase &kept, int64_t task, const Settings &setting
   }
 }
 
-// By the clock of today.
+// When the process was started, by the present clock.
 int64_t bornAt(const ProcessName &process) {
   timespec up{};
   clock_gettime(CLOCK_BOOTTIME, &up);
@@ -164,7 +164,7 @@ int64_t bornAt(const ProcessName &process) {
          process.born / sysconf(_SC_CLK_TCK);
 }
 
-// Whatever the clock says, of each task the newest stay, and never more than the total.
+// The newest runs of each task stay whatever their age, but no more than the total of all tasks.
 void dropRuns(const KeptDatabase &kept, const Settings &settings) {
   Query(kept,
         "DELETE FROM run WHERE state = 2 AND run IN (SELECT run FROM (SELECT run, moment,"
@@ -180,7 +180,8 @@ void dropRuns(const KeptDatabase &kept, const Settings &settings) {
       .run();
 }
 
-// Removed ones, with what was noted of them, when no run is left that may be theirs.
+// Drops tasks that were removed long ago, with their notices and acknowledgements, when no run of
+// that id is left.
 void dropTasks(const KeptDatabase &kept, const Settings &settings) {
   const int64_t dropped = Query(kept,
                                 "DELETE FROM task WHERE removed < ?"
@@ -233,10 +234,10 @@ std::vector<KeptRun> runsOf(const KeptDatabase &kept, const RunFilter &filter) {
   std::vector<KeptRun> runs;
   if (!kept.isThere()) return runs;
   std::vector<int64_t> values;
-  const std::string sql = "SELECT " COLUMNS " FROM run" + conditionOf(kept, filter, &values) +
-                          // The few that have not ended have an index of their own.
-                          (filter.underWay ? " ORDER BY +moment DESC" : " ORDER BY moment DESC") +
-                          ", run DESC LIMIT ?";
+  const std::string sql =
+      "SELECT " COLUMNS " FROM run" + conditionOf(kept, filter, &values) +
+      // Without the index of moments: runs under way have an index of their own.
+      (filter.underWay ? " ORDER BY +moment DESC" : " ORDER BY moment DESC") + ", run DESC LIMIT ?";
   Query query(kept, sql.c_str());
   for (const int64_t value : values) query.with(value);
   query.with(filter.limit);
@@ -297,7 +298,7 @@ void saveRun(const KeptDatabase &kept, KeptRun *run) {
     Query update(kept, kUpdate);
     bind(&update, *run);
     if (update.with(run->run).run() > 0) return;
-    run->run = 0;  // somebody has taken the database away meanwhile
+    run->run = 0;  // the database has been removed meanwhile
   }
   Query insert(kept, kInsert);
   bind(&insert, *run);

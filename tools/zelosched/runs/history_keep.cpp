@@ -29,7 +29,7 @@ class Sweep {
  public:
   Sweep(const RunDatabase &status, const TaskList &list) : status_(status), list_(list) {}
 
-  // In one transaction. How many rows of the history it added or changed.
+  // In one transaction. Returns how many rows of the history it added or changed.
   int64_t run(const KeptDatabase &kept);
   const std::vector<int64_t> &runsWithoutKeeper() const { return withoutKeeper_; }
 
@@ -52,7 +52,7 @@ class Sweep {
   std::vector<int64_t> withoutKeeper_;
 };
 
-// Noted by its keeper, which reads the row at the end alone.
+// The run in the history whose keeper has not read the row yet, which it does at the end.
 std::vector<KeptRun> underWayOf(const KeptDatabase &kept, const Run &row, const std::string &boot) {
   RunFilter filter;
   filter.underWay = true;
@@ -65,12 +65,12 @@ std::vector<KeptRun> underWayOf(const KeptDatabase &kept, const Run &row, const 
 
 bool isProcessAlive(const KeptRun &run) {
   if (run.process.born != 0) return isAlive(run.process);
-  // Of a row of which only the number is known.
+  // Only the pid is known.
   return run.process.pid > 0 && run.process.pid <= INT32_MAX &&
          isAlive(processNamed(run.process.pid));
 }
 
-// The column of the status database takes a name that reads as a number for one: 007 is 7 there.
+// The column of the status database has a numeric affinity: a name 007 is 7 there.
 bool isSameApp(const std::string &app, const std::string &recorded) {
   if (app == recorded) return true;
   char *end = nullptr;
@@ -107,10 +107,10 @@ void Sweep::takeOver(const KeptDatabase &kept, const Run &row) {
   std::vector<KeptRun> underWay = underWayOf(kept, row, boot_);
   if (!underWay.empty()) {
     KeptRun &run = underWay.front();
-    if (isAlive(run.keeper)) return;  // which writes it at the end
+    if (isAlive(run.keeper)) return;  // it writes the row at the end
     run.start = row.start;
     run.statusId = row.statusId;
-    run.state = RunState::kRunning;  // until somebody has looked after it
+    run.state = RunState::kRunning;  // until lookAfter() has looked at it
     save(kept, &run);
     return;
   }
@@ -122,7 +122,7 @@ void Sweep::takeOver(const KeptDatabase &kept, const Run &row) {
   takeStatus(row, &run);
   describe(&run);
   if (run.state == RunState::kRunning) run.process = processOf(row);
-  // Of runs that other programs have started only what nobody else sees is told.
+  // Of runs that other programs have started, only lost ones are reported.
   run.isTold = run.outcome != Outcome::kLost && run.state == RunState::kEnded;
   save(kept, &run);
 }
@@ -146,24 +146,24 @@ void Sweep::takeOver(const KeptDatabase &kept) {
       .run();
 }
 
-// In the status database.
+// The row of the run in the status database.
 std::optional<Run> Sweep::rowOf(const KeptRun &run) const {
   std::optional<Run> row =
       run.statusId ? status_.runOfId(*run.statusId) : status_.runOfProcess(run.process.pid, 0);
   if (!row || row->pid != run.process.pid || row->taskId != run.task) return std::nullopt;
-  // Before its row was read, a start is when a keeper saw it.
+  // Before its row was read, `start` is when its keeper saw it begin.
   const bool isItsTime =
       run.statusId ? row->start == run.start : run.queued && row->start >= *run.queued;
   return isItsTime ? row : std::nullopt;
 }
 
-// Written by the process last of all.
+// The run's process writes its row last of all.
 bool Sweep::isOverByItsRow(const KeptRun &run) const {
   const std::optional<Run> row = rowOf(run);
   return row && row->statusCode != ZELO_SCHED_STATUS_RUNNING;
 }
 
-// Its process is gone, and no keeper is there to say how it ended.
+// For a run whose process and keeper are gone: its row gives the outcome.
 void Sweep::endByRow(KeptRun *run) const {
   if (const std::optional<Run> row = rowOf(*run)) {
     takeStatus(*row, run);
@@ -193,7 +193,7 @@ void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
     run.state = RunState::kEnded;
   }
   if (run.trigger == Trigger::kOther && !run.isTold) run.isTold = run.outcome != Outcome::kLost;
-  // What its keeper had read by the time when that was killed.
+  // What its keeper had read before it was killed.
   OutputFile printed = OutputFile::open(run.process);
   run.outputBytes = std::max(run.outputBytes, printed.total());
   save(kept, &run);
@@ -201,7 +201,7 @@ void Sweep::lookAfter(const KeptDatabase &kept, KeptRun run) {
   printed.remove();
 }
 
-// The library leaves out what it cannot read, one task or all of them.
+// Whether the list has every stored task: the library leaves out those that it cannot read.
 bool isWhole(const TaskList &list) {
   const auto ordinary = std::count_if(list.tasks().begin(), list.tasks().end(),
                                       [](const TaskRecord *task) { return !isPower(*task); });
@@ -232,13 +232,13 @@ int64_t sweep(const TaskList &list) {
   return changed;
 }
 
-// The clock alone must not fill the log.
+// Prints nothing when nothing was kept, as the timer would fill the log with it.
 void sweepAndSay() {
   const int64_t count = sweep(TaskList(TaskList::Unreadable::kIsLeftOut));
   if (count > 0) std::printf("%s kept\n", counted(static_cast<size_t>(count), "run").c_str());
 }
 
-// Of two at once, one tells. It is noted first: better never than twice.
+// Marks the runs as told before that is done: a notice may be lost, but is not sent twice.
 std::vector<KeptRun> takeUntold(const KeptDatabase &kept) {
   Transaction transaction(kept);
   Query query(kept, "SELECT run FROM run WHERE told = 0 AND state = 2");
@@ -254,7 +254,7 @@ std::vector<KeptRun> takeUntold(const KeptDatabase &kept) {
   return untold;
 }
 
-// Each time once, also when nobody was to be told of it then.
+// Each missed time is taken once, also when there is no program to notify.
 std::vector<RunRecord> takeUntoldMissed(const KeptDatabase &kept, const TaskList &list) {
   std::vector<RunRecord> untold;
   const std::map<int64_t, TaskNote> notes = taskNotes(kept);
@@ -294,9 +294,9 @@ void forgetUntold() {
   takeUntoldMissed(kept, TaskList(TaskList::Unreadable::kIsLeftOut));
 }
 
-// What an administrator's programs need, such as a mailer, the unit of the sweep does not have.
+// The unit of the sweep restricts what an administrator's programs need, such as a mailer.
 void haveRunsToldOf() {
-  // Whoever is to be told from now on need not hear of what was long before.
+  // A program that is added later is not notified of earlier runs.
   if (!isAnybodyToBeTold()) {
     forgetUntold();
     return;

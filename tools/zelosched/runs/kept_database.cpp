@@ -17,14 +17,14 @@ namespace {
 constexpr char kPath[] = "/usr/zelo/var/history.sqlite";
 constexpr char kDirectory[] = "/usr/zelo/var";
 constexpr mode_t kDirectoryMode = 0755;
-constexpr mode_t kMode = 0600;  // command results are nobody else's business
+constexpr mode_t kMode = 0600;  // only root may read results of commands
 constexpr char kBootId[] = "/proc/sys/kernel/random/boot_id";
 constexpr int64_t kFirstVersion = 1;
 constexpr int64_t kVersion = 2;  // in user_version; 0 is a new database
 
-// A run has the number that no other run ever gets. The ids of the status database begin anew with
-// each boot, or when somebody removes that database, so that it takes all that never changes in a
-// row there to tell two runs apart. `moment` orders the runs: the start, or what was first known.
+// The number of a run is not reused. The ids of the status database begin anew with each boot, or
+// when that database is removed, so that all columns that do not change there together identify a
+// run. `moment` orders the runs: the start, or the first time that was known.
 constexpr char kSchema[] =
     "CREATE TABLE task(generation INTEGER PRIMARY KEY AUTOINCREMENT, task INTEGER NOT NULL,"
     " app TEXT NOT NULL, name TEXT NOT NULL, schedule TEXT NOT NULL, command TEXT NOT NULL,"
@@ -53,15 +53,15 @@ constexpr char kSchema[] =
     "CREATE TABLE swept(file TEXT PRIMARY KEY, status_id INTEGER NOT NULL) WITHOUT ROWID;"
     "CREATE TABLE notice(kind TEXT NOT NULL, generation INTEGER NOT NULL, moment INTEGER NOT NULL,"
     " told INTEGER NOT NULL, PRIMARY KEY(kind, generation, moment)) WITHOUT ROWID;"
-    // `began`: when the machine was started, by the clock of the last look.
+    // `began`: when the machine was started, by the clock of the last sweep.
     "CREATE TABLE boot(boot TEXT PRIMARY KEY, started INTEGER, began INTEGER NOT NULL,"
     " seen INTEGER NOT NULL, clock_from INTEGER, clock_until INTEGER) WITHOUT ROWID;"
     "CREATE TABLE acknowledged(generation INTEGER PRIMARY KEY, moment INTEGER NOT NULL,"
     " run INTEGER NOT NULL);"
     "PRAGMA user_version = 2;";
 
-// The numbers in the last two are RunState, Outcome and Trigger of run_record.h. Of the runs of
-// then, only the start and the code are known, and everybody has been told.
+// Converts a database of version 1. The numbers are those of RunState, Outcome and Trigger
+// (run_record.h). Only start and code of these runs are known, and no notices are sent of them.
 constexpr char kFromFirst[] =
     "INSERT INTO run(task, task_name, app, owner, started_by, start, state, outcome, exit_code,"
     " signal, output_bytes, moment, boot, status_id, pid, told)"
@@ -78,7 +78,7 @@ Failure cannot(const char *what, const char *why) {
   return Failure(std::string("cannot ") + what + " " + kPath + ": " + why);
 }
 
-// Busy is something else than damaged: it passes.
+// A busy database is a temporary failure.
 [[noreturn]] void fail(const char *what, sqlite3 *db) {
   const char *const why = sqlite3_errmsg(db);
   if (sqlite3_errcode(db) == SQLITE_BUSY) throw DatabaseBusy(cannot(what, why).what());
@@ -94,7 +94,7 @@ void makeDirectories() {
   }
 }
 
-// SQLite would give it the mode of the day.
+// SQLite would create it with a mode that depends on the umask.
 void makeFile() {
   makeDirectories();
   const int file = open(kPath, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kMode);
@@ -122,8 +122,8 @@ void requireOurFile() {
   }
 }
 
-// A data volume may stand behind a link of root's to the directory, where SQLite, told to follow no
-// link, would follow none of these either.
+// The directory may be a link of root's to a data volume. It is resolved first, as SQLite is told
+// to follow no link at all.
 std::string pathBehindLinks() {
   const std::unique_ptr<char, decltype(&std::free)> directory(realpath(kDirectory, nullptr),
                                                               std::free);
@@ -179,8 +179,7 @@ KeptDatabase::KeptDatabase(Access access, std::chrono::milliseconds patience) {
   const int64_t version = versionOf(*this);
   if (version > kVersion) throw cannot("read", "a later zelosched made it");
   if (version == kVersion) return;
-  // What cannot be written, such as a file system that is read-only, cannot be brought to this
-  // version either.
+  // An older version is converted for reading too; a database without tables is like none.
   if (access == kChange || version == kFirstVersion) {
     makeTables(*this);
   } else {
@@ -277,7 +276,7 @@ void Transaction::commit() {
   isCommitted_ = true;
 }
 
-// Within a transaction that is the case already.
+// Within a transaction there is a snapshot already.
 Snapshot::Snapshot(const KeptDatabase &database)
     : database_(database),
       isOurs_(database.isThere() && sqlite3_get_autocommit(database.get()) != 0) {

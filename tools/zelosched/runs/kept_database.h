@@ -14,13 +14,13 @@
 struct sqlite3;
 struct sqlite3_stmt;
 
-// The database is there, and this user has not the rights to read it.
+// Whether the database is there, and this user has not the rights to read it.
 bool isKeptFromUs();
 
-// The kernel's name of this boot. Throws Failure.
+// The kernel's id of this boot. Throws Failure.
 std::string bootId();
 
-// Another process has the database to itself for longer than we wait.
+// Another process has locked the database for longer than we wait.
 class DatabaseBusy : public Failure {
  public:
   using Failure::Failure;
@@ -31,8 +31,8 @@ class KeptDatabase {
   enum Access { kRead, kChange };
   static constexpr std::chrono::milliseconds kUsualPatience{10000};
 
-  // For reading null inside when there is no database yet; for a change it is made, and one of an
-  // earlier version is brought to this one. Throws Failure.
+  // Without a database, isThere() is false for reading, and a change creates it. One of an earlier
+  // version is converted. Throws Failure.
   explicit KeptDatabase(Access access, std::chrono::milliseconds patience = kUsualPatience);
 
   bool isThere() const { return db_ != nullptr; }
@@ -45,12 +45,12 @@ class KeptDatabase {
   std::unique_ptr<sqlite3, Close> db_;
 };
 
-// One statement of it, which may be run several times. Each call throws Failure.
+// A prepared statement, which may be run several times. Each call throws Failure.
 class Query {
  public:
   Query(const KeptDatabase &database, const char *sql);
 
-  // The next parameter.
+  // Binds the next parameter.
   Query &with(int64_t number);
   Query &with(std::optional<int64_t> number);
   Query &with(std::optional<double> number);
@@ -59,7 +59,7 @@ class Query {
 
   // To the next row. False at the end, and it can be run again.
   bool next();
-  // Of a statement without rows: how many it changed.
+  // Runs a statement to its end. Returns how many rows it changed.
   int64_t run();
 
   int64_t number(int column) const;
@@ -80,7 +80,7 @@ class Query {
   int parameters_ = 0;
 };
 
-// What is changed while one lives takes effect by commit(), all of it, or not at all.
+// A write transaction, which is rolled back unless commit() is called.
 class Transaction {
  public:
   explicit Transaction(const KeptDatabase &database);
@@ -94,7 +94,7 @@ class Transaction {
   bool isCommitted_ = false;
 };
 
-// What is read while one lives is of one moment, and is locked once and not for each statement.
+// A read transaction: its statements see one snapshot, and share one lock.
 class Snapshot {
  public:
   explicit Snapshot(const KeptDatabase &database);

@@ -35,8 +35,8 @@ const RunRecord *LatestRuns::of(int64_t task) const {
   return found == ofEach.end() ? nullptr : &found->second;
 }
 
-// What the sweep cannot take over, since somebody is in the way of the status database in "/tmp",
-// say, is told, and what is known is shown all the same.
+// When the sweep fails, such as for another user's file in "/tmp", that is reported, and the
+// history is shown all the same.
 LatestRuns latestRuns(const TaskList &list) {
   LatestRuns latest;
   if (!mayReadAllRuns()) return latest;
@@ -53,7 +53,7 @@ LatestRuns latestRuns(const TaskList &list) {
     underWay.ofTasksOfToday = true;
     for (KeptRun &run : runsOf(kept, underWay)) {
       latest.running.insert(run.task);
-      // The one that goes on for longest: later ones wait for it.
+      // Newest first: the one that has been running longest stays.
       if (run.state == RunState::kRunning) latest.ofEach[run.task] = std::move(run);
     }
     latest.isKnown = true;

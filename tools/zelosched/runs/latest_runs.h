@@ -1,4 +1,4 @@
-// The last run of each task, for those that show tasks.
+// The last run of each task, for commands that show tasks.
 #pragma once
 
 #include <cstdint>
@@ -12,8 +12,8 @@
 struct LatestRuns {
   bool isKnown = false;                 // this user may read the runs, and they can be read
   std::string fault;                    // what failed, where this user may read them
-  std::map<int64_t, RunRecord> ofEach;  // the last, or the one that goes on
-  std::set<int64_t> running;            // the tasks that have a run which goes on
+  std::map<int64_t, RunRecord> ofEach;  // the last run, or the one that is running
+  std::set<int64_t> running;            // the tasks with a run that waits or is running
 
   const RunRecord *of(int64_t task) const;
 };

@@ -13,9 +13,9 @@
 namespace {
 
 constexpr int64_t kMinute = 60;          // seconds
-constexpr int64_t kGrace = 2 * kMinute;  // in which cron's program may still begin
+constexpr int64_t kGrace = 2 * kMinute;  // in which the program that cron starts may still begin
 constexpr int64_t kClockMoved = 2 * kMinute;
-constexpr int64_t kBetweenLooks = 11 * kMinute;  // of the sweep, which is late by a minute at most
+constexpr int64_t kBetweenLooks = 11 * kMinute;  // of the sweep: its timer's period and accuracy
 
 int64_t uptime() {
   timespec up{};
@@ -28,8 +28,8 @@ int64_t epoch() {
 }
 
 struct Boot {
-  std::optional<int64_t> started;  // the look before cron was started
-  int64_t began = 0;               // by the clock of the last look
+  std::optional<int64_t> started;  // when restore ran, before cron was started
+  int64_t began = 0;               // by the clock of the last sweep
   bool wasClockSet = false;
 };
 
@@ -40,8 +40,8 @@ std::optional<Boot> bootOf(const KeptDatabase &kept, const std::string &id) {
   return Boot{query.optionalNumber(0), query.number(1), query.optionalNumber(2).has_value()};
 }
 
-// The first time in a boot that the clock was set, it was wrong before. Later on somebody has
-// changed the time, and what was due before was due.
+// The first jump of the clock in a boot means that it was wrong before. A later one is a change by
+// hand: earlier due times were right.
 void noteClock(const KeptDatabase &kept, const std::string &id, const Boot &boot, int64_t now) {
   const int64_t began = now - uptime();
   const bool hasMoved = std::abs(began - boot.began) > kClockMoved;
@@ -64,7 +64,7 @@ struct Span {
   int64_t until;
 };
 
-// In which the clock was wrong.
+// The spans in which the clock was wrong.
 std::vector<Span> unjudgedSpans(const KeptDatabase &kept) {
   std::vector<Span> spans;
   Query query(kept, "SELECT clock_from, clock_until FROM boot WHERE clock_until IS NOT NULL");
@@ -72,7 +72,7 @@ std::vector<Span> unjudgedSpans(const KeptDatabase &kept) {
   return spans;
 }
 
-// In which the machine was on, as far as is known, in their order.
+// The spans in which the machine was on, as far as is known, in their order.
 std::vector<Span> spansUp(const KeptDatabase &kept, int64_t now) {
   std::vector<Span> spans;
   const std::string current = bootId();
@@ -88,7 +88,7 @@ bool isIn(const std::vector<Span> &spans, time_t moment) {
                      [&](const Span &span) { return moment >= span.from && moment < span.until; });
 }
 
-// Between two boots it was off, but for the minutes after the last look at the first of them.
+// Between two boots it was off, except for the minutes after the last sweep of the first one.
 MachineThen machineAt(const std::vector<Span> &up, time_t moment) {
   if (isIn(up, moment)) return MachineThen::kOn;
   const auto isOff = [&](const Span &before, const Span &after) {
@@ -98,7 +98,7 @@ MachineThen machineAt(const std::vector<Span> &up, time_t moment) {
                                                                      : MachineThen::kOff;
 }
 
-// Up to which moment a time that was passed over counts as missed.
+// The moment up to which a time without a run counts as missed.
 int64_t judgedUntil(const KeptDatabase &kept, int64_t now) {
   const std::optional<Boot> boot = bootOf(kept, bootId());
   const int64_t certain = boot && boot->started ? *boot->started : 0;
@@ -146,7 +146,7 @@ class Judge {
     const std::optional<time_t> due = momentOf(minute);
     if (!due) return;
     if (isIn(unjudged_, *due)) return;
-    // Somebody may have switched it on between its power times.
+    // The machine may have been switched on by hand between its power times.
     if (off_.isOffAt(minute) && !isIn(up_, *due)) {
       ++missed->planned;
     } else {
@@ -169,7 +169,7 @@ class Judge {
 
 }  // namespace
 
-// No time of theirs may count as passed over until they are.
+// Until the tasks are in /tmp, none of their times counts as missed.
 bool areTasksLost() {
   struct stat info {};
   const bool isThere = lstat(kWorkingCopy, &info) == 0 && info.st_size > 0;

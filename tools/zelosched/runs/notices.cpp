@@ -28,7 +28,7 @@ constexpr char kRunDirectory[] = "/run/zelosched";
 constexpr char kFaults[] = "/run/zelosched/notices";
 constexpr char kOutputPattern[] = "/run/zelosched/told.XXXXXX";
 
-// Nobody else can change it, or what it leads to: the directory is root's too.
+// Whether only root can change it. The directory is checked too, as its entries may be links.
 bool isRootsAlone(const struct stat &info) {
   return info.st_uid == 0 && (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
 }
@@ -49,7 +49,7 @@ std::vector<std::string> namesIn(const char *directory) {
   return names;
 }
 
-// Those that can be told; of the others a line in the system log.
+// The programs that can be run. Logs why the others cannot.
 std::vector<std::string> programs() {
   std::vector<std::string> found;
   for (const NoticeProgram &program : noticePrograms()) {
@@ -62,7 +62,7 @@ std::vector<std::string> programs() {
   return found;
 }
 
-// Where it stands how a program failed; /run is empty when the machine starts.
+// The file that has the fault of a program; /run is empty after a boot.
 std::string markOf(const std::string &program) {
   return kFaults + program.substr(program.rfind('/'));
 }
@@ -82,7 +82,7 @@ void noteFault(const std::string &program, const std::string &fault) {
   }
 }
 
-// What was printed, with a line in place of what was not kept. Gone with the object.
+// A temporary file with what was printed, and a line in place of what was not kept.
 class OutputOnDisk {
  public:
   explicit OutputOnDisk(const Output &output) {
@@ -164,7 +164,7 @@ Environment environmentOf(const RunRecord &run, const char *outputPath, bool isR
   return all;
 }
 
-// 0, and why, when it could not be started.
+// The pid; 0, and the fault, when it could not be started.
 pid_t start(const std::string &program, Environment environment, std::string *fault) {
   posix_spawnattr_t attributes;
   posix_spawn_file_actions_t actions;
@@ -194,8 +194,7 @@ pid_t start(const std::string &program, Environment environment, std::string *fa
   return 0;
 }
 
-// False when it went on for too long. Looks now and then: what else would tell of the end, such as
-// a file of the process, can be refused, and then nothing would end the wait.
+// False when it ran for too long. Polls: a pidfd can be refused, and the wait must have an end.
 bool waitForEnd(pid_t pid) {
   const auto until = std::chrono::steady_clock::now() + kPatience;
   for (;;) {
@@ -219,8 +218,8 @@ std::string faultOfRun(const std::string &program, const Environment &environmen
   const pid_t pid = start(program, environment, &fault);
   if (pid == 0) return fault;
   const bool isDone = waitForEnd(pid);
-  // With all its group, which lives on as long as its leader has not been waited for. What a
-  // program that ended in time has left in the background, such as a delivery, goes on.
+  // The process group, whose id is valid until its leader is waited for. Background processes of a
+  // program that ended in time, such as a mail delivery, go on.
   if (!isDone) kill(-pid, SIGKILL);
   int status = 0;
   while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {

@@ -13,7 +13,7 @@
 namespace {
 
 constexpr char kDirectory[] = "/run/zelosched";
-constexpr mode_t kDirectoryMode = 0700;  // what commands print is nobody else's business
+constexpr mode_t kDirectoryMode = 0700;  // only root may read what commands print
 constexpr mode_t kMode = 0600;
 constexpr char kMagic[8] = {'z', 'e', 'l', 'o', 'o', 'u', 't', '1'};
 
@@ -95,7 +95,7 @@ bool OutputFile::readHeader(Header *header) const {
          header->last >= 0 && header->total >= 0;
 }
 
-// The first bytes stand first; the others go round behind them.
+// The first bytes are at the beginning, the last ones in a ring buffer behind them.
 void OutputFile::append(std::string_view bytes) {
   if (!isOpen()) return;
   const auto size = static_cast<int64_t>(bytes.size());
@@ -128,7 +128,7 @@ int64_t OutputFile::total() const {
   return isOpen() && readHeader(&header) ? header.total : 0;
 }
 
-// Within the first bytes, or within the last ones that are still there.
+// A range of the first bytes, or of the last ones that are still in the ring buffer.
 std::string OutputFile::read(const Header &header, int64_t from, int64_t to) const {
   std::string bytes;
   while (from < to) {

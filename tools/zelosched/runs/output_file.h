@@ -1,6 +1,6 @@
 // What a run has printed so far: its first bytes and its last ones, in a file in /run/zelosched
-// that its keeper writes and others may look at. It outlives a keeper that is killed, takes none of
-// its memory, and has a bound whatever the run prints.
+// that its keeper writes and root's other programs can read. It outlives a keeper that is killed,
+// and its size is bounded.
 #pragma once
 
 #include <cstdint>
@@ -12,10 +12,10 @@
 
 class OutputFile {
  public:
-  // A new one for the run of that process. Where none can be made it is in memory, and others
-  // cannot see it. It is there until it is removed. Not isOpen() when there is not even memory.
+  // Creates the file for the run of that process. Where that fails it is a memfd, which others
+  // cannot see. The file stays until remove(). Not isOpen() when there is no memfd either.
   static OutputFile make(const ProcessName &process, int64_t first, int64_t last);
-  // That of a run that goes on, to be read, or to be written on.
+  // The file of a run under way, to be read or appended to.
   static OutputFile open(const ProcessName &process);
 
   OutputFile() = default;
@@ -32,7 +32,7 @@ class OutputFile {
   // Bytes that were printed, kept or not.
   int64_t total() const;
   Output contents() const;
-  // Those from `from` on, and of those that are not there any more, how many.
+  // The bytes from `from` on, and in `lost` how many of them are not kept any more.
   std::string since(int64_t from, int64_t *lost) const;
 
  private:
@@ -46,6 +46,6 @@ class OutputFile {
   std::string read(const Header &header, int64_t from, int64_t to) const;
 
   int file_ = -1;
-  std::string path_;  // none of one in memory
+  std::string path_;  // empty for a memfd
   Header header_ = {};
 };

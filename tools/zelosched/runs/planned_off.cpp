@@ -41,6 +41,6 @@ bool PlannedOff::isOffAt(const LocalMinute &minute) const {
   const auto next = std::find_if(events_.begin(), events_.end(), [&](const Event &event) {
     return event.minuteOfWeek >= minuteOfWeek(minute);
   });
-  // Before the first one of the week it is as the last one left it.
+  // Before the first event of the week, the last one counts.
   return next == events_.begin() ? events_.back().isOff : std::prev(next)->isOff;
 }

@@ -11,8 +11,8 @@ class PlannedOff {
   // By the enabled power times of the list.
   explicit PlannedOff(const TaskList &list);
 
-  // The last power time before that minute switches the machine off. One that switches it on in
-  // this very minute comes too late: the machine is still starting.
+  // Whether the last power time before that minute switches the machine off. One that switches it
+  // on in this minute comes too late, as the machine is still starting.
   bool isOffAt(const LocalMinute &minute) const;
 
  private:

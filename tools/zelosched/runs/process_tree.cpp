@@ -10,11 +10,10 @@
 
 namespace {
 
-// Whatever appears faster than it is found.
+// Against processes that appear faster than they are found.
 constexpr int kMostRounds = 1000;
 
-// No descriptor is held from one call to the next: a run may have more processes than we may open
-// files.
+// No pidfd is kept open: a run may have more processes than we may open files.
 void send(pid_t pid, unsigned long long started, int number) {
   const int file = static_cast<int>(syscall(SYS_pidfd_open, pid, 0));
   if (file < 0) return;
@@ -36,7 +35,7 @@ ProcessTree::ProcessTree(pid_t root, std::set<pid_t> spared)
 ProcessTree::ProcessTree(pid_t root, std::set<pid_t> spared, std::set<pid_t> passedOver)
     : root_(root), spared_(std::move(spared)), passedOver_(std::move(passedOver)) {}
 
-// A keeper's child that tells of the end of its run, with the programs below it.
+// Whether it is a keeper's child that runs the notice programs.
 bool ProcessTree::isOfKeeper(pid_t pid) const {
   return !passedOver_.empty() && passedOver_.count(pid) == 0 && isOfRoot(pid) &&
          isOfSameProgram(pid, root_);
@@ -60,7 +59,7 @@ size_t ProcessTree::look() {
       if (passedOver_.count(pid) == 0 && !isEnded(all.at(pid))) there.insert(pid);
     }
   }
-  // One that its parent has left to somebody else is not below the root any more, but ours still.
+  // A process that was reparented is not below the root any more, but still one of the run's.
   std::erase_if(found_, [&](const auto &known) {
     const auto now = all.find(known.first);
     const bool isThere =

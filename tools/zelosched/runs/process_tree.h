@@ -6,23 +6,23 @@
 #include <map>
 #include <set>
 
-// A process is known by its number and by when it was started, so that no signal meets another one
-// that has got its number. Each call throws Failure where the processes cannot be listed.
+// A process is identified by its pid and its start time, so that no signal reaches another one that
+// reuses the pid. Each call throws Failure where the processes cannot be listed.
 class ProcessTree {
  public:
   // Those below `root`, without it, without `spared` ones and what is below these.
   explicit ProcessTree(pid_t root, std::set<pid_t> spared = {});
-  // Of a keeper: without the run's own process, but with what is below it, and without what the
-  // keeper has started to tell of the run's end.
+  // For a keeper: without the run's own process and the notice programs, but with the processes
+  // below the former.
   ProcessTree(pid_t root, std::set<pid_t> spared, std::set<pid_t> passedOver);
 
-  // How many there are by now.
+  // Lists the processes again. Returns how many there are.
   size_t look();
-  // To each that there is, also to those that appear meanwhile.
+  // Sends a signal to each, also to those that appear meanwhile.
   void signal(int number);
-  // To those that have appeared since. To how many it went.
+  // Sends it to those that have appeared since. Returns how many these are.
   size_t signalNew(int number);
-  // Ends all: first none may start another one any more.
+  // Kills all, after stopping them, so that none starts another one.
   void killAll();
 
  private:

@@ -17,7 +17,7 @@
 
 namespace {
 
-// Of a process that ends meanwhile reading fails, which a stream would throw.
+// Empty when reading fails, as it does for a process that has just ended.
 std::string textOf(const std::string &path) {
   constexpr size_t kEnough = 4096;  // for a status page
   const int file = open(path.c_str(), O_RDONLY | O_CLOEXEC);
@@ -32,7 +32,7 @@ std::string textOf(const std::string &path) {
 ProcessStat statOf(const std::string &pid) {
   constexpr int kFieldsBetween = 17;  // between the parent and the start in /proc/PID/stat
   const std::string text = textOf("/proc/" + pid + "/stat");
-  const size_t name = text.rfind(')');  // the name before it may hold anything
+  const size_t name = text.rfind(')');  // the name before it may have any character
   if (name == std::string::npos) return {};
   std::istringstream fields(text.substr(name + 1));
   ProcessStat stat;
@@ -94,7 +94,7 @@ bool hasChild(pid_t pid) {
 bool isOfRoot(pid_t pid) {
   std::istringstream status(textOf("/proc/" + std::to_string(pid) + "/status"));
   const std::string label = "Uid:";
-  std::string line;  // the first one has a name that the process chooses
+  std::string line;  // the first has a name that the process chooses
   while (std::getline(status, line) && !line.starts_with(label)) {
   }
   std::istringstream ids(line.substr(std::min(label.size(), line.size())));

@@ -1,4 +1,4 @@
-// What /proc tells of processes.
+// Processes, as /proc shows them.
 #pragma once
 
 #include <sys/types.h>
@@ -13,25 +13,24 @@ struct ProcessStat {
 };
 
 ProcessStat statOf(pid_t pid);
-// Of all. Throws Failure.
+// All processes. Throws Failure.
 std::map<pid_t, ProcessStat> processes();
 
-// Ours. Throws Failure.
+// Our children. Throws Failure.
 std::map<pid_t, ProcessStat> children();
 
-// Those of another process, in the order in which they began.
+// The children of another process, in the order in which they began.
 std::vector<pid_t> childrenOf(pid_t pid);
 bool hasChild(pid_t pid);
 
-// What a command leaves behind becomes ours, and may be older than the next run's process. But it
-// cannot have root's saved user id, which a run's process keeps as its way back.
+// Whether the saved user id is root's, as a run's process keeps it. Orphans of commands, which
+// become our children too, have another one unless they are root's or set-uid programs.
 bool isOfRoot(pid_t pid);
 
-// Whether it runs the program that we run, as a child does that was forked and has started no
-// other. A set-uid program that a command has started is of root too. True also where we may not
-// look, as in a container without CAP_SYS_PTRACE.
+// Whether its executable is ours, as that of a forked child is until it calls exec(). True also
+// where we may not read that, as in a container without CAP_SYS_PTRACE.
 bool isOfOurProgram(pid_t pid);
 bool isOfSameProgram(pid_t pid, pid_t other);
 
-// Whether it has ended, and waits for its parent to ask how. It has no program any more.
+// Whether it is a zombie, which has no executable any more.
 bool isOver(pid_t pid);

@@ -1,4 +1,4 @@
-// What a keeper tells the one who waits for its run, a line each:
+// The events that a keeper writes to a process that waits for its run, one a line:
 //
 //   run 12              the run's number in the history, where it could be written
 //   process 345 6789    the run's own process
@@ -17,13 +17,13 @@
 // What the lines so far say.
 struct RunEvents {
   KeptRun run;
-  bool isKnown = false;  // its process is there
+  bool isKnown = false;  // the run's process is known
   bool isWaiting = false;
   bool isRunning = false;
   bool isEnded = false;
   int64_t waitsFor = 0;
 
-  // Of a line without its end; what it does not know it passes over.
+  // Takes a line, without its line feed, and ignores an unknown one.
   void take(std::string_view line);
 };
 

@@ -13,13 +13,13 @@
 
 namespace {
 
-constexpr size_t kMostAtOnce = size_t{64} << 10;  // what a pipe holds
+constexpr size_t kMostAtOnce = size_t{64} << 10;  // the usual capacity of a pipe
 constexpr int kPause = 50;                        // milliseconds
 
 }  // namespace
 
 RunOutput::RunOutput(int reading) : reading_(reading), isForTerminal_(isTerminal()) {
-  std::fflush(stdout);  // what was printed before comes before
+  std::fflush(stdout);  // what was printed before must come first
 }
 
 bool RunOutput::pass(std::chrono::milliseconds time) {
@@ -51,7 +51,7 @@ void RunOutput::finish() {
   cutCharacter_.clear();
 }
 
-// A run is not held up by what cannot be written any more: the rest is read, and forgotten.
+// After an error the rest is read and dropped, so that the run does not block.
 void RunOutput::writeAll(std::string_view bytes) {
   size_t written = 0;
   while (written < bytes.size() && fault_.empty()) {

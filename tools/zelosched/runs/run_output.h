@@ -1,6 +1,6 @@
-// What a run prints, on its way from its keeper to our standard output. What goes to a terminal is
-// made printable, but for line feeds and tabs; elsewhere it goes unchanged. No more of it is held
-// than was read at once.
+// Passes what a run prints from its keeper to our standard output. For a terminal it is made
+// printable, except for line feeds and tabs; otherwise it is unchanged. Only what is read at once
+// is in memory.
 #pragma once
 
 #include <chrono>
@@ -11,11 +11,10 @@ class RunOutput {
  public:
   explicit RunOutput(int reading);
 
-  // Waits so long for something to pass on, and does so. False at the end of all, or after a
-  // signal.
+  // Waits so long for bytes, and passes them on. False at their end, or after a signal.
   bool pass(std::chrono::milliseconds time);
   void show(std::string_view bytes);
-  // What there is of a character whose rest did not come.
+  // Writes what there is of a character whose rest did not come.
   void finish();
 
   // Why not all of it could be written; empty when it could.

@@ -1,4 +1,4 @@
-// A run as the history tells of it.
+// A run as it is in the history.
 #pragma once
 
 #include <cstdint>
@@ -7,7 +7,7 @@
 
 enum class Trigger { kSchedule, kManual, kCatchUp, kOther };
 enum class RunState { kWaiting, kRunning, kEnded };
-// An exit status has the same name, which a scoped one does not hide.
+// kFailed is an exit status too, which a scoped enumerator does not hide.
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wshadow"
 enum class Outcome {
@@ -17,7 +17,7 @@ enum class Outcome {
   kKilled,      // a signal ended it
   kNotStarted,  // the command could not be started
   kTimeLimit,
-  kGaveUp,     // it waited for other runs for too long
+  kGaveUp,     // it waited too long for other runs
   kCancelled,  // by 'stop', while it waited
   kStopped,    // by 'stop', while it ran
   kLost,       // its process is gone, and nobody saw how it ended
@@ -25,11 +25,11 @@ enum class Outcome {
 #pragma GCC diagnostic pop
 
 struct RunRecord {
-  int64_t run = 0;  // its number in the history, which no other run ever gets
+  int64_t run = 0;  // its number in the history, which is not reused
   int64_t task = 0;
-  std::string taskName;  // as it was when the run was noted
+  std::string taskName;  // as it was when the run was recorded
   std::string app;
-  std::string owner;  // his name, or his number when he has none
+  std::string owner;  // the user's name, or the uid without one
   Trigger trigger = Trigger::kOther;
   RunState state = RunState::kWaiting;
   Outcome outcome = Outcome::kNone;
@@ -38,13 +38,13 @@ struct RunRecord {
   std::optional<int64_t> queued;
   std::optional<int64_t> start;
   std::optional<int64_t> end;
-  std::optional<double> duration;  // seconds, by a clock that nobody sets
+  std::optional<double> duration;  // seconds; where a keeper saw the start, by CLOCK_BOOTTIME
   std::optional<int> exitCode;
   std::optional<int> signal;
   int64_t outputBytes = 0;  // all that it printed, also what was not kept
 };
 
-// "time-limit" and the like: the words of every output.
+// "time-limit" and the like, for every output.
 const char *nameOf(Trigger trigger);
 const char *nameOf(RunState state);
 const char *nameOf(Outcome outcome);

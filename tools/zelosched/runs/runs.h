@@ -1,5 +1,4 @@
-// The runs that the library has recorded. The status database is read only: SELECT, and never made
-// by a look at it.
+// The runs that the library has recorded. The status database is only read, and not created.
 #pragma once
 
 #include <cstdint>
@@ -21,14 +20,13 @@ struct Run {
   std::string comment;
 };
 
-// By its record it goes on, but its process does not.
+// Whether its record says running, but its process is gone.
 bool isGone(const Run &run);
 
-// Names the status database in use, which is gone with the boot at the latest. Empty when there is
-// none.
+// Identifies the status database by boot, device and inode. Empty when there is none.
 std::string runDatabaseName();
 
-// This user has the rights to read the status database, or will have when it is there.
+// Whether this user has the rights to read the status database, or will have when it is there.
 bool mayReadRuns();
 
 class RunDatabase {
@@ -47,8 +45,7 @@ class RunDatabase {
   // Recorded after that one, in the order of their ids.
   std::vector<Run> after(int64_t statusId) const;
   std::optional<Run> runOfId(int64_t statusId) const;
-  // A live run that keeps one of this task, and of this application, waiting; either may be asked
-  // for. Not that of this process.
+  // A run, other than that of process `pid`, for which one of this task or application has to wait.
   std::optional<Run> inTheWayOf(std::optional<int64_t> taskId, std::optional<std::string> app,
                                 int64_t pid) const;
   // The run of a process that was recorded after `statusId`; the last one.

@@ -28,7 +28,7 @@ struct Setting {
   int64_t most;
 };
 
-// A keeper holds what it keeps of a run in a file in memory, hence the bounds on the bytes of one.
+// A keeper's output file is in memory (/run), hence the bounds on its size.
 constexpr Setting kSettings[] = {
     {"output-first", &Settings::outputFirst, Kind::kBytes, 0, int64_t{16} << 20},
     {"output-last", &Settings::outputLast, Kind::kBytes, 0, int64_t{16} << 20},

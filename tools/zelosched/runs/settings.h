@@ -22,8 +22,8 @@ struct Settings {
 // What is wrong with the file, a sentence a line of it; empty when nothing is.
 using SettingsFaults = std::vector<std::string>;
 
-// Lines that are wrong are passed over.
+// Lines that are wrong are ignored.
 Settings readSettings(SettingsFaults *faults);
 
-// For the tools: what is wrong is said on standard error.
+// For the tools: reports faults on standard error.
 Settings settingsOrComplaints();

@@ -1,4 +1,4 @@
-// How long a time is, as an option says it.
+// Spans of time, as options give them.
 #pragma once
 
 #include <cstdint>

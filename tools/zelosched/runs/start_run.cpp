@@ -36,7 +36,7 @@ struct Pipe {
   int writing = -1;
 };
 
-// Both above the standard streams, whatever of these the caller has closed.
+// Both are above the standard streams, of which main opens those that the caller has closed.
 Pipe makePipe() {
   int ends[2];
   if (pipe2(ends, O_CLOEXEC) != 0) {
@@ -52,7 +52,7 @@ std::vector<char *> pointersTo(std::vector<std::string> *words) {
   return pointers;
 }
 
-// The process that starts the program. Signals are as cron leaves them.
+// The child executes the program, with the signals as cron leaves them.
 [[noreturn]] void becomeProgram(char *const *argv, char *const *envp, const Pipe &tell,
                                 const Pipe &copy, int64_t cron) {
   const int nothing = open("/dev/null", O_RDWR);

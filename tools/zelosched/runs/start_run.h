@@ -13,11 +13,11 @@
 struct RunRequest {
   Trigger trigger = Trigger::kManual;
   std::optional<int64_t> due;
-  bool isDisabledSkipped = false;  // a task that is disabled by now is passed over without a word
+  bool isDisabledSkipped = false;  // a task that is disabled by now is skipped silently
   bool wantsOutput = false;
 };
 
-// A run that was started, and its keeper, which goes on whether or not anybody listens.
+// A run that was started, with the events of its keeper, which does not depend on this object.
 class StartedRun {
  public:
   // Throws Failure.
@@ -26,13 +26,12 @@ class StartedRun {
   StartedRun(const StartedRun &) = delete;
   StartedRun &operator=(const StartedRun &) = delete;
 
-  // Waits so long for something new, and takes it. False when nothing will come any more, or a
-  // signal came.
+  // Waits so long for events, and takes them. False when no more will come, or after a signal.
   bool listen(std::chrono::milliseconds time);
   const RunEvents &events() const { return events_; }
-  // No more will be told: at the end, or as the keeper was killed.
+  // No more events will come: at the end, or as the keeper was killed.
   bool isSilent() const { return telling_ < 0; }
-  // Where what the run prints can be read, to its end; -1 when nobody wanted it.
+  // The descriptor to read what the run prints from; -1 when that was not wanted.
   int output() const { return output_; }
 
  private:

@@ -51,7 +51,7 @@ void takeStatus(const Run &row, KeptRun *run) {
   }
 }
 
-// One that was asked to stop and did all that it had to do all the same has finished.
+// A run that was asked to stop, and finished successfully all the same, counts as finished.
 void judgeEnd(std::string_view command, bool isStopAsked, RunRecord *run) {
   const bool isByItself = run->outcome != Outcome::kFailed && run->outcome != Outcome::kKilled;
   if (isByItself) return;

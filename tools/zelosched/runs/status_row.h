@@ -6,10 +6,10 @@
 #include "runs/history.h"
 #include "runs/runs.h"
 
-// How it ended, or that it goes on. A row that says "running" of a process that is gone is "lost":
-// who saw that process end knows more.
+// Takes the state and the outcome. A row that says "running" for a process that is gone is "lost":
+// a keeper that saw the process end knows more.
 void takeStatus(const Run &row, KeptRun *run);
 
-// `command` is what is stored of the task: by its time limit, or by 'stop', it ends otherwise than
-// by itself. To be called when all is known.
+// Sets the outcome of a run that was ended by 'stop' or by the time limit in the stored `command`.
+// To be called when exit code and duration are known.
 void judgeEnd(std::string_view command, bool isStopAsked, RunRecord *run);

@@ -21,10 +21,10 @@ namespace {
 using Clock = std::chrono::steady_clock;
 constexpr std::chrono::milliseconds kPause(10);
 constexpr std::chrono::milliseconds kPatience(2000);
-constexpr int kMostKills = 1000;     // of what starts new processes as fast as it is killed
-constexpr int kStatusPatience = 20;  // milliseconds: it may hold the lock, stopped as it is
+constexpr int kMostKills = 1000;     // against processes that fork as fast as they are killed
+constexpr int kStatusPatience = 20;  // milliseconds: the stopped process may hold the lock
 
-// A process, held so that its number cannot become another one's.
+// A pidfd of a process, so that no signal reaches another one that reuses its pid.
 class Held {
  public:
   explicit Held(const ProcessName &process)
@@ -69,7 +69,7 @@ bool hasRow(pid_t pid) {
                      [&](const Run &run) { return run.pid == pid; });
 }
 
-// While its command runs, the owner may stop the run's own process, which would not go on then.
+// The run's own process may have been stopped, and would not go on by itself.
 void endOwn(const Held &own) {
   own.send(SIGCONT);
   if (own.waitForEnd(kPatience)) return;
@@ -84,7 +84,7 @@ Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds gr
   while (Clock::now() < until) {
     const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(until - Clock::now());
     const bool isOver = own.waitForEnd(std::min(left, kPause * 5));
-    // A command that was about to start comes after the first signal.
+    // A command that was about to start appears after the first signal.
     tree->signalNew(SIGTERM);
     if (isOver && tree->look() == 0) return Stopped::kEnded;
   }
@@ -97,8 +97,8 @@ Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds gr
   return isOver ? Stopped::kKilled : Stopped::kNot;
 }
 
-// Of such a row the history knows better: a run whose process was killed leaves one that says that
-// it goes on, and its number may be another process's by now, of another run even.
+// Such a row is ignored, as it may be out of date: a run whose process was killed leaves one that
+// says running, and its pid may be that of another process by now, even of another run.
 bool isInHistory(const Run &row) {
   const KeptDatabase kept(KeptDatabase::kRead);
   if (!kept.isThere()) return false;

@@ -8,7 +8,7 @@
 
 namespace {
 
-// What says when it runs; a change of it makes an earlier time of it no missed one.
+// The schedule as a text. After a change of it, earlier times do not count as missed.
 std::string scheduleOf(const TaskRecord &task) {
   std::string text = std::to_string(task.Type) + " " + std::string(task.Week);
   for (const uint32_t number : {task.StartYear, task.StartMonth, task.StartDay, task.RunHour,
@@ -40,7 +40,7 @@ void end(const KeptDatabase &kept, int64_t id) {
       .run();
 }
 
-// What is known of a task of today.
+// What is recorded of an existing task.
 struct Seen {
   int64_t generation;
   std::string app;
@@ -94,7 +94,7 @@ bool isAnother(const TaskRecord &task, const Seen &seen) {
   return seen.app != task.App || (seen.name != task.Name && seen.command != task.Command);
 }
 
-// Runs that were recorded before anybody looked at the tasks are those of the first task seen.
+// Runs that were recorded before any task of that id are taken for those of the first one.
 void adoptRuns(const KeptDatabase &kept, const TaskRecord &task) {
   Query(kept,
         "UPDATE run SET generation = (SELECT generation FROM task WHERE task = ?1 AND removed IS"
@@ -112,7 +112,7 @@ void look(const KeptDatabase &kept, const TaskRecord &task, const Seen *seen) {
   adoptRuns(kept, task);
 }
 
-// A change that was made is not a failure since it could not be noted: the sweep does that.
+// A change that cannot be recorded is not a failure, as it was made: the sweep records it later.
 template <class Step>
 void note(const TaskRecord &task, Step step) {
   if (isPower(task)) return;

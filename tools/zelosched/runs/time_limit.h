@@ -22,13 +22,13 @@ std::optional<int64_t> secondsOfLimit(std::string_view limit);
 // The stored command; as it is when the limit is empty.
 std::string storedCommand(const LimitedCommand &limited);
 
-// The way back.
+// The reverse of storedCommand().
 LimitedCommand takeApart(std::string_view stored);
 
-// How 'timeout' exits when the time is over, and when the command had to be killed then.
+// The exit status of timeout(1) when the time is up, and when it had to kill the command then.
 inline constexpr int kTimeLimitExit = 124;
 inline constexpr int kTimeLimitKillExit = 137;
 
-// A run of the stored command, so many seconds long and with that exit code, was ended by its
-// limit. The same code before the limit is the command's own.
+// Whether a run of the stored command, so many seconds long and with that exit code, was ended by
+// its limit. The same code before the limit is the command's own.
 bool isEndedByLimit(std::string_view stored, int exitCode, double seconds);

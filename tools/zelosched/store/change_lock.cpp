@@ -16,7 +16,7 @@
 
 namespace {
 
-constexpr mode_t kLockFileMode = 0600;  // who can open it can hold every change up
+constexpr mode_t kLockFileMode = 0600;  // who can open it can lock it
 constexpr std::chrono::milliseconds kPause(20);
 constexpr std::chrono::seconds kSaidAfter(2);
 constexpr std::chrono::seconds kPatience(30);
@@ -33,7 +33,7 @@ int openLockFile() {
                 (isRights ? " (changing tasks takes root's rights)" : ""));
 }
 
-// The library waits for its own lock in silence.
+// The library waits for its own lock without a message.
 void sayWhoHoldsTheLibrarysLock() {
   const Clock::time_point start = Clock::now();
   pid_t holder = schedLockHolder(kSchedStoreLockFile);
@@ -57,7 +57,7 @@ std::string processText(pid_t pid) {
 }
 
 ChangeLock::ChangeLock() : file_(openLockFile()) {
-  // A reader that goes away must not end us between two changes.
+  // A closed pipe must not end us between two changes.
   signal(SIGPIPE, SIG_IGN);
   const Clock::time_point start = Clock::now();
   bool isSaid = false;

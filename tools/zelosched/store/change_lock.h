@@ -1,5 +1,5 @@
-// Keeps zelosched commands that change tasks from doing so at once: of two that read a task, change
-// it and save it, the second would undo the first.
+// Serializes the zelosched commands that change tasks, by an advisory lock: of two that read,
+// change and save a task, the second would undo the first.
 #pragma once
 
 #include <sys/types.h>
@@ -13,7 +13,7 @@ std::string processText(pid_t pid);
 
 class ChangeLock {
  public:
-  // Waits for its turn. Throws Failure when that does not come in time.
+  // Waits for the lock. Throws Failure after 30 seconds.
   ChangeLock();
   ~ChangeLock();
   ChangeLock(const ChangeLock &) = delete;

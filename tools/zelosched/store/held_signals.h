@@ -1,5 +1,5 @@
-// While it lives, the signals by which people and the system end a command wait: this one and the
-// programs that the library starts for a change get them when the change is whole.
+// Blocks the signals that end a command while the object exists: this process, and the programs
+// that the library starts for a change, get them when the change is complete.
 #pragma once
 
 #include <signal.h>

@@ -46,8 +46,8 @@ bool isDigit(char c) {
   return isBetween(c, '0', '9');
 }
 
-// A word, a number, or a word with a number, as in crontab.backup and crontab.old001, is a name
-// that somebody has given: few random ones look like that.
+// A word, a number, or a word with a number, as in crontab.backup and crontab.old001, was chosen by
+// a person: few random names look like that.
 bool looksRandom(std::string_view characters) {
   bool isMixed = false;
   for (size_t i = 0; i < characters.size(); ++i) {

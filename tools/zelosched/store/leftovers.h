@@ -1,6 +1,6 @@
-// What a program leaves behind that is killed while it replaces a file: the new file beside the old
-// one, under a random name. Nothing else removes those that are not in /tmp.
+// The new files beside the old ones, under random names, of programs that were killed while they
+// replaced a file. Nothing else removes those that are not in /tmp.
 #pragma once
 
-// Removes them, and says so. Throws Failure.
+// Removes and reports them. Throws Failure.
 void removeLeftovers();

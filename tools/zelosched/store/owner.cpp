@@ -17,8 +17,8 @@ struct FreeUser {
 };
 using User = std::unique_ptr<ZELOUSER, FreeUser>;
 
-// The name; none for a number without a user. The tasks of a list have few owners, and looking one
-// up reads a file.
+// The name; none for a uid without a user. Cached, as the tasks of a list have few owners, and a
+// look-up reads a file.
 const std::optional<std::string> &nameOf(uid_t uid) {
   static std::map<uid_t, std::optional<std::string>> known;
   const auto [found, isNew] = known.try_emplace(uid);
@@ -33,7 +33,7 @@ const std::optional<std::string> &nameOf(uid_t uid) {
 
 }  // namespace
 
-// What no name can be is not asked for: a zero byte would end the question before it.
+// A text that cannot be a name is not looked up: a zero byte would cut it off.
 std::optional<uid_t> findUserByName(const std::string &name) {
   if (name.size() > LOGIN_NAME_MAX || name.find('\0') != std::string::npos) return std::nullopt;
   const passwd *entry = getpwnam(name.c_str());

@@ -14,5 +14,5 @@ std::optional<uid_t> findUserByName(const std::string &name);
 
 bool userExists(uid_t uid);
 
-// The user's name, or the number of one that has none.
+// The user's name, or the uid as a text where there is no such user.
 std::string userName(uid_t uid);

@@ -1,5 +1,5 @@
-// Files that are put in place whole or not at all, wherever that is: what somebody else has planted
-// under the name is neither followed nor taken over.
+// Files that are replaced atomically, in any directory: a link or a file that another user put
+// under the name is neither followed nor written to.
 #pragma once
 
 #include <sched_new_file.h>
@@ -9,12 +9,12 @@
 
 // Each throws Failure.
 
-// Of a regular file, or of one that a link leads to.
+// The contents of a regular file, also through a symbolic link.
 std::string contentsOf(const std::string &path);
 
-// Makes the file whole and on the disk, root's and with that mode.
+// Writes the new file to the disk, owned by root and with that mode.
 void fill(SchedNewFile *file, const std::string &contents, mode_t mode);
 
-// The file, root's and with that mode, on the disk when the call returns. It replaces a file or a
-// link of that name, but no directory.
+// Replaces a file or a link, but no directory, by a file of root's with that mode, which is on the
+// disk when the call returns.
 void placeFile(const std::string &path, const std::string &contents, mode_t mode);

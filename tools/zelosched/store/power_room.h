@@ -1,6 +1,5 @@
-// Which power times can still be added: no two alike, which the library would make one, and no more
-// of a direction than fit. Told beforehand, as an import changes nothing unless all of it can be
-// saved.
+// Whether power times can be added: no two may be equal, which the library would make one, and each
+// direction has a limit. An import checks this before it saves anything.
 #pragma once
 
 #include <zelosched.h>
@@ -27,7 +26,7 @@ class PowerRoom {
   // Throws Failure when the power time has no room, and counts it otherwise.
   void take(const ZELO_SCHED_TASK &task);
 
-  // A stored power time gives its place up, by its stored id.
+  // Makes room by a stored power time, by its stored id.
   void leave(const ZELO_SCHED_TASK &task) { ids_.erase(task.ID); }
 
  private:

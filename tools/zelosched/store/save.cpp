@@ -16,7 +16,7 @@ namespace {
 
 constexpr int kFlagYes = 1;
 
-// An entry that is edited into one like another would be one less.
+// A power time that is edited to equal another one would be merged with it.
 void requireUnlike(const ZELO_SCHED_TASK &task) {
   PowerRoom room;
   room.leave(task);
@@ -67,7 +67,7 @@ std::string unreadableTask(const TaskList &list) {
 void requireReadableTasks(std::optional<int64_t> changedId) {
   requireTasksAreBack();
   const TaskList list;
-  // Of several, each is mended beside the others.
+  // Where there are several, each can be mended while the others are there.
   const bool isMended = std::any_of(
       list.tasks().begin(), list.tasks().end(),
       [&](const ZELO_SCHED_TASK *task) { return changedId == task->ID && isUnreadable(*task); });
@@ -116,7 +116,7 @@ void editTask(ZELO_SCHED_TASK *task) {
 }
 
 void removeTask(const ZELO_SCHED_TASK &task) {
-  // The lines of power times are others, which no task can harm.
+  // Power times have lines of their own, which a task does not affect.
   if (!isPower(task)) requireReadableTasks(task.ID);
   storeRemoved(task);
   requireCrontabInStep();
@@ -154,7 +154,7 @@ void storeRemoved(const ZELO_SCHED_TASK &task) {
 }
 
 std::string crontabFault(const TaskList &list) {
-  // As long as one is kept out of it, the crontab cannot be in step.
+  // While there is an unreadable task, the crontab is not written, and may differ.
   if (!unreadableTask(list).empty()) return "";
   const std::vector<std::string> differences = crontabDifferences(list.tasks());
   return differences.empty() ? "" : differences.front();

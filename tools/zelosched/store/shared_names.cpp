@@ -26,7 +26,7 @@ constexpr char kDirectory[] = "/tmp";
 constexpr std::string_view kScratchPrefix = "scheduled_tasks.tmp.";
 constexpr std::string_view kAsidePrefix = "zeloscheduler.";
 
-// In the order in which they are taken: what is in the directory can be judged only behind it.
+// In the order in which they are taken: the directory before the file in it.
 constexpr const SchedSharedName *kNames[] = {&kSchedLockDirectory, &kSchedLockFile, &kSchedDatabase,
                                              &kSchedJournal};
 
@@ -35,7 +35,7 @@ Failure cannot(const std::string &what) {
   return Failure("cannot " + what + ": " + std::strerror(reason));
 }
 
-// Why it is not to be used at all; nothing when it is root's alone.
+// Why the name cannot be used at all; empty when it is root's alone.
 std::string whyForeign(const SchedSharedName &name) {
   const char *why = nullptr;
   return schedLookAt(name, &why) == SchedNameState::kForeign ? why : "";
@@ -56,7 +56,7 @@ void take(const SchedSharedName &name) {
   const std::string why = whyForeign(name);
   if (!why.empty()) complain(std::string(name.path) + " " + why + ": it is moved away");
   if (!schedTakeName(name)) throw Failure(std::string("cannot take ") + name.path);
-  // Root's alone, in a directory where nobody else can put another in its place.
+  // It is root's, in a sticky directory: no other user can replace it before the chmod.
   if (isOpenToOthers(name) && chmod(name.path, name.mode) != 0) {
     throw cannot(std::string("close ") + name.path + " to others");
   }
@@ -91,10 +91,10 @@ void forEachName(std::string_view prefix, const ActOnName &act) {
   }
 }
 
-// One directory for all that cannot be removed at once.
+// A directory for those that cannot be removed.
 class AsideDirectory {
  public:
-  // Under a number, as somebody may make the same name again and again.
+  // Under a number, as the same name may be made again.
   void receive(int directory, const char *name) {
     if (path_.empty()) make();
     const std::string to = path_ + "/" + std::to_string(++count_);
@@ -115,7 +115,7 @@ class AsideDirectory {
   uint64_t count_ = 0;
 };
 
-// SQLite would believe what is beside the database, were it opened by another program.
+// SQLite would read these files when another program opens the database.
 void removeForeignLogs() {
   for (const char *path : {"/tmp/sched_status.sqlite-wal", "/tmp/sched_status.sqlite-shm"}) {
     struct stat info {};

@@ -17,7 +17,7 @@ constexpr size_t kIdLength = 32;
 constexpr int64_t kMinute = 60;
 constexpr int64_t kDay = int64_t{24} * 60 * kMinute;
 
-// Machines that have none yet share a word in its place.
+// Machines without an id have the same word in its place.
 bool isId(const std::string &text) {
   return text.size() == kIdLength && text.find_first_not_of('0') != std::string::npos &&
          std::all_of(text.begin(), text.end(),
@@ -32,8 +32,8 @@ std::string machineId() {
                 " holds no id, by which --stagger tells this machine from others (machine-id(5))");
 }
 
-// FNV-1a, and a last step by which every bit depends on every character. With another hash, the
-// next version would move the tasks.
+// FNV-1a with a final mixing step. It must not change: with another hash, the next version would
+// move the tasks.
 uint64_t hashOf(std::string_view text) {
   constexpr uint64_t kOffset = 14695981039346656037U;
   constexpr uint64_t kPrime = 1099511628211U;

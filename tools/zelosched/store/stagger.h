@@ -8,7 +8,7 @@
 #include <string>
 #include <string_view>
 
-// Of "30m" or "2h", up to a day. Throws UsageError.
+// The minutes of "30m" or "2h", up to a day. Throws UsageError.
 uint32_t minutesOfWindow(const std::string &text);
 
 // Moves the task to a minute of the window that begins with its own: always the same one for a

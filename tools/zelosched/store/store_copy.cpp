@@ -55,8 +55,7 @@ bool isBlankOrComment(const std::string &line) {
   return line.find_first_not_of(" \t\r") == std::string::npos || line[0] == '#' || line[0] == ';';
 }
 
-// A store without tasks has comments only. What has lines of another kind, and no task, is the
-// remains of something else.
+// A store without tasks has comments only. A file with other lines and no task is no store.
 bool hasOtherLines(const std::string &contents) {
   std::istringstream lines(contents);
   for (std::string line; std::getline(lines, line);) {
@@ -65,10 +64,10 @@ bool hasOtherLines(const std::string &contents) {
   return false;
 }
 
-// The text as the platform writes it: with a header, and with a trailer that has a checksum.
-// Whoever adds a section and removes it again has both made anew, and all else as it was.
+// The text as the platform writes it, with a header and a trailer that has a checksum. Adding a
+// section and removing it again writes both anew, and leaves all else as it was.
 std::string writtenAnew(const std::string &contents) {
-  constexpr char kScratch[] = "/run/zelosched.store";  // no memory that wears, and root's alone
+  constexpr char kScratch[] = "/run/zelosched.store";  // in memory, and root's alone
   constexpr char kSection[] = "zelosched looks whether this is whole";
   constexpr mode_t kMode = 0600;
   SchedNewFile scratch(kScratch);
@@ -92,7 +91,7 @@ StoreCopy doubtful(const std::string &why, int tasks, bool isHeaded) {
   return {StoreCopy::kDoubtful, why, tasks, isHeaded};
 }
 
-// What cannot be looked at that closely is better than no tasks, but nothing to fall back on.
+// A copy that cannot be checked is used where there is no better one, but not as the last good one.
 StoreCopy judgeText(const std::string &contents, int tasks) {
   try {
     const std::string anew = writtenAnew(contents);
@@ -108,7 +107,7 @@ StoreCopy damaged(const std::string &why) {
   return {StoreCopy::kDamaged, why};
 }
 
-// After the power went, a file may have its size and no contents: none at all, or zeros.
+// After a power failure, a file may be empty, or have its size and zero bytes only.
 StoreCopy judgeContents(const std::string &path) {
   const std::string contents = contentsOf(path);
   if (contents.empty()) return damaged("is cut off: it has no bytes");

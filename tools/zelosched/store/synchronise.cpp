@@ -13,7 +13,7 @@
 
 namespace {
 
-// A power list that cannot be read is told in the end, but keeps no task out of the crontab.
+// A power list that cannot be read is reported at the end, after the tasks are in the crontab.
 void writeTasksOut() {
   requireTasksAreBack();
   const std::string fault = unreadableTask(TaskList(TaskList::Unreadable::kIsLeftOut));
@@ -37,7 +37,7 @@ void synchronise() {
   try {
     writeTasksOut();
   } catch (const Failure &) {
-    // The machine goes on at its time whatever is wrong with the tasks.
+    // The machine must switch on at its time whatever is wrong with the tasks.
     attempt(armClock);
     throw;
   }

@@ -26,9 +26,8 @@ bool isPowerListReadable(int list) {
   return ZELOAutoPowerConfGet(list, 1, &first) >= 0;
 }
 
-// The library passes over a backend that fails, and its tasks must not seem to be gone. It also
-// passes over a task that cannot be read, which must not keep the others from being listed; that
-// leaves other codes.
+// The library skips a backend that fails, whose tasks must not seem to be removed. It also skips an
+// unreadable task, which must not keep the others from being listed; that leaves other codes.
 bool hasBackendFailed() {
   const int code = QLIBCErrGet();
   if (code == 0) return false;
@@ -39,7 +38,7 @@ bool hasBackendFailed() {
   return !isPowerListReadable(ZELO_AUTOPOWER_ON) || !isPowerListReadable(ZELO_AUTOPOWER_OFF);
 }
 
-// Which file it is, and what is to be done, where it is the store.
+// With the file and the remedy, where the store is the reason.
 Failure cannotList() {
   Failure failure = failedTo("list the tasks");
   const char *why = nullptr;

@@ -1,4 +1,4 @@
-// Tasks as the library hands them out, with their owners, and texts in their fields.
+// Tasks of the library as objects that free them, and texts in their fields.
 #pragma once
 
 #include <zelosched.h>

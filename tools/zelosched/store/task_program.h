@@ -6,13 +6,12 @@
 
 std::string installedTaskProgram();
 
-// Empty when /proc does not tell.
+// The path of this program; empty when /proc cannot be read.
 std::string ownProgram();
 
-// Whether the service manager has started us, with what a unit takes away, and will end with us
-// what we leave behind.
+// Whether we run in a unit of the service manager, which may restrict us and end our children.
 bool isUnit();
 
-// Starts a program that goes on by itself. Within a unit the service manager is asked to start it.
-// Throws Failure.
+// Starts a program that puts itself into the background, or, within a unit, has the service manager
+// start it. Throws Failure.
 void startDetached(const std::string &program, const std::vector<std::string> &arguments);

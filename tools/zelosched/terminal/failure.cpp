@@ -56,7 +56,7 @@ Failure failedTo(const std::string &what) {
 }
 
 int complain(const std::string &sentence) {
-  // Names of other users' files stand in some, and standard error may be a terminal.
+  // Some have names of other users' files, and standard error may be a terminal.
   std::istringstream lines(sentence);
   std::string shown = "zelosched:";
   for (std::string line; std::getline(lines, line);) shown += " " + printable(line) + "\n";

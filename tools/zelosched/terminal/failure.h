@@ -27,10 +27,10 @@ std::string errorInWords();
 // "WHAT: " and the error in words.
 Failure failedTo(const std::string &what);
 
-// One line on standard error, with the program's name in front. Gives kFailed.
+// The sentence on standard error, with the program's name in front. Returns kFailed.
 int complain(const std::string &sentence);
 
-// Takes a step whose failure is said, and does not keep the steps after it from being taken.
+// Runs a step, and reports its Failure. Returns the exit status.
 template <class Step>
 int attempt(Step step) {
   try {

@@ -1,7 +1,7 @@
 // Schedules as people say them.
 //
-// What cannot be read is thrown as UsageError. Whether the numbers are in their ranges is for
-// task_check to say, which knows what harm one does that is not.
+// Throws UsageError for what cannot be read, and Failure for a start date that does not exist.
+// Other numbers out of range are left to task_check.
 #pragma once
 
 #include <zelosched.h>
@@ -27,6 +27,5 @@ void setStart(ZELO_SCHED_TASK *task, const std::string &text);
 // "weekly on Mon, Wed and Fri at 08:30, every 2 hours until 18"
 std::string scheduleInWords(const ZELO_SCHED_TASK &task);
 
-// "mon-fri 08:00 every 2h until 18", "2026-12-24 18:30", "monthly 15 08:30": as short as it can be
-// said without loss.
+// "mon-fri 08:00 every 2h until 18", "2026-12-24 18:30", "monthly 15 08:30".
 std::string scheduleInBrief(const ZELO_SCHED_TASK &task);

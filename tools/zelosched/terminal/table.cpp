@@ -10,7 +10,7 @@
 namespace {
 
 constexpr size_t kGap = 2;
-constexpr size_t kNarrowest = 8;  // below, a name tells nothing any more
+constexpr size_t kNarrowest = 8;  // a narrower name could not be recognised
 
 const char *const kStart[] = {"", "\033[2m", "\033[31m"};
 constexpr char kEnd[] = "\033[0m";

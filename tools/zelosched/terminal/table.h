@@ -1,5 +1,5 @@
-// A table of aligned columns. On a terminal, columns that may shrink give way until a line fits:
-// what is too long for one then is cut, or goes on below.
+// A table of aligned columns. On a terminal, columns that may shrink do so until a line fits: a
+// text that is too long is cut, or wrapped.
 #pragma once
 
 #include <string>
@@ -9,7 +9,7 @@ struct Column {
   const char *title;
   enum Alignment { kLeft, kRight } alignment = kLeft;
   bool shrinks = false;
-  bool wraps = false;  // one that shrinks: goes on below instead of being cut
+  bool wraps = false;  // of one that shrinks: a text is wrapped instead of cut
 };
 
 enum class Emphasis { kNone, kDim, kBad };
@@ -27,7 +27,7 @@ class Table {
   bool empty() const { return rows_.empty(); }
   // The whole table as text, within so many columns (0: any number).
   std::string text(size_t columns, bool colour) const;
-  // To the standard output, as wide as that is.
+  // To the standard output, within the width of the terminal.
   void print() const;
 
  private:

@@ -17,8 +17,8 @@ struct Range {
   uint32_t first;
   uint32_t last;
 };
-// Control characters, the marks that turn the direction of writing or break lines, and
-// what cannot be seen, by which two names that look alike differ.
+// Control characters, marks of writing direction and line breaks, and invisible characters, by
+// which names that look alike can differ.
 constexpr Range kUnsafe[] = {
     {0x00, 0x1F},     {0x7F, 0x9F},     {0xAD, 0xAD},       {0x034F, 0x034F},   {0x061C, 0x061C},
     {0x115F, 0x1160}, {0x17B4, 0x17B5}, {0x180B, 0x180F},   {0x200B, 0x200B},   {0x200E, 0x200F},
@@ -78,7 +78,7 @@ int columnsOf(uint32_t code) {
   return columns < 0 ? 1 : columns;
 }
 
-// Walks over the characters until `take` says no; bytes that are none count as one each.
+// Calls `take` for each character until it returns false; an invalid byte counts as a character.
 template <class Take>
 void forEachCharacter(std::string_view text, Take take) {
   while (!text.empty()) {

@@ -5,9 +5,8 @@
 #include <string_view>
 #include <vector>
 
-// The text with everything escaped that could change more than its own place on a terminal: control
-// characters (\n, \t, \x1b, ...), marks that turn the direction of writing, and bytes that are no
-// UTF-8.
+// The text with everything escaped that a terminal would interpret or not show: control characters
+// (\n, \t, \x1b, ...), marks of writing direction, invisible characters, and invalid UTF-8.
 std::string printable(std::string_view text);
 
 // The same of several lines: line feeds and tabs stay.
@@ -29,5 +28,5 @@ std::vector<std::string> wrapped(const std::string &printable, size_t columns);
 // "word", or its plural for every number but one.
 std::string counted(size_t number, const char *word);
 
-// A word that a shell reads back as this very word; unquoted where that does no harm.
+// The word quoted for a shell, where that is needed.
 std::string shellQuoted(std::string_view word);
