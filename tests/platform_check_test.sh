@@ -1,6 +1,6 @@
 #!/bin/bash
-# examples/platform_check.c: it finds no fault in our platform, and reports each contract that a platform
-# breaks. It leaves power times, crontab, alarm and plugins as they were, whatever the platform does.
+# examples/platform_check.c: it finds no fault in our platform, and reports each contract that another
+# breaks. Power times, crontab, alarm and plugins are left as they were, whatever the platform does.
 #
 # Functions are called by check, and what is in single quotes is for another shell:
 # shellcheck disable=SC2016,SC2089,SC2090,SC2317
