@@ -169,12 +169,12 @@ bool sameRecords(const ZELO_SCHED_TASK &left, const ZELO_SCHED_TASK &right) {
 
 class AccessorsTest : public support::SandboxTest {
  protected:
-  // Full of a byte that is no accessor's result, so that whatever is written shows.
+  // Filled with a byte that no accessor writes, so that every change shows.
   AccessorsTest() { std::memset(static_cast<void *>(&task), 'x', sizeof(task)); }
 
   char *textAt(size_t offset) { return reinterpret_cast<char *>(&task) + offset; }
 
-  // One line that names the accessor's own line in the header, and the code.
+  // One log line, with the accessor's line in the header and the code.
   static void expectRefused(const std::string &header, const char *name, int result,
                             const std::string &condition) {
     EXPECT_EQ(result, -1);

@@ -1,6 +1,6 @@
 #!/bin/bash
-# Many machines from one place: the Ansible collection, by Debian's Ansible over ssh, against three
-# machines, each of which is a sandbox with an sshd.
+# The Ansible collection, played by Debian's Ansible over ssh against three machines, each of which is
+# a sandbox with an sshd.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -35,7 +35,7 @@ prepare() {
   ssh-keygen -q -t ed25519 -N '' -f host_key
   local number
   for number in $MACHINES; do echo "127.0.0.$number $(cat host_key.pub)" >>known_hosts; done
-  # What the tests need of Ansible, and nothing of the user's.
+  # A configuration of the test's own, without the user's.
   export HOME=$SCRATCH ANSIBLE_HOME=$SCRATCH/ansible ANSIBLE_CONFIG=$SCRATCH/ansible.cfg
   export ANSIBLE_COLLECTIONS_PATH=$SCRATCH/collections LC_ALL=C.UTF-8
   if ! { ansible-galaxy collection build "$ROOT/ansible" &&
@@ -73,7 +73,7 @@ start_machine() {
 
 stop_machine() {
   local process=machine_$1
-  kill -KILL "${!process}" # which takes all of the sandbox with it
+  kill -KILL "${!process}" # which ends the whole sandbox
   wait "${!process}" 2>/dev/null || true
 }
 
@@ -86,7 +86,7 @@ on() {
 
 # ---- playing --------------------------------------------------------------------------------
 
-# play [OPTION...]: the example, without its packages, for the set in set.json; keeps $status and out.json
+# play [OPTION...]: plays the example with set.json, without installing; sets $status, writes out.json
 play() {
   status=0
   timeout 100 ansible-playbook -i inventory zelo.scheduler.fleet \
@@ -102,7 +102,7 @@ def changes(host): return [(c["name"], c["change"]) for c in hosts[host]["The ta
 print(eval(sys.argv[1]))' "$1"
 }
 
-# module NAME OPTIONS: a module alone, on the machine of the test; its result is in result.json
+# module NAME OPTIONS: runs a module alone, in the sandbox of the test; its result is in result.json
 module() {
   /usr/bin/python3 - "$1" "$2" >result.json 2>err <<'PY'
 import json, runpy, sys
@@ -121,7 +121,7 @@ with open("result.json") as file: r = json.load(file)
 print(eval(sys.argv[1]))' "$1" || cat result.json err
 }
 
-# fake STATUS ANSWER: a program in the place of zelosched
+# fake STATUS ANSWER: makes a program that takes the place of zelosched
 fake() {
   # shellcheck disable=SC2016
   printf '#!/bin/sh\n[ "$1" = list ] || cat >/dev/null\ncat "$0.answer"\nexit %d\n' "$1" >fake
@@ -134,7 +134,7 @@ is() {
   same "$@" || { head -c 4000 out.json err; return 1; }
 }
 
-# a_set TIME [NAME...]: one backup that payroll owns and as many as are named
+# a_set TIME [NAME...]: a set of one backup that payroll owns, and a task for each name
 a_set() {
   python3 - "$@" <<'PY'
 import json, sys
@@ -172,7 +172,7 @@ the_first_play_changes() {
     each_has "Nightly@02:30 Weekly@03:00"
 }
 
-# Whatever its number is there.
+# Whatever the uid is there.
 an_owner_is_the_same_person_everywhere() {
   local number
   for number in $MACHINES; do
@@ -219,7 +219,7 @@ an_unreachable_machine_disturbs_no_other() {
     same "$(tasks_of 11) $(tasks_of 13)" "Nightly@02:45 own@01:00 Nightly@02:45 own@01:00"
 }
 
-# It comes up without any task, as a new one does.
+# It comes up without any task, like a new machine.
 and_has_all_when_it_is_back() {
   start_machine 12
   play
@@ -274,7 +274,7 @@ applications_are_a_list() {
   done
 }
 
-# As zelosched itself refuses it.
+# With the messages of zelosched itself.
 a_set_is_read_by_the_program() {
   local before wanted file
   before=$(tasks_of 11)
@@ -294,7 +294,7 @@ SETS
   is "$status" 0 && same "$(on 11 zelosched export | grep -cF 'docker ps --format {{.Names}}')" 1
 }
 
-# Such as one of a newer kind, or none.
+# As when zelosched cannot be run.
 a_status_that_cannot_be_told_fails_the_play() {
   sed 's/zelosched status/zelosched-that-is-not-there status/' \
     collections/ansible_collections/zelo/scheduler/playbooks/fleet.yml >broken.yml
@@ -322,7 +322,7 @@ a_file_over_ssh_does_it_too() {
   same "$told$(tasks_of 12)" "3 0 3 0 Nightly@04:30 Weekly@03:00"
 }
 
-# The script of the package in the documentation.
+# The postinst script in docs/fleet.md.
 a_package_of_the_set_does_it_too() {
   a_set 04:45 >set.json
   sed -n '/^    #!\/bin\/sh/,/^    fi/s/^    //p' "$ROOT/docs/fleet.md" |
@@ -338,7 +338,7 @@ task 1 (Nightly) unchanged")"
 
 # ---- the module for one task ----------------------------------------------------------------
 
-# one_task OPTIONS [MODE...]: by the module for one
+# one_task OPTIONS [MODE...]: runs the module for one task
 one_task() {
   status=0
   timeout 100 ansible -i inventory machine11 -m zelo.scheduler.task -a "$1" "${@:2}" >out.txt 2>&1 || status=$?
@@ -383,7 +383,7 @@ faults_are_told_by_the_module() {
 
 readonly HALF='"version": 1, "crontab_written": false'
 
-# Which is no success.
+# An answer that is no JSON of the expected form is a failure, whatever the status.
 what_is_no_answer_fails() {
   local mode wanted answer options
   while IFS='|' read -r mode wanted answer; do
@@ -424,7 +424,7 @@ a_program_that_goes_on_is_ended() {
   same "$(of_module "r['msg']")" "zelosched was ended after 1 s: 'timeout' allows no more" && ((SECONDS - began < 30))
 }
 
-# z COMMAND...: on the machine of the test
+# z COMMAND...: zelosched in the sandbox of the test
 z() {
   "$BUILD_DIR/bin/zelosched" "$@"
 }
@@ -459,7 +459,7 @@ a_hidden_task_goes_by_force_alone() {
   module task "{$absent, \"force\": true}" && here_are
 }
 
-# One that got it between the two looks.
+# Another task gets the number between list and remove.
 another_task_with_the_number_stays() {
   cat >racy <<SCRIPT
 #!/bin/sh
@@ -476,7 +476,7 @@ SCRIPT
     "(True, True)" && here_are Important
 }
 
-# Whoever looks at it has a terminal.
+# The diff is shown on a terminal, so control characters must be escaped.
 the_diff_is_shown_safely() {
   local unsafe='\u001b[2J\u009b2J\u202e\u2066\u007f\n\udb40\udc01'
   fake 0 "{\"version\": 1, \"crontab_written\": false, \"changes\": [{\"id\": 1, \"name\": \"größe$unsafe\", \"app\": \"b$unsafe\",

@@ -40,8 +40,7 @@ constexpr Registered kRegistered[] = {
 constexpr uint32_t kCapacity = sizeof(SchedBackends) / sizeof(SchedBackends[0]);
 constexpr auto kCount = static_cast<uint32_t>(std::size(kRegistered));
 
-// What happens to an init that the library calls: nothing, a failure, or a name that is not its
-// own.
+// What happens to an init that the library calls: it is passed on, fails, or gets another's name.
 enum class Fate { kPassedOn, kFails, kOtherName };
 struct Inits {
   Fate fate = Fate::kPassedOn;
@@ -428,7 +427,7 @@ INSTANTIATE_TEST_SUITE_P(EveryCall, BackendCallTest, testing::ValuesIn(kCalls),
 
 }  // namespace
 
-// Before the library's own, for the registry too.
+// Interposes the library's own, for calls of the registry too.
 extern "C" __attribute__((visibility("default"))) int zeloschedule_init(
     const char *szName, ZELO_SCHED_BACKEND *pBackend) {
   static const auto real = reinterpret_cast<Init>(dlsym(RTLD_NEXT, "zeloschedule_init"));

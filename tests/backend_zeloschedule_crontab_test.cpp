@@ -33,7 +33,7 @@ std::string backendLine(const std::string &text) {
   return "backend_zeloschedule.cpp:N " + text;
 }
 
-// What is left of a crontab that was not finished.
+// Temporary files of a crontab that was not completed.
 Lines leftovers() {
   Lines names;
   for (const auto &entry : std::filesystem::directory_iterator("/etc")) {
@@ -43,7 +43,7 @@ Lines leftovers() {
   return names;
 }
 
-// What stands in for the library's own sort of lists.
+// Replaces the library's sort of lists.
 std::function<int(ZELO_SCHED_TASK **, const char *, int)> sortList;
 
 class CrontabTest : public SandboxTest {
@@ -88,7 +88,8 @@ TEST_F(CrontabTest, EachScheduleHasItsLine) {
   }
 }
 
-// Records are used for one task after the other, their texts emptied by the first byte alone.
+// A record is reused for one task after the other, and its texts are cleared by the first byte
+// only.
 TEST_F(CrontabTest, AWeekThatIsTooShortTakesNoDaysFromTheTaskBeforeIt) {
   for (const char *before : {"0000000", "1111111", "0101010"}) {
     SCOPED_TRACE(before);
@@ -106,7 +107,7 @@ TEST_F(CrontabTest, AWeekThatIsTooShortTakesNoDaysFromTheTaskBeforeIt) {
   }
 }
 
-// A text with a line feed would else be a line of its own, which cron starts as root.
+// Otherwise a text with a line feed would become a line of its own, which cron runs as root.
 TEST_F(CrontabTest, NoTextOfATaskReachesTheCrontab) {
   create([](ZELO_SCHED_TASK *task) {
     const std::string hostile = "\n* * * * * root /bin/hostile\n";
@@ -392,7 +393,7 @@ TEST_F(CrontabTest, ARecordThatCannotBeAllocatedLeavesTheCrontab) {
   writeFile(kCrontab, kPlainCrontab);
   forget();
   for (const unsigned failing :
-       {1U, 2U}) {  // what is kept of all tasks, and what each is read into
+       {1U, 2U}) {  // the array for all tasks, and the record that each is read into
     SCOPED_TRACE(failing);
     const support::FailingAllocation one("calloc",
                                          {.from = failing, .minSize = sizeof(ZELO_SCHED_TASK)});
@@ -514,7 +515,7 @@ TEST_F(CrontabTest, EachCallThatFailsLeavesTheOldCrontabAndReturnsTheNumberOfTas
   }
 }
 
-// The stream is closed on the way out too, so that fclose says nothing here.
+// The guard closes the stream too, so that calls of fclose are not compared.
 TEST_F(CrontabTest, AfterACallThatFailsNoneOfTheLaterIsMade) {
   create();
   for (auto each = std::begin(kCalls); each != std::end(kCalls); ++each) {

@@ -1,5 +1,5 @@
-// Processes that change tasks of both backends at once: each change stands afterwards, in the
-// store, in the power schedule and in the crontab.
+// Processes change tasks of both backends at once: each change is there afterwards, in the store,
+// in the power schedule and in the crontab.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/wait.h>
@@ -33,7 +33,7 @@ class ChangeTurnsTest : public support::SandboxTest {
   void SetUp() override {
     SandboxTest::SetUp();
     support::haveClock();
-    support::realSleep(true);  // waiting for a turn leaves it to the others
+    support::realSleep(true);  // a process that waits for the lock yields to the others
   }
   void TearDown() override {
     support::realSleep(false);
@@ -93,8 +93,8 @@ TEST_F(ChangeTurnsTest, NoChangeOfSeveralProcessesIsLost) {
   EXPECT_EQ(support::logged(), Lines{});
 }
 
-// Where a change takes long, not everybody has his turn in time. What was acknowledged is stored
-// all the same, under an id of its own, and nothing else is.
+// When changes take long, some processes time out. Each acknowledged task is stored under an id of
+// its own, and no other.
 TEST_F(ChangeTurnsTest, OfManyWritersOfALargeStoreEachIsStoredOrToldThatItIsNot) {
   constexpr int kStored = 1000;
   constexpr size_t kMany = 60;

@@ -163,7 +163,7 @@ std::string firstDifference(const ZELO_SCHED_TASK &task, const CronLine &line) {
 
 class CrontabLinePropertyTest : public SandboxTest {
  protected:
-  // Without the crontab, which a later sync writes.
+  // Without writing the crontab, which a later sync does.
   static void addToStore(const ZELO_SCHED_TASK *task) {
     PSZHASH hash = QLIBCSzHashAlloc(1);
     ASSERT_EQ(ZELOSchedInitHashFromTask(&hash, task), 0);
@@ -209,7 +209,7 @@ TEST_F(CrontabLinePropertyTest, ALineMatchesTheMinutesOfItsTaskAndNoOther) {
   }
 }
 
-// The comparison above, compared with lines that are wrong.
+// The comparison above detects lines that are wrong.
 TEST_F(CrontabLinePropertyTest, ALineThatIsWrongIsToldApart) {
   const Task task = makeTask("task", "true");
   task->RunHour = 8;

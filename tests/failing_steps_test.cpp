@@ -1,7 +1,7 @@
 // Each call that a function of the library makes fails, one after the other: once, and from then
-// on. Whatever fails, the function answers with success or with its failure, what it acknowledged
-// stands, the store and the crontab are whole (the old or the new), nothing temporary stays, and no
-// memory is lost.
+// on. Whatever fails, the function returns success or its failure value, acknowledged changes are
+// stored, the store and the crontab are whole (the old or the new), no temporary file is left, and
+// no memory leaks.
 //
 // Prints for each function how many points it can fail at.
 #include <fcntl.h>
@@ -48,8 +48,8 @@ using Files = std::map<std::string, std::string>;
 
 const char *const kKept[] = {support::kStore, support::kPersistentStore, support::kPowerSchedule,
                              support::kCrontab, support::kWakeAlarm};
-// These change at one stroke. The crontab does so too, but may be changed several times, and lacks
-// the line of a task that could not be read; the alarm is off while it is set.
+// These change atomically. So does the crontab, but it may be changed several times, and lacks the
+// line of a task that could not be read; the alarm is off while it is set.
 const char *const kAtOneStroke[] = {support::kStore, support::kPersistentStore,
                                     support::kPowerSchedule};
 
@@ -395,7 +395,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
     return failed;
   }
 
-  // Each that could not write its end would be asked after by all that follow.
+  // A run that could not record its end would be checked by each later run.
   static void forgetRuns() {
     EXPECT_EQ(sqlite3_exec(database, "DELETE FROM task_status WHERE status_id>1", nullptr, nullptr,
                            nullptr),
@@ -404,7 +404,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
 
   void check(long result, const std::string &failed, bool onwards) {
     const bool succeeded = GetParam().good.count(result) == 1;
-    // A task that does not convert is nobody's, and its id is given to the next.
+    // A task that cannot be converted counts as missing, and its id is given to the next.
     const bool isGivenAway = failed == "ZELOEncodingBase64Decode";
     EXPECT_TRUE(succeeded || isGivenAway || GetParam().bad.count(result) == 1)
         << "answer " << result;
@@ -427,7 +427,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
       EXPECT_EQ(openDescriptors(), descriptors_);
     }
     if (failed == "unlink" || onwards) {
-      removeTemporaryFiles();  // nothing could
+      removeTemporaryFiles();  // the library could not
     }
     EXPECT_EQ(temporaryFiles(), temporary_);
   }
@@ -485,7 +485,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
     return support::kAllocationsCanFail && GetParam().memory == Memory::kGivenBack;
   }
 
-  // What is lost at one step is lost again at each repetition of it.
+  // Only a leak that repeats with the step counts.
   bool losesMemory(unsigned nth) {
     constexpr int kMost = 12;
     size_t used = 0;

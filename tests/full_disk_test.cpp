@@ -1,6 +1,6 @@
-// File systems that are full, or have become read-only, under each of the store's copies, the
-// status database and the crontab: what was acknowledged stays, what fails says so, nothing is left
-// behind, and with room it goes on. They are real ones, mounted in the sandbox.
+// File systems that are full or read-only, under each of the store's copies, the status database
+// and the crontab: acknowledged changes stay, failures are reported, no temporary files are left,
+// and with room changes succeed again. They are real ones, mounted in the sandbox.
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 #include <sys/mount.h>
@@ -162,8 +162,8 @@ TEST_F(FullDiskTest, AFullWorkingCopyLosesNothingAndGoesOnWithRoom) {
   EXPECT_EQ(filesIn("/tmp"), Lines{"scheduled_tasks"});
 }
 
-// A copy that found no room behind the pages that it had freed itself is as long as what it
-// replaces.
+// A copy that ran out of room after reusing the pages that it had freed has the length of the old
+// file.
 TEST_F(FullDiskTest, AWorkingCopyThatIsCutOffAtItsOldLengthIsMadeWhole) {
   ASSERT_EQ(saveTask(smallTask(1)), 1);
   const std::string before = readFile(kStore);
@@ -252,14 +252,14 @@ class HalfWayTest : public FullDiskTest {
     EXPECT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
   }
 
-  // Larger than what is there, by more than the room that emptying the old one makes.
+  // So large that emptying the old copy does not make enough room.
   static Task largeTask(int number) {
     Task task = smallTask(number);
     setText(task->Command, std::string(8000, ':'));
     return task;
   }
 
-  // Reading says so as well as changing. A list passes over what cannot be listed.
+  // Reads and changes report it; a list passes over a backend that fails.
   static void expectToldOfTheCutOff() {
     const Task task = smallTask(9);
     const Task edited = smallTask(9);
@@ -290,7 +290,7 @@ class HalfWayTest : public FullDiskTest {
   }
 };
 
-// Half of the store would keep every task from running until a restore.
+// A truncated store would keep every task from running until a restore.
 TEST_F(HalfWayTest, AWorkingCopyThatCouldNotBeFilledIsWholeAllTheSame) {
   for (const HalfWay &way : kHalfWays) {
     SCOPED_TRACE(way.name);
@@ -424,7 +424,7 @@ TEST_F(FullStatusTest, ARunThatCannotBeRecordedIsNotStarted) {
   EXPECT_NE(rows[0].statusCode, ZELO_SCHED_STATUS_RUNNING);
 }
 
-// It has its row and its end, as those take no more room than the beginning did.
+// Recording its end takes no more room than its row did.
 TEST_F(FullStatusTest, TheEndOfARunThatFillsTheDiskIsRecorded) {
   const SmallFileSystem disk("/tmp");
   const long id =

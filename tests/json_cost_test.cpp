@@ -1,5 +1,5 @@
-// What a text that is meant to exhaust the processor costs, beside one of ordinary members of the
-// same size: processor time, of which other programs take nothing.
+// The processor time that a text made to exhaust the processor takes, compared with one of ordinary
+// members of the same size.
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -18,7 +18,7 @@ namespace {
 
 constexpr size_t kSize = size_t{1} << 20;  // where the cost grows with the square, it is seconds
 
-// Behind the members of a task, up to the end of the object.
+// A task with `rest` behind its members.
 std::string taskWith(const std::string &rest) {
   constexpr char kTask[] =
       R"({"id":"\"-1\"","run hour":"\"1\"","run min":"\"2\"","name":"\"n\"","app":"\"a\"",)"
@@ -59,7 +59,7 @@ bool canStandInAString(char c) {
   return byte >= ' ' && c != '"' && c != '\\';
 }
 
-// Texts of 16 bytes that end in the same state of a hash that mixes them with what everybody knows.
+// Texts of 16 bytes that collide in a hash that mixes them with known constants.
 std::string colliding() {
   uint64_t next = 0;
   return withMembers([&](size_t) {
@@ -133,7 +133,7 @@ TEST_F(JsonCostTest, NoAcceptedTextCostsMoreThanFourTimesAHarmlessOneOfItsSize) 
   }
 }
 
-// Of many small values each takes sixty times its text; none is a task's.
+// Parsing such a value takes many times the memory of its text, and no task has one.
 TEST_F(JsonCostTest, AWideOrDeepValueIsNotReadWhereItCannotBeTaken) {
   const double usual = cost(harmless(), true);
   const Text texts[] = {
@@ -149,7 +149,7 @@ TEST_F(JsonCostTest, AWideOrDeepValueIsNotReadWhereItCannotBeTaken) {
   }
 }
 
-// Whether what follows is JSON must be told, so it is read: in time that grows with its size alone.
+// The value must be parsed to tell whether the text is JSON: in time linear in its size.
 TEST_F(JsonCostTest, ARefusedTextCostsNoMoreThanAFewTimesAHarmlessOne) {
   const double usual = cost(harmless(), true);
   const Text texts[] = {

@@ -1,9 +1,9 @@
-// A process that changes tasks, power times or the record of runs is killed, together with all that
-// it has started: at random moments, and before each single call of a change. Nothing that it
-// acknowledged is lost: one of the two copies of the store is whole and holds it, what was being
-// changed is there as it was or as it was to be, nothing is built on a copy that was cut off, the
-// crontab is the old or the new one, and no lock stays held. Every record is looked at byte by
-// byte, by a reader that is not the library's.
+// A process that changes tasks, power times or the record of runs is killed, together with its
+// children: at random moments, and before each single call of a change. No acknowledged change is
+// lost: the working or the persistent copy of the store is whole and has it. The task under change
+// has its old or its new value, no change is based on a truncated copy, the crontab is the old or
+// the new one, and no lock stays held. Every record is compared byte by byte, by a reader that is
+// not the library's.
 //
 // ZELO_SOAK_FACTOR=100 makes the random part that much longer, 0.1 shorter.
 #include <fcntl.h>
@@ -221,7 +221,7 @@ class KilledTest : public SandboxTest {
     return count;
   }
 
-  // Into a process group of its own. The fork is no call of the library's.
+  // Into a process group of its own. This fork does not count as a call of the library.
   static pid_t forkAlone() {
     const OwnWork own;
     const pid_t pid = fork();
@@ -229,7 +229,7 @@ class KilledTest : public SandboxTest {
     return pid;
   }
 
-  // Until none of the killed processes is left. Nor is this a call of the library's.
+  // Until none of the killed processes is left. Does not count as a call of the library either.
   static void reap() {
     const OwnWork own;
     while (waitpid(-1, nullptr, 0) > 0 || errno == EINTR) {
@@ -243,8 +243,8 @@ class KilledTest : public SandboxTest {
     return status;
   }
 
-  // In a process that is killed before its nth call, with all that it started. Its wait status: it
-  // ends by itself when there are fewer calls.
+  // Runs `act` in a process that is killed before its nth call, with its children. Returns its wait
+  // status; with fewer calls it exits by itself.
   static int killBefore(unsigned nth, const std::function<bool()> &act) {
     const KillingStep step(nth);
     const pid_t pid = forkAlone();
@@ -262,7 +262,7 @@ class KilledTest : public SandboxTest {
     }
   }
 
-  // What was acknowledged is `tasks_`; the change that may have been under way is `pending`.
+  // `tasks_` are the acknowledged tasks, `pending` is the change that may have been under way.
   void check(const std::optional<Change> &pending) {
     const Tasks changed = pending ? pending->appliedTo(tasks_) : tasks_;
     const std::optional<Tasks> working = tasksIn(kStore);
@@ -270,7 +270,7 @@ class KilledTest : public SandboxTest {
     ASSERT_TRUE(working || persistent) << "no copy is whole";
     const auto isGood = [&](const Tasks &copy) { return copy == tasks_ || copy == changed; };
     EXPECT_TRUE(isGood(working ? *working : *persistent)) << "not the old tasks, not the new ones";
-    // Where the power goes now, one of these two is what is left.
+    // After a loss of power now, only these two copies are left.
     const std::optional<Tasks> kept = persistent ? persistent : tasksIn(support::kLastGoodStore);
     EXPECT_TRUE(kept) << "nothing is kept for the next boot";
     EXPECT_TRUE(!kept || persistent || isGood(*kept) || kept == kept_);
@@ -295,7 +295,7 @@ class KilledTest : public SandboxTest {
         << testing::PrintToString(tasks_) << " or " << testing::PrintToString(changed);
   }
 
-  // The last good copy is then put back, as it is after a boot.
+  // The persistent copy is then put back, as it is after a boot.
   void checkThatNothingIsBuiltOnIt(const Tasks &persistent) {
     ++cutOff_;
     const std::string before = readFile(kPersistentStore);
@@ -345,7 +345,7 @@ class RandomChanges {
   std::mt19937 random_;
 };
 
-// What the worker says: that it begins a change, and that the library has acknowledged it.
+// What the worker reports: that it begins a change, and that the library has acknowledged it.
 struct Word {
   Change change;
   bool isDone;
@@ -780,8 +780,8 @@ TEST_F(KilledStatusTest, BeforeEachCallNoRowIsLostOrHalfThere) {
 
 // ---- in the middle of a copy
 
-// In the place of /bin/cp: the copy that is to be cut off writes so many bytes and has the whole
-// group killed. A count of copies that no change comes to lets all of them be made.
+// Replaces /bin/cp: the copy that is to be truncated writes so many bytes and kills the process
+// group. A number of copies that no change reaches lets all of them be made.
 constexpr char kCopyProgram[] = "/usr/bin/cp";
 constexpr char kRealCopy[] = "/run/killed_test.cp";
 constexpr char kPlan[] = "/run/killed_test.plan";

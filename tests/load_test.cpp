@@ -1,7 +1,7 @@
-// Many at once: 200 runs that are started together, 16 processes on the status database, and one
-// process that lists 1,000 tasks over and over. No run is lost but those that give up after their
-// twentieth wait, none overlaps one that it may not overlap, no row is lost or mixed up, and no
-// memory is.
+// Load: 200 runs that are started together, 16 processes on the status database, and one process
+// that lists 1,000 tasks repeatedly. No run is lost but those that give up after their twentieth
+// wait, none overlaps one that it must not overlap, no row is lost or mixed up, and no memory
+// leaks.
 //
 // ZELO_SOAK_FACTOR=20 repeats each of these that much more often. The sizes and times are printed.
 #include <fcntl.h>
@@ -72,7 +72,7 @@ Task makeRunTask(int id, const std::string &app, const std::string &command, Tog
   return task;
 }
 
-// In one go: saving them one by one is not what is measured here.
+// All at once: saving them one by one is not measured here.
 void storeTasks(const std::vector<Task> &tasks) {
   std::string text;
   TextHash hash;
@@ -86,7 +86,7 @@ void storeTasks(const std::vector<Task> &tasks) {
 
 // ---- their commands
 
-// Tells that it has begun, and ends when the test lets it go.
+// Reports that it has begun, and ends when the test releases it.
 const std::string kWaitToBeLetGo =
     std::string("echo >> ") + kStartedFifo + "; read go < " + kGoFifo + "; ";
 
@@ -116,8 +116,8 @@ class WaitingCommands {
     }
   }
 
-  // Happens in any case after a while, so that a run too many or too few fails the test and does
-  // not hang it.
+  // Also called by the alarm, so that a run too many or too few fails the test and does not hang
+  // it.
   void letGo() {
     if (alarm(0) != 0) letAllGo();
   }
@@ -219,12 +219,12 @@ class RunsTest : public SandboxTest {
   static void newRound() {
     cleanWorld();
     std::remove(kOrder);
-    // A process that meets a locked database must leave it to the others.
+    // Sleeps are real, so that a process that finds the database locked yields to the others.
     realSleep(true, kTimesShorter);
   }
 
-  // As the first run since the boot has left it. Of several that find none, one makes it and the
-  // others, whose own attempt has failed then, log that and come back seconds later.
+  // As after the first run since the boot. When several runs find none at once, one makes it, and
+  // the others log a failure and retry seconds later.
   static void makeLockDirectory() { ASSERT_EQ(mkdir(kLockDirectory, kLockDirectoryMode), 0); }
 };
 

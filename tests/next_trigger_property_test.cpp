@@ -1,6 +1,6 @@
 // The next trigger time of random tasks against a walk through the calendar, minute by minute, that
-// asks of each minute whether the task is due in it. The calendar of the walk is its own and knows
-// no time zones. Where what is shown is known to differ from what fires, the walk says so:
+// asks of each minute whether the task is due in it. The walk has a calendar of its own, without
+// time zones. Where the shown time is known to differ from the next run, the walk accounts for it:
 //
 //   - a day that its month lacks is shown as a day of the month after it (31 April as 1 May);
 //   - a start date to come is shown as stored, whether it exists or not;
@@ -91,7 +91,7 @@ bool isDueInMinute(const ZELO_SCHED_TASK &task, int ofDay) {
          (hour - task.RunHour) % task.RepeatHour == 0;
 }
 
-// Behind the end of the text all days are on.
+// Days beyond the end of the text are on.
 bool isWeekdayOn(const ZELO_SCHED_TASK &task, sys_days day) {
   const std::string week = task.Week;
   const size_t at = weekday(day).c_encoding();
@@ -165,7 +165,7 @@ std::string text(const Minute &minute) {
               static_cast<unsigned>(minute.ofDay % kMinutesPerHour));
 }
 
-// How often the random tasks led to each kind of result, so that none is left out unnoticed.
+// Counts each kind of result, so that a kind that never occurs fails the test.
 struct Expected {
   std::string kind;
   std::string text;
@@ -272,7 +272,7 @@ void setClockTo(const Minute &now, int second, const Zone &zone) {
   setClock(static_cast<time_t>((minutes - zone.minutesEast) * kSecondsPerMinute + second));
 }
 
-// The hour that a spring night skips is no time at all.
+// Local times in the hour that a spring night skips do not exist.
 bool exists(const Minute &now, const Zone &zone) {
   constexpr int kSkippedHour = 2;
   const bool summerBegins = isSummerAtNight(now.day) && !isSummerAtNight(now.day - days(1));

@@ -69,7 +69,7 @@ class OwnersRightsTest : public UsersTest {
     return runSaved(id);
   }
 
-  // The same, started by a process that hands its capabilities on, with these securebits.
+  // The same, started by a process that passes on its capabilities, with these securebits.
   static int runByHander(uid_t owner, const std::string &command, int securebits) {
     const Task task = makeTask("task", command);
     task->Owner = owner;
@@ -90,7 +90,7 @@ class OwnersRightsTest : public UsersTest {
     return rows.empty() ? -1 : rows.back().statusCode;
   }
 
-  // All that are permitted become inheritable, or none.
+  // Makes all permitted capabilities inheritable, or none.
   static bool setInheritable(bool all) {
     __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
     __user_cap_data_struct sets[_LINUX_CAPABILITY_U32S_3] = {};
@@ -99,7 +99,7 @@ class OwnersRightsTest : public UsersTest {
     return syscall(SYS_capset, &header, sets) == 0;
   }
 
-  // A few become ambient too.
+  // Makes all inheritable, and a few ambient too.
   static bool handCapabilitiesOn() {
     if (!setInheritable(true)) return false;
     for (const int capability : {CAP_DAC_OVERRIDE, CAP_SETUID, CAP_NET_RAW}) {
@@ -178,8 +178,8 @@ TEST_F(OwnersRightsTest, RootsTaskIsHandedNoCapabilitiesEither) {
   EXPECT_EQ(readFile(kOutput), "CapInh:\t0000000000000000\nCapAmb:\t0000000000000000\n");
 }
 
-// Else a set-uid program that the command starts would keep root's capabilities while it works as
-// its user. What restricts stays.
+// Otherwise a set-uid program that the command starts would keep root's capabilities after changing
+// to its user. Securebits that restrict stay set.
 TEST_F(OwnersRightsTest, AChangeOfUsersTakesCapabilitiesAgain) {
   const auto run = SchedBackends[0].run;
   SchedBackends[0].run = [](ZELO_SCHED_TASK *, int *pStatusCode, char *, size_t) {
@@ -235,7 +235,7 @@ TEST_F(OwnersRightsTest, NoWayLeadsBackToRoot) {
   EXPECT_EQ(readFile(kOutput), "");
 }
 
-// A shell that is told to keep its ids does not change the effective one to the real one.
+// With -p a shell does not set its effective ids to the real ones.
 TEST_F(OwnersRightsTest, NoShellBringsRootBack) {
   for (const char *shell : {"/bin/sh", "/bin/sh -p", "/bin/bash", "/bin/bash -p"}) {
     SCOPED_TRACE(shell);
@@ -254,7 +254,7 @@ TEST_F(OwnersRightsTest, RootsFilesCannotBeReadOrChanged) {
   EXPECT_EQ(readFile(kRootsFile), "root's");
 }
 
-// It still has its way back to root.
+// Its real or saved ids are still root's.
 TEST_F(OwnersRightsTest, TheProcessThatRunsTheTaskCannotBeLookedInto) {
   EXPECT_EQ(run(kOwner,
                 "cat /proc/$PPID/environ && exit 1; ls /proc/$PPID/fd/ && exit 2; "

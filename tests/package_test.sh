@@ -43,7 +43,7 @@ make_root_tar() {
   mv "$ROOT_TAR.new" "$ROOT_TAR"
 }
 
-# dpkg's safety against a loss of power would cost most of the time.
+# dpkg does not sync, which would take most of the time.
 unpack_root() {
   local name
   rm -rf --one-file-system "$ROOT"
@@ -54,8 +54,8 @@ unpack_root() {
   echo force-unsafe-io >"$ROOT/etc/dpkg/dpkg.cfg.d/package_test"
 }
 
-# Run where the root is still below us: what kernel settings and devices there are is the machine's,
-# and stays as it is.
+# Run before the chroot: devices and kernel settings are the machine's, and the settings are
+# read-only.
 readonly MOUNTS='
   set -e
   cd "$1"
@@ -82,7 +82,7 @@ in_root_quietly() {
   quietly in_root "$@"
 }
 
-# Everything in the root, but for what dpkg, apt and systemd know of packages and timers.
+# Every file in the root, without the databases of dpkg, apt and systemd.
 files_in_root() {
   (cd "$ROOT" && find . \( -path ./proc -o -path ./sys -o -path ./dev -o -path ./packages \
     -o -path ./var/lib/dpkg -o -path ./var/lib/apt -o -path ./var/cache -o -path ./var/log \
@@ -338,7 +338,7 @@ readonly STARTED_AT='
   systemctl is-active zelosched-catch-up
   zelosched run "$(cat /task)" --wait >/dev/null && echo ran'
 
-# Of the runs in a boot, one was kept by the timer's service, the other at shutdown.
+# How many finished runs of the task the history has.
 kept_runs() {
   in_root zelosched history "$(cat "$ROOT/task")" | grep -c finished || true
 }
@@ -382,7 +382,7 @@ planted_names_are_not_adopted() {
 program"
 }
 
-# A process that changes tasks for too long.
+# As when another process holds the lock for too long: flock fails.
 leaves_lines_of_a_held_lock() {
   in_root sh -c 'mkdir /stub && printf "#!/bin/sh\nexit 1\n" >/stub/flock && chmod 755 /stub/flock
     PATH=/stub:$PATH /usr/share/zeloscheduler/take_lines_out /tmp/zeloschedtask' >"$WORK/log" 2>&1 &&
@@ -402,7 +402,7 @@ readonly WHICH_PROGRAM='
   cmp -s /tmp/zeloschedtask /usr/sbin/zeloschedtask && echo program
   cmp -s /tmp/zeloschedtask /usr/share/zeloscheduler/zeloschedtask.stand-in && echo stand-in'
 
-# A program that only has the library.
+# By a program that uses the library alone.
 save_by_library() {
   local -a flags
   read -ra flags < <(PKG_CONFIG_LIBDIR=$ROOT/$LIB/pkgconfig pkg-config --cflags --libs zeloscheduler)
@@ -410,12 +410,12 @@ save_by_library() {
     in_root_quietly /save_and_list "By the library" true && rm "$ROOT/save_and_list"
 }
 
-# As another user who was first would have it.
+# Another user takes the names first.
 plant_names() {
   in_root setpriv --reuid 65534 --regid 65534 --clear-groups sh -c '
     printf "#!/bin/sh\n" >/tmp/zeloschedtask; chmod 755 /tmp/zeloschedtask
     mkdir /tmp/lock /tmp/scheduled_tasks; : >/tmp/sched_status.sqlite'
-  # One that is root's, and that he has moved there from a directory of his own.
+  # A file of root's, as he can move one there from a directory of his.
   echo planted >"$ROOT/tmp/sched_status.sqlite-journal"
 }
 

@@ -1,6 +1,6 @@
-// "/tmp" is everybody's. Whatever an ordinary user puts there under a name that the library uses:
-// files of his, links of both kinds, pipes, directories. Each operation ends, writes through
-// nothing, and starts nothing of his as root.
+// Every user can write to "/tmp". Whatever an ordinary user puts there under a name of the library
+// (files, links of both kinds, pipes, directories), each operation ends, follows no link of his in
+// writing, and starts nothing of his as root.
 #include <fcntl.h>
 #include <grp.h>
 #include <gtest/gtest.h>
@@ -262,7 +262,7 @@ class PlantsTest : public SandboxTest {
   void SetUp() override {
     SandboxTest::SetUp();
     REQUIRE_OTHER_USERS();
-    holder() = 0;  // the memory is there before any process is forked
+    holder() = 0;  // maps the shared memory before any process is forked
   }
   void TearDown() override {
     endHolder();

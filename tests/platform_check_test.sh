@@ -1,6 +1,6 @@
 #!/bin/bash
-# examples/platform_check.c: it finds no fault in our platform, and in one that breaks a contract it names
-# that one, whichever it is. What a machine has once it leaves as it was, whatever the platform does.
+# examples/platform_check.c: it finds no fault in our platform, and reports each contract that another
+# breaks. Power times, crontab, alarm and plugins are left as they were, whatever the platform does.
 #
 # Functions are called by check, and what is in single quotes is for another shell:
 # shellcheck disable=SC2016,SC2089,SC2090,SC2317
@@ -18,7 +18,7 @@ readonly AT_ONCE=8 # most wait for a second
 sandbox=$(cd "$here/.." && pwd -P)/scripts/sandbox
 mkdir -p "$WORK"
 
-# No test may arm the machine's own clock. Of what a machine has once, each of these finds something to lose.
+# No test may arm the machine's own clock. `state` shows all that the check could change.
 readonly MACHINE='mount -n -t tmpfs sys /sys && mkdir -p /sys/class/rtc/rtc0 && : >/sys/class/rtc/rtc0/wakealarm
   state() { cksum /etc/crontab; stat -c %a:%u:%g /etc/crontab; grep -s times /usr/zelo/etc/power_sched.conf
     ls -R /usr/zelo /tmp; tr -d "0\n" </sys/class/rtc/rtc0/wakealarm; }
@@ -36,7 +36,7 @@ finds_no_fault() {
     same "$(cat "$WORK/sum")" "$(grep -c '^ok ' "$WORK/own") hold, 0 do not"
 }
 
-# A line of the wrong platform's contracts that are not named as faults.
+# Prints the broken contracts that the check does not report.
 unnamed_faults() {
   export -f on_machine
   export sandbox
@@ -44,13 +44,13 @@ unnamed_faults() {
     on_machine "wrongly \"\$1\" --system \"\$PLUGINS\"" "$1" 2>&1 | grep -qF "not ok $1" || echo "$1"' bash FAULT
 }
 
-# left_alone FAULT ARGUMENTS: by the check, on a machine with times that are none of its own
+# left_alone FAULT ARGUMENTS: whether the check changes nothing, on a machine with power times of others
 left_alone() {
   same "$(on_machine 'times "0 127 7 30" "1 62 23 0"; before=$(state)
     wrongly "$@" >/dev/null 2>&1; diff <(echo "$before") <(state) && echo same' "$@")" same
 }
 
-# What a platform does of what it should not reaches no machine without --system.
+# Without --system even a wrong platform is not led to change the machine.
 nothing_is_done() {
   local fault
   for fault in none "ZELOAutoPowerConfSet: a list that does not exist is refused" \
@@ -69,7 +69,7 @@ everything_is_put_back() {
   done
 }
 
-# The signal is for all of the check, as one of a terminal is.
+# The signal goes to the whole process group, as one from a terminal does.
 puts_back_when_interrupted() {
   same "$(on_machine 'before=$(cksum /etc/crontab)
     WRONG_PLATFORM="ZELOScheduleSet hangs" LD_PRELOAD=$WRONG timeout -s INT 3 "$CHECK" --system | grep -v "^ok "
@@ -116,7 +116,7 @@ sums_up() {
     test "$(tail -n 1 /tmp/out)" = "$(grep -c "^ok " /tmp/out) hold, $(grep -c "^not ok " /tmp/out) do not" && echo same')" same
 }
 
-# In another place than our platform has it.
+# A platform may add the line elsewhere in the file than ours does.
 takes_a_line_anywhere() {
   same "$(on_machine 'wrongly "ZELOScheduleSet adds lines in front" --system | grep -cv "^ok "')" 0
 }
@@ -126,7 +126,7 @@ takes_a_user_with_the_highest_id() {
     "ok ZELOUserGetByUID: the highest id is looked up like any other"
 }
 
-# Who may read all, as what is built may lie where only root looks, and is not root.
+# Another user with CAP_DAC_READ_SEARCH, as the programs may lie where only root can read.
 refuses_who_is_not_root() {
   same "$(on_machine 'before=$(state)
     setpriv --reuid 65534 --regid 65534 --clear-groups --inh-caps +dac_read_search --ambient-caps +dac_read_search \

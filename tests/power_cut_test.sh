@@ -1,7 +1,7 @@
 #!/bin/bash
-# The power goes at any moment of a change. What had been acknowledged by then is there after the boot:
-# the file system of the persistent copy is in an image, of which a copy is taken at that moment, so
-# that only what had been written to the disk is in it.
+# The power fails right after a change was acknowledged, or when /bin/cp has emptied its target. What
+# was acknowledged is there after the boot: the file system of the persistent copy is in an image,
+# which is copied at that moment, so that the copy has only what had been written to the disk.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -15,7 +15,7 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 
 readonly DISK=/usr/zelo/etc
 readonly CUT=$SCRATCH/cut.img
-# Nothing reaches the disk by itself.
+# The journal is not committed during the test, unless something is synced.
 readonly OPTIONS=commit=300
 mkdir -p "$DISK"
 
@@ -28,7 +28,7 @@ add_task() {
   add --daily 02:30 --name "$1" -- true
 }
 
-# The machine comes up with what was on the disk: the tasks are put back, and shown.
+# Restores the tasks from what was on the disk, as a boot does, and prints their names.
 tasks_after_boot() {
   mkdir -p "$SCRATCH/now"
   mount --move "$DISK" "$SCRATCH/now" 2>/dev/null || mount --bind "$DISK" "$SCRATCH/now"
@@ -48,8 +48,8 @@ keeps_three_tasks() {
   same "$(tasks_after_boot)" "one three two"
 }
 
-# In place of /bin/cp: the power goes when it has emptied its target, and the target is on the disk
-# like that.
+# Replaces /bin/cp: the power fails when it has emptied its target, and the empty target is on the
+# disk.
 cut_in_copies_of() {
   cat >"$SCRATCH/cp" <<CP
 #!/bin/sh

@@ -1,6 +1,6 @@
-// Another user puts things under the names of the library in "/tmp" and takes them away again, in a
-// loop, while root calls the library with these names free. Nothing of his is shown, run or kept,
-// and each call ends. (planted_paths_test has what stands still.)
+// Another user creates and removes files under the names of the library in "/tmp", in a loop, while
+// root calls the library with these names free. Nothing of his is shown, run or kept, and each call
+// ends. (planted_paths_test has files that stay.)
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sqlite3.h>
@@ -68,7 +68,7 @@ void makeHisDatabase(const std::string &path) {
   sqlite3_close(db);
 }
 
-// What he copies his things from, and his own directory.
+// The models of his files, and his own directory.
 void makeHisThings() {
   const std::string models = std::string(kModels) + "/";
   std::filesystem::create_directories(kModels);
@@ -82,7 +82,7 @@ void makeHisThings() {
   EXPECT_EQ(chown(kHis, kOther, kOther), 0);
 }
 
-// What root has moved away from him he makes again.
+// Makes a file again that root has moved away.
 void haveAgain(const std::string &kind) {
   const std::string his = std::string(kHis) + "/" + kind;
   if (fileExists(his)) return;
@@ -99,7 +99,7 @@ void haveAgain(const std::string &kind) {
 
 constexpr const char *kHisKinds[] = {"store", "database", "program", "link", "pipe", "directory"};
 
-// Each of his things, in and out again, and once as a second name that stays a moment.
+// Moves each of his files there and back, and then makes and removes a hard link to it.
 void toggle(const std::string &name) {
   for (const char *kind : kHisKinds) {
     haveAgain(kind);
@@ -110,7 +110,7 @@ void toggle(const std::string &name) {
   }
 }
 
-// The process that does so, until it goes.
+// The process that does so, until the object is destroyed.
 class Rival {
  public:
   explicit Rival(std::vector<std::string> names) : pid_(fork()) {
@@ -161,7 +161,7 @@ void useDatabase() {
   if (db == nullptr) return;
   ZELO_SCHED_STATUS status = {};
   ZELOSchedDBIsTaskRunning(db.get(), kHisTask, &status);
-  // A run of an earlier call's may record itself only now, with a process of its own.
+  // A genuine run of an earlier call may be recorded only now, with another process id.
   EXPECT_FALSE(status.found != 0 && status.pid == inForgedRows);
   int code = 0;
   char comment[16] = "";

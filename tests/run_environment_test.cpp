@@ -1,4 +1,4 @@
-// What a task's command finds around it, whatever its caller has open, ignores or exports.
+// The environment of a task's command, whatever its caller has open, ignores or exports.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <linux/keyctl.h>
@@ -36,7 +36,7 @@ namespace {
 
 using Lines = std::vector<std::string>;
 
-// As the kernel has them; its header does not compile as C++ everywhere.
+// The kernel's values; its header does not compile as C++ everywhere.
 constexpr int kWhoProcess = 1;
 constexpr int kDiskClassShift = 13;
 constexpr long kIdleDiskClass = 3;
@@ -103,7 +103,7 @@ class RunEnvironmentTest : public UsersTest {
     return outputOf(save(owner, command));
   }
 
-  // What the command printed, when a process that `prepare` has had its way with starts the run.
+  // What the command printed, when the run is started by a process that has called `prepare`.
   static std::string outputAfter(const std::function<void()> &prepare, long id) {
     fflush(nullptr);
     const pid_t caller = fork();
@@ -224,7 +224,7 @@ TEST_F(RunEnvironmentTest, ACallerWithoutStandardInputOnlyKeepsTheOthers) {
             " /dev/null /tmp/run_environment_test.stdout /tmp/run_environment_test.stdout\n");
 }
 
-// As a shell's loop that reads what it works on, line by line.
+// As in a shell's loop that reads its input line by line.
 TEST_F(RunEnvironmentTest, ARunLeavesItsCallersInputAlone) {
   const long id = save(0, kTo + "cat; echo end");
   int input[2];
@@ -271,7 +271,7 @@ TEST_F(RunEnvironmentTest, OneOutputOfTheTwoIsReplacedAlone) {
             " /dev/null /dev/null /tmp/run_environment_test.stdout\n");
 }
 
-// What could be read as well, or is more than a place to write to.
+// Descriptors that can be read as well, or are more than a place to write to.
 TEST_F(RunEnvironmentTest, NoOtherOutputOfTheCallersReachesTheCommand) {
   const long id = save(0, "echo lost; echo lost >&2; " + kListLinks);
   ASSERT_EQ(mkfifo("/tmp/run_environment_test.fifo", 0600), 0);
@@ -401,8 +401,8 @@ TEST_F(RunEnvironmentTest, WithoutASessionOfItsOwnNothingIsRun) {
 
 constexpr char kKey[] = "run_environment_test";
 
-// In place of the command: the user's rights are the owner's by then, and an exec changes neither
-// of what is looked at here.
+// Replaces the backend's run of the command: the rights are the owner's by then, and an exec would
+// change neither keys nor scheduling.
 class ForCommand {
  public:
   explicit ForCommand(int (*run)(ZELO_SCHED_TASK *, int *, char *, size_t))
@@ -513,7 +513,7 @@ TEST_F(RunEnvironmentTest, AScoreThatCannotBeWrittenKeepsNothingFromRunning) {
   EXPECT_EQ(logged(), Lines{});
 }
 
-// sudo and its like go on working in a command.
+// So that sudo and the like work in a command.
 TEST_F(RunEnvironmentTest, ACommandMayStillGainRightsAndOutlivesTheCallersDeathSignal) {
   const long id = save(0, "true");
   const ForCommand look([](ZELO_SCHED_TASK *, int *, char *, size_t) {
@@ -580,7 +580,7 @@ TEST_F(RunEnvironmentTest, SignalsThatTheCallerIgnoresOrBlocksReachTheCommand) {
   EXPECT_EQ(rows[0].statusCode, ZELO_SCHED_STATUS_FINISHED);
 }
 
-// A shell may take the mask back by itself; not every command is one.
+// A shell may reset the mask by itself; not every command is one.
 TEST_F(RunEnvironmentTest, SignalsThatTheCallerIgnoresOrBlocksReachTheRun) {
   const long id = save(0, "true");
   const auto run = SchedBackends[0].run;

@@ -140,7 +140,7 @@ TEST_F(SchedDateTest, NormalisingNeedsADate) {
   EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
 }
 
-// Two billion years from now: what follows its last month cannot be counted.
+// Two billion years from now: the month after its last one overflows.
 TEST_F(SchedDateTest, ADateThatCannotBeConvertedStays) {
   constexpr uint32_t kLastYear = uint32_t{INT32_MAX} + 1900;
   setZone("UTC");
@@ -157,7 +157,7 @@ TEST_F(SchedDateTest, TheSecondBeforeTheEpochIsNoFailure) {
   setZone("UTC");
   EXPECT_EQ(normalised({1970, 1, 1, 0, 0, 0}), (Fields{1970, 1, 1, 4, 0, 0}));
   EXPECT_EQ(normalised({1969, 12, 31, 0, 23, 59}), (Fields{1969, 12, 31, 3, 23, 59}));
-  setZone("XXX-0:00:01");  // where the second that mktime fails with begins a minute
+  setZone("XXX-0:00:01");  // where mktime's result -1 is the first second of a minute
   EXPECT_EQ(normalised({1970, 1, 1, 0, 0, 0}), (Fields{1970, 1, 1, 4, 0, 0}));
 }
 

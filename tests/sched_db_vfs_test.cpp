@@ -1,4 +1,4 @@
-// What others put beside the status database, under the names that SQLite gives its journals.
+// Files that others put next to the status database, under the names of SQLite's journals.
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 #include <sys/stat.h>
@@ -88,7 +88,7 @@ std::string bigEndian(size_t number) {
 
 constexpr char kJournalMagic[] = "\xd9\xd5\x05\xf9\x20\xa1\x63\xd7";
 
-// A rollback journal that makes the database what `pages` is.
+// A rollback journal that restores the database to `pages`.
 std::string journalOf(const std::string &pages) {
   const size_t count = pages.size() / kPageSize;
   std::string journal = kJournalMagic + bigEndian(count) + bigEndian(0) + bigEndian(count) +
@@ -106,7 +106,7 @@ std::string journalOf(const std::string &pages) {
   return journal;
 }
 
-// That the journal is one of several, which this super-journal holds together.
+// The end of a journal that names this super-journal.
 std::string naming(const std::string &superJournal) {
   constexpr size_t kPageOfLocks = (size_t{1} << 30U) / kPageSize + 1;
   unsigned sum = 0;
@@ -179,7 +179,7 @@ class PlantedJournalTest : public support::SandboxTest {
   }
 };
 
-// The forgeries are what SQLite takes for its own.
+// SQLite takes the forgeries for its own files.
 TEST_F(PlantedJournalTest, SqliteBelievesThemByItself) {
   makeGenuine();
   writeFile(kLog, forgedLog());
@@ -232,7 +232,7 @@ TEST_F(PlantedJournalTest, ALogThatAppearsMeanwhileIsNeitherReadNorTouched) {
   }
 }
 
-// Once taken, so that nobody can put another in its place.
+// Otherwise another user could take it.
 TEST_F(PlantedJournalTest, TheNameOfTheJournalIsNeverFreeAgain) {
   bool wasTaken = false;
   unsigned timesFree = 0;
@@ -268,7 +268,7 @@ TEST_F(PlantedJournalTest, AJournalThatIsNoLongerOursIsMovedAwayAndNotRolledBack
   const std::string journal = forgedJournal() + naming(kVictim);
   writeFile(kVictim, "important");
   const Database db = init();
-  // As root's own sqlite3 does, which knows nothing of others.
+  // As the sqlite3 shell does when root runs it.
   std::filesystem::remove(kJournal);
   plant(kJournal, journal);
   EXPECT_EQ(applications(db), "genuine");
@@ -539,13 +539,13 @@ void openOthersMeanwhile() {
   EXPECT_EQ(applications(db), "genuine");
 }
 
-// As another thread can. In a process of its own, since it changes what is passed on from then on.
+// As another thread could. In a forked process, since it changes how later calls are passed on.
 TEST_F(PlantedJournalTest, ADatabaseOpenedMeanwhileIsOpenedAsEver) {
   makeGenuine();
   if (fork() == 0) {
     openOthersMeanwhile();
     fflush(stdout);
-    exit(HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);  // by which what was run here is counted
+    exit(HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);  // not _exit, which writes no coverage data
   }
   EXPECT_EQ(support::waitForChildRuns(), std::vector<int>{0});
 }
@@ -668,7 +668,8 @@ TEST_F(NamesTest, AJournalThatCannotBeEmptiedFailsTheTransaction) {
   EXPECT_EQ(applications(db_), "genuine next");
 }
 
-// It is empty then, so nothing can be taken back; whether a power cut keeps it so is not known.
+// The journal is truncated by then, so the change cannot be rolled back; whether the truncation
+// survives a power cut is unknown.
 TEST_F(NamesTest, AnEmptiedJournalThatMayNotHaveReachedTheDiskIsToldAsAFailure) {
   EXPECT_EQ(answer(db_.get(), "PRAGMA synchronous=EXTRA; PRAGMA journal_mode=DELETE"), "delete");
   support::failCall("fsync", {.error = EIO});

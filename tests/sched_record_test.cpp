@@ -1,4 +1,4 @@
-// The records of lists: they come from blocks, and go back one by one, in any order.
+// The records of lists: they are allocated in blocks, and freed one by one, in any order.
 #include <gtest/gtest.h>
 #include <malloc.h>
 
@@ -212,10 +212,11 @@ TEST_F(ListRecordsTest, ARecordThatIsKeptKeepsNoMoreThanItsBlock) {
   EXPECT_LT(heapInUse(), before + sizeof(ZELO_SCHED_TASK));
 }
 
-// The sort by a number is by memory, where the allocator puts what it likes.
+// The library sorts by a number in the order of the records in memory.
 TEST_F(ListRecordsTest, TheCrontabHasEachTaskWithItsOwnTimeInTheOrderOfTheStore) {
   for (const int count : {1, 2, kInBlock, kInBlock + 1, kMany, 10000}) {
-    if (!support::kAllocationsCanFail && count > kMany) continue;  // which zeroes all that it gives
+    if (!support::kAllocationsCanFail && count > kMany)
+      continue;  // the sanitizer's calloc touches all memory
     SCOPED_TRACE(count);
     storeTasks(count);
     support::writeFile(support::kCrontab, "");
@@ -229,7 +230,7 @@ TEST_F(ListRecordsTest, TheCrontabHasEachTaskWithItsOwnTimeInTheOrderOfTheStore)
   }
 }
 
-// More ids than are first made room for.
+// More ids than the array has room for at first.
 TEST_F(ListRecordsTest, TheNextIdAfterThousandsIsFound) {
   storeTasks(2500);
   ZELO_SCHED_TASK *task = ZELOSchedTaskAlloc();

@@ -1,5 +1,5 @@
-// How the names in "/tmp" become ours: where somebody is faster, where the file system cannot do
-// what others can, and where a call fails. (planted_paths_test has what the library makes of it.)
+// How the names in "/tmp" become ours: when another process is faster, when the file system cannot
+// exchange names, and when a call fails. (planted_paths_test has the library's operations.)
 #include "sched_shared_names.h"
 
 #include <gtest/gtest.h>
@@ -81,7 +81,7 @@ class SharedNamesTest : public support::SandboxTest {
     for (const std::filesystem::path &path : left) std::filesystem::remove_all(path);
   }
 
-  // What others could write is not ours, whoever has made it.
+  // A file that others can write counts as foreign, whoever owns it.
   static void plantFile(const SchedSharedName &name, const std::string &contents = "foreign") {
     const support::OwnWork own;
     std::filesystem::remove_all(name.path);
@@ -263,7 +263,7 @@ TEST_F(SharedNamesTest, WhatCannotBeExaminedAfterAnExchangeIsKept) {
                             " is gone: it is now " + movedTo});
 }
 
-// A limit of the file's size makes the kernel write a part and then nothing.
+// With a file size limit the kernel writes a part, and then fails.
 class SizeLimitTest : public SharedNamesTest {
  protected:
   void SetUp() override {
@@ -381,7 +381,7 @@ TEST_F(SharedNamesTest, ANameThatBecomesFreeMeanwhileIsTaken) {
   EXPECT_EQ(readFile(kStore), kNoTasks);
 }
 
-// Gone when it is to be exchanged, there again when the name is to be taken.
+// The file is gone when it is to be exchanged, and there again when the name is to be taken.
 TEST_F(SharedNamesTest, ANameThatIsNowFreeAndNowTakenIsTriedForAWhile) {
   for (const unsigned rounds : {3U, 2 * kTries}) {
     support::resetFailingCalls();

@@ -1,5 +1,5 @@
-// The turns at changes, where the lock file does not do what it should, and who is told to hold it.
-// (backend_zeloschedule_store_test has what a change makes of it, change_turns_test many at once.)
+// The lock that serialises changes: failures of the lock file, and which process is reported as its
+// holder. (backend_zeloschedule_store_test has changes, change_turns_test many at once.)
 #include "sched_store_lock.h"
 
 #include <fcntl.h>
@@ -82,7 +82,8 @@ TEST_F(StoreLockTest, WhoeverHoldsItIsToldUntilHeGivesItUp) {
   EXPECT_EQ(logged(), Lines{});
 }
 
-// A lock is the open file's, which a child has too; the list has the process that locked it.
+// A lock belongs to the open file description, which a child shares; /proc/locks has the process
+// that took it.
 TEST_F(StoreLockTest, TheHolderIsToldWhoeverLockedItAndWhateverTheFileSays) {
   writeFile(kLock, "4711\n");
   const int file = open(kLock, O_RDWR | O_CLOEXEC);
@@ -95,7 +96,7 @@ TEST_F(StoreLockTest, TheHolderIsToldWhoeverLockedItAndWhateverTheFileSays) {
   ASSERT_EQ(end.si_status, 0);
   EXPECT_EQ(heldBy(), other);
   EXPECT_EQ(waitpid(other, nullptr, 0), other);
-  EXPECT_EQ(heldBy(), kSchedUnknownHolder);  // the lock is the open file's, which we have too
+  EXPECT_EQ(heldBy(), kSchedUnknownHolder);  // that process is gone, the lock is not
   close(file);
   EXPECT_EQ(heldBy(), 0);
 }

@@ -116,7 +116,7 @@ const Entries kDefaultsWithLs = {{"id", "-1"},
                                  {"state", "enabled"},
                                  {"type", "daily"}};
 
-// Called with each error record that is set.
+// Called whenever the error record is set.
 void (*onErrorSet)() = nullptr;
 
 class SchedTaskConvertTest : public SandboxTest {
@@ -360,7 +360,7 @@ TEST_F(SchedTaskConvertTest, AnEncodedCommandThatCannotBeSetIsShownEncoded) {
   EXPECT_EQ(errorRecord(), kInjectedError);
 }
 
-// A value that kept its line feed would break the line of the store that it stands on.
+// A line feed in a value would split its line in the store.
 TEST_F(SchedTaskConvertTest, ALineFeedThatCannotBeReplacedIsAFailure) {
   failCallFor("QLIBCSzHashSetValue", "name", {.from = 2, .code = 0x1234});
   Task task = plainTask("ls");
@@ -608,7 +608,7 @@ TEST_F(SchedTaskConvertTest, AShortCommandReplacesALongOne) {
   EXPECT_STREQ(task->Command, "ls");
 }
 
-// 16383 encoded characters hold 12287 bytes and a broken piece.
+// 16383 encoded characters hold 12287 bytes and an incomplete group.
 TEST_F(SchedTaskConvertTest, AnEncodedCommandThatIsTooLongIsCutBeforeItIsDecoded) {
   constexpr size_t kLongestSurvivor = 12287;
   for (const size_t length : {kLongestSurvivor, kLongestSurvivor + 1, size_t{16383}}) {

@@ -26,7 +26,7 @@ using Lines = std::vector<std::string>;
 constexpr char kUnit[] = "sched_task_convert_to_json_string.cpp:N ";
 constexpr size_t kSmallest = 40960;
 
-// A new buffer full of '#', so that what is written shows.
+// A new buffer filled with '#', so that every write shows.
 class Buffer {
  public:
   explicit Buffer(size_t size) : bytes_(size + kGuard, '#') {}

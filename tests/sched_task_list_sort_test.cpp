@@ -49,8 +49,8 @@ constexpr const char *kNumberKeys[] = {"id",
                                        "state",
                                        "type"};
 
-// Each task has a name and a number that tells it from others of that name. The records lie in
-// memory in the order in which they were named.
+// Each task has a name and a number that distinguishes it from others of that name. The records are
+// in memory in the order in which they were named.
 class SchedTaskListSortTest : public SandboxTest {
  protected:
   void makeList(const std::vector<std::string> &names) {

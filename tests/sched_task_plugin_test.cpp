@@ -1,4 +1,4 @@
-// Hooks: what plugins are told of a change of a task.
+// Hooks: the action, stage and variables that plugins get at a change of a task.
 #include <gtest/gtest.h>
 #include <zelocore.h>
 

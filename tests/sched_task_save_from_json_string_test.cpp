@@ -233,7 +233,7 @@ TEST_F(TaskFromJsonTest, ATaskOfAnotherBackendIsOverwrittenThere) {
   EXPECT_EQ(fakes.calls().back(), "edit 1 id 7");
 }
 
-// Of a listed one the name is another than by its id; here it is taken by its id.
+// A listed power task has another name than one that is read by its id; this one is read by its id.
 TEST_F(TaskFromJsonTest, APowerTaskIsOverwrittenInItsPlaceOrBecomesAnOrdinaryTask) {
   support::haveClock();
   support::setPowerList(support::kOn, {{1, 127, 5, 7}, {1, 127, 6, 8}});
@@ -253,7 +253,7 @@ TEST_F(TaskFromJsonTest, APowerTaskIsOverwrittenInItsPlaceOrBecomesAnOrdinaryTas
   EXPECT_EQ(support::powerList(support::kOn).size(), 2U);
 }
 
-// What a backend leaves alone must not look like what is stored.
+// Fields that a backend does not fill must not be taken for stored values.
 TEST_F(TaskFromJsonTest, TheStoredTaskIsReadIntoAZeroFilledRecord) {
   const FakeBackends fakes(1);
   static bool wasZeroFilled;
@@ -283,7 +283,7 @@ TEST_F(TaskFromJsonTest, AMemberThatIsNoKeyOfATaskIsPassedOver) {
   EXPECT_EQ(loadTask(2)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
 }
 
-// As the header warns: the text alone decides, and what is no number counts as 0.
+// As the header warns: the text alone decides, and a text that is no number counts as 0.
 TEST_F(TaskFromJsonTest, AnOwnerThatIsMissingOrSaysNothingIsRoot) {
   int id = 0;
   for (const char *owner : {"", " 0", "-0", "0"}) {
@@ -436,7 +436,7 @@ TEST_F(TaskFromJsonTest, ANumberThatDoesNotFitItsFieldIsRefusedRatherThanCut) {
   EXPECT_EQ(loadTask(1)->Owner, 4294967295U);
 }
 
-// The conversion stops at the missing id, before it comes to them.
+// The conversion stops at the missing id, so only the check of the fields has seen these values.
 TEST_F(TaskFromJsonTest, WhetherFieldsFitIsAskedWithoutATraceInTheErrorRecord) {
   for (const auto &[key, value] : Members{
            {"run hour", "5x"}, {"run hour", "x5"}, {"run hour", "1234567890x"}, {"cmd", "!!"}}) {
@@ -483,7 +483,7 @@ TEST_F(TaskFromJsonTest, ATextCutOffAfterAHundredMegabytesIsRefusedAndQuotedWhol
   expectNotJson(text);
 }
 
-// Of many small values each takes sixty times its text in memory.
+// Many small values take many times the memory of their text.
 TEST_F(TaskFromJsonTest, ATextThatIsFarLongerThanAnyTaskIsRefused) {
   const std::string good = taskText();
   std::string tooLong = good.substr(0, good.size() - 1) + ",\"x\":[0";
@@ -492,7 +492,7 @@ TEST_F(TaskFromJsonTest, ATextThatIsFarLongerThanAnyTaskIsRefused) {
 }
 
 TEST_F(TaskFromJsonTest, ManyCommentsAreReadInLittleTime) {
-  // With comments kept this takes minutes; the time limit of the program is what fails then.
+  // If the reader kept comments, this would take minutes and exceed the program's time limit.
   std::string text = taskText();
   text.pop_back();
   for (int i = 0; i < 500'000; ++i) text += "/**/";
@@ -516,7 +516,7 @@ TEST_F(TaskFromJsonTest, TheIdThatWasReadStandsInTheLine) {
 
 // ---- what cron could not read -----------------------------------------------------------------
 
-// What the schedule is in JSON.
+// The schedule as members of the JSON object.
 Members membersOf(const support::Schedule &schedule) {
   constexpr const char *kTypes[] = {"once", "daily", "weekly", "monthly", "yearly"};
   const std::string week(schedule.week.substr(0, schedule.week.find('\0')));
@@ -531,7 +531,7 @@ Members membersOf(const support::Schedule &schedule) {
           {"last work hour", std::to_string(schedule.last)}};
 }
 
-// Where cron cannot read one line, it starts nothing of the whole crontab.
+// If cron cannot read one line, it ignores the whole crontab.
 std::vector<Members> schedules(bool isReadable) {
   std::vector<Members> all;
   for (const support::ScheduleCase &each : support::scheduleCases()) {
@@ -549,8 +549,7 @@ TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsRefused) {
     for (const char *state : {"disabled", "NotExisted"}) {
       SCOPED_TRACE(state);
       Members changes = schedule;
-      changes.emplace_back("state",
-                           state);  // it may be enabled later, by who looks at nothing else
+      changes.emplace_back("state", state);  // it may be enabled later without another check
       expectRefused(taskText(changes), "hash to task failed, task id=-1");
     }
     support::clearLog();
@@ -592,7 +591,7 @@ TEST_F(TaskFromJsonTest, AWeekOfOneCharacterTakesNoDaysFromTheTaskBeforeIt) {
             1);
 }
 
-// It has no line of its own, and the platform knows how to keep it.
+// It adds no line to the crontab, and the platform can store it.
 TEST_F(TaskFromJsonTest, APowerTimeWithoutADayIsOverwrittenInItsPlaceButIsNoOrdinaryTask) {
   support::haveClock();
   support::setPowerList(support::kOff, {{1, 0, 5, 7}});

@@ -280,7 +280,7 @@ TEST_F(SchedUtilTest, TheTimeTextIsLookedAtBeforeTheRecord) {
 
 // ---- the seed
 
-// The seed is sown once in a process, so each test of it has a process of its own.
+// rand() is seeded once in a process, so each test of it runs in a process of its own.
 template <typename Check>
 bool holdsInANewProcess(Check check) {
   if (fork() == 0) _exit(check() ? 0 : 1);
@@ -308,7 +308,7 @@ TEST_F(SchedUtilTest, ASecondCallInAProcessDoesNotSeedAgain) {
   }));
 }
 
-// Else runs started together by one caller would all wait alike.
+// Otherwise runs started together by one caller would wait for the same times.
 TEST_F(SchedUtilTest, AForkedProcessSeedsForItself) {
   setClock(time_t{1000000});
   EXPECT_TRUE(holdsInANewProcess([] {

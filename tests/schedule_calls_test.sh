@@ -1,5 +1,5 @@
 #!/bin/bash
-# The rules of schedules call nothing that reads a clock, allocates, logs or asks the system.
+# The library of schedules calls nothing that reads a clock, allocates, logs or makes a system call.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -9,7 +9,7 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
 
-# Texts in memory, and what the compiler's protections add.
+# String and memory functions, and those that the compiler's protections add.
 readonly ALLOWED='^(mem(cpy|set|move|cmp)|str(len|nlen|cpy)|stpcpy|__(st[pr]cpy|mem(cpy|set))_chk|__stack_chk_fail|_GLOBAL_OFFSET_TABLE_)$'
 
 foreign_calls() {

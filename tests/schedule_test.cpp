@@ -1,4 +1,4 @@
-// When a task runs: the rules themselves. What calls them is tested with the same table.
+// When a task runs: the rules themselves. Their callers are tested with the same table.
 #include <gtest/gtest.h>
 
 #include "fake_clock.h"
@@ -54,8 +54,7 @@ TEST_F(ScheduleTest, EachScheduleIsDueInItsMinutesAndHasItsNextRun) {
   }
 }
 
-// Minute by minute: each run is one at which cron starts the task and it is due, and no such minute
-// is left out.
+// Minute by minute: the runs are exactly the minutes at which cron starts the task and it is due.
 TEST_F(ScheduleTest, TheRunsAreTheMinutesOfCronAtWhichTheTaskIsDue) {
   for (const ScheduleCase &each : scheduleCases()) {
     SCOPED_TRACE(each.what);
@@ -109,7 +108,7 @@ std::vector<uint32_t> minutesOfDay(const Task &task) {
   return minutes;
 }
 
-// Whatever the hours: each run comes so much later, none is lost, and none leaves its day.
+// Whatever the hours: each run is later by the shift, none is lost, and none leaves its day.
 TEST_F(ScheduleTest, AShiftMovesEveryRunOfADay) {
   for (const uint32_t repeat : {0U, 1U, 2U, 5U, 12U, 23U, 24U}) {
     for (uint32_t hour = 0; hour < 24; ++hour) {

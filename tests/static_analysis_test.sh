@@ -1,5 +1,5 @@
 #!/bin/bash
-# What can be found without running anything.
+# Static analysis: clang-tidy, cppcheck, clang-format, shellcheck.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -73,8 +73,8 @@ cpp_check() {
     -I platform/libzelocore/include -I platform/libzelosdk/include "$@"
 }
 
-# cppcheck's parser knows no __VA_OPT__, which the report macros are made of. It is shown them in the
-# older spelling, in the place of their header.
+# cppcheck's parser knows no __VA_OPT__, which the report macros use. It gets a copy of their header
+# with the older spelling.
 cpp_check_library() {
   local macros status=0
   macros=$(mktemp)

@@ -1,5 +1,5 @@
-// While one process creates, edits and removes tasks, another that lists them sees every task that
-// stands throughout, each as it was at one moment, and no error.
+// While one process creates, edits and removes tasks, another that lists them sees each task that
+// exists throughout, in a consistent state, and no error.
 #include <gtest/gtest.h>
 #include <sys/mman.h>
 #include <sys/wait.h>
@@ -23,7 +23,7 @@ using Lines = std::vector<std::string>;
 
 constexpr int kStanding = 10;
 const int kPassing = isShortRun() ? 100 : 500;
-constexpr int kAliveAtOnce = 8;  // of those that come and go
+constexpr int kAliveAtOnce = 8;  // of the tasks that are created and removed
 constexpr uint32_t kMinutes = 60;
 
 // One number in fields at the beginning, in the middle and at the end of the record, the long ones
@@ -118,7 +118,7 @@ TEST_F(StoreReaderTest, AReaderNeverMissesATaskNorSeesATornOne) {
     passing.push_back(makeTask("", ""));
     fill(passing.back().get(), version++);
     EXPECT_EQ(ZELOSchedTaskSave(passing.back().get()), 0);
-    // A task that stands is edited, and one that came before goes.
+    // Edits one of the lasting tasks, and removes an earlier one of the others.
     const Task &edited =
         i % 2 == 0 ? standing[static_cast<size_t>(i / 2 % kStanding)] : passing.back();
     fill(edited.get(), version++);
@@ -133,12 +133,12 @@ TEST_F(StoreReaderTest, AReaderNeverMissesATaskNorSeesATornOne) {
   EXPECT_EQ(status, 0);
   EXPECT_EQ(complaints().texts(), Lines{});
   EXPECT_EQ(logged(), Lines{});
-  // It did read while the store changed.
+  // The reader has listed often while the store changed.
   EXPECT_GT(shared->lists, 20U);
   EXPECT_GT(shared->changes, 10U);
 }
 
-// The comparison above, of a task that is half old and half new.
+// The comparison above detects a task that is half old and half new.
 TEST_F(StoreReaderTest, ATornTaskIsToldApart) {
   const Task task = makeTask("", "");
   fill(task.get(), 2001);

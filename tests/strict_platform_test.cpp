@@ -1,5 +1,5 @@
-// A platform that is stricter than ours: it frees no null, and before the first failure its error
-// record has no file name.
+// A platform that is stricter than ours: it does not accept null to be freed, and before the first
+// failure its error record has no file name.
 #include <dlfcn.h>
 #include <gtest/gtest.h>
 

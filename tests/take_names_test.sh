@@ -39,7 +39,7 @@ outcome() {
   echo "$status $output"
 }
 
-# What was moved away from under a name, by its contents
+# Prints the contents of what was moved away from a name
 moved_from() {
   cat /tmp/zeloscheduler.*/"$(basename "$1")"
 }

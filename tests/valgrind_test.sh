@@ -1,6 +1,5 @@
 #!/bin/bash
-# The examples in C under valgrind: what a caller does by the book loses no memory and touches none
-# that is not his.
+# The examples in C under valgrind: no memory leak and no invalid access.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317

@@ -118,7 +118,7 @@ class ZelocorePlugin : public testing::Test {
     std::ofstream(Path(name)) << "#!/bin/sh\n" << script << "\n";
     ASSERT_EQ(chmod(Path(name).c_str(), mode), 0);
   }
-  /* A plugin that notes its name. */
+  /* A plugin that records its name. */
   void InstallNoter(const std::string &name, mode_t mode = 0755) {
     Install(name, "echo " + name + " >> " + Log(), mode);
   }

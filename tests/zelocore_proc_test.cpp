@@ -23,7 +23,7 @@ namespace {
 int g_failing_fork = 0;
 int g_forks = 0;
 
-/* What status pages hold; the real ones when null, none when empty. */
+/* The contents of /proc/PID/status; the real ones when null, none when empty. */
 const char *g_status_page = nullptr;
 bool g_pipes_fail = false;
 int g_interruptions = 0;
@@ -206,7 +206,7 @@ TEST_F(ZelocoreProc, TheProgramStartsWithDefaultSignals) {
   sigprocmask(SIG_SETMASK, &set, &before);
   auto *const handler = signal(SIGHUP, SIG_IGN);
   const int blocked = Shell("grep -q '^SigBlk:.0*$' /proc/self/status");
-  /* Of the 31 standard signals: the C library keeps the two above for itself. */
+  /* Of the 31 standard signals: the C library uses the two above itself. */
   const int ignored = Shell("grep -q '^SigIgn:.*[08]0000000$' /proc/self/status");
   signal(SIGHUP, handler);
   sigset_t after;
@@ -216,7 +216,7 @@ TEST_F(ZelocoreProc, TheProgramStartsWithDefaultSignals) {
   EXPECT_TRUE(sigismember(&after, SIGUSR1)) << "the caller's mask is its own";
 }
 
-/* The child's side of the fork tells who it is through a pipe, and ends. */
+/* The child writes its process id into a pipe, and exits. */
 int ForkAndHear(pid_t *child, int *code = nullptr) {
   int ends[2];
   if (pipe(ends) != 0) {

@@ -18,7 +18,7 @@
 namespace {
 
 long g_allocations = 0;
-/* How many more succeed; none counts them down otherwise. */
+/* How many more allocations succeed; only ShortMemory sets it. */
 long g_allocations_left = LONG_MAX;
 
 void *Allocate(std::size_t size) {
@@ -169,8 +169,8 @@ double SecondsToSet(const std::vector<std::string> &keys) {
   return used;
 }
 
-/* Whoever knows how a hash without a key mixes words makes texts of 16 bytes that differ
- * and end in the same state. This is how one was made to take minutes. */
+/* Different texts of 16 bytes that collide in a hash without a secret key. With such a hash
+ * this test took minutes. */
 std::vector<std::string> KeysThatCollideWithoutAKey(size_t count) {
   constexpr uint64_t kLength = 16;
   constexpr uint64_t kState = 0x6161616161616161U;

@@ -1,6 +1,6 @@
 #!/bin/bash
-# 'zelosched apply', by which many machines are kept alike: what it does and tells, that it takes turns
-# with others, and what is left when it fails or is killed at any step.
+# 'zelosched apply', which keeps the tasks of many machines the same: its output, that it takes turns
+# with others, and the state after it fails or is killed at any step.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -15,7 +15,7 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 readonly PYTHON=/usr/bin/python3 # which has Debian's jsonschema
 readonly FAIL=$BUILD_DIR/tests/fail_step.so
 
-# A build that watches each call writes what it has seen in many more steps.
+# A build for sanitizers or coverage makes many more calls.
 if grep -q -e __asan_init -e __gcov_ "$ZELOSCHED"; then
   readonly IS_WATCHED=true STRIDE=20
 else
@@ -24,7 +24,7 @@ fi
 
 # ---- helpers --------------------------------------------------------------------------------
 
-# many COUNT [COMMAND]: a file of so many tasks
+# many COUNT [COMMAND]: a file of COUNT tasks
 many() {
   "$PYTHON" -c 'import json, sys
 print(json.dumps({"version": 1, "tasks": [
@@ -37,7 +37,7 @@ is_valid() {
   "$PYTHON" "$here/support/json_schema.py" "$@"
 }
 
-# milliseconds COMMAND...: of the processor, that of what it starts counted
+# milliseconds COMMAND...: the processor time that it takes, with its children
 milliseconds() {
   "$PYTHON" -c 'import resource, subprocess, sys
 subprocess.run(sys.argv[1:], check=True, stdout=subprocess.DEVNULL)
@@ -92,7 +92,7 @@ an_apply_and_others_take_turns() {
     same "$(grep -c unchanged told)" 20 && crontab_fits
 }
 
-# It looks at the tasks when it has its turn, not before.
+# It reads the tasks after it has taken the lock.
 what_changed_while_it_waited_is_seen() {
   clean
   set_of 02:30 >set.json
@@ -109,7 +109,7 @@ what_changed_while_it_waited_is_seen() {
 
 # ---- steps that fail ------------------------------------------------------------------------
 
-# A removal, a change, a creation, and one that stays.
+# Two sets, for a task to be removed, one to be changed, one to be created and one that stays.
 before_and_after() {
   clean
   file_of "$(one removed 01:00)" "$(one changed 02:00)" "$(one same 03:00)" >old
@@ -162,7 +162,7 @@ fails_at_every_step() {
       cat export.err
       bad=1
     fi
-    # What it says is done is done.
+    # After a success everything is done.
     if [[ $1 != kill && $status == 0 ]]; then
       cmp -s exported.now exported.new || { echo "step $step: not done, and not told"; bad=1; }
     fi
@@ -175,8 +175,8 @@ fails_at_every_step() {
   ((step > 100))
 }
 
-# Who ends a command at a terminal ends all that it has started: here while the working copy is
-# half written.
+# A signal from a terminal goes to the children too: here while /bin/cp has written a part of the
+# working copy.
 ends_between_changes() {
   local signal
   before_and_after
@@ -206,8 +206,8 @@ print(subprocess.run(sys.argv[1:], preexec_fn=begin, stdout=subprocess.DEVNULL).
   done
 }
 
-# Nothing that was stored is lost, each task that could not be saved is told, and with room the same
-# file is applied whole.
+# No stored task is lost, each task that could not be saved is reported, and with room the same file
+# is applied whole.
 a_full_disk_is_told() {
   clean
   many 50 "$(printf '%02000d' 0)" >set.json

@@ -1,4 +1,4 @@
-// What a list tells in few words: schedules, runs, and cells that go on below.
+// The short forms of lists: schedules, runs, and cells that are wrapped.
 #include <gtest/gtest.h>
 
 #include "runs/history.h"

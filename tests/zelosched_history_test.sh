@@ -1,6 +1,6 @@
 #!/bin/bash
-# The history database: one of the first version becomes one of today's and loses nothing, and what
-# other programs rely on in it.
+# The history database: one of the first version is migrated to today's without loss, and keeps what
+# other programs rely on.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -72,7 +72,7 @@ print([(r["run"], r["task"], r["outcome"]) for r in json.load(sys.stdin)["runs"]
     "[(2, 2, 'finished'), (1, 1, 'finished')]"
 }
 
-# Killed at any write: the old one stands, or the new one.
+# Killed after 10 to 80 ms: the old version is there, or the new one.
 a_migration_that_is_killed_leaves_one_of_both() {
   local i version bad=0
   for i in 1 2 3 5 8 13 21 34; do
@@ -92,7 +92,7 @@ an_earlier_one_is_used_whoever_is_first() {
   same "$(cat "$SCRATCH"/out.* | sort | uniq -c | awk '{ print $1 }' | sort -u)" 10
 }
 
-# What the sweep has taken over goes on counting.
+# The numbers of deleted runs are not used again.
 no_number_comes_again() {
   clean
   z add --quiet --daily 08:30 -- true >/dev/null

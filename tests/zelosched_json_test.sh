@@ -1,6 +1,6 @@
 #!/bin/bash
-# The JSON that zelosched writes and reads: each output against the schema in docs/schema, files there
-# and back, and what is said of those that cannot be read.
+# The JSON that zelosched writes and reads: each output against the schema in docs/schema, round trips
+# of files, and the messages for those that cannot be read.
 #
 # Functions are called by check, and what stands in single quotes is for another shell:
 # shellcheck disable=SC2317,SC2016
@@ -21,12 +21,12 @@ is_valid() {
   "$PYTHON" "$here/support/json_schema.py" "$@"
 }
 
-# of EXPRESSION: what it is of the JSON that is read
+# of EXPRESSION: prints it for the JSON on standard input
 of() {
   "$PYTHON" -c "import json, sys; top = json.load(sys.stdin); print($1)"
 }
 
-# says STATUS ERRORS...: the status, and each line of standard error
+# says STATUS ERRORS...: checks the status, and each line of standard error
 says() {
   local wanted=$1
   shift
@@ -227,7 +227,7 @@ an_export_changes_nothing_where_it_is_from() {
   local field
   all_kinds
   applied_where_it_is_from_it_changes_nothing || return 1
-  # Of the daily one, what another program may have stored, which means the same.
+  # Fields of no effect on the daily task, which another program may have stored.
   for field in 'start year=2000' 'start month=0' 'start day=0' 'last work hour=5' 'week=1000000' 'listable=0' \
     'can edit from ui=0'; do
     sed -i "/^\[2\]/,/^\[3\]/s/^${field%%=*}=.*/${field%%=*}=\"${field#*=}\"/" "$STORE"
@@ -245,7 +245,7 @@ comes_back_from_what_lists_tell() {
   z import - <"$SCRATCH/told" >/dev/null && z export | diff "$SCRATCH/before" -
 }
 
-# By key, whatever the ids are, whenever it is written, and however the runs went.
+# Ordered by key, and independent of ids, of the time, and of runs.
 an_export_changes_with_the_tasks_alone() {
   clean
   add --daily 08:30 --name b -- true

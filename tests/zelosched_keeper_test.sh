@@ -21,7 +21,7 @@ cp /etc/crontab "$SCRATCH/crontab"
 
 # ---- helpers --------------------------------------------------------------------------------
 
-# Everybody is gone: of a run that was left in the middle, too.
+# Kills every keeper and run, also of a test that has failed in the middle.
 clean() {
   local pid
   for pid in $(pgrep -x zeloschedtask || true); do kill -9 "$pid" 2>/dev/null || true; done
@@ -40,7 +40,7 @@ add() {
   z add --quiet --daily 08:30 "$@" -- "$command" >/dev/null
 }
 
-# What a command does to be held: it says that it has begun, and goes on after a line.
+# A command that reports that it has begun, and goes on when it has read a line.
 readonly HOLD="echo \$PPID >$SCRATCH/begun; read -r line <$SCRATCH/go"
 
 # Starts the task and waits until its command has begun; sets run_process.
@@ -58,7 +58,7 @@ kept() {
   sql "$KEPT" "$@"
 }
 
-# until_is WANTED COMMAND...: it says so within half a minute.
+# until_is WANTED COMMAND...: waits up to half a minute until COMMAND prints WANTED
 until_is() {
   local wanted=$1 got i
   shift
@@ -90,7 +90,7 @@ is_gone() {
   until_is "" living "$1"
 }
 
-# One that has ended and waits for its parent to ask how is gone.
+# A zombie counts as gone.
 living() {
   ps -o stat= -p "$1" | grep -v Z
 }
@@ -201,7 +201,7 @@ an_owner_who_is_gone_is_told_as_not_started() {
     run_is 54321 owner
 }
 
-# What it leaves behind is in another session, where 'timeout' does not find it.
+# The process left behind is in another session, so 'timeout' does not signal it.
 ends_what_is_left_past_the_limit() {
   clean
   add "timeout --kill-after=30s 1s sh -c 'setsid sh -c \"echo \\\$\\\$ >$SCRATCH/ran; exec sleep 1000\" & sleep 1000'"
@@ -210,7 +210,7 @@ ends_what_is_left_past_the_limit() {
     is_gone "$(cat "$SCRATCH/ran")"
 }
 
-# The time in which it waits is none of its own, and that from its start until it was seen is.
+# The time in which it waits does not count; that between its start and its discovery does.
 counts_the_limit_from_the_start_after_waiting() {
   clean
   add "$HOLD" --app X --app-overlap no
@@ -275,7 +275,7 @@ follows_what_goes_on() {
   until_is first cat "$SCRATCH/out" && go && wait $! && same "$(cat "$SCRATCH/out")" $'first\nlast'
 }
 
-# Nobody but who follows looks after the run.
+# Only 'log --follow' can start another keeper.
 follows_a_run_whose_keeper_is_killed() {
   clean
   add "echo first; $HOLD; echo last"
@@ -288,7 +288,7 @@ follows_a_run_whose_keeper_is_killed() {
     wait $! && same "$(head -n 1 "$SCRATCH/out")" first && ended_as "$FINISHED"
 }
 
-# As by an interrupt of its terminal, and a pager that waits does the same.
+# As when it is stopped from its terminal, or its output goes to a pager that waits.
 a_reader_who_stands_still_holds_up_no_keeper() {
   clean
   add "echo \$PPID >$SCRATCH/begun; exec yes" --time-limit 1s
@@ -312,7 +312,7 @@ a_command_may_end_its_process_group() {
   same "$(z log 1)" said && run_is 2 state && is_gone_by_name
 }
 
-# Whoever opens the pipe for reading takes what the run itself has printed, and no more.
+# A command that opens the pipe for reading can take only its own output.
 what_reads_its_own_output_harms_nobody() {
   clean
   add 'exec 3<>/dev/stdout; echo said; head -c 5 <&3 >/dev/null; echo more' --owner nobody
@@ -338,7 +338,7 @@ a_daemon_does_not_keep_a_run_from_ending() {
   clean
   add "setsid sh -c 'echo \$\$ >$SCRATCH/ran; read -r line <$SCRATCH/go; head -c 1000000 /dev/zero; echo wrote >$SCRATCH/ran2' & until test -s $SCRATCH/ran; do :; done; echo said"
   z run --wait 1 >/dev/null && same "$(z log 1)" said && ended_as "$FINISHED" || return 1
-  # It is read on, and is not the run's any more.
+  # It is still read, but does not belong to the run any more.
   fails_saying "is not running" z stop 1 && go && until_is wrote cat "$SCRATCH/ran2" && is_gone_by_name
 }
 
@@ -408,7 +408,7 @@ check "a setting that is wrong is told, and changes nothing" tells_of_a_setting_
 
 # ---- faults ---------------------------------------------------------------------------------
 
-# What it prints then is more than a pipe holds, and no write of it may fail.
+# It then prints more than a pipe holds, and no write may fail.
 a_killed_keeper_ends_no_run() {
   clean
   add "echo first; $HOLD; head -c 1000000 /dev/zero && echo ran >$SCRATCH/ran"
@@ -418,7 +418,7 @@ a_killed_keeper_ends_no_run() {
   killed=$(keeper_of)
   kill -9 "$killed"
   is_gone "$killed"
-  z history >/dev/null # has another one look after it
+  z history >/dev/null # starts another keeper
   until_is 0 kept "SELECT keeper = $killed FROM run" && go && ended_as "$FINISHED" &&
     same "$(cat "$SCRATCH/ran")" ran && run_is 1000006 output_bytes && same "$(z log 1 | head -c 5)" first
 }
@@ -435,7 +435,7 @@ a_killed_keeper_leaves_the_end_to_the_sweep() {
   ended_as "$FAILED" && run_is "1 4" "count(*), exit_code" && same "$(z log 1)" first
 }
 
-# As the parent of the run it is seen by the caller, which starts the run where there is none.
+# The caller inherits the run's process, and starts the run itself where there is none.
 a_keeper_killed_before_the_run_loses_nothing() {
   clean
   add "echo ran >>$SCRATCH/ran"
@@ -464,7 +464,7 @@ KILLER
   until_is $'ran\nran' cat "$SCRATCH/ran" && is_gone_by_name && same "$(z history | wc -l)" 3
 }
 
-# with_history FAULT: a run takes place, and is in the status database.
+# runs_without_its_record FAULT: the run takes place, and is in the status database
 runs_without_its_record() {
   local fault=$1
   clean
@@ -479,7 +479,7 @@ no_database() { head -c 9000 /dev/zero | tr '\0' x >"$KEPT"; }
 later_version() { kept "PRAGMA user_version = 99"; }
 no_room() { mount -n -t tmpfs -o mode=0755,size=4k var /usr/zelo/var; }
 
-# start_without_room: and then there is some
+# start_without_room: starts a run while there is no room for the history, and then makes some
 start_without_room() {
   clean
   mkdir -p /usr/zelo/var
@@ -516,7 +516,7 @@ HOLD
   ended_as "$FINISHED" && run_is 1000000 output_bytes
 }
 
-# What a keeper could not commit is not there: neither is the task that it was about to note.
+# When a keeper's commit fails, the entry of the task is rolled back too.
 a_run_is_its_tasks_own_after_a_commit_that_failed() {
   clean
   add 'exit 1' --name one
@@ -536,7 +536,7 @@ READ
     FROM run JOIN task USING(generation) ORDER BY run.task)"
 }
 
-# The sweep writes it when there is room again, and it alone tells of it.
+# The sweep writes it when there is room again, and it alone runs the programs of run-ended.d.
 an_end_without_room_is_left_to_the_sweep() {
   clean
   mkdir -p /usr/zelo/var /etc/zelosched/run-ended.d
@@ -693,7 +693,7 @@ a_new_task_inherits_no_run() {
     z run --wait 1 >/dev/null && same "$(z history 1 | sed -n 2p | awk '{ print $NF }')" new
 }
 
-# As another program does it: the store says so, and nobody told the history.
+# As another program does it: only the store has the change, not the history.
 notes_what_others_changed() {
   clean
   add 'exit 3' --name old

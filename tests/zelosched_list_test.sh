@@ -1,5 +1,5 @@
 #!/bin/bash
-# The list at a glance, tasks by their names, and time limits, as an administrator meets them.
+# The list, tasks by their names, and time limits, as an administrator uses them.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -58,7 +58,7 @@ print(base64.b64decode(json.loads(json.load(sys.stdin)["cmd"])).decode(), end=""
 # ---- the list -------------------------------------------------------------------------------
 
 readonly HISTORY=/usr/zelo/var/history.sqlite
-# Its keeper writes of a run once more when it has told of its end.
+# The keeper writes the run into the history once more after it has reported its end.
 started_at_nine() {
   until [[ $(sqlite3 "$HISTORY" "SELECT count(*) FROM run WHERE state = 2 AND told = 0") == 0 ]]; do sleep 0.01; done
   sqlite3 /tmp/sched_status.sqlite "UPDATE task_status SET timestamp = $(date -u -d '2026-11-22 09:00' +%s)"
@@ -100,7 +100,7 @@ is_whole_at_80_columns() {
     grep -q 'mon-fri 08:00 every 2h  Mon 08:00  finished, 3 h ago' "$SCRATCH/seen" && ! grep -q '…' "$SCRATCH/seen"
 }
 
-# The words of the whole list are those of the narrow one.
+# The wide and the narrow list have the same words.
 nothing_is_lost_at_60_columns() {
   local name
   common_tasks

@@ -1,6 +1,6 @@
 #!/bin/bash
-# The way of a failed run to the one who is to know of it: what the metrics' unit writes, through
-# Prometheus' node exporter, to the alerts of the example.
+# A failed run, from the output of the metrics' unit through Prometheus' node exporter to the example
+# alerts.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -32,7 +32,7 @@ write_as_the_unit_does() {
   z $command
 }
 
-# As Debian's package starts it: it collects of that directory unless told otherwise.
+# As Debian's package starts it: with that directory for the textfile collector.
 start_exporter() {
   directory=$(sed -n 's/^ConditionPathIsDirectory=//p' "$UNIT")
   mount -n -t tmpfs collected /var/lib/prometheus
@@ -70,7 +70,6 @@ a_failed_run_is_scraped() {
     grep -q 'node_textfile_mtime_seconds{file=".*/zelosched.prom"}' scraped
 }
 
-# Nobody sees half a file, and the next one takes its place.
 the_next_run_takes_its_place() {
   z edit 1 -- true >/dev/null
   z run --wait 1 >/dev/null

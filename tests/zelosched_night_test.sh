@@ -1,6 +1,6 @@
 #!/bin/bash
-# The morning after, with the real cron: what failed and why, what hangs, what was missed, who was told.
-# Waits for a real minute.
+# With the real cron: runs that failed, hang or were missed, and the notices of them. Waits for a real
+# minute.
 #
 # Functions are called by check, and what stands in single quotes is for another shell:
 # shellcheck disable=SC2317,SC2016
@@ -78,7 +78,7 @@ ends_running_processes() {
   ! pgrep -f 'sleep 1000' && same "$(z history --task hang --json | json 'tasks[0]["outcome"]')" stopped
 }
 
-# The run has ended when 'stop' returns, and its keeper tells of it then.
+# When 'stop' returns the run has ended, and its keeper runs the notices after that.
 everybody_was_told() {
   local tenths
   for ((tenths = 0; tenths < PATIENCE; tenths++)); do

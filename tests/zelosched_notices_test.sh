@@ -1,5 +1,5 @@
 #!/bin/bash
-# Who is told of the end of a run: the programs in run-ended.d, the owner by mail, the system log.
+# Notices of the end of a run: the programs in run-ended.d, mail to the owner, the system log.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -35,13 +35,13 @@ add() {
   z add --quiet --daily 08:30 "$@" -- "$command" >/dev/null
 }
 
-# Until nobody looks after a run any more.
+# Runs tasks, and waits until no keeper is left.
 run() {
   z run --wait "$@" >/dev/null 2>&1 || true
   wait_for_keepers
 }
 
-# That pgrep could not look says nothing.
+# Only status 1 of pgrep says that there is none; others are failures of pgrep.
 wait_for_keepers() {
   local i status
   for ((i = 0; i < 1800; i++)); do
@@ -111,7 +111,7 @@ finished -1-
 finished --"
 }
 
-# The command holds the pipe, and the program would hold the keeper.
+# A child of the command keeps the pipe open; the keeper runs the programs all the same.
 does_not_wait_for_the_pipe() {
   clean
   add "sleep 1000 & echo \$! >$SCRATCH/told.pid"
@@ -122,7 +122,7 @@ does_not_wait_for_the_pipe() {
   told_is told && kill "$(cat "$SCRATCH/told.pid")" && wait_for_keepers
 }
 
-# In its process group; the clock of the wait is the kernel's, so this takes half a minute.
+# With its process group. The clock of the wait is the real one, so this takes half a minute.
 ends_a_program_that_hangs() {
   clean
   add true
@@ -163,7 +163,7 @@ check "the system log has a line for each end" logs_one_line
 
 # ---- mail -----------------------------------------------------------------------------------
 
-# Keeps what it gets.
+# Keeps the mails that it gets.
 put_sendmail() {
   clean
   cat >/usr/sbin/sendmail <<SENDMAIL
@@ -208,7 +208,7 @@ mails_a_fixed_address() {
   same "$(tail -1 "$SCRATCH"/mail_to.*)" admin@example.org
 }
 
-# The last mails are an hour old.
+# Makes the last mails an hour old.
 an_hour_later() {
   sed -i "s/^[0-9]*/$(($(date +%s) - 3601))/" /run/zelosched/mailed/*
 }
@@ -265,7 +265,7 @@ says_what_became_of_it() {
   same "$(shown | sed -n 1p)" "root | scheduled task 2 (Task 2) ended by its time limit | 6"
 }
 
-# There was no run, of which something could be told.
+# Without a run, most variables are empty.
 says_what_was_missed() {
   put_sendmail
   env ZELO_RUN='' ZELO_RUN_TASK=4 ZELO_RUN_TASK_NAME=backup ZELO_RUN_OWNER=root ZELO_RUN_OUTCOME=missed \
@@ -309,7 +309,7 @@ no_name_becomes_a_header() {
   same "$(mails)" 1 && ! grep -qi '^bcc' "$SCRATCH"/mail.*
 }
 
-# The machine's own stays as it is.
+# The machine's own /usr/sbin stays as it is.
 mkdir -p /tmp/notices_sbin
 cp -a /usr/sbin/. /tmp/notices_sbin/
 mount -n --bind /tmp/notices_sbin /usr/sbin

@@ -1,4 +1,4 @@
-// Which processes are taken for a run's: a command chooses its process's name.
+// Which processes are taken for a run: a command can choose its own process name.
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/prctl.h>
@@ -13,7 +13,7 @@ namespace {
 
 constexpr uid_t kOther = 65534;
 
-// A child that has made itself ready and waits; gone with the object.
+// A child process that has called `prepare` and waits; killed with the object.
 template <class Prepare>
 class Child {
  public:

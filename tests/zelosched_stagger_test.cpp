@@ -31,7 +31,7 @@ TEST(ZeloschedStaggerTest, AWindowIsSaidInMinutesOrHours) {
   }
 }
 
-// Another version must not move the tasks of all machines.
+// A later version must give each machine the same minutes.
 TEST(ZeloschedStaggerTest, TheMinuteOfAMachineIsTheSameForEver) {
   EXPECT_EQ(placeInWindow(kMachine, "backup", "Nightly", 30), 8U);
   EXPECT_EQ(placeInWindow(kMachine, "backup", "Nightly", 1440), 1118U);

@@ -158,8 +158,8 @@ TEST_F(ZeloschedTaskCheckTest, WhatIsJustInRangeIsFit) {
   for (const auto &change : fits) EXPECT_EQ(harms(change), Sentences{});
 }
 
-// Also of tasks of programs that check nothing. Where the line that the library writes is not the
-// one that is expected, status reports a difference for ever and no task can be saved.
+// Also for tasks of programs that check nothing. If the library's line differed from the expected
+// one, status would report it for ever, and no task could be saved.
 TEST_F(ZeloschedTaskCheckTest, TheCrontabIsInStepWithTheLineOfEachSchedule) {
   for (const ScheduleCase &each : scheduleCases()) {
     SCOPED_TRACE(each.what);

@@ -1,4 +1,4 @@
-// A time limit as a part of the stored command, there and back.
+// A time limit as a part of the stored command, written and read back.
 #include <gtest/gtest.h>
 
 #include <string>

@@ -34,7 +34,7 @@ class ZeloschedtaskTest : public SandboxTest {
     return task;
   }
 
-  // Saves the task anew with the current minute when that passed while the program ran.
+  // Saves the task with the current minute, and tries again when the minute passed meanwhile.
   template <typename Change>
   static Outcome runDueTask(const std::string &command, Change change) {
     constexpr time_t kSecondsPerMinute = 60;

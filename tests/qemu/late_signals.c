@@ -1,5 +1,5 @@
-/* Of two signals the emulator hands on the second, where that one ends it. 0 where it is the first.
- */
+/* Of two signals the emulator delivers only the second when that one is SIGKILL. 0 where the first
+ * is delivered. */
 #include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>

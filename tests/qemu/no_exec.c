@@ -1,4 +1,4 @@
-/* The kernel starts no program of the emulated processor. 0 where it does. */
+/* The kernel cannot execute a program of the emulated processor. 0 where it can. */
 #include <unistd.h>
 
 int main(int argc, char **argv) {

@@ -1,5 +1,5 @@
-/* The emulator starts what is not there: its vfork is a fork, so the child cannot tell. 0 where it
- * can. */
+/* posix_spawn of a missing program succeeds: the emulator's vfork is a fork, so the child cannot
+ * report the error. 0 where it can. */
 #include <spawn.h>
 
 int main(void) {

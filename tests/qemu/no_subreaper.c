@@ -1,4 +1,4 @@
-/* The emulator refuses to make a process the parent of its orphans. 0 where it can. */
+/* The emulator refuses PR_SET_CHILD_SUBREAPER. 0 where it does not. */
 #include <sys/prctl.h>
 
 int main(void) {

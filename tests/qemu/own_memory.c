@@ -1,4 +1,5 @@
-/* What the kernel counts as memory of a process is the emulator's. 0 where it is below 8 MiB. */
+/* The memory that the kernel accounts to a process includes the emulator's. 0 where it is below
+ * 8 MiB. */
 #include <stdio.h>
 
 int main(void) {

@@ -1,5 +1,5 @@
-/* What the emulated C library ignores in a command, 32 and 33, are other signals there. 0 where
- * they are not. */
+/* Signals 32 and 33, which the C library ignores in a command, have other numbers under the
+ * emulator. 0 where they have not. */
 #include <stdlib.h>
 
 int main(void) {

@@ -4,8 +4,9 @@
 #   scripts/cross-root tests/qemu/run_tests.sh TARGET [NAME...]      all programs, by default
 #   scripts/cross-root --quick tests/qemu/run_tests.sh --quick TARGET [NAME...]
 #
-# Left out is what the emulator cannot do, as tests/qemu/cannot.txt says, and with --quick what takes it a minute. $BUILD_DIR is that of the machine's
-# own build; the programs are those of $BUILD_DIR/cross/TARGET, or quick/TARGET. $PAGE_SIZE is another size of pages than 4096.
+# Tests that the emulator cannot run are left out (tests/qemu/cannot.txt), and with --quick those that
+# take it a minute. $BUILD_DIR is the machine's own build; the programs are those of
+# $BUILD_DIR/cross/TARGET, or quick/TARGET. $PAGE_SIZE is a page size other than 4096.
 set -euo pipefail
 
 here=$(cd "$(dirname "$0")" && pwd -P)
@@ -25,7 +26,7 @@ case $target in
   s390x) emulator=qemu-s390x-static ;;
 esac
 export EMULATOR="$here/emulate.py $emulator${PAGE_SIZE:+ -p $PAGE_SIZE}"
-# An emulator is some ten times slower: a tenth of what takes long by its number.
+# The emulator is much slower: tests with a length run a tenth of it.
 export TIMES_SLOWER=5 ZELO_SOAK_FACTOR=0.1
 
 # The first column of a row is a program or a test of one, the second the programs that show the reason.
@@ -40,8 +41,8 @@ programs() {
   done
 }
 
-# Other processes start these by name, which only the machine's own programs can be. Mounts are private
-# here, and so is what stands in the place of the programs.
+# Other processes execute these by name, which the kernel can do only with native programs. Scripts
+# take their place, in mounts that are private here.
 wrap_tools() {
   local tool
   mkdir -p "$BUILD_DIR/bin" "$BUILD_DIR/bin.$target"

@@ -2,8 +2,9 @@
  * demo_tasks UID OUTPUT - saves three tasks through the library, as a program
  * of the appliance would: one of user UID that is due in the next minute and
  * writes the ids that it runs with to OUTPUT, one that is disabled, and one that
- * is due a year later, which its crontab line cannot tell. Prints a line "ID NAME OWNER STATE
- * NEXT-TRIGGER-TIME", separated by tabs, for each, the one that is due first.
+ * is due a year later, which a crontab line cannot express. Prints a line "ID
+ * NAME OWNER STATE NEXT-TRIGGER-TIME", separated by tabs, for each, beginning
+ * with the one that is due first.
  */
 #include <stdint.h>
 #include <stdio.h>

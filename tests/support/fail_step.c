@@ -1,8 +1,8 @@
-/* Loaded into zelosched: the step of the number FAIL_STEP, a call that changes files or starts
-   programs, fails with FAIL_ERROR, once, or ends the program where FAIL_ERROR is "kill". It is
-   noted in the file FAIL_MARK, so that a caller sees when there are no more. What the program
-   starts is left alone. */
-/* Where off_t has 32 bits of its own, each of two names is to be a function here. */
+/* Preloaded into zelosched: of the calls that open or change files or start programs, the one of
+   number FAIL_STEP fails with FAIL_ERROR, or kills the program where FAIL_ERROR is "kill". It
+   creates the file FAIL_MARK, so that a caller sees when there are no more. Child processes are
+   not affected. */
+/* So that, with a 32-bit off_t, open and open64 are two functions here. */
 #undef _FILE_OFFSET_BITS
 #undef _TIME_BITS
 #include <dlfcn.h>
@@ -80,7 +80,7 @@ REPLACE(pid_t, fork, (void), ())
 REPLACE_SPAWN(posix_spawn)
 REPLACE_SPAWN(posix_spawnp)
 
-/* Those that read fail as well. */
+/* Opening for reading fails as well. */
 #define REPLACE_OPEN(name)                                       \
   int name(const char *path, int how, ...) {                     \
     static int (*real)(const char *, int, ...);                  \

@@ -47,14 +47,14 @@ namespace {
 #define WIDE_CALLS(X)
 #endif
 
-// X(number of arguments, name, how, key, failure) of each call that is passed on as it is:
+// X(number of arguments, name, how, key, failure) of each call that is passed on unchanged:
 //   how      '=' a plan's key must be equal to the call's, '~' or be contained in it; and
-//            'w' it writes, so there may be no room for it and no right to do it;
+//            'w' it writes, so it can fail with ENOSPC, EDQUOT and EROFS;
 //            'n' it never fails in a step, as it cannot fail;
 //            's' standard streams and descriptors are never touched;
 //            'd' it has done its work when it fails
 //   key      of its arguments a, b, c and so on; null for none
-//   failure  what it then gives, unless a plan says otherwise
+//   failure  its result when it fails, unless a plan says otherwise
 #define PLAIN_CALLS(X)                                                                           \
   X(1, QLIBCSzHashAlloc, "=", std::to_string(a), kFailed)                                        \
   X(3, QLIBCSzHashSetValue, "=", b, kFailed)                                                     \
@@ -295,7 +295,7 @@ Forced &forced() {
   return values;
 }
 
-// malloc is called before anything else here is ready, and by everything here.
+// malloc is called before anything else here is initialised, and by everything here.
 bool allocationPlanned = false;
 bool callsAreWatched = false;
 
@@ -321,7 +321,7 @@ bool concerns(Call call, const Plan &plan, const char *key, size_t size) {
   return is(call, '=') ? std::strcmp(key, plan.key) == 0 : std::strstr(key, plan.key) != nullptr;
 }
 
-// No room and no right to write is found by what writes.
+// Only calls that write fail with these errors.
 bool canFailWith(Call call, int error) {
   const bool isOfWriters = error == ENOSPC || error == EDQUOT || error == EROFS;
   return !is(call, 'n') && (!isOfWriters || is(call, 'w'));
@@ -333,7 +333,7 @@ int errorOf(Call call) {
   return call == Call::k_fork ? EAGAIN : state().step.error;
 }
 
-// Whether the step that stands is at this call.
+// Whether the current step fails this call.
 bool fallsOn(Call call) {
   Step &step = state().step;
   if (!step.stands || OwnWork::isGoingOn() || !canFailWith(call, step.error)) return false;
@@ -356,7 +356,7 @@ void actBefore(Call call) {
   errno = error;
 }
 
-// Counts the call. The plan by which it fails, or null.
+// Counts the call. Returns the plan by which it fails, or null.
 const Plan *failing(Call call, const char *key = nullptr, size_t size = 0) {
   if (countsAreWritten) return nullptr;
   State::PerCall &calls = slot(call);
@@ -486,8 +486,8 @@ struct Signature<ResultOf(Arguments...) noexcept> : Signature<ResultOf(Arguments
   static constexpr bool kIsNoexcept = true;
 };
 
-// The key may be a text that is made for it, which is the test's own work; looking for the next
-// definition of the call is not, and comes after it.
+// Making the key may allocate, which is the test's own work; looking up the next definition of the
+// call is not, and comes after it.
 template <Call call, class Next, class Key, class Failure, class... Arguments>
 auto failOrCall(Next next, Key makeKey, const Failure &failure, Arguments... arguments) {
   using Result = decltype(next()(arguments...));
@@ -805,7 +805,7 @@ int close(int descriptor) {
   REAL(close);
   if (isStandard(descriptor)) return real_close(descriptor);
   const int result = real_close(descriptor);
-  if (result != 0) return result;  // of what was not open, which is no failure to be had
+  if (result != 0) return result;  // the descriptor was not open
   const auto *plan = failing(Call::k_close);
   return plan != nullptr ? resultOf(*plan, -1) : result;
 }
@@ -923,7 +923,7 @@ int posix_spawn(pid_t *pid, const char *program, const posix_spawn_file_actions_
   return real_posix_spawn(pid, program, actions, attributes, arguments, environment);
 }
 
-// Its header leaves out that it is of the C language.
+// Its header lacks extern "C".
 int pidfd_open(pid_t pid, unsigned flags) noexcept {
   FAIL_OR_CALL(pidfd_open, nullptr, kFailed, pid, flags);
 }

@@ -18,10 +18,11 @@
 //   plugin argument    QLIBPluginSetArg, QLIBPluginSetArgByInt             equal
 //   section name       QLIBCFile{Get,Set,Add,Remove}Section                equal
 //   path or text       QLIBCFileExist, QLIBCFileTouch, QLIBCFileEnumSection, QLIBCExec (program and
-//                      arguments), QLIBCStrSep, open, fopen, rename (both paths), mkstemp, mkdir,
-//                      mkostemp, chmod, access, unlink, chdir, fstatat, statx, stat, lstat, system,
-//                      posix_spawn, open64, putenv, kill (pid), sqlite3_open, sqlite3_exec (SQL),
-//                      fdopen (mode), initgroups (name)                                   contained
+//                      arguments), QLIBCStrSep, open, fopen, rename, renameat2 (both paths),
+//                      mkstemp, mkdtemp, mkostemp, mkdir, rmdir, chmod, access, unlink, chdir,
+//                      fstatat, statx, stat, lstat, system, posix_spawn, open64, putenv,
+//                      kill (pid), sqlite3_open, sqlite3_exec (SQL), fdopen (mode),
+//                      initgroups (name)                                                  contained
 //
 // Calls without a key: QLIBCSzListAlloc QLIBCSzListPush QLIBCSzHashEnumKey
 // QLIBCProcForkChildNoWait SzBase64EncodeFull ZELOEncodingBase64Decode QLIBPluginInit
@@ -77,7 +78,7 @@ unsigned callCount(const std::string &call);
 // Forgets every plan, count, record and forced value.
 void resetFailingCalls();
 
-// Allocations fail within a scope only, since the test's own would fail too. Does nothing in a
+// Allocations fail within a scope only, since those of the test would fail too. Does nothing in a
 // build with the address sanitizer, which has its own allocator: ask kAllocationsCanFail.
 #if defined(__SANITIZE_ADDRESS__)
 inline constexpr bool kAllocationsCanFail = false;
@@ -93,17 +94,17 @@ class FailingAllocation {
   FailingAllocation &operator=(const FailingAllocation &) = delete;
 };
 
-// Within the scope one of all the calls above fails, whichever it is: the nth from the beginning,
-// and all after it when `onwards`. Not counted are what cannot fail (QLIBCFileExist,
-// QLIBCProcAlive, QLIBCSzHashGetValue, sleeps, rand, srand) and what the test's own helpers do.
+// Within the scope the nth of all the calls above fails, and all after it when `onwards`. Not
+// counted are those that cannot fail (QLIBCFileExist, QLIBCProcAlive,
+// QLIBCSzHashGetValue, sleeps, rand, srand) and those of the test's own helpers.
 //
 //   FailingStep step(3, false);
 //   act();
 //   step.failed();   "rename"; "" when there were fewer calls
 class FailingStep {
  public:
-  // `error` is what a call reports that has no error of its own, as short memory has. ENOSPC,
-  // EDQUOT and EROFS come to calls that write only.
+  // `error` is the errno of a call that has none of its own (as allocations have). ENOSPC, EDQUOT
+  // and EROFS fail only calls that write.
   FailingStep(unsigned nth, bool onwards, int error = EIO);
   ~FailingStep();
   FailingStep(const FailingStep &) = delete;
@@ -112,7 +113,7 @@ class FailingStep {
   std::string failed() const;
 };
 
-// For a call that is interposed elsewhere: whether the step that stands is at it.
+// For a call that is interposed elsewhere: whether it is the one that the current step fails.
 bool failsInStep(const char *call);
 
 // As FailingStep, but before the nth call the whole process group is killed.
@@ -121,7 +122,7 @@ class KillingStep : public FailingStep {
   explicit KillingStep(unsigned nth);
 };
 
-// What is called while one stands is the test's own, and neither fails nor counts in a FailingStep.
+// Calls within the scope are the test's own: they neither fail nor count in a FailingStep.
 class OwnWork {
  public:
   OwnWork() { ++depth_; }

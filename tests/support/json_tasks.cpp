@@ -1,8 +1,7 @@
 // json_tasks write COUNT   COUNT random tasks, each as a line of its JSON text and a line with its
 //                          text fields as they are in the record, "KEY=HEX KEY=HEX ..."
-// json_tasks save          saves each line of standard input, which is a JSON text, as a new task
-// and
-//                          prints it again as JSON, as it was stored; the task is removed then
+// json_tasks save          saves each line of standard input, which is a JSON text, as a new task,
+//                          prints it as JSON, as it was stored, and removes the task
 #include <algorithm>
 #include <cstddef>
 #include <cstdio>

@@ -1,4 +1,4 @@
-// The main of every test program.
+// The main of the test programs of zelo_test; those of zelo_platform_test have GoogleTest's.
 #include <gtest/gtest.h>
 #include <sys/prctl.h>
 
@@ -19,8 +19,8 @@ int main(int argc, char **argv) {
                  argv[0], argv[0]);
     return kOutsideSandbox;
   }
-  // Runs detach from their caller; this makes them our children all the same, to be waited for.
-  // An emulator of another processor was asked to do it (tests/qemu/emulate.py).
+  // Runs detach from their caller; as a child subreaper this process can wait for them. For an
+  // emulated program tests/qemu/emulate.py has set it.
   if (std::getenv("ZELO_EMULATED") == nullptr && prctl(PR_SET_CHILD_SUBREAPER, 1) != 0) {
     std::perror("prctl");
     return EXIT_FAILURE;

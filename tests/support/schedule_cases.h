@@ -1,8 +1,8 @@
-// The table of schedules that the tests of everything that reads a schedule have in common: the
-// crontab lines, the check whether a run is due, the time that is shown as the next run, the runs
-// that will come, and the check whether cron can read the line.
+// The table of schedules that several tests share: those of the crontab lines, of the check whether
+// a run is due, of the time shown as the next run, of the coming runs, and of the check whether
+// cron can read the line.
 //
-// Clocks change in none of them.
+// The clock does not change to or from summer time in any of them.
 #pragma once
 
 #include <cstdint>
@@ -22,17 +22,17 @@ struct Day {
 
 struct Schedule {
   int32_t type = ZELO_SCHED_TYPE_DAILY;
-  std::string_view week = "1111111";  // copied with what stands behind its end
+  std::string_view week = "1111111";  // copied with the bytes behind a zero byte
   Day start{};
   uint32_t hour = 8, minute = 30;
   uint32_t repeat = 0, last = 0;
 };
 
-// What is so in one minute.
+// The expected results in one minute.
 struct Moment {
   const char *now;
   bool isDue;
-  const char *shown;           // what ZELOSchedNextTriggerTime tells
+  const char *shown;           // by ZELOSchedNextTriggerTime
   const char *next = nullptr;  // when cron starts the task and it is due; the same where null
 };
 
@@ -58,7 +58,7 @@ std::string nextOf(const Moment &moment);
 // A schedule of a type without a name cannot be stored.
 bool isStorable(const Schedule &schedule);
 
-// The hours of its line that a day has.
+// The hours of its line, up to 23.
 std::vector<uint32_t> hoursOf(const ScheduleCase &each);
 
 }  // namespace support

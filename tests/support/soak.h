@@ -1,6 +1,5 @@
-// How long the tests run whose length is a number: ZELO_SOAK_FACTOR times as long as usual. Above 1
-// they look for what is rare. Below, where each step takes several times as long, under a sanitizer
-// or with its lines counted, they do with a part.
+// Tests that repeat something do so ZELO_SOAK_FACTOR times as often as usual: above 1 to find rare
+// failures, below 1 where each step takes longer (sanitizers, coverage, emulators).
 #pragma once
 
 #include <algorithm>

@@ -1,8 +1,8 @@
 /*
- * stored_forms save     stores tasks and power times with all that may be read otherwise elsewhere
+ * stored_forms save     stores tasks and power times with values that another processor may misread
  * stored_forms print    prints every task: its id, its JSON, and its hash form by key
  *
- * What one processor has stored, every other one prints alike.
+ * Every processor prints the same for the same stored files.
  */
 #include <stdio.h>
 #include <stdlib.h>

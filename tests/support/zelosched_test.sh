@@ -24,7 +24,7 @@ export TZ=UTC
 mkdir -p "$SCRATCH"
 cd "$SCRATCH" || exit
 
-# What hangs shall fail.
+# A command that hangs fails.
 z() {
   timeout 60 "$ZELOSCHED" "$@"
 }
@@ -39,7 +39,7 @@ at() {
   FAKE_TIME=$(date -u -d "$moment" +%s) LD_PRELOAD=$FAKE z "$@"
 }
 
-# Waiting takes no time.
+# Sleeps return at once (support/fake_time.c).
 patiently() {
   FAKE_PATIENCE=1 LD_PRELOAD=$FAKE "$@"
 }
@@ -56,7 +56,7 @@ add() {
   z add --quiet "$@" >/dev/null
 }
 
-# json EXPRESSION: of what zelosched printed, `tasks`; what stands in its lists
+# json EXPRESSION: prints it for the JSON on standard input; `tasks` are the members of its lists
 json() {
   python3 -c "import json, sys
 tasks = json.load(sys.stdin)
@@ -65,7 +65,7 @@ if 'version' in tasks and 'state' not in tasks:
 print($1)"
 }
 
-# The library's form of tasks with its members decoded, an array of an object a line.
+# The library's JSON of tasks with its members decoded, as an array with an object a line.
 plain() {
   z export --wire "$@" | python3 -c 'import base64, json, re, sys
 objects = [{k: json.loads(v) for k, v in json.loads(line).items()} for line in sys.stdin]
@@ -110,7 +110,7 @@ fill_crontab() {
   yes '#' | head -n $(($1 - present)) >>/etc/crontab
 }
 
-# times COUNT: an array with so many of the object that is read
+# times COUNT: an array of COUNT copies of the object on standard input
 times() {
   local object
   object=$(cat)
@@ -125,7 +125,7 @@ file_of() {
   echo "{\"version\": 1, \"tasks\": [$*]}"
 }
 
-# set_of TIME: a file of two tasks, the one at that time
+# set_of TIME: a file of two tasks, the first of them daily at that time
 set_of() {
   file_of '{"name": "Backup", "app": "backup", "owner": "root", "schedule": {"type": "daily", "at": "'"$1"'"}, "command": "true"}' \
     '{"name": "Mail", "owner": "nobody", "schedule": {"type": "weekly", "days": ["mon", "fri"], "at": "08:00", "every_hours": 2, "until_hour": 18}, "command": "true"}'
@@ -151,7 +151,7 @@ start_zelosched_tests() {
 
 start_something_like_cron() {
   cp /bin/sleep "$SCRATCH/cron"
-  # No child of this shell, which waits for its own, and deaf to the library's signal.
+  # No child of this shell, which waits for its own; ignores the library's SIGHUP.
   (
     trap '' HUP
     "$SCRATCH/cron" 10000 >/dev/null 2>&1 &
@@ -159,7 +159,7 @@ start_something_like_cron() {
   )
 }
 
-# transcripts NAME...: a line for each of their tests; or brings them up to date, where that is wanted
+# transcripts NAME...: runs them, with a line for each test; with $UPDATE_TRANSCRIPTS updates them
 transcripts() {
   local tests
   tests=$(cd "$(dirname "${BASH_SOURCE[0]}")/.." && pwd -P)
@@ -171,13 +171,13 @@ forget_tmp() {
   rm -rf "$STORE"* "$PROGRAM"* "$STATUS"* /tmp/lock* /tmp/zeloscheduler.*
 }
 
-# Those of earlier tests would write into the history of the next.
+# Keepers of earlier tests would write into the history of the next.
 end_keepers() {
   local keeper
   for keeper in $(pgrep -x zeloschedtask || true); do kill -9 "$keeper" 2>/dev/null || true; done
 }
 
-# No task, and nothing of earlier tests.
+# No task, and no traces of earlier tests.
 clean() {
   end_keepers
   forget_tmp
@@ -193,8 +193,8 @@ all_well() {
   install -m 0755 "$BUILD_DIR/bin/zeloschedtask" "$PROGRAM"
 }
 
-# edit_by_hand SCRIPT...: of sed, in an editor that knows nothing of the store's header and trailer.
-# As these are gone, nobody waits for the rest of what looks like a copy in progress.
+# edit_by_hand SCRIPT: edits the store by sed, and drops its header and trailer. With a header and a
+# wrong trailer it would look like a copy in progress, which readers wait for.
 edit_by_hand() {
   sed -i -e "$1" -e '/^# zelo section file$/d; /^# end of file/d' "$STORE"
 }
@@ -209,13 +209,13 @@ many_tasks() {
   done >"$STORE"
 }
 
-# The machine comes up: /tmp is empty, and the crontab is as it was.
+# Boots: /tmp is empty, and the crontab is as it was.
 boot() {
   forget_tmp
   cat /proc/sys/kernel/random/uuid >"$SCRATCH/boot_id"
 }
 
-# come_up MOMENT: with the tasks put back then.
+# come_up MOMENT: boots, and restores the tasks at that moment
 come_up() {
   boot
   FAKE_STARTED=$(($(date -u -d "$1" +%s) - 40))
@@ -223,7 +223,7 @@ come_up() {
   at "$1" restore >/dev/null
 }
 
-# Not even root can move a directory away on which something is mounted. Until it is let go.
+# hold PATH: a mount point, which not even root can rename, until let_go PATH
 hold() {
   rm -rf "$1"
   mkdir "$1"
@@ -248,8 +248,8 @@ is_unchanged() {
   state | cmp - "$SCRATCH/state"
 }
 
-# A program that every user can run, wherever the checkout lies: below root's home, say, which is
-# closed to others. One that counts what is run of it finds a place for that.
+# A copy of zelosched that every user can run, also when the checkout is in a directory that others
+# cannot enter. A build for coverage has a place for its counts.
 readonly FOR_OTHERS=/run/for_others/zelosched
 copy_for_others() {
   local directory=${FOR_OTHERS%/*}
@@ -287,7 +287,7 @@ one_recorded_run() {
   z run --wait 1 >/dev/null
 }
 
-# A process that holds the lock on a file until it is ended, as $held.
+# hold_lock FILE: starts process $held, which holds a lock on the file until it is killed
 hold_lock() {
   flock --no-fork "$1" sleep 600 >/dev/null 2>&1 &
   held=$!
@@ -308,7 +308,7 @@ commands() {
   z --help | sed -n 's/^  \([a-z-]*\) .*/\1/p'
 }
 
-# In 256 MB of addresses, which no program with sanitizers starts in.
+# With 256 MB of address space, too little for a program with sanitizers.
 bounded() {
   (
     if ! grep -q __asan_init "$ZELOSCHED"; then ulimit -v 262144; fi
@@ -328,13 +328,13 @@ three_saved() {
   add --daily 04:30 --name three -- true
 }
 
-# What it is, and of a file what is in it. Reading a FIFO would not end.
+# The type of a file, and of a regular one its checksum: reading a FIFO would not end.
 contents_of() {
   stat -c %F "$1" 2>/dev/null || true
   if [[ -f $1 ]]; then md5sum <"$1"; fi
 }
 
-# Bytes, or as much as is usual.
+# leave_room MOUNT [BYTES]: leaves that much room in a tmpfs, or makes it as large as usual
 leave_room() {
   local used size=50%
   used=$(df --output=used -B1 "$1" | tail -1)
@@ -347,7 +347,7 @@ make_readonly() {
   mount -n -o remount,bind,ro "$1"
 }
 
-# Where zelosched is, but the program that it puts back is as somebody makes it.
+# A copy of zelosched in a directory of its own, where a test chooses the zeloschedtask beside it.
 elsewhere() {
   rm -rf /run/elsewhere
   mkdir /run/elsewhere
@@ -358,7 +358,7 @@ elsewhere_zelosched() {
   LD_LIBRARY_PATH=$BUILD_DIR/lib /run/elsewhere/zelosched "$@"
 }
 
-# What is named like the files that a killed writer leaves
+# Files with names like those that a killed writer leaves
 scratch_names() {
   find /tmp /run /usr/zelo/etc -name '*.??????' -not -name 'zeloscheduler.*' -not -name '*.sqlite' |
     grep -v -e "^$BUILD_DIR" -e "^${FOR_OTHERS%/*}"
@@ -368,7 +368,7 @@ names_in_tmp() {
   find /tmp/lock "$STATUS" "$STATUS"-* -printf '%p %u:%g %m %y\n' 2>/dev/null | sort
 }
 
-# record ID START STATUS [COMMENT [STATUS_ID [PID]]]: a run, as the library does
+# record ID START STATUS [COMMENT [STATUS_ID [PID]]]: adds a row to the status database
 record() {
   if [[ ! -s $STATUS ]]; then
     install -m 0600 /dev/null "$STATUS"
@@ -436,7 +436,7 @@ tasks_of_all_kinds() {
   z power add on --daily 05:00 >/dev/null
 }
 
-# What ran, once there are so many.
+# ran COUNT: what commands wrote into the file ran, once it has COUNT lines
 ran() {
   local tenths
   for ((tenths = 0; tenths < 200; tenths++)); do
