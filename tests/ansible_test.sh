@@ -478,7 +478,7 @@ SCRIPT
 
 # The diff is shown on a terminal, so control characters must be escaped.
 the_diff_is_shown_safely() {
-  local unsafe='\u001b[2J\u009b2J\u202e\u2066\u007f\n\udb40\udc01'
+  local unsafe='\u001b[2J\u009b2J\u202e\u2066\u3164\u2800\u007f\n\udb40\udc01'
   fake 0 "{\"version\": 1, \"crontab_written\": false, \"changes\": [{\"id\": 1, \"name\": \"größe$unsafe\", \"app\": \"b$unsafe\",
     \"change\": \"changed\", \"differences\": [{\"member\": \"command\", \"before\": \"a$unsafe\", \"after\": \"ö$unsafe\"}]}]}"
   module tasks '{"tasks": [], "executable": "/run/fleet/fake", "_ansible_diff": true}'

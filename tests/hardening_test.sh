@@ -82,7 +82,7 @@ if [[ $(setting ZELO_HARDEN) != ON || -n $(setting ZELO_SANITIZE) ]]; then
 fi
 
 readonly LIBRARIES=("$BUILD_DIR"/lib/lib{zelocore,zeloscheduler,zelosdk}.so)
-readonly TOOLS=("$BUILD_DIR"/bin/zelosched*)
+readonly TOOLS=("$BUILD_DIR"/bin/zelosched* "$BUILD_DIR/bin/take-names")
 readonly SOURCES=(schedule libzeloscheduler platform tools)
 # These cannot show it, as nothing in them needs it: no function with an array, no call that writes
 # into a buffer or by a format. What they were compiled with is looked at below.
@@ -93,7 +93,7 @@ readonly FORTIFIED='__[a-z]+_chk'
 is_optimised=true
 if [[ $(setting CMAKE_BUILD_TYPE) == Debug ]]; then is_optimised=false; fi
 
-check "all libraries and tools are there" test "${#LIBRARIES[@]} ${#TOOLS[@]}" = "3 2"
+check "all libraries and tools are there" test "${#LIBRARIES[@]} ${#TOOLS[@]}" = "3 3"
 for file in "${LIBRARIES[@]}" "${TOOLS[@]}"; do
   name=$(basename "$file")
   check "$name: what was relocated is read-only" relocations_are_read_only "$file"

@@ -19,10 +19,11 @@ export function daysText(days) {
   return DAYS.map((day, i) => (on[i] ? weekdayText(i, width) : null)).filter((text) => text).join(", ");
 }
 
-// A date that cannot be parsed is shown as it is stored.
+// A date that does not exist is shown as it is stored: browsers take February 30 for March 2.
 function dateInWords(text) {
   const date = new Date(text + "T00:00:00Z");
-  return Number.isNaN(date.getTime()) ? text : dateText(date);
+  const exists = !Number.isNaN(date.getTime()) && date.toISOString().startsWith(text);
+  return exists ? dateText(date) : text;
 }
 
 function dayInWords(schedule) {

@@ -66,6 +66,11 @@ def listed(browser, server):
     browser.see("9 tasks")
     for name in names.values():
         assert name in column(browser, "name"), (name, column(browser, "name"))
+    # A date that does not exist, which another program has stored, is not taken for the one that comes then.
+    add("--once", "2099-02-28T10:00", "--name", "Odd")
+    browser.see("Feb 28, 2099", "tbody")
+    library("sed -i 's/^start day=\"28\"/start day=\"30\"/' $STORE $PERSISTENT")
+    browser.see("Once, on 2099-02-30", "tbody")
 
 
 @story("a switch on the list switches the task")

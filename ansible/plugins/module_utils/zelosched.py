@@ -20,10 +20,11 @@ COMMON_OPTIONS = {
     "timeout": {"type": "int", "default": 600},
 }
 
-# Control characters, marks of writing direction and line breaks, common invisible characters (of
-# which zelosched escapes more), and lone surrogates, which cannot be encoded. Not the line feed.
-UNSAFE = re.compile("[\x00-\x09\x0b-\x1f\x7f-\x9f\xad\u061c\u200b\u200e\u200f\u2028-\u202e\u2060-\u2064"
-                    "\u2066-\u2069\ud800-\udfff\ufeff\ufff9-\ufffb\U000e0000-\U000e007f]")
+# What zelosched escapes too: control characters, marks of writing direction and line breaks, invisible
+# characters; and lone surrogates, which cannot be encoded. Not the line feed.
+UNSAFE = re.compile("[\x00-\x09\x0b-\x1f\x7f-\x9f\xad\u034f\u061c\u115f\u1160\u17b4\u17b5\u180b-\u180f\u200b\u200e\u200f"
+                    "\u2028-\u202e\u2060-\u206f\u2800\u3164\ud800-\udfff\ufeff\uffa0\ufff9-\ufffb"
+                    "\U0001d159\U0001d173-\U0001d17a\U000e0000-\U000e0fff]")
 
 
 def shown(text):

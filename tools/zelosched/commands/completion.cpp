@@ -147,7 +147,7 @@ _zelosched() {
   esac
 }
 
-# Ids, with the names beside them for as int64_t as there is a choice. A part of a name finds its id.
+# Ids, with the names beside them for as long as there is a choice. A part of a name finds its id.
 _zelosched_ids() {
   local id name
   COMPREPLY=()
