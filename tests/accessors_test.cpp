@@ -15,12 +15,9 @@
 #include "zeloschedgetter.h"
 #include "zeloschedsetter.h"
 
+namespace support {
 namespace {
 
-using support::ErrorRecord;
-using support::errorRecord;
-using support::logged;
-using support::Task;
 using Lines = std::vector<std::string>;
 
 constexpr char kNoTask[] = "((void *)0) != pTask";
@@ -157,7 +154,7 @@ constexpr TextGetter kTextGetters[] = {
 
 // The number of the line on which a header lists the accessor.
 int lineInHeader(const std::string &header, const std::string &name) {
-  std::istringstream text(support::readFile(ZELO_SOURCE_DIR "/libzeloscheduler/include/" + header));
+  std::istringstream text(readFile(ZELO_SOURCE_DIR "/libzeloscheduler/include/" + header));
   std::string line;
   for (int number = 1; std::getline(text, line); ++number) {
     if (line.find("(" + name + ",") != std::string::npos) {
@@ -171,7 +168,7 @@ bool sameRecords(const ZELO_SCHED_TASK &left, const ZELO_SCHED_TASK &right) {
   return std::memcmp(&left, &right, sizeof(left)) == 0;
 }
 
-class AccessorsTest : public support::SandboxTest {
+class AccessorsTest : public SandboxTest {
  protected:
   // Full of a byte that is no accessor's result, so that whatever is written shows.
   AccessorsTest() { std::memset(static_cast<void *>(&task), 'x', sizeof(task)); }
@@ -185,13 +182,12 @@ class AccessorsTest : public support::SandboxTest {
                                 const std::string &condition, const Call &call) {
     for (const auto &row : rows) {
       SCOPED_TRACE(row.name);
-      support::clearLog();
+      clearLog();
       QLIBCErrSetEx(0, "", 0);
       EXPECT_EQ(call(row), -1);
-      EXPECT_EQ(support::loggedRaw(),
-                Lines{header + ":" + std::to_string(lineInHeader(header, row.name)) +
-                      " Invaild Argument (" + condition + ")=[0]\n"});
-      EXPECT_EQ(support::loggedPriorities(), std::vector<int>{3});
+      EXPECT_EQ(loggedRaw(), Lines{header + ":" + std::to_string(lineInHeader(header, row.name)) +
+                                   " Invaild Argument (" + condition + ")=[0]\n"});
+      EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
       EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, header}));
     }
   }
@@ -428,3 +424,4 @@ TEST_F(AccessorsTest, ATextGetterRefusesANullBufferThenASizeOfZeroThenANullTask)
 }
 
 }  // namespace
+}  // namespace support

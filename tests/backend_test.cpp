@@ -19,11 +19,9 @@
 #include "zelocore.h"
 #include "zelosched.h"
 
+namespace support {
 namespace {
 
-using support::ErrorRecord;
-using support::errorRecord;
-using support::logged;
 using Lines = std::vector<std::string>;
 using Init = int (*)(const char *, ZELO_SCHED_BACKEND *);
 
@@ -82,7 +80,7 @@ bool isEmptyEntry(const ZELO_SCHED_BACKEND &entry) {
   return std::memcmp(&entry, &kEmpty, sizeof(entry)) == 0;
 }
 
-class BackendTest : public support::SandboxTest {
+class BackendTest : public SandboxTest {
  protected:
   // Runs the test's body where the library has not been used yet.
   static void inFreshProcess(const std::function<void()> &body) {
@@ -205,7 +203,7 @@ TEST_F(BackendTest, RegistrationWorksAgainAfterTheTableWasFull) {
 TEST_F(BackendTest, AnInitThatFailsIsNamedAndLeavesTheTableEmpty) {
   for (const Registered &registered : kRegistered) {
     SCOPED_TRACE(registered.szInit);
-    support::clearLog();
+    clearLog();
     inFreshProcess([&] {
       leaveEarlierError();
       inits = {Fate::kFails, registered.szInit, 1, {}};
@@ -236,7 +234,7 @@ TEST_F(BackendTest, AfterAnInitThatFailedTheNextCallRegistersFromTheStart) {
 TEST_F(BackendTest, AnInitThatRejectsItsNameLeavesTheTableEmptyAndIsTriedAgain) {
   for (const Registered &registered : kRegistered) {
     SCOPED_TRACE(registered.szInit);
-    support::clearLog();
+    clearLog();
     inFreshProcess([&] {
       const std::string name = registered.szName;
       inits = {Fate::kOtherName, registered.szInit, 1, {}};
@@ -261,7 +259,7 @@ TEST_F(BackendTest, FailuresOfRegistrationAreLoggedAtPriorityError) {
     inits = {Fate::kFails, kRegistered[0].szInit, 1, {}};
     ZELOSchedBackendInit();
   });
-  EXPECT_EQ(support::loggedPriorities(), (std::vector<int>{kPriorityError, kPriorityError}));
+  EXPECT_EQ(loggedPriorities(), (std::vector<int>{kPriorityError, kPriorityError}));
 }
 
 // ---- what an init promises
@@ -274,10 +272,10 @@ class BackendInitTest : public BackendTest, public testing::WithParamInterface<R
 
 TEST_P(BackendInitTest, NeedsANameAndThenAnEntry) {
   const Init init = GetParam().init;
-  support::expectRefused("backend_" + name_ + ".cpp",
-                         {{"((void *)0) != szName", [&] { return init(nullptr, &entry_); }},
-                          {"((void *)0) != szName", [&] { return init(nullptr, nullptr); }},
-                          {"NULL != pBackend", [&] { return init(GetParam().szName, nullptr); }}});
+  expectRefused("backend_" + name_ + ".cpp",
+                {{"((void *)0) != szName", [&] { return init(nullptr, &entry_); }},
+                 {"((void *)0) != szName", [&] { return init(nullptr, nullptr); }},
+                 {"NULL != pBackend", [&] { return init(GetParam().szName, nullptr); }}});
   EXPECT_TRUE(isEmptyEntry(entry_));
 }
 
@@ -285,7 +283,7 @@ TEST_P(BackendInitTest, TakesItsOwnNameOnlyAndSetsNoCode) {
   for (const std::string &other : {std::string("someone's"), std::string(), "Z" + name_.substr(1),
                                    "ZELO" + name_.substr(4), name_ + " "}) {
     SCOPED_TRACE(other);
-    support::clearLog();
+    clearLog();
     EXPECT_EQ(GetParam().init(other.c_str(), &entry_), -1);
     EXPECT_EQ(logged(), Lines{"backend_" + name_ + ".cpp:N backend name is mismatch for " + name_ +
                               "!! [" + other + "]"});
@@ -414,16 +412,17 @@ INSTANTIATE_TEST_SUITE_P(EveryCall, BackendCallTest, testing::ValuesIn(kCalls),
                          });
 
 }  // namespace
+}  // namespace support
 
 // Before the library's own, for the registry too.
 extern "C" __attribute__((visibility("default"))) int zeloschedule_init(
     const char *szName, ZELO_SCHED_BACKEND *pBackend) {
-  static const auto real = reinterpret_cast<Init>(dlsym(RTLD_NEXT, "zeloschedule_init"));
-  return intercepted("zeloschedule_init", real, szName, pBackend);
+  static const auto real = reinterpret_cast<support::Init>(dlsym(RTLD_NEXT, "zeloschedule_init"));
+  return support::intercepted("zeloschedule_init", real, szName, pBackend);
 }
 
 extern "C" __attribute__((visibility("default"))) int zeloautopower_init(
     const char *szName, ZELO_SCHED_BACKEND *pBackend) {
-  static const auto real = reinterpret_cast<Init>(dlsym(RTLD_NEXT, "zeloautopower_init"));
-  return intercepted("zeloautopower_init", real, szName, pBackend);
+  static const auto real = reinterpret_cast<support::Init>(dlsym(RTLD_NEXT, "zeloautopower_init"));
+  return support::intercepted("zeloautopower_init", real, szName, pBackend);
 }

@@ -52,14 +52,6 @@ std::string failedSql(const std::string &sql, const std::string &error) {
   return "sched_task_db.cpp:N Exec sql:[" + sql + "] error: " + error + "\n";
 }
 
-// A process that was and is no more.
-pid_t deadProcess() {
-  const pid_t child = fork();
-  if (child == 0) _exit(0);
-  waitpid(child, nullptr, 0);
-  return child;
-}
-
 // Another program, which nothing holds back.
 class OtherProgram {
  public:

@@ -95,13 +95,6 @@ int tryRunLock() {
   return error;
 }
 
-pid_t deadProcess() {
-  const pid_t pid = fork();
-  if (pid == 0) _exit(0);
-  waitpid(pid, nullptr, 0);
-  return pid;
-}
-
 StatusRow runningRow(long taskId, const std::string &app, pid_t pid = getpid()) {
   return {.pid = pid, .timestamp = 1, .app = app, .taskId = taskId, .statusCode = 2};
 }
