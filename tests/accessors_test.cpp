@@ -11,19 +11,20 @@
 #include "captured_log.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
+#include "zelocore.h"
 #include "zeloschedgetter.h"
 #include "zeloschedsetter.h"
 
+namespace support {
 namespace {
 
-using support::ErrorRecord;
-using support::errorRecord;
-using support::logged;
-using support::Task;
 using Lines = std::vector<std::string>;
 
 constexpr char kNoTask[] = "((void *)0) != pTask";
 constexpr char kNoTaskLast[] = "NULL != pTask";
+constexpr char kNoResult[] = "((void *)0) != pVal";
+constexpr char kSetters[] = "zeloschedsetter.h";
+constexpr char kGetters[] = "zeloschedgetter.h";
 constexpr int32_t kUntouched = 4711;
 
 template <class Accessor>
@@ -153,7 +154,7 @@ constexpr TextGetter kTextGetters[] = {
 
 // The number of the line on which a header lists the accessor.
 int lineInHeader(const std::string &header, const std::string &name) {
-  std::istringstream text(support::readFile(ZELO_SOURCE_DIR "/libzeloscheduler/include/" + header));
+  std::istringstream text(readFile(ZELO_SOURCE_DIR "/libzeloscheduler/include/" + header));
   std::string line;
   for (int number = 1; std::getline(text, line); ++number) {
     if (line.find("(" + name + ",") != std::string::npos) {
@@ -167,29 +168,28 @@ bool sameRecords(const ZELO_SCHED_TASK &left, const ZELO_SCHED_TASK &right) {
   return std::memcmp(&left, &right, sizeof(left)) == 0;
 }
 
-class AccessorsTest : public support::SandboxTest {
+class AccessorsTest : public SandboxTest {
  protected:
   // Filled with a byte that no accessor writes, so that every change shows.
   AccessorsTest() { std::memset(static_cast<void *>(&task), 'x', sizeof(task)); }
 
   char *textAt(size_t offset) { return reinterpret_cast<char *>(&task) + offset; }
 
-  // One log line, with the accessor's line in the header and the code.
-  static void expectRefused(const std::string &header, const char *name, int result,
-                            const std::string &condition) {
-    EXPECT_EQ(result, -1);
-    EXPECT_EQ(support::loggedRaw(),
-              Lines{header + ":" + std::to_string(lineInHeader(header, name)) +
-                    " Invaild Argument (" + condition + ")=[0]\n"});
-    EXPECT_EQ(support::loggedPriorities(), std::vector<int>{3});
-    EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, header}));
-    support::clearLog();
-  }
-  static void expectSetterRefused(const char *name, int result, const std::string &condition) {
-    expectRefused("zeloschedsetter.h", name, result, condition);
-  }
-  static void expectGetterRefused(const char *name, int result, const std::string &condition) {
-    expectRefused("zeloschedgetter.h", name, result, condition);
+  // Each accessor of a shape: one line that names the accessor's own line in the header, and the
+  // code.
+  template <class Rows, class Call>
+  static void expectEachRefused(const std::string &header, const Rows &rows,
+                                const std::string &condition, const Call &call) {
+    for (const auto &row : rows) {
+      SCOPED_TRACE(row.name);
+      clearLog();
+      QLIBCErrSetEx(0, "", 0);
+      EXPECT_EQ(call(row), -1);
+      EXPECT_EQ(loggedRaw(), Lines{header + ":" + std::to_string(lineInHeader(header, row.name)) +
+                                   " Invaild Argument (" + condition + ")=[0]\n"});
+      EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
+      EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, header}));
+    }
   }
 
   template <class Number, size_t count>
@@ -235,11 +235,13 @@ TEST_F(AccessorsTest, ATypeSetterStoresItsTypeAndNothingElse) {
   EXPECT_EQ(logged(), Lines{});
 }
 
-TEST_F(AccessorsTest, ATypeSetterRefusesNull) {
-  for (const auto &row : kTypeSetters) {
-    SCOPED_TRACE(row.name);
-    expectSetterRefused(row.name, row.call(nullptr), kNoTask);
-  }
+TEST_F(AccessorsTest, ASetterOfATypeAFlagOrANumberRefusesNull) {
+  const auto callWithOne = [](const auto &row) { return row.call(nullptr, 1); };
+  expectEachRefused(kSetters, kTypeSetters, kNoTask,
+                    [](const auto &row) { return row.call(nullptr); });
+  expectEachRefused(kSetters, kFlagSetters, kNoTask, callWithOne);
+  expectEachRefused(kSetters, kUnsignedSetters, kNoTask, callWithOne);
+  expectEachRefused(kSetters, kSignedSetters, kNoTask, callWithOne);
 }
 
 TEST_F(AccessorsTest, AFlagSetterStoresOneForOneAndZeroForAllElse) {
@@ -265,13 +267,6 @@ TEST_F(AccessorsTest, SetStateWithTwoMakesTheTaskDisabled) {
   EXPECT_EQ(task.State, ZELO_SCHED_STATE_DISABLED);
 }
 
-TEST_F(AccessorsTest, AFlagSetterRefusesNull) {
-  for (const auto &row : kFlagSetters) {
-    SCOPED_TRACE(row.name);
-    expectSetterRefused(row.name, row.call(nullptr, 1), kNoTask);
-  }
-}
-
 TEST_F(AccessorsTest, ANumberSetterStoresTheNumberUnchecked) {
   expectNumbersStoredAsTheyAre(kUnsignedSetters);
   expectNumbersStoredAsTheyAre(kSignedSetters);
@@ -281,17 +276,6 @@ TEST_F(AccessorsTest, ANumberSetterStoresTheNumberUnchecked) {
 TEST_F(AccessorsTest, SetRunHourTakesNinetyNine) {
   EXPECT_EQ(ZELOSchedCTaskSetRunHour(&task, 99), 0);
   EXPECT_EQ(task.RunHour, 99U);
-}
-
-TEST_F(AccessorsTest, ANumberSetterRefusesNull) {
-  for (const auto &row : kUnsignedSetters) {
-    SCOPED_TRACE(row.name);
-    expectSetterRefused(row.name, row.call(nullptr, 1), kNoTask);
-  }
-  for (const auto &row : kSignedSetters) {
-    SCOPED_TRACE(row.name);
-    expectSetterRefused(row.name, row.call(nullptr, 1), kNoTask);
-  }
 }
 
 TEST_F(AccessorsTest, ATextSetterStoresTheText) {
@@ -341,20 +325,17 @@ TEST_F(AccessorsTest, SetWeekKeepsTheFirstSevenOfEight) {
 }
 
 TEST_F(AccessorsTest, ATextSetterRefusesANullTextFirst) {
-  for (const auto &row : kTextSetters) {
-    SCOPED_TRACE(row.name);
-    const ZELO_SCHED_TASK before = task;
-    expectSetterRefused(row.name, row.call(nullptr, nullptr), "((void *)0) != szVal");
-    expectSetterRefused(row.name, row.call(&task, nullptr), "((void *)0) != szVal");
-    EXPECT_TRUE(sameRecords(task, before));
+  const ZELO_SCHED_TASK before = task;
+  for (ZELO_SCHED_TASK *pTask : {static_cast<ZELO_SCHED_TASK *>(nullptr), &task}) {
+    expectEachRefused(kSetters, kTextSetters, "((void *)0) != szVal",
+                      [&](const auto &row) { return row.call(pTask, nullptr); });
   }
+  EXPECT_TRUE(sameRecords(task, before));
 }
 
 TEST_F(AccessorsTest, ATextSetterRefusesANullTask) {
-  for (const auto &row : kTextSetters) {
-    SCOPED_TRACE(row.name);
-    expectSetterRefused(row.name, row.call(nullptr, "text"), kNoTaskLast);
-  }
+  expectEachRefused(kSetters, kTextSetters, kNoTaskLast,
+                    [](const auto &row) { return row.call(nullptr, "text"); });
 }
 
 TEST_F(AccessorsTest, AYesNoReaderTestsForExactlyItsValue) {
@@ -370,52 +351,30 @@ TEST_F(AccessorsTest, AYesNoReaderTestsForExactlyItsValue) {
   EXPECT_EQ(logged(), Lines{});
 }
 
-TEST_F(AccessorsTest, AYesNoReaderRefusesANullResultFirst) {
-  for (const auto &row : kYesNoReaders) {
-    SCOPED_TRACE(row.name);
-    expectGetterRefused(row.name, row.call(nullptr, nullptr), "((void *)0) != pVal");
-  }
+TEST_F(AccessorsTest, AReaderRefusesANullResultFirst) {
+  const auto callWithNothing = [](const auto &row) { return row.call(nullptr, nullptr); };
+  expectEachRefused(kGetters, kYesNoReaders, kNoResult, callWithNothing);
+  expectEachRefused(kGetters, kUnsignedGetters, kNoResult, callWithNothing);
+  expectEachRefused(kGetters, kSignedGetters, kNoResult, callWithNothing);
 }
 
-TEST_F(AccessorsTest, AYesNoReaderRefusesANullTaskAndLeavesTheResult) {
-  for (const auto &row : kYesNoReaders) {
-    SCOPED_TRACE(row.name);
-    int32_t read = kUntouched;
-    expectGetterRefused(row.name, row.call(&read, nullptr), kNoTaskLast);
-    EXPECT_EQ(read, kUntouched);
-  }
+TEST_F(AccessorsTest, AReaderRefusesANullTaskAndLeavesTheResult) {
+  const auto callWithoutTask = [this](const auto &row) {
+    auto read = task.*row.field;
+    read = kUntouched;
+    const int result = row.call(&read, nullptr);
+    EXPECT_TRUE(read == kUntouched) << read;
+    return result;
+  };
+  expectEachRefused(kGetters, kYesNoReaders, kNoTaskLast, callWithoutTask);
+  expectEachRefused(kGetters, kUnsignedGetters, kNoTaskLast, callWithoutTask);
+  expectEachRefused(kGetters, kSignedGetters, kNoTaskLast, callWithoutTask);
 }
 
 TEST_F(AccessorsTest, ANumberGetterReadsTheNumberAsItIs) {
   expectNumbersReadAsTheyAre(kUnsignedGetters);
   expectNumbersReadAsTheyAre(kSignedGetters);
   EXPECT_EQ(logged(), Lines{});
-}
-
-TEST_F(AccessorsTest, ANumberGetterRefusesANullResultFirst) {
-  for (const auto &row : kUnsignedGetters) {
-    SCOPED_TRACE(row.name);
-    expectGetterRefused(row.name, row.call(nullptr, nullptr), "((void *)0) != pVal");
-  }
-  for (const auto &row : kSignedGetters) {
-    SCOPED_TRACE(row.name);
-    expectGetterRefused(row.name, row.call(nullptr, nullptr), "((void *)0) != pVal");
-  }
-}
-
-TEST_F(AccessorsTest, ANumberGetterRefusesANullTaskAndLeavesTheResult) {
-  for (const auto &row : kUnsignedGetters) {
-    SCOPED_TRACE(row.name);
-    uint32_t read = kUntouched;
-    expectGetterRefused(row.name, row.call(&read, nullptr), kNoTaskLast);
-    EXPECT_EQ(read, static_cast<uint32_t>(kUntouched));
-  }
-  for (const auto &row : kSignedGetters) {
-    SCOPED_TRACE(row.name);
-    int32_t read = kUntouched;
-    expectGetterRefused(row.name, row.call(&read, nullptr), kNoTaskLast);
-    EXPECT_EQ(read, kUntouched);
-  }
 }
 
 TEST_F(AccessorsTest, ATextGetterReadsAFieldThatIsFull) {
@@ -452,29 +411,17 @@ TEST_F(AccessorsTest, GetCommandIntoOneCharacterGivesAnEmptyText) {
   EXPECT_EQ(read[1], '#');
 }
 
-TEST_F(AccessorsTest, ATextGetterRefusesANullBufferFirst) {
-  for (const auto &row : kTextGetters) {
-    SCOPED_TRACE(row.name);
-    expectGetterRefused(row.name, row.call(nullptr, 0, nullptr), "((void *)0) != szBuf");
-  }
-}
-
-TEST_F(AccessorsTest, ATextGetterRefusesASizeOfZeroNext) {
-  for (const auto &row : kTextGetters) {
-    SCOPED_TRACE(row.name);
-    char read[] = "#";
-    expectGetterRefused(row.name, row.call(read, 0, nullptr), "0 < cbBuf");
-    EXPECT_STREQ(read, "#");
-  }
-}
-
-TEST_F(AccessorsTest, ATextGetterRefusesANullTaskLastAndLeavesTheBuffer) {
-  for (const auto &row : kTextGetters) {
-    SCOPED_TRACE(row.name);
-    char read[] = "#";
-    expectGetterRefused(row.name, row.call(read, sizeof(read), nullptr), kNoTaskLast);
-    EXPECT_STREQ(read, "#");
-  }
+TEST_F(AccessorsTest, ATextGetterRefusesANullBufferThenASizeOfZeroThenANullTask) {
+  char read[] = "#";
+  expectEachRefused(kGetters, kTextGetters, "((void *)0) != szBuf",
+                    [](const auto &row) { return row.call(nullptr, 0, nullptr); });
+  expectEachRefused(kGetters, kTextGetters, "0 < cbBuf",
+                    [&](const auto &row) { return row.call(read, 0, nullptr); });
+  EXPECT_STREQ(read, "#");
+  expectEachRefused(kGetters, kTextGetters, kNoTaskLast,
+                    [&](const auto &row) { return row.call(read, sizeof(read), nullptr); });
+  EXPECT_STREQ(read, "#");
 }
 
 }  // namespace
+}  // namespace support

@@ -13,16 +13,15 @@
 #include <iterator>
 
 #include "captured_log.h"
+#include "refused_arguments.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
 #include "zelocore.h"
 #include "zelosched.h"
 
+namespace support {
 namespace {
 
-using support::ErrorRecord;
-using support::errorRecord;
-using support::logged;
 using Lines = std::vector<std::string>;
 using Init = int (*)(const char *, ZELO_SCHED_BACKEND *);
 
@@ -30,12 +29,14 @@ struct Registered {
   int32_t id;
   const char *szName;
   const char *szInit;
+  Init init;
+  bool ownsIds;  // whether it offers owns_id
 };
 
 // In the order of registration.
 constexpr Registered kRegistered[] = {
-    {ZELO_SCHED_BACKEND_SCHEDULE, "zeloschedule", "zeloschedule_init"},
-    {ZELO_SCHED_BACKEND_AUTOPOWER, "zeloautopower", "zeloautopower_init"},
+    {ZELO_SCHED_BACKEND_SCHEDULE, "zeloschedule", "zeloschedule_init", zeloschedule_init, false},
+    {ZELO_SCHED_BACKEND_AUTOPOWER, "zeloautopower", "zeloautopower_init", zeloautopower_init, true},
 };
 constexpr uint32_t kCapacity = sizeof(SchedBackends) / sizeof(SchedBackends[0]);
 constexpr auto kCount = static_cast<uint32_t>(std::size(kRegistered));
@@ -78,7 +79,7 @@ bool isEmptyEntry(const ZELO_SCHED_BACKEND &entry) {
   return std::memcmp(&entry, &kEmpty, sizeof(entry)) == 0;
 }
 
-class BackendTest : public support::SandboxTest {
+class BackendTest : public SandboxTest {
  protected:
   // Runs the test's body where the library has not been used yet.
   static void inFreshProcess(const std::function<void()> &body) {
@@ -130,22 +131,6 @@ TEST_F(BackendTest, EachInitFindsTheIdInItsEntry) {
                          std::to_string(kRegistered[i].id) + " at " + std::to_string(i));
     }
     EXPECT_EQ(inits.calls, expected);
-  });
-}
-
-TEST_F(BackendTest, ZeloscheduleOffersEverythingButOwnsId) {
-  inFreshProcess([] {
-    ASSERT_EQ(ZELOSchedBackendInit(), 0);
-    const ZELO_SCHED_BACKEND &entry = SchedBackends[0];
-    EXPECT_NE(entry.sync, nullptr);
-    EXPECT_NE(entry.create, nullptr);
-    EXPECT_NE(entry.edit, nullptr);
-    EXPECT_NE(entry.remove, nullptr);
-    EXPECT_NE(entry.get_default, nullptr);
-    EXPECT_EQ(entry.owns_id, nullptr);
-    EXPECT_NE(entry.get_by_id, nullptr);
-    EXPECT_NE(entry.run, nullptr);
-    EXPECT_NE(entry.list_get, nullptr);
   });
 }
 
@@ -217,7 +202,7 @@ TEST_F(BackendTest, RegistrationWorksAgainAfterTheTableWasFull) {
 TEST_F(BackendTest, AnInitThatFailsIsNamedAndLeavesTheTableEmpty) {
   for (const Registered &registered : kRegistered) {
     SCOPED_TRACE(registered.szInit);
-    support::clearLog();
+    clearLog();
     inFreshProcess([&] {
       leaveEarlierError();
       inits = {Fate::kFails, registered.szInit, 1, {}};
@@ -248,7 +233,7 @@ TEST_F(BackendTest, AfterAnInitThatFailedTheNextCallRegistersFromTheStart) {
 TEST_F(BackendTest, AnInitThatRejectsItsNameLeavesTheTableEmptyAndIsTriedAgain) {
   for (const Registered &registered : kRegistered) {
     SCOPED_TRACE(registered.szInit);
-    support::clearLog();
+    clearLog();
     inFreshProcess([&] {
       const std::string name = registered.szName;
       inits = {Fate::kOtherName, registered.szInit, 1, {}};
@@ -273,64 +258,64 @@ TEST_F(BackendTest, FailuresOfRegistrationAreLoggedAtPriorityError) {
     inits = {Fate::kFails, kRegistered[0].szInit, 1, {}};
     ZELOSchedBackendInit();
   });
-  EXPECT_EQ(support::loggedPriorities(), (std::vector<int>{kPriorityError, kPriorityError}));
+  EXPECT_EQ(loggedPriorities(), (std::vector<int>{kPriorityError, kPriorityError}));
 }
 
 // ---- what an init promises
 
-TEST_F(BackendTest, ZeloscheduleInitNeedsAName) {
-  ZELO_SCHED_BACKEND entry = {};
-  EXPECT_EQ(zeloschedule_init(nullptr, &entry), -1);
-  EXPECT_EQ(logged(),
-            Lines{"backend_zeloschedule.cpp:N Invaild Argument (((void *)0) != szName)=[0]\n"});
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "backend_zeloschedule.cpp"}));
-  EXPECT_TRUE(isEmptyEntry(entry));
+class BackendInitTest : public BackendTest, public testing::WithParamInterface<Registered> {
+ protected:
+  const std::string name_ = GetParam().szName;
+  ZELO_SCHED_BACKEND entry_ = {};
+};
+
+TEST_P(BackendInitTest, NeedsANameAndThenAnEntry) {
+  const Init init = GetParam().init;
+  expectRefused("backend_" + name_ + ".cpp",
+                {{"((void *)0) != szName", [&] { return init(nullptr, &entry_); }},
+                 {"((void *)0) != szName", [&] { return init(nullptr, nullptr); }},
+                 {"NULL != pBackend", [&] { return init(GetParam().szName, nullptr); }}});
+  EXPECT_TRUE(isEmptyEntry(entry_));
 }
 
-TEST_F(BackendTest, ZeloscheduleInitNeedsAnEntry) {
-  EXPECT_EQ(zeloschedule_init("zeloschedule", nullptr), -1);
-  EXPECT_EQ(logged(),
-            Lines{"backend_zeloschedule.cpp:N Invaild Argument (NULL != pBackend)=[0]\n"});
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "backend_zeloschedule.cpp"}));
-}
-
-TEST_F(BackendTest, ZeloscheduleInitAsksForTheNameFirst) {
-  EXPECT_EQ(zeloschedule_init(nullptr, nullptr), -1);
-  EXPECT_EQ(logged(),
-            Lines{"backend_zeloschedule.cpp:N Invaild Argument (((void *)0) != szName)=[0]\n"});
-}
-
-TEST_F(BackendTest, ZeloscheduleInitTakesItsOwnNameOnly) {
-  for (const char *szName : {"zeloautopower", "", "Zeloschedule", "zeloschedule "}) {
-    SCOPED_TRACE(szName);
-    support::clearLog();
-    ZELO_SCHED_BACKEND entry = {};
-    EXPECT_EQ(zeloschedule_init(szName, &entry), -1);
-    EXPECT_EQ(logged(),
-              Lines{"backend_zeloschedule.cpp:N backend name is mismatch for zeloschedule!! [" +
-                    std::string(szName) + "]"});
+TEST_P(BackendInitTest, TakesItsOwnNameOnlyAndSetsNoCode) {
+  for (const std::string &other : {std::string("someone's"), std::string(), "Z" + name_.substr(1),
+                                   "ZELO" + name_.substr(4), name_ + " "}) {
+    SCOPED_TRACE(other);
+    clearLog();
+    EXPECT_EQ(GetParam().init(other.c_str(), &entry_), -1);
+    EXPECT_EQ(logged(), Lines{"backend_" + name_ + ".cpp:N backend name is mismatch for " + name_ +
+                              "!! [" + other + "]"});
     EXPECT_EQ(errorRecord(), kNoError);
-    EXPECT_TRUE(isEmptyEntry(entry));
+    EXPECT_TRUE(isEmptyEntry(entry_));
   }
 }
 
-TEST_F(BackendTest, ZeloscheduleInitStoresTheNamePointerAndLeavesTheId) {
+TEST_P(BackendInitTest, StoresTheNamePointerLeavesTheIdAndSetsEverySlot) {
   constexpr int32_t kSomeId = 77;
-  const std::string name = "zeloschedule";
-  ZELO_SCHED_BACKEND entry = {};
-  entry.id = kSomeId;
-  EXPECT_EQ(zeloschedule_init(name.c_str(), &entry), 0);
-  EXPECT_EQ(entry.szName, name.c_str());
-  EXPECT_EQ(entry.id, kSomeId);
+  entry_.id = kSomeId;
+  entry_.owns_id = [](long) { return 0; };
+  const auto before = entry_.owns_id;
+  EXPECT_EQ(GetParam().init(name_.c_str(), &entry_), 0);
+  EXPECT_EQ(entry_.szName, name_.c_str());
+  EXPECT_EQ(entry_.id, kSomeId);
   EXPECT_EQ(logged(), Lines{});
+  EXPECT_NE(entry_.sync, nullptr);
+  EXPECT_NE(entry_.create, nullptr);
+  EXPECT_NE(entry_.edit, nullptr);
+  EXPECT_NE(entry_.remove, nullptr);
+  EXPECT_NE(entry_.get_default, nullptr);
+  EXPECT_NE(entry_.owns_id, before);
+  EXPECT_EQ(entry_.owns_id != nullptr, GetParam().ownsIds);
+  EXPECT_NE(entry_.get_by_id, nullptr);
+  EXPECT_NE(entry_.run, nullptr);
+  EXPECT_NE(entry_.list_get, nullptr);
 }
 
-TEST_F(BackendTest, ZeloscheduleInitEmptiesASlotThatItDoesNotOffer) {
-  ZELO_SCHED_BACKEND entry = {};
-  entry.owns_id = [](long) { return 0; };
-  ASSERT_EQ(zeloschedule_init("zeloschedule", &entry), 0);
-  EXPECT_EQ(entry.owns_id, nullptr);
-}
+INSTANTIATE_TEST_SUITE_P(EachBackend, BackendInitTest, testing::ValuesIn(kRegistered),
+                         [](const testing::TestParamInfo<Registered> &backend) {
+                           return std::string(backend.param.szName);
+                         });
 
 // ---- every exported call that reaches a backend
 
@@ -426,16 +411,17 @@ INSTANTIATE_TEST_SUITE_P(EveryCall, BackendCallTest, testing::ValuesIn(kCalls),
                          });
 
 }  // namespace
+}  // namespace support
 
 // Interposes the library's own, for calls of the registry too.
 extern "C" __attribute__((visibility("default"))) int zeloschedule_init(
     const char *szName, ZELO_SCHED_BACKEND *pBackend) {
-  static const auto real = reinterpret_cast<Init>(dlsym(RTLD_NEXT, "zeloschedule_init"));
-  return intercepted("zeloschedule_init", real, szName, pBackend);
+  static const auto real = reinterpret_cast<support::Init>(dlsym(RTLD_NEXT, "zeloschedule_init"));
+  return support::intercepted("zeloschedule_init", real, szName, pBackend);
 }
 
 extern "C" __attribute__((visibility("default"))) int zeloautopower_init(
     const char *szName, ZELO_SCHED_BACKEND *pBackend) {
-  static const auto real = reinterpret_cast<Init>(dlsym(RTLD_NEXT, "zeloautopower_init"));
-  return intercepted("zeloautopower_init", real, szName, pBackend);
+  static const auto real = reinterpret_cast<support::Init>(dlsym(RTLD_NEXT, "zeloautopower_init"));
+  return support::intercepted("zeloautopower_init", real, szName, pBackend);
 }

@@ -18,25 +18,23 @@
 #include "zelocore.h"
 #include "zelosched.h"
 
+namespace support {
 namespace {
 
-using support::makeTask;
-using support::setText;
-using support::Task;
 using Lines = std::vector<std::string>;
 
 constexpr int kWriters = 3;
 constexpr int kChanges = 6;
 
-class ChangeTurnsTest : public support::SandboxTest {
+class ChangeTurnsTest : public SandboxTest {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
-    support::haveClock();
-    support::realSleep(true);  // a process that waits for the lock yields to the others
+    haveClock();
+    realSleep(true);  // a process that waits for the lock yields to the others
   }
   void TearDown() override {
-    support::realSleep(false);
+    realSleep(false);
     SandboxTest::TearDown();
   }
 
@@ -66,7 +64,7 @@ class ChangeTurnsTest : public support::SandboxTest {
   }
 
   static long linesWith(const std::string &text) {
-    const Lines lines = support::crontabLines();
+    const Lines lines = crontabLines();
     return std::count_if(lines.begin(), lines.end(), [&](const std::string &line) {
       return line.find(text) != std::string::npos;
     });
@@ -84,13 +82,13 @@ TEST_F(ChangeTurnsTest, NoChangeOfSeveralProcessesIsLost) {
     ASSERT_EQ(waitpid(pid, &status, 0), pid);
     EXPECT_EQ(status, 0);
   }
-  EXPECT_EQ(support::powerList(support::kOff).size(), size_t{kWriters * kChanges});
+  EXPECT_EQ(powerList(kOff).size(), size_t{kWriters * kChanges});
   ZELO_SCHED_TASK *head = nullptr;
   EXPECT_EQ(ZELOSchedTaskListGet(&head, nullptr), 2 * kWriters * kChanges);
   ZELOSchedTaskListFree(&head);
   EXPECT_EQ(linesWith("/tmp/zeloschedtask"), kWriters * kChanges);
   EXPECT_EQ(linesWith("zelo_poweroff_feasible_check"), kWriters * kChanges);
-  EXPECT_EQ(support::logged(), Lines{});
+  EXPECT_EQ(logged(), Lines{});
 }
 
 // When changes take long, some processes time out. Each acknowledged task is stored under an id of
@@ -99,7 +97,7 @@ TEST_F(ChangeTurnsTest, OfManyWritersOfALargeStoreEachIsStoredOrToldThatItIsNot)
   constexpr int kStored = 1000;
   constexpr size_t kMany = 60;
   constexpr int kNoTurn = 0x0400;
-  support::realSleep(true, 50);  // 0.6 seconds, in place of thirty
+  realSleep(true, 50);  // 0.6 seconds, in place of thirty
   const Task stored = makeTask("stored", "true");
   for (int id = 1; id <= kStored; ++id) {
     stored->ID = id;
@@ -109,7 +107,7 @@ TEST_F(ChangeTurnsTest, OfManyWritersOfALargeStoreEachIsStoredOrToldThatItIsNot)
     EXPECT_GE(QLIBCFileAddSection("/run/stored", section.c_str(), hash, 0), 0);
     QLIBCSzHashFree(hash);
   }
-  std::filesystem::copy("/run/stored", support::kStore);
+  std::filesystem::copy("/run/stored", kStore);
   std::vector<pid_t> writers;
   for (size_t i = 0; i < kMany; ++i) {
     const pid_t pid = fork();
@@ -158,3 +156,4 @@ TEST_F(ChangeTurnsTest, NobodyElseCanKeepTheOthersWaiting) {
 }
 
 }  // namespace
+}  // namespace support

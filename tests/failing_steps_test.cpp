@@ -31,14 +31,8 @@
 #include "zelocore.h"
 #include "zelosched.h"
 
+namespace support {
 namespace {
-
-using support::FailingStep;
-using support::isShortRun;
-using support::makeTask;
-using support::OwnWork;
-using support::setText;
-using support::Task;
 
 constexpr int kTasks = 3;
 
@@ -46,17 +40,15 @@ constexpr int kTasks = 3;
 
 using Files = std::map<std::string, std::string>;
 
-const char *const kKept[] = {support::kStore, support::kPersistentStore, support::kPowerSchedule,
-                             support::kCrontab, support::kWakeAlarm};
+const char *const kKept[] = {kStore, kPersistentStore, kPowerSchedule, kCrontab, kWakeAlarm};
 // These change atomically. So does the crontab, but it may be changed several times, and lacks the
 // line of a task that could not be read; the alarm is off while it is set.
-const char *const kAtOneStroke[] = {support::kStore, support::kPersistentStore,
-                                    support::kPowerSchedule};
+const char *const kAtOneStroke[] = {kStore, kPersistentStore, kPowerSchedule};
 
 Files keptFiles() {
   Files files;
   for (const char *path : kKept) {
-    if (support::fileExists(path)) files[path] = support::readFile(path);
+    if (fileExists(path)) files[path] = readFile(path);
   }
   return files;
 }
@@ -66,8 +58,8 @@ void putBack(const Files &files) {
     const auto found = files.find(path);
     if (found == files.end()) {
       std::filesystem::remove(path);
-    } else if (support::readFile(path) != found->second) {
-      support::writeFile(path, found->second);
+    } else if (readFile(path) != found->second) {
+      writeFile(path, found->second);
     }
   }
 }
@@ -85,7 +77,7 @@ std::set<std::string> temporaryFiles() {
   for (const char *directory : {"/tmp", "/etc", "/usr/zelo/etc"}) {
     for (const std::string &name : namesIn(directory)) {
       const bool isKept = std::find(std::begin(kKept), std::end(kKept), name) != std::end(kKept);
-      if (!isKept && !name.starts_with(support::kStatusDatabase)) found.insert(name);
+      if (!isKept && !name.starts_with(kStatusDatabase)) found.insert(name);
     }
   }
   return found;
@@ -164,7 +156,7 @@ sqlite3 *database = nullptr;
 long runToEnd(long id, int onlyWhenDue = 0) {
   const long result = ZELOSchedTaskRun(id, onlyWhenDue, onlyWhenDue);
   const OwnWork own;
-  support::waitForChildRuns();
+  waitForChildRuns();
   return result;
 }
 
@@ -279,7 +271,7 @@ const Scenario kScenarios[] = {
      {0}},
     {"ZELOSchedDBInit",
      [] {
-       const support::ExpectedLeak handleLeftOpen;
+       const ExpectedLeak handleLeftOpen;
        sqlite3 *opened = ZELOSchedDBInit();
        if (opened == nullptr) return 0L;
        sqlite3_close(opened);
@@ -337,24 +329,24 @@ const Scenario kScenarios[] = {
     {"ZELOSchedTaskRun (power)", [] { return runToEnd(91272130); }, {0}, {-1}},
 };
 
-class FailingStepsTest : public support::SandboxTest, public testing::WithParamInterface<Scenario> {
+class FailingStepsTest : public SandboxTest, public testing::WithParamInterface<Scenario> {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
-    support::haveClock();
-    if (GetParam().plugins == Plugins::kOne) support::installPlugin("a", "exit 0");
-    std::filesystem::remove_all(support::kPowerSchedule);
+    haveClock();
+    if (GetParam().plugins == Plugins::kOne) installPlugin("a", "exit 0");
+    std::filesystem::remove_all(kPowerSchedule);
     hash = QLIBCSzHashAlloc(64);
     for (int i = 0; i < kTasks; ++i) {
       const Task task = makeTask("task", "exit 0");
-      if (i == kTasks - 1 && support::otherUsersExist()) task->Owner = 65534;
-      support::saveTask(task);
+      if (i == kTasks - 1 && otherUsersExist()) task->Owner = 65534;
+      saveTask(task);
     }
     ASSERT_EQ(ZELOSchedInitHashFromTask(&hash, edited(1)), 0);
-    support::setPowerList(support::kOff, {{1, 127, 21, 30}});
+    setPowerList(kOff, {{1, 127, 21, 30}});
     ASSERT_EQ(ZELOSchedTaskSync(), 0);
-    std::filesystem::remove_all(support::kStatusDatabase);
-    support::addStatusRow({.pid = 1, .timestamp = 5, .app = "app", .taskId = 1, .statusCode = 3});
+    std::filesystem::remove_all(kStatusDatabase);
+    addStatusRow({.pid = 1, .timestamp = 5, .app = "app", .taskId = 1, .statusCode = 3});
     database = ZELOSchedDBInit();
     ASSERT_NE(database, nullptr);
     before_ = keptFiles();
@@ -372,14 +364,14 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
   void TearDown() override {
     QLIBCSzHashFree(hash);
     sqlite3_close(database);
-    std::filesystem::remove_all(support::kPowerSchedule);
+    std::filesystem::remove_all(kPowerSchedule);
     SandboxTest::TearDown();
   }
 
   // The name of the call that failed, "" when there are fewer.
   std::string step(unsigned nth, bool onwards) {
-    support::clearLog();
-    support::resetPowerCalls();
+    clearLog();
+    resetPowerCalls();
     QLIBCErrSetEx(0, "", 0);
     long result = 0;
     std::string failed;
@@ -415,7 +407,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
       EXPECT_TRUE(isOld || isNew || isGivenAway) << path << " is neither the old nor the new";
     }
     if (succeeded && !isGivenAway) {
-      for (const char *path : {support::kStore, support::kPersistentStore}) {
+      for (const char *path : {kStore, kPersistentStore}) {
         EXPECT_TRUE(same(files, after_, path)) << path << " lacks what was acknowledged";
       }
     }
@@ -440,9 +432,9 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
 
   // A task that could not be read has no line, and lines of power times are changed one by one.
   void checkCrontab(const std::string &failed) const {
-    const std::string crontab = support::readFile(support::kCrontab);
-    EXPECT_TRUE(crontab.starts_with(support::kPlainCrontab));
-    const std::vector<std::string> lines = support::crontabLines();
+    const std::string crontab = readFile(kCrontab);
+    EXPECT_TRUE(crontab.starts_with(kPlainCrontab));
+    const std::vector<std::string> lines = crontabLines();
     for (const std::string &line : lines) {
       EXPECT_TRUE(holdsLine(before_, line) || holdsLine(after_, line)) << line;
     }
@@ -450,8 +442,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
   }
 
   static size_t linesIn(const Files &files) {
-    return support::linesOf(files.at(support::kCrontab)).size() -
-           support::linesOf(support::kPlainCrontab).size();
+    return linesOf(files.at(kCrontab)).size() - linesOf(kPlainCrontab).size();
   }
 
   static bool changeLockIsFree() {
@@ -462,7 +453,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
   }
 
   static bool holdsLine(const Files &files, const std::string &line) {
-    return files.at(support::kCrontab).find("\n" + line + "\n") != std::string::npos;
+    return files.at(kCrontab).find("\n" + line + "\n") != std::string::npos;
   }
 
   static bool same(const Files &a, const Files &b, const char *path) {
@@ -482,7 +473,7 @@ class FailingStepsTest : public support::SandboxTest, public testing::WithParamI
   }
 
   static bool watchesMemory() {
-    return support::kAllocationsCanFail && GetParam().memory == Memory::kGivenBack;
+    return kAllocationsCanFail && GetParam().memory == Memory::kGivenBack;
   }
 
   // Only a leak that repeats with the step counts.
@@ -550,3 +541,4 @@ INSTANTIATE_TEST_SUITE_P(Each, FailingStepsTest, testing::ValuesIn(kScenarios),
                          });
 
 }  // namespace
+}  // namespace support

@@ -17,15 +17,9 @@
 #include "tasks.h"
 #include "zelosched.h"
 
+namespace support {
 namespace {
 
-using support::Entries;
-using support::Entry;
-using support::kOff;
-using support::kOn;
-using support::makeTask;
-using support::setText;
-using support::Task;
 using Lines = std::vector<std::string>;
 
 constexpr char kCheck[] = "/usr/zelo/bin/zelo_poweroff_feasible_check";
@@ -38,12 +32,12 @@ std::string joined(const std::vector<int> &numbers) {
   return text;
 }
 
-class SideBySideTest : public support::SandboxTest {
+class SideBySideTest : public SandboxTest {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
-    support::haveClock();
-    std::filesystem::permissions(support::kCrontab, std::filesystem::perms(kMode));
+    haveClock();
+    std::filesystem::permissions(kCrontab, std::filesystem::perms(kMode));
   }
 
   unsigned below(unsigned limit) { return static_cast<unsigned>(random_() % limit); }
@@ -93,7 +87,7 @@ class SideBySideTest : public support::SandboxTest {
     const auto victim =
         std::next(ordinary_.begin(), below(static_cast<unsigned>(ordinary_.size())));
     if (choice == 2) {
-      const Task task = support::loadTask(victim->first);
+      const Task task = loadTask(victim->first);
       fillOrdinary(task.get());
       ASSERT_EQ(ZELOSchedTaskSave(task.get()), 0);
       remember(*task);
@@ -141,7 +135,7 @@ class SideBySideTest : public support::SandboxTest {
     const Entry chosen = entries[below(static_cast<unsigned>(entries.size()))];
     const auto victim = std::find(entries.begin(), entries.end(), chosen);
     if (choice == 2) {
-      const Task task = support::loadTask(idOf(list, chosen));
+      const Task task = loadTask(idOf(list, chosen));
       fillPower(task.get(), entry);
       ASSERT_EQ(ZELOSchedTaskSave(task.get()), 0);
       *victim = entry;
@@ -181,7 +175,7 @@ class SideBySideTest : public support::SandboxTest {
     Lines ordinary;
     Lines power;
     std::string others;
-    for (const std::string &line : support::linesOf(support::readFile(support::kCrontab))) {
+    for (const std::string &line : linesOf(readFile(kCrontab))) {
       if (line.find(kProgram) != std::string::npos) {
         ordinary.push_back(line);
       } else if (line.find(kCheck) != std::string::npos) {
@@ -193,11 +187,11 @@ class SideBySideTest : public support::SandboxTest {
     std::sort(ordinary.begin(), ordinary.end());
     EXPECT_EQ(ordinary, ordinaryLines());
     EXPECT_EQ(power, powerLines());
-    EXPECT_EQ(others, support::kPlainCrontab);
-    EXPECT_EQ(support::powerList(kOn), power_.at(kOn));
-    EXPECT_EQ(support::powerList(kOff), power_.at(kOff));
+    EXPECT_EQ(others, kPlainCrontab);
+    EXPECT_EQ(powerList(kOn), power_.at(kOn));
+    EXPECT_EQ(powerList(kOff), power_.at(kOff));
     struct stat status = {};
-    ASSERT_EQ(stat(support::kCrontab, &status), 0);
+    ASSERT_EQ(stat(kCrontab, &status), 0);
     EXPECT_EQ(status.st_mode & 07777U, kMode);
   }
 
@@ -218,7 +212,8 @@ TEST_F(SideBySideTest, TheLinesOfBothBackendsOutliveTwoHundredEditsOfEither) {
   }
   EXPECT_GT(ordinaryLines().size(), 5U);
   EXPECT_GT(powerLines().size(), 5U);
-  EXPECT_EQ(support::logged(), Lines{});
+  EXPECT_EQ(logged(), Lines{});
 }
 
 }  // namespace
+}  // namespace support

@@ -18,22 +18,9 @@
 #include "sandbox_fixture.h"
 #include "zelocore.h"
 
+namespace support {
 namespace {
 
-using support::alarm;
-using support::crontabLines;
-using support::Entries;
-using support::Entry;
-using support::errorRecord;
-using support::failCall;
-using support::kOff;
-using support::kOn;
-using support::powerList;
-using support::readFile;
-using support::setClock;
-using support::setPowerList;
-using support::setZone;
-using support::writeFile;
 using Lines = std::vector<std::string>;
 
 constexpr int kOutOfMemory = 0x0200;
@@ -55,11 +42,11 @@ testing::AssertionResult failedWith(int result, int code) {
   return testing::AssertionFailure() << "result " << result << ", record " << errorRecord();
 }
 
-class PlatformTest : public support::SandboxTest {
+class PlatformTest : public SandboxTest {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
-    support::haveClock();
+    haveClock();
     std::filesystem::remove_all(kFile);
   }
 };
@@ -128,12 +115,12 @@ TEST_F(SetLineTest, AValueWithoutALineToReplaceIsAppended) {
 TEST_F(SetLineTest, AFileThatIsNotThereHoldsNoLineAndIsNotMade) {
   EXPECT_EQ(set("key"), 0);
   EXPECT_TRUE(failedWith(set("key", "key=1"), kOpen));
-  EXPECT_FALSE(support::fileExists(kFile));
+  EXPECT_FALSE(fileExists(kFile));
 }
 
 TEST_F(SetLineTest, OwnerAndModeAreKept) {
   writeFile(kFile, "key\n", 0640);
-  const bool others = support::otherUsersExist();
+  const bool others = otherUsersExist();
   if (others) {
     ASSERT_EQ(chown(kFile, 1234, 4321), 0);
   }
@@ -147,7 +134,7 @@ TEST_F(SetLineTest, OwnerAndModeAreKept) {
 
 // A change of the owner clears such bits.
 TEST_F(SetLineTest, TheBitsOfTheModeOutliveTheOwner) {
-  if (!support::otherUsersExist()) GTEST_SKIP() << "needs other users";
+  if (!otherUsersExist()) GTEST_SKIP() << "needs other users";
   writeFile(kFile, "key\n");
   ASSERT_EQ(chown(kFile, 1234, 4321), 0);
   ASSERT_EQ(chmod(kFile, 06755), 0);
@@ -168,12 +155,12 @@ TEST_F(SetLineTest, ADirectoryThatCannotBeSyncedIsAFailureWithTheNewFileInPlace)
 TEST_F(SetLineTest, TheChangeIsOnTheDiskBeforeTheFileTakesItsName) {
   writeFile(kFile, "key\n");
   EXPECT_EQ(set("key"), 1);
-  EXPECT_EQ(support::callCount("fsync"), 2U) << "of the file and of its directory";
+  EXPECT_EQ(callCount("fsync"), 2U) << "of the file and of its directory";
   writeFile(kFile, "key\n");
-  support::resetFailingCalls();
+  resetFailingCalls();
   failCall("rename", {.error = EXDEV});
   EXPECT_TRUE(failedWith(set("key"), kRename));
-  EXPECT_EQ(support::callCount("fsync"), 1U);
+  EXPECT_EQ(callCount("fsync"), 1U);
 }
 
 TEST_F(SetLineTest, AFailureLeavesTheFileAsItWasAndNoTemporary) {
@@ -191,7 +178,7 @@ TEST_F(SetLineTest, AFailureLeavesTheFileAsItWasAndNoTemporary) {
     EXPECT_TRUE(failedWith(set("key"), failure.code));
     EXPECT_EQ(readFile(kFile), "key\nother\n");
     EXPECT_EQ(filesIn("/tmp"), files);
-    support::resetFailingCalls();
+    resetFailingCalls();
   }
 }
 
@@ -261,25 +248,24 @@ TEST_F(PowerConfTest, AListMayBeLongerThanWhatIsAskedFor) {
 TEST_F(PowerConfTest, AListOfMoreThanAHundredEntriesIsRefusedAndNothingIsStored) {
   const Entries full = differentEntries(100);
   setPowerList(kOn, full);
-  const std::string before = readFile(support::kPowerSchedule);
+  const std::string before = readFile(kPowerSchedule);
   const Entries many = differentEntries(101);
   for (const int list : {kOn, kOff}) {
     QLIBCErrSetEx(0, "", 0);
     EXPECT_TRUE(failedWith(ZELOAutoPowerConfSet(list, 101, many.data()), kBadArgument));
   }
-  EXPECT_EQ(readFile(support::kPowerSchedule), before);
+  EXPECT_EQ(readFile(kPowerSchedule), before);
 }
 
 TEST_F(PowerConfTest, TheFileIsASectionFileForPeopleToReadAndWrite) {
   setPowerList(kOff, {{1, 62, 22, 15}, {0, 65, 23, 0}});
-  EXPECT_NE(readFile(support::kPowerSchedule).find("[poweroff]\ntimes=\"1 62 22 15; 0 65 23 0\"\n"),
+  EXPECT_NE(readFile(kPowerSchedule).find("[poweroff]\ntimes=\"1 62 22 15; 0 65 23 0\"\n"),
             std::string::npos);
-  writeFile(support::kPowerSchedule,
-            "; mine\n[poweron]\ntimes=1 127 7 30;0 1\t2 3 ;\n[other]\nx=y\n");
+  writeFile(kPowerSchedule, "; mine\n[poweron]\ntimes=1 127 7 30;0 1\t2 3 ;\n[other]\nx=y\n");
   EXPECT_EQ(powerList(kOn), (Entries{{1, 127, 7, 30}, {0, 1, 2, 3}}));
   setPowerList(kOff, {{1, 1, 1, 1}});
   EXPECT_EQ(powerList(kOn), (Entries{{1, 127, 7, 30}, {0, 1, 2, 3}}));
-  EXPECT_NE(readFile(support::kPowerSchedule).find("[other]\nx=y\n"), std::string::npos);
+  EXPECT_NE(readFile(kPowerSchedule).find("[other]\nx=y\n"), std::string::npos);
 }
 
 TEST_F(PowerConfTest, AFileWithSomethingElseThanPowerTimesIsAFailure) {
@@ -289,7 +275,7 @@ TEST_F(PowerConfTest, AFileWithSomethingElseThanPowerTimesIsAFailure) {
                             "1 127 7 30 1 127 7 30", ";", "1 127 7 30;;1 127 7 30"}) {
     SCOPED_TRACE(times);
     QLIBCErrSetEx(0, "", 0);
-    writeFile(support::kPowerSchedule, std::string("[poweron]\ntimes=\"") + times + "\"\n");
+    writeFile(kPowerSchedule, std::string("[poweron]\ntimes=\"") + times + "\"\n");
     EXPECT_TRUE(failedWith(ZELOAutoPowerConfGet(kOn, 1, &entry), kMalformed));
     EXPECT_TRUE(failedWith(ZELOAutoPoweronSet(), kMalformed));
     EXPECT_EQ(ZELOAutoPowerConfGet(kOff, 1, &entry), 0);
@@ -300,7 +286,7 @@ TEST_F(PowerConfTest, AListWhoseLineWasDamagedIsAFailureAndIsNotWrittenOver) {
   for (const char *text : {"[poweroff]\ntimes=\"1 127 22 15\n", "[poweroff]\n",
                            "[poweroff]\n[poweroff]\ntimes=\"1 127 22 15\"\n"}) {
     SCOPED_TRACE(text);
-    writeFile(support::kPowerSchedule, text);
+    writeFile(kPowerSchedule, text);
     Entry entry = {};
     EXPECT_TRUE(failedWith(ZELOAutoPowerConfGet(kOff, 1, &entry), kMalformed));
     EXPECT_EQ(ZELOAutoPowerConfGet(kOn, 1, &entry), 0);
@@ -309,13 +295,13 @@ TEST_F(PowerConfTest, AListWhoseLineWasDamagedIsAFailureAndIsNotWrittenOver) {
 
 TEST_F(PowerConfTest, AFileCutOffIsAFailureAndIsNotBuiltUpon) {
   setPowerList(kOn, {{1, 127, 7, 30}});
-  const std::string whole = readFile(support::kPowerSchedule);
+  const std::string whole = readFile(kPowerSchedule);
   const std::string torn = whole.substr(0, whole.size() - 10);
-  writeFile(support::kPowerSchedule, torn);
+  writeFile(kPowerSchedule, torn);
   Entry entry{};
   EXPECT_TRUE(failedWith(ZELOAutoPowerConfGet(kOn, 1, &entry), kIo));
   EXPECT_TRUE(failedWith(ZELOAutoPowerConfSet(kOn, 1, &entry), kIo));
-  EXPECT_EQ(readFile(support::kPowerSchedule), torn);
+  EXPECT_EQ(readFile(kPowerSchedule), torn);
 }
 
 TEST_F(PowerConfTest, BadArgumentsAreRefusedAndNothingIsStored) {
@@ -334,7 +320,7 @@ TEST_F(PowerConfTest, BadArgumentsAreRefusedAndNothingIsStored) {
     const Entries entries = {good, bad};
     EXPECT_TRUE(failedWith(ZELOAutoPowerConfSet(kOn, 2, entries.data()), kBadArgument));
   }
-  EXPECT_FALSE(support::fileExists(support::kPowerSchedule));
+  EXPECT_FALSE(fileExists(kPowerSchedule));
 }
 
 TEST_F(PowerConfTest, ADirectoryThatIsNotThereIsAFailure) {
@@ -348,7 +334,7 @@ TEST_F(PowerConfTest, MemoryThatRunsShortIsAFailure) {
   setPowerList(kOn, {{1, 127, 7, 30}});
   const Entry entry{1, 127, 7, 30};
   Entry read{};
-  failCall("QLIBCSzHashAlloc", {.times = support::kAlways, .code = kOutOfMemory});
+  failCall("QLIBCSzHashAlloc", {.times = kAlways, .code = kOutOfMemory});
   EXPECT_TRUE(failedWith(ZELOAutoPowerConfSet(kOn, 1, &entry), kOutOfMemory));
   QLIBCErrSetEx(0, "", 0);
   EXPECT_TRUE(failedWith(ZELOAutoPowerConfGet(kOn, 1, &read), kOutOfMemory));
@@ -356,9 +342,9 @@ TEST_F(PowerConfTest, MemoryThatRunsShortIsAFailure) {
 
 TEST_F(PowerConfTest, AListIsOnTheDiskWhenItIsStored) {
   setPowerList(kOn, {{1, 127, 7, 30}});
-  EXPECT_EQ(support::callCount("fsync"), 2U) << "of a new file and of its directory";
+  EXPECT_EQ(callCount("fsync"), 2U) << "of a new file and of its directory";
   setPowerList(kOn, {});
-  EXPECT_EQ(support::callCount("fsync"), 4U) << "of one that replaces another";
+  EXPECT_EQ(callCount("fsync"), 4U) << "of one that replaces another";
 }
 
 TEST_F(PowerConfTest, AFailureWhileStoringLeavesTheOldLists) {
@@ -368,7 +354,7 @@ TEST_F(PowerConfTest, AFailureWhileStoringLeavesTheOldLists) {
     SCOPED_TRACE(call);
     failCall(call, {.error = EIO});
     EXPECT_EQ(ZELOAutoPowerConfSet(kOn, 0, nullptr), -1);
-    support::resetFailingCalls();
+    resetFailingCalls();
     EXPECT_EQ(powerList(kOn), old);
   }
   EXPECT_EQ(filesIn("/usr/zelo/etc"), 1);
@@ -489,7 +475,7 @@ TEST_F(PoweronSetTest, ATimeThatComesTwiceComesTheFirstTime) {
   setZone("Europe/Berlin");
   setClock("2013-10-27 00:00");
   EXPECT_EQ(armed({{1, 127, 2, 30}}), "2013-10-27 00:30:00");
-  setClock(support::localTime("2013-10-27 00:00") + 3 * 3600);  // 02:00 for the second time
+  setClock(localTime("2013-10-27 00:00") + 3 * 3600);  // 02:00 for the second time
   EXPECT_EQ(armed({{1, 127, 2, 30}}), "2013-10-28 01:30:00");
 }
 
@@ -557,19 +543,19 @@ TEST_F(PoweronSetTest, AnArmedAlarmIsDisarmedBeforeItIsArmedAnew) {
 
 TEST_F(PoweronSetTest, ItIsDisarmedByAZero) {
   armed({{1, 127, 9, 0}});
-  support::failCallFor("open", support::kWakeAlarm, {.from = 2, .error = EBUSY});
+  failCallFor("open", kWakeAlarm, {.from = 2, .error = EBUSY});
   EXPECT_TRUE(failedWith(ZELOAutoPoweronSet(), kOpen));
   EXPECT_EQ(alarm(), "0\n");
 }
 
 TEST_F(PoweronSetTest, AClockThatIsNotArmedIsNotWrittenTo) {
   for (const char *unarmed : {"", "0\n"}) {
-    writeFile(support::kWakeAlarm, unarmed);
+    writeFile(kWakeAlarm, unarmed);
     setPowerList(kOn, {});
-    failCall("write", {.times = support::kAlways, .error = EROFS});
+    failCall("write", {.times = kAlways, .error = EROFS});
     EXPECT_EQ(ZELOAutoPoweronSet(), 0);
     EXPECT_EQ(alarm(), unarmed);
-    support::resetFailingCalls();
+    resetFailingCalls();
   }
 }
 
@@ -612,20 +598,20 @@ TEST_F(PoweronSetTest, AListWithoutATimeDisarmsTheClock) {
 }
 
 TEST_F(PoweronSetTest, WithoutAClockThereIsNothingToDisarm) {
-  support::haveNoClock();
+  haveNoClock();
   EXPECT_EQ(ZELOAutoPoweronSet(), 0);
   setPowerList(kOn, {{0, 127, 9, 0}});
   EXPECT_EQ(ZELOAutoPoweronSet(), 0);
   EXPECT_EQ(errorRecord().code, 0);
-  EXPECT_FALSE(support::fileExists(support::kWakeAlarm));
+  EXPECT_FALSE(fileExists(kWakeAlarm));
 }
 
 TEST_F(PoweronSetTest, ATimeThatIsWantedWithoutAClockIsAFailure) {
-  support::haveNoClock();
+  haveNoClock();
   setPowerList(kOn, {{1, 127, 9, 0}});
   EXPECT_TRUE(failedWith(ZELOAutoPoweronSet(), kOpen));
   EXPECT_EQ(errorRecord().file, "power_on.cpp");
-  EXPECT_FALSE(support::fileExists(support::kWakeAlarm)) << "none is made";
+  EXPECT_FALSE(fileExists(kWakeAlarm)) << "none is made";
 }
 
 TEST_F(PoweronSetTest, ATimeThatTheKernelRefusesIsAFailure) {
@@ -659,9 +645,9 @@ class ScheduleSetTest : public PlatformTest {
 TEST_F(ScheduleSetTest, AScheduleIsALineAtTheEndOfTheCrontab) {
   EXPECT_EQ(set(schedule(62, 22, 5)), 0);
   EXPECT_EQ(set(schedule(65, 0, 59, "/bin/echo 'a b'")), 0);
-  EXPECT_EQ(readFile(support::kCrontab), std::string(support::kPlainCrontab) +
-                                             "5\t22\t*\t*\t1,2,3,4,5\troot\t/bin/true\n"
-                                             "59\t0\t*\t*\t0,6\troot\t/bin/echo 'a b'\n");
+  EXPECT_EQ(readFile(kCrontab), std::string(kPlainCrontab) +
+                                    "5\t22\t*\t*\t1,2,3,4,5\troot\t/bin/true\n"
+                                    "59\t0\t*\t*\t0,6\troot\t/bin/echo 'a b'\n");
 }
 
 TEST_F(ScheduleSetTest, EveryDayIsAStar) {
@@ -671,34 +657,34 @@ TEST_F(ScheduleSetTest, EveryDayIsAStar) {
 
 TEST_F(ScheduleSetTest, AScheduleWithoutAWeekdayGetsNoLine) {
   EXPECT_EQ(set(schedule(0, 23, 0)), 0);
-  EXPECT_EQ(readFile(support::kCrontab), support::kPlainCrontab);
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
 }
 
 TEST_F(ScheduleSetTest, AScheduleThatIsNotEnabledGetsNoLine) {
   const ZELO_SCHEDULE made = schedule(127, 23, 0);
   EXPECT_EQ(ZELOScheduleSet(&made, 0), 0);
-  EXPECT_EQ(readFile(support::kCrontab), support::kPlainCrontab);
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
 }
 
 TEST_F(ScheduleSetTest, ACrontabWithoutALastLineFeedIsNotJoinedTo) {
-  writeFile(support::kCrontab, "SHELL=/bin/sh");
+  writeFile(kCrontab, "SHELL=/bin/sh");
   EXPECT_EQ(set(schedule(1, 1, 1)), 0);
-  EXPECT_EQ(readFile(support::kCrontab), "SHELL=/bin/sh\n1\t1\t*\t*\t0\troot\t/bin/true\n");
+  EXPECT_EQ(readFile(kCrontab), "SHELL=/bin/sh\n1\t1\t*\t*\t0\troot\t/bin/true\n");
 }
 
 TEST_F(ScheduleSetTest, WithoutACrontabNoneIsMade) {
-  std::filesystem::remove(support::kCrontab);
+  std::filesystem::remove(kCrontab);
   EXPECT_TRUE(failedWith(set(schedule(1, 1, 1)), kOpen));
-  EXPECT_FALSE(support::fileExists(support::kCrontab));
+  EXPECT_FALSE(fileExists(kCrontab));
 }
 
 TEST_F(ScheduleSetTest, OwnerAndModeOfTheCrontabAreKeptAndItIsOnTheDisk) {
-  std::filesystem::permissions(support::kCrontab, std::filesystem::perms(0600));
+  std::filesystem::permissions(kCrontab, std::filesystem::perms(0600));
   EXPECT_EQ(set(schedule(1, 1, 1)), 0);
   struct stat status = {};
-  ASSERT_EQ(stat(support::kCrontab, &status), 0);
+  ASSERT_EQ(stat(kCrontab, &status), 0);
   EXPECT_EQ(status.st_mode & 07777U, 0600U);
-  EXPECT_EQ(support::callCount("fsync"), 2U);
+  EXPECT_EQ(callCount("fsync"), 2U);
 }
 
 TEST_F(ScheduleSetTest, RecordsOutOfTheirRangesAreRefused) {
@@ -730,7 +716,7 @@ TEST_F(ScheduleSetTest, RecordsOutOfTheirRangesAreRefused) {
   const ZELO_SCHEDULE good = schedule(127, 1, 1);
   EXPECT_TRUE(failedWith(ZELOScheduleSet(&good, 2), kBadArgument));
   EXPECT_TRUE(failedWith(ZELOScheduleSet(nullptr, 1), kBadArgument));
-  EXPECT_EQ(readFile(support::kCrontab), support::kPlainCrontab);
+  EXPECT_EQ(readFile(kCrontab), kPlainCrontab);
 }
 
 // ---- the daemon
@@ -746,7 +732,7 @@ TEST_F(UpdateCrontabTest, TheDaemonOfThePidFileGetsAHangUpSignal) {
   if (daemon == 0) {
     for (;;) pause();
   }
-  writeFile(support::kCronPidFile, std::to_string(daemon) + "\n");
+  writeFile(kCronPidFile, std::to_string(daemon) + "\n");
   EXPECT_EQ(ZELOUpdateCrontab("/bin/true", 0, 0), 0);
   EXPECT_EQ(waitpid(daemon, nullptr, WNOHANG), 0) << "a reload was not asked for";
   EXPECT_EQ(update(), 0);
@@ -758,12 +744,12 @@ TEST_F(UpdateCrontabTest, TheDaemonOfThePidFileGetsAHangUpSignal) {
 }
 
 TEST_F(UpdateCrontabTest, ADaemonThatCannotBeSignalledIsAFailure) {
-  writeFile(support::kCronPidFile, std::to_string(getpid()) + "\n");
-  failCall("kill", {.times = support::kAlways, .error = EPERM});
+  writeFile(kCronPidFile, std::to_string(getpid()) + "\n");
+  failCall("kill", {.times = kAlways, .error = EPERM});
   EXPECT_TRUE(failedWith(update(), kSystem));
   EXPECT_EQ(errorRecord().file, "crontab.cpp");
-  support::resetFailingCalls();
-  failCall("kill", {.times = support::kAlways, .error = ESRCH});
+  resetFailingCalls();
+  failCall("kill", {.times = kAlways, .error = ESRCH});
   EXPECT_EQ(update(), 0) << "it ended meanwhile";
 }
 
@@ -779,14 +765,14 @@ TEST_F(UpdateCrontabTest, ANumberThatIsNoSingleProcessIsNotSignalled) {
   ASSERT_EQ(sigaction(SIGHUP, &ignored, &former), 0);
   for (const char *text : {"", "0\n", "-1\n", "1\n", "x\n", "99999999999999999999\n"}) {
     SCOPED_TRACE(text);
-    writeFile(support::kCronPidFile, text);
+    writeFile(kCronPidFile, text);
     EXPECT_EQ(update(), 0);
   }
   ASSERT_EQ(sigaction(SIGHUP, &former, nullptr), 0);
 }
 
 TEST_F(UpdateCrontabTest, APidFileThatCannotBeReadIsAFailure) {
-  writeFile(support::kCronPidFile, "2\n");
+  writeFile(kCronPidFile, "2\n");
   failCall("read", {.error = EIO});
   EXPECT_TRUE(failedWith(update(), kIo));
 }
@@ -798,3 +784,4 @@ TEST_F(UpdateCrontabTest, BadArgumentsAreRefused) {
 }
 
 }  // namespace
+}  // namespace support

@@ -9,6 +9,7 @@
 #include "captured_log.h"
 #include "failing_calls.h"
 #include "fake_clock.h"
+#include "refused_arguments.h"
 #include "sandbox_fixture.h"
 #include "schedule_cases.h"
 #include "tasks.h"
@@ -131,13 +132,6 @@ TEST_F(SchedDateTest, InTheLastHourOfASummerDayTheDateMovesOn) {
   setZone(kCentralEurope);
   EXPECT_EQ(normalised({2013, 7, 10, 0, 23, 10}), (Fields{2013, 7, 11, 4, 0, 10}));
   EXPECT_EQ(normalised({2013, 7, 31, 0, 23, 10}), (Fields{2013, 8, 1, 4, 0, 10}));
-}
-
-TEST_F(SchedDateTest, NormalisingNeedsADate) {
-  EXPECT_EQ(ZELOSchedDateNormalize(nullptr), -1);
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "sched_date.cpp"}));
-  EXPECT_EQ(logged(), Lines{"sched_date.cpp:N Invaild Argument (((void *)0) != pDate)=[0]\n"});
-  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
 }
 
 // Two billion years from now: the month after its last one overflows.
@@ -272,11 +266,10 @@ TEST_F(SchedDateTest, NoStartDateFailsOrRunsForEver) {
 
 // ---- failures
 
-TEST_F(SchedDateTest, ANextRunNeedsATask) {
-  EXPECT_EQ(ZELOSchedNextTriggerTime(nullptr), -1);
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "sched_date.cpp"}));
-  EXPECT_EQ(logged(), Lines{"sched_date.cpp:N Invaild Argument (((void *)0) != pTask)=[0]\n"});
-  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
+TEST_F(SchedDateTest, ANextRunNeedsATaskAndNormalisingADate) {
+  expectRefused("sched_date.cpp",
+                {{"((void *)0) != pDate", [] { return ZELOSchedDateNormalize(nullptr); }},
+                 {"((void *)0) != pTask", [] { return ZELOSchedNextTriggerTime(nullptr); }}});
 }
 
 TEST_F(SchedDateTest, WithoutADateTheFieldStaysAsItWas) {

@@ -19,13 +19,9 @@
 #include "tasks.h"
 #include "zelosched.h"
 
+namespace support {
 namespace {
 
-using support::beforeEachCall;
-using support::fileExists;
-using support::kStatusDatabase;
-using support::readFile;
-using support::writeFile;
 using Lines = std::vector<std::string>;
 
 const std::string kJournal = std::string(kStatusDatabase) + "-journal";
@@ -51,7 +47,7 @@ Database openPlainly(const char *szPath) {
 
 // What the statements give, "|" between values and " " between rows, or SQLite's error.
 std::string answer(sqlite3 *db, const std::string &sql) {
-  const support::OwnWork own;
+  const OwnWork own;
   std::string rows;
   char *error = nullptr;
   sqlite3_exec(
@@ -115,7 +111,7 @@ std::string naming(const std::string &superJournal) {
          kJournalMagic;
 }
 
-class PlantedJournalTest : public support::SandboxTest {
+class PlantedJournalTest : public SandboxTest {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
@@ -123,7 +119,7 @@ class PlantedJournalTest : public support::SandboxTest {
     std::filesystem::create_directory("/tmp/forge");
   }
   void TearDown() override {
-    support::resetFailingCalls();
+    resetFailingCalls();
     forget();
     SandboxTest::TearDown();
   }
@@ -144,30 +140,30 @@ class PlantedJournalTest : public support::SandboxTest {
   }
   static Database init() { return Database(ZELOSchedDBInit()); }
   static int add(const Database &db, const char *szApp) {
-    const support::Task task = support::makeTask("task", "");
-    support::setText(task->App, szApp);
+    const Task task = makeTask("task", "");
+    setText(task->App, szApp);
     return ZELOSchedDBAddRecord(db.get(), task.get(), nullptr);
   }
   // A copy of the genuine database, to change.
   static Database forge() {
-    const support::OwnWork own;
+    const OwnWork own;
     std::filesystem::copy_file(kStatusDatabase, kForge,
                                std::filesystem::copy_options::overwrite_existing);
     return openPlainly(kForge);
   }
   static std::string forgedLog() {
-    const support::OwnWork own;
+    const OwnWork own;
     const Database db = forge();
     answer(db.get(), "PRAGMA journal_mode=WAL; UPDATE task_status SET app='forged'");
     return readFile(std::string(kForge) + "-wal");
   }
   static std::string forgedJournal() {
-    const support::OwnWork own;
+    const OwnWork own;
     answer(forge().get(), "UPDATE task_status SET app='forged'");
     return journalOf(readFile(kForge));
   }
   static void plant(const std::string &path, const std::string &contents) {
-    const support::OwnWork own;
+    const OwnWork own;
     writeFile(path, contents, 0666);
     giveAway(path);
   }
@@ -205,7 +201,7 @@ TEST_F(PlantedJournalTest, ALogThatIsThereIsNeitherReadNorTouched) {
   EXPECT_EQ(applications(db), "genuine next");
   expectStillHis(kLog, log);
   expectStillHis(kLogIndex, "his");
-  EXPECT_EQ(support::logged(), Lines{});
+  EXPECT_EQ(logged(), Lines{});
 }
 
 // Whenever a log appears, between any two calls of an opening and a recording.
@@ -225,7 +221,7 @@ TEST_F(PlantedJournalTest, ALogThatAppearsMeanwhileIsNeitherReadNorTouched) {
     const Database db = init();
     ASSERT_NE(db, nullptr);
     EXPECT_EQ(add(db, "next"), 0);
-    support::resetFailingCalls();
+    resetFailingCalls();
     wasLast = calls < nth;
     EXPECT_EQ(applications(db), "genuine next");
     if (!wasLast) expectStillHis(kLog, log);
@@ -272,13 +268,13 @@ TEST_F(PlantedJournalTest, AJournalThatIsNoLongerOursIsMovedAwayAndNotRolledBack
   std::filesystem::remove(kJournal);
   plant(kJournal, journal);
   EXPECT_EQ(applications(db), "genuine");
-  support::failCall("renameat2", {.error = EIO});
+  failCall("renameat2", {.error = EIO});
   EXPECT_EQ(add(db, "next"), -1);
   EXPECT_EQ(applications(db), "genuine");
   expectStillHis(kJournal, journal);
   EXPECT_EQ(add(db, "next"), 0);
   EXPECT_EQ(applications(db), "genuine next");
-  EXPECT_EQ(readFile(support::movedAway(kJournal)), journal);
+  EXPECT_EQ(readFile(movedAway(kJournal)), journal);
   EXPECT_EQ(readFile(kVictim), "important");
 }
 
@@ -326,11 +322,11 @@ class WalModeTest : public PlantedJournalTest {
     PlantedJournalTest::SetUp();
     makeGenuine();
     EXPECT_EQ(answer(openPlainly(kStatusDatabase).get(), "PRAGMA journal_mode=WAL"), "wal");
-    support::clearLog();
+    clearLog();
   }
   static Lines namesAside() {
     Lines names;
-    const std::string aside = support::movedAway(kStatusDatabase);
+    const std::string aside = movedAway(kStatusDatabase);
     if (aside.empty()) return names;
     const std::filesystem::path directory = std::filesystem::path(aside).parent_path();
     struct stat info = {};
@@ -348,7 +344,7 @@ TEST_F(WalModeTest, ItIsMovedAsideAndMadeAnew) {
   bool wasFree = false;
   beforeEachCall([&](const std::string &) { wasFree = wasFree || !fileExists(kStatusDatabase); });
   const Database db = init();
-  support::resetFailingCalls();
+  resetFailingCalls();
   ASSERT_NE(db, nullptr);
   EXPECT_FALSE(wasFree);
   EXPECT_EQ(add(db, "next"), 0);
@@ -358,8 +354,8 @@ TEST_F(WalModeTest, ItIsMovedAsideAndMadeAnew) {
   EXPECT_EQ(info.st_mode & 0777U, 0600U);
   ASSERT_EQ(namesAside().size(), 1U);
   EXPECT_EQ(applications(openPlainly(namesAside()[0].c_str())), "genuine");
-  EXPECT_EQ(support::logged(), Lines{"sched_task_db.cpp:N " + std::string(kStatusDatabase) +
-                                     " was in WAL mode and is now " + namesAside()[0] + "\n"});
+  EXPECT_EQ(logged(), Lines{"sched_task_db.cpp:N " + std::string(kStatusDatabase) +
+                            " was in WAL mode and is now " + namesAside()[0] + "\n"});
 }
 
 TEST_F(WalModeTest, ItsOwnLogGoesWithIt) {
@@ -395,11 +391,11 @@ TEST_F(WalModeTest, WhatAnotherProcessHasJustMadeIsNotMovedAside) {
     if (call != "flock" || isDone) return;
     isDone = true;
     std::filesystem::remove(kStatusDatabase);
-    support::addStatusRow({.pid = 1, .app = "made meanwhile"});
+    addStatusRow({.pid = 1, .app = "made meanwhile"});
     chmod(kStatusDatabase, 0600);
   });
   const Database db = init();
-  support::resetFailingCalls();
+  resetFailingCalls();
   EXPECT_TRUE(isDone);
   EXPECT_EQ(applications(db), "made meanwhile");
   EXPECT_EQ(namesAside(), Lines{});
@@ -407,12 +403,12 @@ TEST_F(WalModeTest, WhatAnotherProcessHasJustMadeIsNotMovedAside) {
 
 TEST_F(WalModeTest, WithoutRoomForAnotherTheDatabaseIsNotOpened) {
   for (const char *call : {"mkdtemp", "flock"}) {
-    support::clearLog();
-    support::failCall(call, {.error = ENOSPC});
+    clearLog();
+    failCall(call, {.error = ENOSPC});
     EXPECT_EQ(init(), nullptr) << call;
-    EXPECT_EQ(support::logged(),
+    EXPECT_EQ(logged(),
               Lines{"sched_task_db.cpp:N Can't open database: unable to open database file\n"});
-    support::resetFailingCalls();
+    resetFailingCalls();
   }
   EXPECT_EQ(namesAside(), Lines{});
 }
@@ -435,13 +431,13 @@ TEST_F(WalModeTest, WithoutTheJournalThereAreNoTurnsAndItIsNotOpened) {
     std::filesystem::remove(kJournal);
   });
   EXPECT_EQ(init(), nullptr);
-  support::resetFailingCalls();
+  resetFailingCalls();
   EXPECT_TRUE(isDone);
   EXPECT_EQ(namesAside(), Lines{});
 }
 
 TEST_F(WalModeTest, AnotherFailureMeanwhileMovesNothingAside) {
-  support::failCall("sqlite3_open", {.from = 2});
+  failCall("sqlite3_open", {.from = 2});
   EXPECT_EQ(init(), nullptr);
   EXPECT_EQ(namesAside(), Lines{});
 }
@@ -464,16 +460,16 @@ TEST_F(PlantedJournalTest, WhoeverMayOnlyReadItMakesNoJournal) {
 TEST_F(PlantedJournalTest, OneThatBecomesOursWhenItCouldNotBeTakenIsNotOpened) {
   makeGenuine();
   chmod(kStatusDatabase, 0666);
-  support::failCall("renameat2", {.error = EIO});
+  failCall("renameat2", {.error = EIO});
   bool couldNot = false;
   beforeEachCall([&](const std::string &call) {
     if (call == "lstat" && couldNot) chmod(kStatusDatabase, 0600);
     couldNot = couldNot || call == "renameat2";
   });
   EXPECT_EQ(init(), nullptr);
-  support::resetFailingCalls();
-  EXPECT_EQ(support::logged(), Lines{"sched_task_db.cpp:N Can't open database: " +
-                                     std::string(kStatusDatabase) + " was another user's\n"});
+  resetFailingCalls();
+  EXPECT_EQ(logged(), Lines{"sched_task_db.cpp:N Can't open database: " +
+                            std::string(kStatusDatabase) + " was another user's\n"});
   EXPECT_EQ(applications(init()), "genuine");
 }
 
@@ -498,7 +494,7 @@ TEST_F(PlantedJournalTest, NothingIsLeftInSqliteAfterAnOpening) {
   const Database db = init();
   EXPECT_EQ(allVfs(), before);
   EXPECT_EQ(vfsOf(openPlainly(kForge)), before.front());
-  support::failCall("sqlite3_open");
+  failCall("sqlite3_open");
   EXPECT_EQ(init(), nullptr);
   EXPECT_EQ(allVfs(), before);
 }
@@ -522,7 +518,7 @@ void openOthersMeanwhile() {
     third = openPlainly("/tmp/sched_status.sqlite.third");
   });
   const Database db(ZELOSchedDBInit());
-  support::resetFailingCalls();
+  resetFailingCalls();
   ASSERT_NE(other, nullptr);
   EXPECT_EQ(answer(third.get(), "CREATE TABLE t(a)"), "");
   // Both in one transaction, for which SQLite makes a super-journal.
@@ -547,7 +543,7 @@ TEST_F(PlantedJournalTest, ADatabaseOpenedMeanwhileIsOpenedAsEver) {
     fflush(stdout);
     exit(HasFailure() ? EXIT_FAILURE : EXIT_SUCCESS);  // not _exit, which writes no coverage data
   }
-  EXPECT_EQ(support::waitForChildRuns(), std::vector<int>{0});
+  EXPECT_EQ(waitForChildRuns(), std::vector<int>{0});
 }
 
 TEST_F(PlantedJournalTest, AProcessWithThreadsOpensAndUsesItTheSame) {
@@ -645,7 +641,7 @@ TEST_F(NamesTest, WhatDoesNotFitIntoMemoryGoesIntoATemporaryFile) {
                          nullptr, nullptr, &error),
             SQLITE_OK)
       << error;
-  support::resetFailingCalls();
+  resetFailingCalls();
   EXPECT_TRUE(wasOpened);
   EXPECT_EQ(answer(db_.get(), "SELECT count(*), sum(length(text)) FROM many"), "500|2000000");
 }
@@ -653,15 +649,13 @@ TEST_F(NamesTest, WhatDoesNotFitIntoMemoryGoesIntoATemporaryFile) {
 TEST_F(NamesTest, AJournalThatCannotBeEmptiedFailsTheTransaction) {
   EXPECT_EQ(answer(db_.get(), "PRAGMA synchronous=EXTRA; PRAGMA journal_mode=DELETE"), "delete");
   const std::function<void()> failures[] = {
-      [] {
-        support::failCallFor("open", "-journal", {.times = support::kAlways, .error = EMFILE});
-      },
-      [] { support::failCall("ftruncate", {.times = support::kAlways, .error = EIO}); },
+      [] { failCallFor("open", "-journal", {.times = kAlways, .error = EMFILE}); },
+      [] { failCall("ftruncate", {.times = kAlways, .error = EIO}); },
   };
   for (const auto &fail : failures) {
     fail();
     EXPECT_EQ(add(db_, "lost"), -1);
-    support::resetFailingCalls();
+    resetFailingCalls();
     EXPECT_EQ(applications(db_), "genuine");
   }
   EXPECT_EQ(add(db_, "next"), 0);
@@ -672,9 +666,9 @@ TEST_F(NamesTest, AJournalThatCannotBeEmptiedFailsTheTransaction) {
 // survives a power cut is unknown.
 TEST_F(NamesTest, AnEmptiedJournalThatMayNotHaveReachedTheDiskIsToldAsAFailure) {
   EXPECT_EQ(answer(db_.get(), "PRAGMA synchronous=EXTRA; PRAGMA journal_mode=DELETE"), "delete");
-  support::failCall("fsync", {.error = EIO});
+  failCall("fsync", {.error = EIO});
   EXPECT_EQ(add(db_, "next"), -1);
-  EXPECT_EQ(support::callCount("fsync"), 1U);
+  EXPECT_EQ(callCount("fsync"), 1U);
 }
 
 TEST_F(NamesTest, TheRestIsSqlitesOwn) {
@@ -709,7 +703,8 @@ TEST_F(PlantedJournalTest, ASecondHandleDropsNoLockOfTheFirst) {
         answer(openPlainly(kStatusDatabase).get(), "BEGIN IMMEDIATE") == "database is locked";
     _exit(isLocked ? EXIT_SUCCESS : EXIT_FAILURE);
   }
-  EXPECT_EQ(support::waitForChildRuns(), std::vector<int>{0});
+  EXPECT_EQ(waitForChildRuns(), std::vector<int>{0});
 }
 
 }  // namespace
+}  // namespace support

@@ -6,6 +6,7 @@
 
 #include "captured_log.h"
 #include "failing_calls.h"
+#include "refused_arguments.h"
 #include "sandbox_fixture.h"
 #include "zelosched.h"
 
@@ -25,12 +26,6 @@ constexpr ZELO_SCHED_ENUM kEmptyList[] = {{-1, nullptr}};
 constexpr const char *kDays[] = {"Sun", "Mon", "Tue", "Wed", "Thu", "Fri", "Sat"};
 constexpr size_t kDayCount = std::size(kDays);
 constexpr size_t kResultCapacity = 4096;
-
-void expectBadArgument(const std::string &condition) {
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "sched_enum.cpp"}));
-  EXPECT_EQ(logged(), Lines{"sched_enum.cpp:N Invaild Argument (" + condition + ")=[0]\n"});
-  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
-}
 
 void expectNotFoundInSilence() {
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x2000, "sched_enum.cpp"}));
@@ -77,9 +72,14 @@ TEST_F(SchedEnumTest, AnEmptyListHasNoNames) {
   expectNotFoundInSilence();
 }
 
-TEST_F(SchedEnumTest, AValueNeedsAList) {
-  EXPECT_EQ(ZELOSchedEnumToName(nullptr, 0), nullptr);
-  expectBadArgument("((void *)0) != enum_list");
+TEST_F(SchedEnumTest, AnArgumentThatIsMissingIsRefusedInTheOrderOfTheChecks) {
+  expectRefused(
+      "sched_enum.cpp",
+      {{"((void *)0) != enum_list",
+        [] { return ZELOSchedEnumToName(nullptr, 0) == nullptr ? -1 : 0; }},
+       {"((void *)0) != enum_list", [] { return ZELOSchedEnumToValue(nullptr, "enabled"); }},
+       {"((void *)0) != enum_list", [] { return ZELOSchedEnumToValue(nullptr, nullptr); }},
+       {"NULL != szName", [] { return ZELOSchedEnumToValue(kStates, nullptr); }}});
 }
 
 // ---- name to value
@@ -108,21 +108,6 @@ TEST_F(SchedEnumTest, APartOfANameIsNotFound) {
   EXPECT_EQ(ZELOSchedEnumToValue(kStates, "enable"), -1);
   EXPECT_EQ(ZELOSchedEnumToValue(kStates, "enabled "), -1);
   expectNotFoundInSilence();
-}
-
-TEST_F(SchedEnumTest, ANameNeedsAList) {
-  EXPECT_EQ(ZELOSchedEnumToValue(nullptr, "enabled"), -1);
-  expectBadArgument("((void *)0) != enum_list");
-}
-
-TEST_F(SchedEnumTest, TheListIsLookedAtBeforeTheName) {
-  EXPECT_EQ(ZELOSchedEnumToValue(nullptr, nullptr), -1);
-  expectBadArgument("((void *)0) != enum_list");
-}
-
-TEST_F(SchedEnumTest, AListNeedsAName) {
-  EXPECT_EQ(ZELOSchedEnumToValue(kStates, nullptr), -1);
-  expectBadArgument("NULL != szName");
 }
 
 // ---- on/off characters to names

@@ -12,17 +12,15 @@
 #include "sandbox_fixture.h"
 #include "zelosched.h"
 
+namespace support {
 namespace {
 
-using support::errorRecord;
-using support::ErrorRecord;
-using support::logged;
 using Lines = std::vector<std::string>;
 
 constexpr int kInBlock = 64;
 constexpr int kMany = 500;
 
-class ListRecordsTest : public support::SandboxTest {
+class ListRecordsTest : public SandboxTest {
  protected:
   static void storeTasks(int count) {
     std::string text;
@@ -33,7 +31,7 @@ class ListRecordsTest : public support::SandboxTest {
               "\napp=a\napp name=b\naction=c\ncmd=\nstate=enabled\n"
               "type=daily\n";
     }
-    support::writeFile(support::kStore, text);
+    writeFile(kStore, text);
   }
 
   static std::vector<ZELO_SCHED_TASK *> listed(ZELO_SCHED_TASK_FILTER filter = nullptr) {
@@ -152,14 +150,14 @@ TEST_F(ListRecordsTest, AFilterMayKeepAListOfItsOwnWhileNothingIsKeptOfTheOuterO
 }
 
 TEST_F(ListRecordsTest, WithoutRoomForABlockRecordsAreTakenOneByOne) {
-  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
   for (const int count : {2, kInBlock + 1, kMany}) {
     SCOPED_TRACE(count);
     storeTasks(count);
     std::vector<ZELO_SCHED_TASK *> tasks;
     {
-      const support::FailingAllocation scope(
-          "calloc", {.times = support::kAlways, .minSize = 2 * sizeof(ZELO_SCHED_TASK)});
+      const FailingAllocation scope("calloc",
+                                    {.times = kAlways, .minSize = 2 * sizeof(ZELO_SCHED_TASK)});
       tasks = listed();
     }
     EXPECT_EQ(idsOf(tasks).size(), static_cast<size_t>(count));
@@ -169,13 +167,13 @@ TEST_F(ListRecordsTest, WithoutRoomForABlockRecordsAreTakenOneByOne) {
 }
 
 TEST_F(ListRecordsTest, WithoutRoomForARecordEitherTheListFails) {
-  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
   storeTasks(kMany);
   ASSERT_EQ(ZELOSchedBackendInit(), 0);
   ZELO_SCHED_TASK *head = nullptr;
   // Two blocks, then neither a block nor a record.
-  const support::FailingAllocation scope(
-      "calloc", {.from = 3, .times = support::kAlways, .minSize = sizeof(ZELO_SCHED_TASK)});
+  const FailingAllocation scope("calloc",
+                                {.from = 3, .times = kAlways, .minSize = sizeof(ZELO_SCHED_TASK)});
   EXPECT_EQ(SchedBackends[0].list_get(&head, nullptr), -1);
   EXPECT_EQ(head, nullptr);
   EXPECT_EQ(logged(), Lines{"backend_zeloschedule.cpp:N malloc ZELO_SCHED_TASK failed. key:[129]"});
@@ -183,7 +181,7 @@ TEST_F(ListRecordsTest, WithoutRoomForARecordEitherTheListFails) {
 }
 
 TEST_F(ListRecordsTest, NoMoreIsTakenThanTheRecordsFill) {
-  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
   for (const int count : {2, kInBlock, kInBlock + 1, 300, kMany}) {
     SCOPED_TRACE(count);
     storeTasks(count);
@@ -199,7 +197,7 @@ TEST_F(ListRecordsTest, NoMoreIsTakenThanTheRecordsFill) {
 }
 
 TEST_F(ListRecordsTest, ARecordThatIsKeptKeepsNoMoreThanItsBlock) {
-  if (!support::kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
+  if (!kAllocationsCanFail) GTEST_SKIP() << "the sanitizer has its own allocator";
   storeTasks(kMany);
   freeAll(listed());
   const size_t before = heapInUse();
@@ -215,18 +213,18 @@ TEST_F(ListRecordsTest, ARecordThatIsKeptKeepsNoMoreThanItsBlock) {
 // The library sorts by a number in the order of the records in memory.
 TEST_F(ListRecordsTest, TheCrontabHasEachTaskWithItsOwnTimeInTheOrderOfTheStore) {
   for (const int count : {1, 2, kInBlock, kInBlock + 1, kMany, 10000}) {
-    if (!support::kAllocationsCanFail && count > kMany)
+    if (!kAllocationsCanFail && count > kMany)
       continue;  // the sanitizer's calloc touches all memory
     SCOPED_TRACE(count);
     storeTasks(count);
-    support::writeFile(support::kCrontab, "");
+    writeFile(kCrontab, "");
     EXPECT_EQ(ZELOSchedTaskSync(), 0);
     std::string wanted;
     for (int id = 1; id <= count; ++id) {
       wanted += std::to_string(id % 60) + "\t" + std::to_string(id % 24) +
                 "\t*\t*\t*\troot\t/tmp/zeloschedtask --run id=" + std::to_string(id) + "\n";
     }
-    EXPECT_TRUE(support::readFile(support::kCrontab) == wanted);
+    EXPECT_TRUE(readFile(kCrontab) == wanted);
   }
 }
 
@@ -240,3 +238,4 @@ TEST_F(ListRecordsTest, TheNextIdAfterThousandsIsFound) {
 }
 
 }  // namespace
+}  // namespace support

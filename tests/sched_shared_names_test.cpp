@@ -18,21 +18,9 @@
 #include "failing_calls.h"
 #include "sandbox_fixture.h"
 
+namespace support {
 namespace {
 
-using support::beforeEachCall;
-using support::callCount;
-using support::failCall;
-using support::failCallFor;
-using support::fileExists;
-using support::kAlways;
-using support::kLockDirectory;
-using support::kStore;
-using support::kTaskProgram;
-using support::logged;
-using support::movedAway;
-using support::readFile;
-using support::writeFile;
 using Lines = std::vector<std::string>;
 
 constexpr char kNoTasks[] = "# The scheduler's tasks.\n";
@@ -58,14 +46,14 @@ const char *whyForeign(const SchedSharedName &name) {
   return schedLookAt(name, &why) == SchedNameState::kForeign ? why : "";
 }
 
-class SharedNamesTest : public support::SandboxTest {
+class SharedNamesTest : public SandboxTest {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
     forget();
   }
   void TearDown() override {
-    support::resetFailingCalls();
+    resetFailingCalls();
     forget();
     SandboxTest::TearDown();
   }
@@ -83,12 +71,12 @@ class SharedNamesTest : public support::SandboxTest {
 
   // A file that others can write counts as foreign, whoever owns it.
   static void plantFile(const SchedSharedName &name, const std::string &contents = "foreign") {
-    const support::OwnWork own;
+    const OwnWork own;
     std::filesystem::remove_all(name.path);
     writeFile(name.path, contents, kWritableByAll);
   }
   static void plantOurs(const SchedSharedName &name, const std::string &contents) {
-    const support::OwnWork own;
+    const OwnWork own;
     std::filesystem::remove_all(name.path);
     writeFile(name.path, contents, name.mode);
   }
@@ -223,7 +211,7 @@ TEST_F(SharedNamesTest, WithoutADirectoryOfItsOwnNothingIsReplaced) {
 
 TEST_F(SharedNamesTest, AFreeNameThatCannotBeTakenStaysFree) {
   for (const char *call : {"mkdtemp", "open", "write", "fchmod", "close", "renameat2"}) {
-    support::resetFailingCalls();
+    resetFailingCalls();
     failCall(call, {.error = EIO});
     EXPECT_FALSE(schedTakeName(kSchedTaskProgram)) << call;
     EXPECT_EQ(errno, EIO) << call;
@@ -231,13 +219,13 @@ TEST_F(SharedNamesTest, AFreeNameThatCannotBeTakenStaysFree) {
     EXPECT_EQ(directoriesOfOurs(), 0U) << call;
   }
   for (const char *call : {"open", "fchmod", "close"}) {
-    support::resetFailingCalls();
+    resetFailingCalls();
     failCall(call, {.error = EIO});
     EXPECT_FALSE(schedTakeName(kSchedDatabase)) << call;
     std::filesystem::remove(kSchedDatabase.path);
   }
   for (const char *call : {"mkdir", "chmod"}) {
-    support::resetFailingCalls();
+    resetFailingCalls();
     failCall(call, {.error = EIO});
     EXPECT_FALSE(schedTakeName(kSchedLockDirectory)) << call;
     std::filesystem::remove(kLockDirectory);
@@ -384,7 +372,7 @@ TEST_F(SharedNamesTest, ANameThatBecomesFreeMeanwhileIsTaken) {
 // The file is gone when it is to be exchanged, and there again when the name is to be taken.
 TEST_F(SharedNamesTest, ANameThatIsNowFreeAndNowTakenIsTriedForAWhile) {
   for (const unsigned rounds : {3U, 2 * kTries}) {
-    support::resetFailingCalls();
+    resetFailingCalls();
     plantFile(kSchedStore);
     unsigned calls = 0;
     beforeEachCall([&](const std::string &call) {
@@ -483,3 +471,4 @@ TEST_F(SharedNamesTest, OthersTakeNoNameThatTheyDoNotNeedAndReplaceNone) {
 }
 
 }  // namespace
+}  // namespace support

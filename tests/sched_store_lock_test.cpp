@@ -18,19 +18,9 @@
 #include "failing_calls.h"
 #include "sandbox_fixture.h"
 
+namespace support {
 namespace {
 
-using support::callCount;
-using support::ErrorRecord;
-using support::errorRecord;
-using support::failCall;
-using support::failCallFor;
-using support::fileExists;
-using support::kAlways;
-using support::logged;
-using support::readFile;
-using support::recordedSleeps;
-using support::writeFile;
 using Lines = std::vector<std::string>;
 
 constexpr char kLock[] = "/run/zeloscheduler.lock";
@@ -39,20 +29,20 @@ pid_t heldBy() {
   return schedLockHolder(kLock);
 }
 
-class StoreLockTest : public support::SandboxTest {
+class StoreLockTest : public SandboxTest {
  protected:
   void SetUp() override {
     SandboxTest::SetUp();
     std::filesystem::remove_all(kLock);
   }
   void TearDown() override {
-    support::resetFailingCalls();
+    resetFailingCalls();
     std::filesystem::remove_all(kLock);
     SandboxTest::TearDown();
   }
 
   static void removeItBeforeTheFirst(const std::string &wanted) {
-    support::beforeEachCall([wanted, isDone = false](const std::string &call) mutable {
+    beforeEachCall([wanted, isDone = false](const std::string &call) mutable {
       if (isDone || call != wanted) return;
       isDone = true;
       std::filesystem::remove(kLock);
@@ -144,7 +134,7 @@ TEST_F(StoreLockTest, AFileThatWasRemovedIsMadeAndLockedAnew) {
 
 TEST_F(StoreLockTest, AFileThatCannotBeExaminedIsLockedAnew) {
   for (const unsigned from : {1U, 2U}) {
-    support::resetFailingCalls();
+    resetFailingCalls();
     failCall("statx", {.from = from, .error = EIO});
     const StoreLock lock;
     EXPECT_TRUE(lock.isHeld());
@@ -171,3 +161,4 @@ TEST_F(StoreLockTest, AfterThirtySecondsTheHolderIsToldAndNothingIsHeld) {
 }
 
 }  // namespace
+}  // namespace support

@@ -7,6 +7,7 @@
 
 #include "captured_log.h"
 #include "failing_calls.h"
+#include "refused_arguments.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
 #include "text_hash.h"
@@ -155,12 +156,6 @@ class SchedTaskConvertTest : public SandboxTest {
   }
 };
 
-void expectBadArgument(const std::string &condition) {
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "sched_task_convert.cpp"}));
-  EXPECT_EQ(logged(), Lines{"sched_task_convert.cpp:N Invaild Argument (" + condition + ")=[0]\n"});
-  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
-}
-
 void expectLine(const std::string &line) {
   EXPECT_EQ(logged(), Lines{"sched_task_convert.cpp:N " + line});
   EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
@@ -291,31 +286,22 @@ TEST_F(SchedTaskConvertTest, TheLongestCommandIsEncodedWhole) {
   EXPECT_EQ(encoded.find('\n'), std::string::npos);
 }
 
-TEST_F(SchedTaskConvertTest, WritingNeedsTheAddressOfAHash) {
-  EXPECT_EQ(ZELOSchedInitHashFromTask(nullptr, plainTask("ls").get()), -1);
-  expectBadArgument("((void *)0) != ppHash");
-}
-
-TEST_F(SchedTaskConvertTest, WritingNeedsAHash) {
+TEST_F(SchedTaskConvertTest, AnArgumentThatIsMissingIsRefusedInTheOrderOfTheChecks) {
+  const Task task = plainTask("ls");
   PSZHASH none = nullptr;
-  EXPECT_EQ(ZELOSchedInitHashFromTask(&none, plainTask("ls").get()), -1);
-  expectBadArgument("((void *)0) != *ppHash");
-}
-
-TEST_F(SchedTaskConvertTest, WritingNeedsATaskAndLeavesTheHashWithoutOne) {
   TextHash hash(Entries{{"kept", "x"}});
-  EXPECT_EQ(ZELOSchedInitHashFromTask(hash.handle(), nullptr), -1);
-  expectBadArgument("NULL != pTask");
+  const TextHash whole(kDefaultsWithLs);
+  expectRefused(
+      "sched_task_convert.cpp",
+      {{"((void *)0) != ppHash", [&] { return ZELOSchedInitHashFromTask(nullptr, task.get()); }},
+       {"((void *)0) != *ppHash", [&] { return ZELOSchedInitHashFromTask(&none, task.get()); }},
+       {"NULL != pTask", [&] { return ZELOSchedInitHashFromTask(hash.handle(), nullptr); }},
+       {"((void *)0) != ppHash", [] { return ZELOSchedInitHashFromTask(nullptr, nullptr); }},
+       {"((void *)0) != *ppHash", [&] { return ZELOSchedInitHashFromTask(&none, nullptr); }},
+       {"((void *)0) != pHash", [&] { return ZELOSchedInitTaskFromHash(task.get(), nullptr); }},
+       {"NULL != pTask", [&] { return ZELOSchedInitTaskFromHash(nullptr, whole.get()); }},
+       {"((void *)0) != pHash", [] { return ZELOSchedInitTaskFromHash(nullptr, nullptr); }}});
   EXPECT_EQ(hash.entries(), (Entries{{"kept", "x"}}));
-}
-
-TEST_F(SchedTaskConvertTest, WritingLooksAtTheAddressThenTheHashThenTheTask) {
-  EXPECT_EQ(ZELOSchedInitHashFromTask(nullptr, nullptr), -1);
-  expectBadArgument("((void *)0) != ppHash");
-  clearLog();
-  PSZHASH none = nullptr;
-  EXPECT_EQ(ZELOSchedInitHashFromTask(&none, nullptr), -1);
-  expectBadArgument("((void *)0) != *ppHash");
 }
 
 TEST_F(SchedTaskConvertTest, AKeyThatCannotBeSetEndsTheWritingAfterTheKeysBeforeIt) {
@@ -379,7 +365,9 @@ TEST_F(SchedTaskConvertTest, AHandleThatIsGoneBeforeTheLineFeedPassIsReportedBut
   failCallFor("QLIBCSzHashSetValue", "cmd", {.from = 2, .result = 0, .code = 0x1234});
   onErrorSet = [] { *watchedHandle = nullptr; };
   EXPECT_EQ(ZELOSchedInitHashFromTask(&handle, plainTask("ls").get()), 0);
-  expectBadArgument("NULL != *ppHash");
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "sched_task_convert.cpp"}));
+  EXPECT_EQ(logged(), Lines{"sched_task_convert.cpp:N Invaild Argument (NULL != *ppHash)=[0]\n"});
+  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
 }
 
 // ---- hash to task
@@ -631,21 +619,6 @@ TEST_F(SchedTaskConvertTest, ACommandThatCannotBeDecodedFailsTheRead) {
   EXPECT_EQ(read(kDefaultsWithLs, plainTask("")), -1);
   expectLine("Base64 decoding failed. [bHM=] " + kInjectedTail);
   EXPECT_EQ(errorRecord(), kInjectedError);
-}
-
-TEST_F(SchedTaskConvertTest, ReadingNeedsAHash) {
-  EXPECT_EQ(ZELOSchedInitTaskFromHash(plainTask("").get(), nullptr), -1);
-  expectBadArgument("((void *)0) != pHash");
-}
-
-TEST_F(SchedTaskConvertTest, ReadingNeedsATask) {
-  EXPECT_EQ(ZELOSchedInitTaskFromHash(nullptr, TextHash(kDefaultsWithLs).get()), -1);
-  expectBadArgument("NULL != pTask");
-}
-
-TEST_F(SchedTaskConvertTest, ReadingLooksAtTheHashFirst) {
-  EXPECT_EQ(ZELOSchedInitTaskFromHash(nullptr, nullptr), -1);
-  expectBadArgument("((void *)0) != pHash");
 }
 
 }  // namespace

@@ -11,6 +11,7 @@
 
 #include "captured_log.h"
 #include "failing_calls.h"
+#include "refused_arguments.h"
 #include "sandbox_fixture.h"
 #include "tasks.h"
 
@@ -85,13 +86,6 @@ class SchedTaskListSortTest : public SandboxTest {
   std::unique_ptr<ZELO_SCHED_TASK[]> tasks_;
   ZELO_SCHED_TASK *head_ = nullptr;
 };
-
-void expectBadArgument(const std::string &condition) {
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "sched_task_list_sort.cpp"}));
-  EXPECT_EQ(logged(),
-            Lines{"sched_task_list_sort.cpp:N Invaild Argument (" + condition + ")=[0]\n"});
-  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
-}
 
 void expectSilence() {
   EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
@@ -229,29 +223,15 @@ TEST_F(SchedTaskListSortTest, AnEmptyListIsSortedByKey) {
   expectSilence();
 }
 
-TEST_F(SchedTaskListSortTest, AnEmptyListIsRefusedByIndex) {
-  EXPECT_EQ(ZELOSchedTaskListSortEx(&head_, kRowOfName, kAscending), -1);
-  expectBadArgument("NULL != *pTaskList");
-}
-
-TEST_F(SchedTaskListSortTest, ASortNeedsAList) {
-  EXPECT_EQ(ZELOSchedTaskListSort(nullptr, "name", kAscending), -1);
-  expectBadArgument("((void *)0) != pTaskList");
-}
-
-TEST_F(SchedTaskListSortTest, TheListIsLookedAtBeforeTheKey) {
-  EXPECT_EQ(ZELOSchedTaskListSort(nullptr, nullptr, kAscending), -1);
-  expectBadArgument("((void *)0) != pTaskList");
-}
-
-TEST_F(SchedTaskListSortTest, ASortNeedsAKeyEvenForAnEmptyList) {
-  EXPECT_EQ(ZELOSchedTaskListSort(&head_, nullptr, kAscending), -1);
-  expectBadArgument("NULL != szKey");
-}
-
-TEST_F(SchedTaskListSortTest, ASortByIndexNeedsAListToo) {
-  EXPECT_EQ(ZELOSchedTaskListSortEx(nullptr, kRowOfName, kAscending), -1);
-  expectBadArgument("((void *)0) != pTaskList");
+TEST_F(SchedTaskListSortTest, AnArgumentThatIsMissingIsRefusedInTheOrderOfTheChecks) {
+  expectRefused(
+      "sched_task_list_sort.cpp",
+      {{"NULL != *pTaskList", [&] { return ZELOSchedTaskListSortEx(&head_, kRowOfName, 1); }},
+       {"((void *)0) != pTaskList", [] { return ZELOSchedTaskListSort(nullptr, "name", 1); }},
+       {"((void *)0) != pTaskList", [] { return ZELOSchedTaskListSort(nullptr, nullptr, 1); }},
+       {"NULL != szKey", [&] { return ZELOSchedTaskListSort(&head_, nullptr, 1); }},
+       {"((void *)0) != pTaskList",
+        [] { return ZELOSchedTaskListSortEx(nullptr, kRowOfName, 1); }}});
 }
 
 TEST_F(SchedTaskListSortTest, WithoutMemoryTheListStaysAsItWas) {

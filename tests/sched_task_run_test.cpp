@@ -13,6 +13,7 @@
 #include <cstring>
 #include <filesystem>
 #include <functional>
+#include <optional>
 
 #include "captured_log.h"
 #include "failing_calls.h"
@@ -48,6 +49,16 @@ std::string runLine(const std::string &text) {
   return "sched_task_run.cpp:N " + text;
 }
 
+std::string lockFailed(int retry, int seconds) {
+  return runLine("Lock failed (retry=" + std::to_string(retry) + "), sleep " +
+                 std::to_string(seconds) + " secs.");
+}
+
+std::string conflict(long other, int retry, int seconds) {
+  return runLine("Task 1 conflict with task " + std::to_string(other) + " (running), retry = " +
+                 std::to_string(retry) + ", wait " + std::to_string(seconds) + " secs.");
+}
+
 // What the child saw.
 SharedLines &seen() {
   static SharedLines lines(size_t{1} << 20);
@@ -69,6 +80,12 @@ mode_t modeOf(const char *path) {
   return stat(path, &info) == 0 ? info.st_mode & kPermissions : 0;
 }
 
+// The lock file, whose directory there is now.
+const char *inLockDirectory() {
+  mkdir(kLockDirectory, 0755);
+  return kLockFile;
+}
+
 // 0 when nobody holds the run lock, EWOULDBLOCK when someone does.
 int tryRunLock() {
   const int descriptor = open(kLockFile, O_RDONLY | O_CLOEXEC);
@@ -76,13 +93,6 @@ int tryRunLock() {
   const int error = flock(descriptor, LOCK_EX | LOCK_NB) == 0 ? 0 : errno;
   close(descriptor);
   return error;
-}
-
-pid_t deadProcess() {
-  const pid_t pid = fork();
-  if (pid == 0) _exit(0);
-  waitpid(pid, nullptr, 0);
-  return pid;
 }
 
 StatusRow runningRow(long taskId, const std::string &app, pid_t pid = getpid()) {
@@ -96,6 +106,11 @@ class TaskRunTest : public UsersTest {
     ASSERT_EQ(ZELOSchedBackendInit(), 0);
     std::copy(std::begin(SchedBackends), std::end(SchedBackends), backends_);
     backendCount_ = cBackend;
+    startAnew();
+  }
+
+  static void startAnew() {
+    cleanWorld();
     seen().clear();
     std::remove(kRanFile);
   }
@@ -474,7 +489,7 @@ TEST_F(TaskRunTest, TheLockDirectoryIsTheOwnersAloneUntilItIsComplete) {
   runToEnd(id);
   umask(mask);
   EXPECT_EQ(modeOf(kLockDirectory), 0700U);
-  EXPECT_EQ(logged(), Lines{runLine("Lock failed (retry=1), sleep 3 secs.")});
+  EXPECT_EQ(logged(), Lines{lockFailed(1, 3)});
   EXPECT_TRUE(ran());
 }
 
@@ -500,8 +515,7 @@ TEST_F(TaskRunTest, ALockDirectoryThatCannotBeMadeIsTriedAgainLater) {
   setRandValues({7, 19});
   failCall("mkdir", {.times = 2, .error = EACCES});
   runToEnd(id);
-  EXPECT_EQ(logged(), (Lines{runLine("Lock failed (retry=1), sleep 24 secs."),
-                             runLine("Lock failed (retry=2), sleep 30 secs.")}));
+  EXPECT_EQ(logged(), (Lines{lockFailed(1, 24), lockFailed(2, 30)}));
   EXPECT_EQ(loggedPriorities(), (std::vector<int>{3, 3}));
   EXPECT_EQ(recordedSleeps(), (std::vector<long>{24 * kMicroseconds, 30 * kMicroseconds}));
   EXPECT_TRUE(ran());
@@ -515,7 +529,7 @@ TEST_F(TaskRunTest, ARunThatLosesTheRaceForTheLockDirectoryComesBackAndFindsIt) 
   failCallFor("mkdir", kLockDirectory, {.error = EEXIST});
   onSleep([](size_t) { std::filesystem::create_directory(kLockDirectory); });
   runToEnd(id);
-  EXPECT_EQ(logged(), Lines{runLine("Lock failed (retry=1), sleep 3 secs.")});
+  EXPECT_EQ(logged(), Lines{lockFailed(1, 3)});
   EXPECT_EQ(recordedSleeps(), std::vector<long>{3 * kMicroseconds});
   EXPECT_TRUE(ran());
   EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_FINISHED);
@@ -540,7 +554,7 @@ TEST_F(TaskRunTest, ARunGivesUpAfterTwentyRetriesOfTheLockAndLeavesNoRow) {
   runToEnd(id);
   Lines wanted;
   for (int retry = 1; retry <= kMostRetries; ++retry) {
-    wanted.push_back(runLine("Lock failed (retry=" + std::to_string(retry) + "), sleep 3 secs."));
+    wanted.push_back(lockFailed(retry, 3));
   }
   EXPECT_EQ(logged(), wanted);
   EXPECT_EQ(recordedSleeps("sleep").size(), size_t{kMostRetries});
@@ -552,37 +566,18 @@ TEST_F(TaskRunTest, ARunGivesUpAfterTwentyRetriesOfTheLockAndLeavesNoRow) {
 TEST_F(TaskRunTest, WhateverStandsInTheWayOfTheLockIsMovedAway) {
   const std::pair<const char *, std::function<void()>> obstacles[] = {
       {"a file where the directory is to be", [] { writeFile(kLockDirectory, ""); }},
-      {"a directory where the file is to be",
-       [] {
-         mkdir(kLockDirectory, 0755);
-         mkdir(kLockFile, 0755);
-       }},
+      {"a directory", [] { std::filesystem::create_directories(kLockFile); }},
       {"a link to something that is not there",
-       [] {
-         mkdir(kLockDirectory, 0755);
-         EXPECT_EQ(symlink("/tmp/run_test.victim", kLockFile), 0);
-       }},
+       [] { std::filesystem::create_symlink("/tmp/run_test.victim", inLockDirectory()); }},
       {"a link to a file",
-       [] {
-         mkdir(kLockDirectory, 0755);
-         EXPECT_EQ(symlink("/etc/passwd", kLockFile), 0);
-       }},
-      {"a FIFO",
-       [] {
-         mkdir(kLockDirectory, 0755);
-         EXPECT_EQ(mkfifo(kLockFile, 0644), 0);
-       }},
+       [] { std::filesystem::create_symlink("/etc/passwd", inLockDirectory()); }},
+      {"a FIFO", [] { EXPECT_EQ(mkfifo(inLockDirectory(), 0644), 0); }},
       {"a file with a second name",
        [] {
-         mkdir(kLockDirectory, 0755);
          writeFile(kLockFile, "", 0600);
          EXPECT_EQ(link(kLockFile, "/tmp/lock/other"), 0);
        }},
-      {"a file that others can write",
-       [] {
-         mkdir(kLockDirectory, 0755);
-         writeFile(kLockFile, "", 0666);
-       }},
+      {"a file that others can write", [] { writeFile(kLockFile, "", 0666); }},
   };
   for (const auto &[what, make] : obstacles) {
     SCOPED_TRACE(what);
@@ -631,7 +626,7 @@ TEST_F(TaskRunTest, ALockOfSomebodyElseIsNotWaitedFor) {
     runToEnd(id);
     close(descriptor);
     EXPECT_EQ(recordedSleeps(), std::vector<long>{});
-    EXPECT_NE(support::movedAway(path), "");
+    EXPECT_NE(movedAway(path), "");
     EXPECT_TRUE(ran());
   }
 }
@@ -645,7 +640,7 @@ TEST_F(TaskRunTest, ALinkOfSomebodyElseToADirectoryIsNotFollowed) {
   ASSERT_EQ(lchown(kLockDirectory, 65534, 65534), 0);
   runToEnd(saveRanTask());
   EXPECT_TRUE(std::filesystem::is_empty(target));
-  EXPECT_TRUE(std::filesystem::is_symlink(support::movedAway(kLockDirectory)));
+  EXPECT_TRUE(std::filesystem::is_symlink(movedAway(kLockDirectory)));
   EXPECT_TRUE(ran());
   std::filesystem::remove_all(target);
 }
@@ -666,7 +661,7 @@ TEST_F(TaskRunTest, ALockFileThatCannotBeOpenedIsTried101Times) {
   onSleep([](size_t) { see("code", QLIBCErrGet()); });
   runToEnd(id);
   EXPECT_EQ(recordedSleeps("usleep"), std::vector<long>(kLockTries, kLockPause));
-  EXPECT_EQ(logged(), Lines{runLine("Lock failed (retry=1), sleep 3 secs.")});
+  EXPECT_EQ(logged(), Lines{lockFailed(1, 3)});
   Lines codes(kLockTries, "code 0");
   codes.push_back("code " + std::to_string(0x0400));
   EXPECT_EQ(seen().texts(), codes);
@@ -691,7 +686,7 @@ TEST_F(TaskRunTest, ALockThatIsRefusedIsTried101TimesWithoutAPause) {
   runToEnd(id);
   EXPECT_EQ(recordedSleeps(), std::vector<long>{3 * kMicroseconds});
   EXPECT_EQ(callCount("flock"), 2U * kLockTries + 2);
-  EXPECT_EQ(logged(), Lines{runLine("Lock failed (retry=1), sleep 3 secs.")});
+  EXPECT_EQ(logged(), Lines{lockFailed(1, 3)});
   EXPECT_EQ(seen().texts(), Lines{"code " + std::to_string(0x0400)});
   EXPECT_TRUE(ran());
 }
@@ -780,9 +775,7 @@ TEST_F(TaskRunTest, ALiveRunOfTheSameTaskIsWaitedFor) {
     sqlite3_close(db);
   });
   runToEnd(id);
-  EXPECT_EQ(logged(),
-            (Lines{runLine("Task 1 conflict with task 1 (running), retry = 1, wait 9 secs."),
-                   runLine("Task 1 conflict with task 1 (running), retry = 2, wait 18 secs.")}));
+  EXPECT_EQ(logged(), (Lines{conflict(1, 1, 9), conflict(1, 2, 18)}));
   EXPECT_EQ(loggedPriorities(), (std::vector<int>{3, 3}));
   EXPECT_EQ(recordedSleeps(), (std::vector<long>{9 * kMicroseconds, 18 * kMicroseconds}));
   const std::vector<StatusRow> rows = statusRows();
@@ -791,67 +784,49 @@ TEST_F(TaskRunTest, ALiveRunOfTheSameTaskIsWaitedFor) {
   EXPECT_TRUE(ran());
 }
 
-TEST_F(TaskRunTest, ALiveRunOfTheSameApplicationIsWaitedFor) {
-  const Task task = makeTask("task", kRanCommand);
-  task->CanRunTaskSameTime = 1;
-  task->CanRunAppSameTime = 0;
-  const long id = save(task);
-  addStatusRow(runningRow(99, task->App));
-  setRandValues({0});
-  runToEnd(id);
-  const Lines lines = logged();
-  ASSERT_EQ(lines.size(), size_t{kMostRetries});
-  EXPECT_EQ(lines[0], runLine("Task 1 conflict with task 99 (running), retry = 1, wait 3 secs."));
-  expectNothingRan();
-}
-
-TEST_F(TaskRunTest, TheSameTaskIsAskedBeforeTheSameApplication) {
-  const Task task = makeTask("task", kRanCommand);
-  task->CanRunAppSameTime = 0;
-  const long id = save(task);
-  addStatusRow(runningRow(99, task->App));
-  addStatusRow(runningRow(id, "other"));
-  setRandValues({0});
-  runToEnd(id);
-  ASSERT_FALSE(logged().empty());
-  EXPECT_EQ(logged()[0], runLine("Task 1 conflict with task 1 (running), retry = 1, wait 3 secs."));
-}
-
-TEST_F(TaskRunTest, WithoutAConflictOfTheTaskTheApplicationIsAskedToo) {
-  const Task task = makeTask("task", kRanCommand);
-  task->CanRunAppSameTime = 0;
-  const long id = save(task);
-  addStatusRow(runningRow(99, task->App));
-  setRandValues({0});
-  runToEnd(id);
-  ASSERT_FALSE(logged().empty());
-  EXPECT_EQ(logged()[0],
-            runLine("Task 1 conflict with task 99 (running), retry = 1, wait 3 secs."));
-}
-
-TEST_F(TaskRunTest, ATaskThatMayOverlapItselfDoesNotWaitForItself) {
-  const Task task = makeTask("task", kRanCommand);
-  task->CanRunTaskSameTime = 1;
-  const long id = save(task);
-  addStatusRow(runningRow(id, task->App));
-  runToEnd(id);
-  EXPECT_TRUE(ran());
-  EXPECT_EQ(logged(), Lines{});
-}
-
-TEST_F(TaskRunTest, WhatDoesNotRunOrIsAnothersIsNoConflict) {
-  const Task task = makeTask("task", kRanCommand);
-  task->CanRunAppSameTime = 0;
-  const long id = save(task);
-  addStatusRow(runningRow(id, task->App, deadProcess()));
-  StatusRow finished = runningRow(id, task->App);
+TEST_F(TaskRunTest, ATaskWaitsForItselfAndThenForItsApplicationUnlessItMayOverlap) {
+  const std::string app = makeTask("task", "")->App;
+  const StatusRow itself = runningRow(1, "other");
+  const StatusRow ofItsApp = runningRow(99, app);
+  StatusRow finished = runningRow(1, app);
   finished.statusCode = ZELO_SCHED_STATUS_FINISHED;
-  addStatusRow(finished);
-  addStatusRow(runningRow(99, "other"));
-  runToEnd(id);
-  EXPECT_TRUE(ran());
-  EXPECT_EQ(logged(), Lines{});
-  EXPECT_EQ(statusRows().size(), 4U);
+  struct {
+    const char *what;
+    int32_t mayOverlapItself;
+    int32_t mayOverlapItsApp;
+    std::vector<StatusRow> rows;
+    std::optional<long> other;  // the task that it waits for
+  } cases[] = {
+      {"the application only", 1, 0, {ofItsApp}, 99},
+      {"the task before the application", 0, 0, {ofItsApp, itself}, 1},
+      {"the application where the task does not run", 0, 0, {ofItsApp}, 99},
+      {"neither", 1, 1, {runningRow(1, app)}, {}},
+      {"what does not run or is another's",
+       0,
+       0,
+       {runningRow(1, app, deadProcess()), finished, runningRow(99, "other")},
+       {}},
+  };
+  for (const auto &each : cases) {
+    SCOPED_TRACE(each.what);
+    startAnew();
+    const Task task = makeTask("task", kRanCommand);
+    task->CanRunTaskSameTime = each.mayOverlapItself;
+    task->CanRunAppSameTime = each.mayOverlapItsApp;
+    const long id = save(task);
+    for (const StatusRow &row : each.rows) addStatusRow(row);
+    setRandValues({0});
+    runToEnd(id);
+    if (!each.other) {
+      EXPECT_TRUE(ran());
+      EXPECT_EQ(logged(), Lines{});
+      EXPECT_EQ(statusRows().size(), each.rows.size() + 1);
+    } else {
+      ASSERT_EQ(logged().size(), size_t{kMostRetries});
+      EXPECT_EQ(logged()[0], conflict(*each.other, 1, 3));
+      expectNothingRan();
+    }
+  }
 }
 
 TEST_F(TaskRunTest, TheTwentyFirstConflictEndsTheRunWithoutARow) {
@@ -861,9 +836,7 @@ TEST_F(TaskRunTest, TheTwentyFirstConflictEndsTheRunWithoutARow) {
   runToEnd(id);
   Lines wanted;
   for (int retry = 1; retry <= kMostRetries; ++retry) {
-    wanted.push_back(
-        runLine("Task 1 conflict with task 1 (running), retry = " + std::to_string(retry) +
-                ", wait " + (retry % 2 == 1 ? "3" : "30") + " secs."));
+    wanted.push_back(conflict(1, retry, retry % 2 == 1 ? 3 : 30));
   }
   EXPECT_EQ(logged(), wanted);
   EXPECT_EQ(recordedSleeps().size(), size_t{kMostRetries});
@@ -880,9 +853,9 @@ TEST_F(TaskRunTest, LockFailuresAndConflictsAreCountedTogether) {
   runToEnd(id);
   const Lines lines = logged();
   ASSERT_EQ(lines.size(), size_t{kMostRetries});
-  EXPECT_EQ(lines[4], runLine("Lock failed (retry=5), sleep 3 secs."));
-  EXPECT_EQ(lines[5], runLine("Task 1 conflict with task 1 (running), retry = 6, wait 3 secs."));
-  EXPECT_EQ(lines[19], runLine("Task 1 conflict with task 1 (running), retry = 20, wait 3 secs."));
+  EXPECT_EQ(lines[4], lockFailed(5, 3));
+  EXPECT_EQ(lines[5], conflict(1, 6, 3));
+  EXPECT_EQ(lines[19], conflict(1, 20, 3));
   expectNothingRan();
 }
 
@@ -1191,9 +1164,9 @@ TEST_F(TaskRunTest, ATaskOfTheCallersOwnUserRunsWithoutAUserRecord) {
 
 TEST_F(TaskRunTest, BackendsThatCannotBeRegisteredInTheChildEndTheRun) {
   const long id = saveRanTask();
-  support::failBackendInit(2);
+  failBackendInit(2);
   runToEnd(id);
-  support::failBackendInit(0);
+  failBackendInit(0);
   EXPECT_EQ(logged(), Lines{runLine("Init backend failed. [0x0000 :N]")});
   EXPECT_EQ(finalCode(), ZELO_SCHED_STATUS_RUNNING);
   expectNothingRan();

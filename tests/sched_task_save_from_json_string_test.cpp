@@ -15,19 +15,9 @@
 #include "schedule_cases.h"
 #include "tasks.h"
 
+namespace support {
 namespace {
 
-using support::ErrorRecord;
-using support::errorRecord;
-using support::failCall;
-using support::failCallFor;
-using support::FakeBackends;
-using support::loadTask;
-using support::logged;
-using support::makeTask;
-using support::saveTask;
-using support::setText;
-using support::Task;
 using Lines = std::vector<std::string>;
 using Members = std::vector<std::pair<std::string, std::string>>;
 
@@ -104,7 +94,7 @@ int storedTasks() {
   return count;
 }
 
-class TaskFromJsonTest : public support::SandboxTest {
+class TaskFromJsonTest : public SandboxTest {
  protected:
   static int save(const std::string &text, int create = 0) {
     return ZELOSchedTaskSaveFromJson(text.c_str(), create);
@@ -112,14 +102,14 @@ class TaskFromJsonTest : public support::SandboxTest {
 
   // Refused with that last line, and nothing saved.
   static void expectRefused(const std::string &text, const std::string &lastLine) {
-    support::clearLog();
+    clearLog();
     EXPECT_EQ(save(text), -1);
     ASSERT_FALSE(logged().empty());
     EXPECT_TRUE(logged().back() == kUnit + lastLine) << logged().back().substr(0, 200);
-    for (const int priority : support::loggedPriorities()) EXPECT_EQ(priority, 3);
-    EXPECT_FALSE(support::hasStoredTasks());
-    EXPECT_FALSE(support::fileExists(support::kPersistentStore));
-    EXPECT_EQ(support::crontabLines(), Lines{});
+    for (const int priority : loggedPriorities()) EXPECT_EQ(priority, 3);
+    EXPECT_FALSE(hasStoredTasks());
+    EXPECT_FALSE(fileExists(kPersistentStore));
+    EXPECT_EQ(crontabLines(), Lines{});
   }
   static void expectNotJson(const std::string &text) {
     SCOPED_TRACE(text.substr(0, 100));
@@ -156,14 +146,14 @@ TEST_F(TaskFromJsonTest, ANewTaskIsCreatedAndItsIdGiven) {
   EXPECT_EQ(task->Type, ZELO_SCHED_TYPE_DAILY);
   EXPECT_EQ(task->StartYear, 2012U);
   EXPECT_STREQ(task->Week, "1111111");
-  EXPECT_EQ(support::crontabLines().size(), 1U);
+  EXPECT_EQ(crontabLines().size(), 1U);
 }
 
 TEST_F(TaskFromJsonTest, LookingForTheStoredTaskOfANewOneLeavesALineAndACode) {
   ASSERT_EQ(save(taskText()), 1);
   EXPECT_EQ(logged(), Lines{"sched_task_get.cpp:N No get_by_id backend is found for task [-1] "});
   EXPECT_EQ(errorRecord(), (ErrorRecord{0x2000, "sched_task_get.cpp"}));
-  support::clearLog();
+  clearLog();
   ASSERT_EQ(save(taskText(), 1), 2);
   EXPECT_EQ(logged(), Lines{}) << "with the create flag none is looked for";
 }
@@ -178,16 +168,16 @@ TEST_F(TaskFromJsonTest, WhatWasWrittenOverwritesThatSameTask) {
   setText(task->AppArgs, "{\"quoted\": \"\\\\ \xC3\xA9\xF0\x9F\x98\x80 \t\"}");
   const long id = saveTask(task);
   saveTask(makeTask("other", "ls"));
-  const std::string before = support::readFile(support::kStore);
+  const std::string before = readFile(kStore);
   EXPECT_EQ(save(jsonOf(id)), id);
-  EXPECT_EQ(support::readFile(support::kStore), before);
+  EXPECT_EQ(readFile(kStore), before);
   EXPECT_EQ(storedTasks(), 2);
   EXPECT_EQ(logged(), Lines{});
 }
 
 TEST_F(TaskFromJsonTest, WithTheSameNameAndAppAChangeIsSavedOverTheTask) {
   ASSERT_EQ(save(taskText()), 1);
-  support::clearLog();
+  clearLog();
   EXPECT_EQ(save(taskText({{"id", "1"}, {"run hour", "5"}})), 1);
   EXPECT_EQ(storedTasks(), 1);
   EXPECT_EQ(loadTask(1)->RunHour, 5U);
@@ -235,8 +225,8 @@ TEST_F(TaskFromJsonTest, ATaskOfAnotherBackendIsOverwrittenThere) {
 
 // A listed power task has another name than one that is read by its id; this one is read by its id.
 TEST_F(TaskFromJsonTest, APowerTaskIsOverwrittenInItsPlaceOrBecomesAnOrdinaryTask) {
-  support::haveClock();
-  support::setPowerList(support::kOn, {{1, 127, 5, 7}, {1, 127, 6, 8}});
+  haveClock();
+  setPowerList(kOn, {{1, 127, 5, 7}, {1, 127, 6, 8}});
   constexpr long kFirst = 71270507;
   const std::string text = jsonOf(kFirst);
   EXPECT_NE(text.find(R"("app args":"\"poweron\"\n")"), std::string::npos) << text;
@@ -245,12 +235,12 @@ TEST_F(TaskFromJsonTest, APowerTaskIsOverwrittenInItsPlaceOrBecomesAnOrdinaryTas
   ASSERT_NE(text.find(enabled), std::string::npos) << text;
   changed.replace(text.find(enabled), enabled.size(), R"("state":"\"disabled\"\n")");
   EXPECT_EQ(save(changed), kFirst);
-  EXPECT_EQ(support::powerList(support::kOn), (support::Entries{{0, 127, 5, 7}, {1, 127, 6, 8}}));
-  EXPECT_FALSE(support::hasStoredTasks());
+  EXPECT_EQ(powerList(kOn), (Entries{{0, 127, 5, 7}, {1, 127, 6, 8}}));
+  EXPECT_FALSE(hasStoredTasks());
   EXPECT_EQ(save(text, 1), 1);
   EXPECT_EQ(loadTask(1)->Backend, ZELO_SCHED_BACKEND_SCHEDULE);
   EXPECT_STREQ(loadTask(1)->Command, "");
-  EXPECT_EQ(support::powerList(support::kOn).size(), 2U);
+  EXPECT_EQ(powerList(kOn).size(), 2U);
 }
 
 // Fields that a backend does not fill must not be taken for stored values.
@@ -272,7 +262,7 @@ TEST_F(TaskFromJsonTest, AnEmptyObjectSavesNothingAndGivesTheIdOfANewRecord) {
   EXPECT_EQ(save("{}"), -1);
   EXPECT_EQ(save(" { } \n", 1), -1);
   EXPECT_EQ(logged(), Lines{});
-  EXPECT_FALSE(support::hasStoredTasks());
+  EXPECT_FALSE(hasStoredTasks());
   const FakeBackends fakes(1);  // whose new records have the id 0
   EXPECT_EQ(save("{}"), 0);
 }
@@ -371,12 +361,12 @@ TEST_F(TaskFromJsonTest, AStringThatHoldsNoJsonStringIsRefused) {
 
 TEST_F(TaskFromJsonTest, ABadMemberAfterGoodOnesSavesNothingOverTheStoredTask) {
   ASSERT_EQ(save(taskText()), 1);
-  const std::string before = support::readFile(support::kStore);
+  const std::string before = readFile(kStore);
   std::string text = taskText({{"id", "1"}, {"run hour", "9"}});
   text.pop_back();
   EXPECT_EQ(save(text + ",\"zzz\":1}"), -1);
   EXPECT_EQ(logged().back(), std::string(kUnit) + "save appargs failed");
-  EXPECT_EQ(support::readFile(support::kStore), before);
+  EXPECT_EQ(readFile(kStore), before);
 }
 
 TEST_F(TaskFromJsonTest, DeepNestingIsRefused) {
@@ -441,7 +431,7 @@ TEST_F(TaskFromJsonTest, WhetherFieldsFitIsAskedWithoutATraceInTheErrorRecord) {
   for (const auto &[key, value] : Members{
            {"run hour", "5x"}, {"run hour", "x5"}, {"run hour", "1234567890x"}, {"cmd", "!!"}}) {
     SCOPED_TRACE(key + " " + value);
-    support::clearLog();
+    clearLog();
     EXPECT_EQ(save(taskText({{key, value}}, "id")), -1);
     EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
     EXPECT_EQ(logged().front(),
@@ -517,7 +507,7 @@ TEST_F(TaskFromJsonTest, TheIdThatWasReadStandsInTheLine) {
 // ---- what cron could not read -----------------------------------------------------------------
 
 // The schedule as members of the JSON object.
-Members membersOf(const support::Schedule &schedule) {
+Members membersOf(const Schedule &schedule) {
   constexpr const char *kTypes[] = {"once", "daily", "weekly", "monthly", "yearly"};
   const std::string week(schedule.week.substr(0, schedule.week.find('\0')));
   return {{"type", kTypes[schedule.type]},
@@ -534,8 +524,8 @@ Members membersOf(const support::Schedule &schedule) {
 // If cron cannot read one line, it ignores the whole crontab.
 std::vector<Members> schedules(bool isReadable) {
   std::vector<Members> all;
-  for (const support::ScheduleCase &each : support::scheduleCases()) {
-    if (each.isReadable == isReadable && support::isStorable(each.schedule)) {
+  for (const ScheduleCase &each : scheduleCases()) {
+    if (each.isReadable == isReadable && isStorable(each.schedule)) {
       all.push_back(membersOf(each.schedule));
     }
   }
@@ -552,7 +542,7 @@ TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsRefused) {
       changes.emplace_back("state", state);  // it may be enabled later without another check
       expectRefused(taskText(changes), "hash to task failed, task id=-1");
     }
-    support::clearLog();
+    clearLog();
     EXPECT_EQ(save(taskText(schedule), 1), -1);
     EXPECT_EQ(logged(), Lines{std::string(kUnit) + "hash to task failed, task id=-1"});
   }
@@ -560,14 +550,14 @@ TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsRefused) {
 
 TEST_F(TaskFromJsonTest, AScheduleThatCronCannotReadIsNotSavedOverTheStoredTask) {
   ASSERT_EQ(save(taskText()), 1);
-  const std::string before = support::readFile(support::kStore);
+  const std::string before = readFile(kStore);
   for (Members schedule : schedules(false)) {
     SCOPED_TRACE(objectOf(schedule));
     schedule.emplace_back("id", "1");
     EXPECT_EQ(save(taskText(schedule)), -1);
     EXPECT_EQ(logged().back(), std::string(kUnit) + "hash to task failed, task id=1");
-    EXPECT_EQ(support::readFile(support::kStore), before);
-    EXPECT_EQ(support::crontabLines().size(), 1U);
+    EXPECT_EQ(readFile(kStore), before);
+    EXPECT_EQ(crontabLines().size(), 1U);
   }
 }
 
@@ -585,7 +575,7 @@ TEST_F(TaskFromJsonTest, AWeekOfOneCharacterTakesNoDaysFromTheTaskBeforeIt) {
   };
   ASSERT_EQ(save(weekly("0000010")), 1);
   ASSERT_EQ(save(weekly("0")), 2);
-  const Lines lines = support::crontabLines();  // in the order of the records in memory
+  const Lines lines = crontabLines();  // in the order of the records in memory
   EXPECT_EQ(std::count(lines.begin(), lines.end(),
                        "2\t1\t*\t*\t1,2,3,4,5,6\troot\t/tmp/zeloschedtask --run id=2"),
             1);
@@ -593,15 +583,15 @@ TEST_F(TaskFromJsonTest, AWeekOfOneCharacterTakesNoDaysFromTheTaskBeforeIt) {
 
 // It adds no line to the crontab, and the platform can store it.
 TEST_F(TaskFromJsonTest, APowerTimeWithoutADayIsOverwrittenInItsPlaceButIsNoOrdinaryTask) {
-  support::haveClock();
-  support::setPowerList(support::kOff, {{1, 0, 5, 7}});
+  haveClock();
+  setPowerList(kOff, {{1, 0, 5, 7}});
   constexpr long kId = 90000507;
   const std::string text = jsonOf(kId);
   EXPECT_EQ(save(text), kId);
-  EXPECT_EQ(support::powerList(support::kOff), (support::Entries{{1, 0, 5, 7}}));
+  EXPECT_EQ(powerList(kOff), (Entries{{1, 0, 5, 7}}));
   EXPECT_EQ(save(text, 1), -1);
   EXPECT_EQ(logged().back(), std::string(kUnit) + "hash to task failed, task id=90000507");
-  EXPECT_FALSE(support::hasStoredTasks());
+  EXPECT_FALSE(hasStoredTasks());
 }
 
 // ---- a crontab that is too long -----------------------------------------------------------------
@@ -610,27 +600,26 @@ TEST_F(TaskFromJsonTest, APowerTimeWithoutADayIsOverwrittenInItsPlaceButIsNoOrdi
 constexpr size_t kMostLines = 9800;
 
 size_t linesOfCrontab() {
-  const std::string text = support::readFile(support::kCrontab);
+  const std::string text = readFile(kCrontab);
   return static_cast<size_t>(std::count(text.begin(), text.end(), '\n'));
 }
 
 // Comments count like any other line.
 void fillCrontab(size_t lines, const std::string &end = "") {
-  std::string text = support::readFile(support::kCrontab);
+  std::string text = readFile(kCrontab);
   for (size_t i = linesOfCrontab(); i < lines; ++i) text += "#\n";
-  support::writeFile(support::kCrontab, text + end);
+  writeFile(kCrontab, text + end);
 }
 
 void expectTooLong(const std::string &text, int create, const char *id) {
   SCOPED_TRACE(text);
-  const std::string store =
-      support::hasStoredTasks() ? support::readFile(support::kStore) : std::string();
-  const std::string crontab = support::readFile(support::kCrontab);
+  const std::string store = hasStoredTasks() ? readFile(kStore) : std::string();
+  const std::string crontab = readFile(kCrontab);
   EXPECT_EQ(ZELOSchedTaskSaveFromJson(text.c_str(), create), -1);
   ASSERT_FALSE(logged().empty());
   EXPECT_EQ(logged().back(), kUnit + std::string("hash to task failed, task id=") + id);
-  EXPECT_EQ(support::hasStoredTasks() ? support::readFile(support::kStore) : std::string(), store);
-  EXPECT_TRUE(support::readFile(support::kCrontab) == crontab) << linesOfCrontab();
+  EXPECT_EQ(hasStoredTasks() ? readFile(kStore) : std::string(), store);
+  EXPECT_TRUE(readFile(kCrontab) == crontab) << linesOfCrontab();
 }
 
 TEST_F(TaskFromJsonTest, ALineThatWouldMakeTheCrontabTooLongIsRefused) {
@@ -640,7 +629,7 @@ TEST_F(TaskFromJsonTest, ALineThatWouldMakeTheCrontabTooLongIsRefused) {
   expectTooLong(taskText(), 0, "-1");
   expectTooLong(taskText({{"id", "77"}}), 0, "77");
   expectTooLong(taskText({{"id", "1"}, {"name", "another"}}), 0, "1");
-  support::clearLog();
+  clearLog();
   expectTooLong(jsonOf(1), 1, "1");
   EXPECT_EQ(logged().size(), 1U) << "no stored task is looked for";
 }
@@ -668,8 +657,8 @@ TEST_F(TaskFromJsonTest, InACrontabWithoutRoomWhatAddsNoLineIsSaved) {
 }
 
 TEST_F(TaskFromJsonTest, BesideACrontabWithoutRoomAPowerTimeIsOverwritten) {
-  support::haveClock();
-  support::setPowerList(support::kOn, {{0, 127, 5, 7}});
+  haveClock();
+  setPowerList(kOn, {{0, 127, 5, 7}});
   constexpr long kId = 61270507;
   std::string text = jsonOf(kId);
   const std::string disabled = R"("state":"\"disabled\"\n")";
@@ -677,13 +666,13 @@ TEST_F(TaskFromJsonTest, BesideACrontabWithoutRoomAPowerTimeIsOverwritten) {
   text.replace(text.find(disabled), disabled.size(), R"("state":"\"enabled\"\n")");
   fillCrontab(kMostLines);
   EXPECT_EQ(save(text), kId);
-  EXPECT_EQ(support::powerList(support::kOn), (support::Entries{{1, 127, 5, 7}}));
+  EXPECT_EQ(powerList(kOn), (Entries{{1, 127, 5, 7}}));
   expectTooLong(text, 1, "61270507");
   expectTooLong(text, 0, "61270507");  // whose id is another one by now
 }
 
 TEST_F(TaskFromJsonTest, BesideACrontabThatIsMissingATaskIsSaved) {
-  ASSERT_EQ(std::remove(support::kCrontab), 0);
+  ASSERT_EQ(std::remove(kCrontab), 0);
   EXPECT_EQ(save(taskText()), 1);
 }
 
@@ -694,11 +683,11 @@ TEST_F(TaskFromJsonTest, WhatAProgramSavesHasItsLineWhateverTheLengthOfTheCronta
 }
 
 TEST_F(TaskFromJsonTest, AFailedAllocationOfTheTaskIsReportedWithTheRecord) {
-  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  if (!kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
   const std::string text = taskText();
   int result = 0;
   {
-    support::FailingAllocation scope("calloc", {.minSize = sizeof(ZELO_SCHED_TASK)});
+    FailingAllocation scope("calloc", {.minSize = sizeof(ZELO_SCHED_TASK)});
     result = save(text);
   }
   EXPECT_EQ(result, -1);
@@ -707,10 +696,10 @@ TEST_F(TaskFromJsonTest, AFailedAllocationOfTheTaskIsReportedWithTheRecord) {
 }
 
 TEST_F(TaskFromJsonTest, TheTaskIsAllocatedBeforeTheTextIsRead) {
-  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  if (!kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
   int result = 0;
   {
-    support::FailingAllocation scope("calloc", {.minSize = sizeof(ZELO_SCHED_TASK)});
+    FailingAllocation scope("calloc", {.minSize = sizeof(ZELO_SCHED_TASK)});
     result = save("not JSON");
   }
   EXPECT_EQ(result, -1);
@@ -720,32 +709,32 @@ TEST_F(TaskFromJsonTest, TheTaskIsAllocatedBeforeTheTextIsRead) {
 
 TEST_F(TaskFromJsonTest, AFailedAllocationOfTheHashIsReported) {
   ZELOSchedTaskFree(ZELOSchedTaskAlloc());
-  const unsigned forTheTask = support::callCount("QLIBCSzHashAlloc");
-  support::resetFailingCalls();
+  const unsigned forTheTask = callCount("QLIBCSzHashAlloc");
+  resetFailingCalls();
   for (const std::string &text : {taskText(), std::string("{}")}) {
-    support::resetFailingCalls();
+    resetFailingCalls();
     failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1});
     expectRefused(text, "Out of memory");
     EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
   }
-  support::resetFailingCalls();
-  failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1, .times = support::kAlways});
+  resetFailingCalls();
+  failCall("QLIBCSzHashAlloc", {.from = forTheTask + 1, .times = kAlways});
   expectNotJson("not JSON");
 }
 
 TEST_F(TaskFromJsonTest, AShortageOfMemoryForTheTextIsReported) {
-  if (!support::kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
+  if (!kAllocationsCanFail) GTEST_SKIP() << "allocations do not fail in this build";
   constexpr size_t kLong = size_t{1} << 20;
   const std::string text = taskText({{"no field", std::string(kLong, 'x')}});
   int result = 0;
   {
-    support::FailingAllocation scope("malloc", {.minSize = kLong});
+    FailingAllocation scope("malloc", {.minSize = kLong});
     result = save(text);
   }
   EXPECT_EQ(result, -1);
   EXPECT_EQ(logged(), Lines{std::string(kUnit) + "Out of memory"});
   EXPECT_EQ(errorRecord(), (ErrorRecord{0, ""}));
-  EXPECT_FALSE(support::hasStoredTasks());
+  EXPECT_FALSE(hasStoredTasks());
 }
 
 TEST_F(TaskFromJsonTest, TheHashIsAskedForWithRoomFor512Keys) {
@@ -756,7 +745,7 @@ TEST_F(TaskFromJsonTest, TheHashIsAskedForWithRoomFor512Keys) {
 TEST_F(TaskFromJsonTest, AValueThatCannotBeSetIsReported) {
   failCallFor("QLIBCSzHashSetValue", "no field", {.code = 0x0200});
   expectRefused(taskText({{"no field", "x"}}), "save appargs failed");
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, support::kInjectedFile}));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0200, kInjectedFile}));
 }
 
 TEST_F(TaskFromJsonTest, AFailedCreationIsReportedWithTheId) {
@@ -765,7 +754,7 @@ TEST_F(TaskFromJsonTest, AFailedCreationIsReportedWithTheId) {
   EXPECT_EQ(save(taskText({{"id", "5"}}), 1), -1);
   EXPECT_EQ(logged().back(), std::string(kUnit) + "create task failed, task id=5");
   EXPECT_EQ(fakes.calls().back(), "create 0 id 5");
-  EXPECT_EQ(errorRecord(), (ErrorRecord{support::kFakeError, support::kFakeFile}));
+  EXPECT_EQ(errorRecord(), (ErrorRecord{kFakeError, kFakeFile}));
 }
 
 TEST_F(TaskFromJsonTest, ACreationThatAnswersMoreThanZeroGivesTheId) {
@@ -786,7 +775,7 @@ TEST_F(TaskFromJsonTest, AFailedOverwritingIsReportedWithTheId) {
     fakes[0].edit = result;
     EXPECT_EQ(save(text), -1);
     EXPECT_EQ(logged().back(), std::string(kUnit) + "overwrite failed, task=5");
-    EXPECT_EQ(errorRecord(), (ErrorRecord{support::kFakeError, support::kFakeFile}));
+    EXPECT_EQ(errorRecord(), (ErrorRecord{kFakeError, kFakeFile}));
   }
 }
 
@@ -798,3 +787,4 @@ TEST_F(TaskFromJsonTest, AnIdThatCannotBeLookedUpIsCreated) {
 }
 
 }  // namespace
+}  // namespace support

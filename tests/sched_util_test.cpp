@@ -10,6 +10,7 @@
 #include "captured_log.h"
 #include "failing_calls.h"
 #include "fake_clock.h"
+#include "refused_arguments.h"
 #include "sandbox_fixture.h"
 #include "zelosched.h"
 
@@ -28,10 +29,21 @@ std::vector<uint32_t> fieldsOf(const ZELO_SCHED_DATE &date) {
   return {date.year, date.month, date.day, date.weekday, date.hour, date.minute};
 }
 
-void expectBadArgument(const std::string &condition) {
-  EXPECT_EQ(errorRecord(), (ErrorRecord{0x0D00, "sched_util.cpp"}));
-  EXPECT_EQ(logged(), Lines{"sched_util.cpp:N Invaild Argument (" + condition + ")=[0]\n"});
-  EXPECT_EQ(loggedPriorities(), std::vector<int>{3});
+TEST_F(SchedUtilTest, AnArgumentThatIsMissingIsRefusedInTheOrderOfTheChecks) {
+  ZELO_SCHED_DATE date = kUntouchedDate;
+  expectRefused(
+      "sched_util.cpp",
+      {{"((void *)0) != pDate", [] { return ZELOSchedDateGet(nullptr); }},
+       {"((void *)0) != pDate1", [] { return ZELOSchedDateComp(nullptr, &kUntouchedDate); }},
+       {"NULL != pDate2", [] { return ZELOSchedDateComp(&kUntouchedDate, nullptr); }},
+       {"((void *)0) != pDate1", [] { return ZELOSchedDateComp(nullptr, nullptr); }},
+       {"((void *)0) != szDateOrg", [&] { return ZELOSchedDateParse(nullptr, &date); }},
+       {"NULL != pDate", [] { return ZELOSchedDateParse("bad", nullptr); }},
+       {"((void *)0) != szDateOrg", [] { return ZELOSchedDateParse(nullptr, nullptr); }},
+       {"((void *)0) != szTimeOrg", [&] { return ZELOSchedTimeParse(nullptr, &date); }},
+       {"NULL != pDate", [] { return ZELOSchedTimeParse("bad", nullptr); }},
+       {"((void *)0) != szTimeOrg", [] { return ZELOSchedTimeParse(nullptr, nullptr); }}});
+  EXPECT_EQ(fieldsOf(date), fieldsOf(kUntouchedDate));
 }
 
 // ---- the clock
@@ -69,11 +81,6 @@ TEST_F(SchedUtilTest, WeekdaysCountFromSunday) {
     EXPECT_EQ(ZELOSchedDateGet(&date), 0);
     EXPECT_EQ(date.weekday, day - 5);
   }
-}
-
-TEST_F(SchedUtilTest, ADateNeedsARecord) {
-  EXPECT_EQ(ZELOSchedDateGet(nullptr), -1);
-  expectBadArgument("((void *)0) != pDate");
 }
 
 TEST_F(SchedUtilTest, AClockThatCannotBeConvertedIsReported) {
@@ -120,21 +127,6 @@ TEST_F(SchedUtilTest, TheYearDecidesThenTheMonthThenTheDay) {
     EXPECT_EQ(ZELOSchedDateComp(&pair.later, &pair.earlier), 1);
   }
   EXPECT_EQ(errorRecord().code, 0);
-}
-
-TEST_F(SchedUtilTest, AComparisonNeedsItsFirstDate) {
-  EXPECT_EQ(ZELOSchedDateComp(nullptr, &kUntouchedDate), -1);
-  expectBadArgument("((void *)0) != pDate1");
-}
-
-TEST_F(SchedUtilTest, AComparisonNeedsItsSecondDate) {
-  EXPECT_EQ(ZELOSchedDateComp(&kUntouchedDate, nullptr), -1);
-  expectBadArgument("NULL != pDate2");
-}
-
-TEST_F(SchedUtilTest, AComparisonLooksAtTheFirstDateFirst) {
-  EXPECT_EQ(ZELOSchedDateComp(nullptr, nullptr), -1);
-  expectBadArgument("((void *)0) != pDate1");
 }
 
 // ---- texts of dates
@@ -203,22 +195,6 @@ TEST_F(SchedUtilTest, ThirtyFebruaryIsReadAsItStandsAndNormalisesIntoMarch) {
   EXPECT_EQ(fieldsOf(date), (std::vector<uint32_t>{2013, 3, 2, 6, 0, 0}));
 }
 
-TEST_F(SchedUtilTest, ADateTextMustBeGiven) {
-  ZELO_SCHED_DATE date = kUntouchedDate;
-  EXPECT_EQ(ZELOSchedDateParse(nullptr, &date), -1);
-  expectBadArgument("((void *)0) != szDateOrg");
-}
-
-TEST_F(SchedUtilTest, ADateTextNeedsARecord) {
-  EXPECT_EQ(ZELOSchedDateParse("bad", nullptr), -1);
-  expectBadArgument("NULL != pDate");
-}
-
-TEST_F(SchedUtilTest, TheDateTextIsLookedAtBeforeTheRecord) {
-  EXPECT_EQ(ZELOSchedDateParse(nullptr, nullptr), -1);
-  expectBadArgument("((void *)0) != szDateOrg");
-}
-
 // ---- texts of times
 
 struct ParsedTime {
@@ -261,22 +237,6 @@ TEST_P(BadTimeTextTest, IsRefused) {
 INSTANTIATE_TEST_SUITE_P(SchedUtil, BadTimeTextTest,
                          testing::Values("", "8:", "830", "123:4", "12:345", ":30", ":300", "8.30",
                                          "8:3a", "-8:30", " 8:30", "8:30 ", "8/30", "08300"));
-
-TEST_F(SchedUtilTest, ATimeTextMustBeGiven) {
-  ZELO_SCHED_DATE date = kUntouchedDate;
-  EXPECT_EQ(ZELOSchedTimeParse(nullptr, &date), -1);
-  expectBadArgument("((void *)0) != szTimeOrg");
-}
-
-TEST_F(SchedUtilTest, ATimeTextNeedsARecord) {
-  EXPECT_EQ(ZELOSchedTimeParse("bad", nullptr), -1);
-  expectBadArgument("NULL != pDate");
-}
-
-TEST_F(SchedUtilTest, TheTimeTextIsLookedAtBeforeTheRecord) {
-  EXPECT_EQ(ZELOSchedTimeParse(nullptr, nullptr), -1);
-  expectBadArgument("((void *)0) != szTimeOrg");
-}
 
 // ---- the seed
 

@@ -2,6 +2,7 @@
 
 #include <sqlite3.h>
 #include <sys/wait.h>
+#include <unistd.h>
 
 #include <cerrno>
 #include <memory>
@@ -102,6 +103,13 @@ std::vector<int> waitForChildRuns() {
       return statuses;
     }
   }
+}
+
+pid_t deadProcess() {
+  const pid_t child = fork();
+  if (child == 0) _exit(0);
+  waitpid(child, nullptr, 0);
+  return child;
 }
 
 }  // namespace support

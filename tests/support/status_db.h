@@ -1,9 +1,12 @@
 // Runs of tasks, as seen from outside the library.
 //
+//   pid_t pid = deadProcess();                   of a process that was and is no more
 //   waitForChildRuns();                          until no child process is left; no polling
 //   std::vector<StatusRow> rows = statusRows();  the status database, in order of insertion
 //   addStatusRow({.pid = 1, .timestamp = 5, .app = "a", .taskId = 7, .statusCode = 2});
 #pragma once
+
+#include <sys/types.h>
 
 #include <cstdint>
 #include <optional>
@@ -33,5 +36,7 @@ long addStatusRow(const StatusRow &row);
 // Waits for every process that came from this one, also for those that detached themselves. Their
 // wait statuses, in the order of their ends.
 std::vector<int> waitForChildRuns();
+
+pid_t deadProcess();
 
 }  // namespace support
