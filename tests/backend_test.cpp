@@ -265,8 +265,10 @@ TEST_F(BackendTest, FailuresOfRegistrationAreLoggedAtPriorityError) {
 
 class BackendInitTest : public BackendTest, public testing::WithParamInterface<Registered> {
  protected:
+  BackendInitTest() { std::memset(&entry_, 0, sizeof(entry_)); }  // its padding too
+
   const std::string name_ = GetParam().szName;
-  ZELO_SCHED_BACKEND entry_ = {};
+  ZELO_SCHED_BACKEND entry_;
 };
 
 TEST_P(BackendInitTest, NeedsANameAndThenAnEntry) {
