@@ -1,5 +1,5 @@
 #!/bin/bash
-# What the fuzzers found once stays found, and each tries for another five seconds.
+# What the fuzzers found once stays found, and each tries for another three seconds.
 #
 # Functions are called by check:
 # shellcheck disable=SC2317
@@ -9,7 +9,7 @@ here=$(cd "$(dirname "$0")" && pwd -P)
 # shellcheck source=tests/support/shell_test.sh
 . "$here/support/shell_test.sh"
 
-readonly SECONDS_EACH=5
+readonly SECONDS_EACH=3
 readonly CORPUS=$here/../fuzz/corpus
 
 replay() {
