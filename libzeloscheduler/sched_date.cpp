@@ -17,7 +17,7 @@ namespace {
 
 constexpr uint32_t kFirstYear = 1900;  // of struct tm
 constexpr uint32_t kTen = 10;
-constexpr uint32_t kHundred = 100;  // a time of day is hour * 100 + minute
+constexpr uint32_t kHourFactor = 100;  // a time of day is hour * 100 + minute
 constexpr char kNever[] = "N/A";
 
 struct TriggerText {
@@ -57,13 +57,13 @@ enum class Today { kFound, kOver, kFailed };
 Today ZELOSchedTDayNextRunTime(const ZELO_SCHED_TASK *pTask, const ZELO_SCHED_DATE &now,
                                TriggerText *result) {
   SCHED_CHECK_ARG(pTask != nullptr, "((void *)0) != pTask", Today::kFailed);
-  const uint32_t nowHM = now.hour * kHundred + now.minute;
+  const uint32_t nowHM = now.hour * kHourFactor + now.minute;
   for (const uint32_t hour : schedHoursOf(*pTask)) {
-    const uint64_t runHM = uint64_t{hour} * kHundred + pTask->RunMin;
+    const uint64_t runHM = uint64_t{hour} * kHourFactor + pTask->RunMin;
     if (runHM > nowHM) {
       ZELO_SCHED_DATE date = now;
-      date.hour = static_cast<uint32_t>(runHM / kHundred);
-      date.minute = static_cast<uint32_t>(runHM % kHundred);
+      date.hour = static_cast<uint32_t>(runHM / kHourFactor);
+      date.minute = static_cast<uint32_t>(runHM % kHourFactor);
       *result = written(date);
       return Today::kFound;
     }

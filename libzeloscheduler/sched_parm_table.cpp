@@ -23,8 +23,6 @@ const ZELO_SCHED_ENUM kTypeEnum[] = {
 
 namespace {
 
-constexpr int kDecimal = 10;
-
 // As snprintf with "%ld" or "%lu", which would take most of the time of converting a task.
 void writeNumber(int64_t number, char *str, size_t cbStr) {
   char digits[std::numeric_limits<int64_t>::digits10 + 3];
@@ -126,30 +124,30 @@ constexpr SchedParm enumRow(const char *szKey, const char *szDefault, size_t off
     key, inHash, required, szDefault, offsetof(ZELO_SCHED_TASK, field),         \
         sizeof(ZELO_SCHED_TASK::field), nullptr, nullptr, nullptr, compareTexts \
   }
-#define FIELD(name) offsetof(ZELO_SCHED_TASK, name)
+#define OFFSET(name) offsetof(ZELO_SCHED_TASK, name)
 
 }  // namespace
 
 const SchedParm parm_table[] = {
-    signedRow("id", kInHash, kRequired, "-1", FIELD(ID)),
-    signedRow("backend", kNotInHash, kOptional, "-1", FIELD(Backend)),
-    signedRow("can edit owner", kInHash, kOptional, "1", FIELD(CanEditOwner)),
-    signedRow("can edit name", kInHash, kOptional, "1", FIELD(CanEditName)),
-    signedRow("listable", kInHash, kOptional, "1", FIELD(Listable)),
-    signedRow("can run from ui", kInHash, kOptional, "1", FIELD(CanRunFromUI)),
-    signedRow("can delete from ui", kInHash, kOptional, "1", FIELD(CanDeleteFromUI)),
-    signedRow("can edit from ui", kInHash, kOptional, "1", FIELD(CanEditFromUI)),
-    signedRow("can run app same time", kInHash, kOptional, "1", FIELD(CanRunAppSameTime)),
-    signedRow("can run task same time", kInHash, kOptional, "0", FIELD(CanRunTaskSameTime)),
-    signedRow("simple edit form", kInHash, kOptional, "0", FIELD(SimpleEditForm)),
-    unsignedRow("owner", kOptional, "0", FIELD(Owner)),
-    unsignedRow("start year", kOptional, "2012", FIELD(StartYear)),
-    unsignedRow("start month", kOptional, "1", FIELD(StartMonth)),
-    unsignedRow("start day", kOptional, "1", FIELD(StartDay)),
-    unsignedRow("run hour", kRequired, "0", FIELD(RunHour)),
-    unsignedRow("run min", kRequired, "0", FIELD(RunMin)),
-    unsignedRow("repeat hour", kOptional, "0", FIELD(RepeatHour)),
-    unsignedRow("last work hour", kOptional, "0", FIELD(LastWorkHour)),
+    signedRow("id", kInHash, kRequired, "-1", OFFSET(ID)),
+    signedRow("backend", kNotInHash, kOptional, "-1", OFFSET(Backend)),
+    signedRow("can edit owner", kInHash, kOptional, "1", OFFSET(CanEditOwner)),
+    signedRow("can edit name", kInHash, kOptional, "1", OFFSET(CanEditName)),
+    signedRow("listable", kInHash, kOptional, "1", OFFSET(Listable)),
+    signedRow("can run from ui", kInHash, kOptional, "1", OFFSET(CanRunFromUI)),
+    signedRow("can delete from ui", kInHash, kOptional, "1", OFFSET(CanDeleteFromUI)),
+    signedRow("can edit from ui", kInHash, kOptional, "1", OFFSET(CanEditFromUI)),
+    signedRow("can run app same time", kInHash, kOptional, "1", OFFSET(CanRunAppSameTime)),
+    signedRow("can run task same time", kInHash, kOptional, "0", OFFSET(CanRunTaskSameTime)),
+    signedRow("simple edit form", kInHash, kOptional, "0", OFFSET(SimpleEditForm)),
+    unsignedRow("owner", kOptional, "0", OFFSET(Owner)),
+    unsignedRow("start year", kOptional, "2012", OFFSET(StartYear)),
+    unsignedRow("start month", kOptional, "1", OFFSET(StartMonth)),
+    unsignedRow("start day", kOptional, "1", OFFSET(StartDay)),
+    unsignedRow("run hour", kRequired, "0", OFFSET(RunHour)),
+    unsignedRow("run min", kRequired, "0", OFFSET(RunMin)),
+    unsignedRow("repeat hour", kOptional, "0", OFFSET(RepeatHour)),
+    unsignedRow("last work hour", kOptional, "0", OFFSET(LastWorkHour)),
     TEXT_ROW("name", kInHash, kRequired, "", Name),
     TEXT_ROW("edit form", kInHash, kOptional, "", EditForm),
     TEXT_ROW("edit dialog", kInHash, kOptional, "ZELO.TOV.TaskScheduler.EditDialog", EditDialog),
@@ -158,9 +156,9 @@ const SchedParm parm_table[] = {
     TEXT_ROW("app args", kInHash, kOptional, "", AppArgs),
     TEXT_ROW("action", kInHash, kRequired, "", Action),
     TEXT_ROW("week", kInHash, kOptional, "1111111", Week),
-    TEXT_ROW("cmd", kInHash, kRequired, "", Command),
+    TEXT_ROW(kSchedCommandKey, kInHash, kRequired, "", Command),
     TEXT_ROW("next trigger time", kNotInHash, kOptional, "", NextTriggerTime),
-    enumRow("state", "enabled", FIELD(State), kStateEnum),
-    enumRow("type", "daily", FIELD(Type), kTypeEnum),
+    enumRow("state", "enabled", OFFSET(State), kStateEnum),
+    enumRow("type", "daily", OFFSET(Type), kTypeEnum),
     {nullptr, false, false, nullptr, 0, 0, nullptr, nullptr, nullptr, nullptr},
 };

@@ -25,6 +25,9 @@ struct SchedParm {
   }
 };
 
+// Of the row that JSON carries encoded.
+inline constexpr char kSchedCommandKey[] = "cmd";
+
 // The index of a row is the sort-field number that callers of ZELOSchedTaskListSortEx pass, so the
 // order of the rows is part of the interface.
 extern const SchedParm parm_table[];

@@ -14,7 +14,6 @@
 
 namespace {
 
-constexpr char kCommandKey[] = "cmd";
 constexpr size_t kNumberCapacity = 4095;
 constexpr size_t kEncodedCapacity = 32768;
 constexpr size_t kCommandCapacity = sizeof(ZELO_SCHED_TASK::Command);
@@ -64,7 +63,7 @@ int setRows(PSZHASH *ppHash, const ZELO_SCHED_TASK *pTask) {
 }
 
 int encodeCommand(PSZHASH *ppHash) {
-  const char *szCommand = QLIBCSzHashGetValue(*ppHash, kCommandKey);
+  const char *szCommand = QLIBCSzHashGetValue(*ppHash, kSchedCommandKey);
   if (szCommand == nullptr) {
     SCHED_LOG("Failed to get cmd in hash");
     return -1;
@@ -74,7 +73,7 @@ int encodeCommand(PSZHASH *ppHash) {
     SCHED_LOG_CALLEE("Base64 encoding failed. [%s] ", szCommand);
     return -1;
   }
-  if (QLIBCSzHashSetValue(ppHash, kCommandKey, szEncoded) < 0) {
+  if (QLIBCSzHashSetValue(ppHash, kSchedCommandKey, szEncoded) < 0) {
     SCHED_LOG_CALLEE("set hash failed. key:[cmd], val:[%s] ", szEncoded);
     return -1;
   }

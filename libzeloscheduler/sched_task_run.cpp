@@ -156,9 +156,9 @@ class LockGuard {
 
 // Random, so that runs that collided do not collide again: 3 to 30 seconds in steps of 3.
 unsigned retryWait() {
-  constexpr int kSteps = 10;
+  constexpr int kWaits = 10;
   constexpr int kStep = 3;
-  return static_cast<unsigned>(rand() % kSteps * kStep + kStep);
+  return static_cast<unsigned>(rand() % kWaits * kStep + kStep);
 }
 
 enum class Conflict { kNone, kRunning, kFailed };

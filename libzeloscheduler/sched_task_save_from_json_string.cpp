@@ -19,6 +19,7 @@
 #include "sched_json.h"
 #include "sched_parm_table.h"
 #include "sched_report.h"
+#include "sched_text.h"
 #include "schedule_cron.h"
 
 namespace {
@@ -26,8 +27,7 @@ namespace {
 constexpr int kHashCapacity = 512;
 // The text of a task has a few hundred KB at most, and parsing takes up to sixty times the memory
 // of the text: a longer one could exhaust the machine.
-constexpr size_t kLongestText = size_t{4} << 20;
-constexpr char kCommandKey[] = "cmd";
+constexpr size_t kLongestJson = size_t{4} << 20;
 
 bool isBlank(char c) {
   return c == ' ' || c == '\t' || c == '\r' || c == '\n';
@@ -135,7 +135,7 @@ bool hasHalfPair(std::string_view text) {
 // as a task's texts. The reader throws when the nesting is too deep.
 bool parse(SchedJsonReader *reader, std::string_view text, char first, Json::Value *value) {
   try {
-    return text.size() <= kLongestText && beginsWith(text, first) && reader->read(text, value) &&
+    return text.size() <= kLongestJson && beginsWith(text, first) && reader->read(text, value) &&
            !hasHalfPair(text) &&
            isAllThereIs(text.substr(static_cast<size_t>(value->getOffsetLimit())));
   } catch (const Json::Exception &) {
@@ -163,7 +163,6 @@ bool decodeMember(SchedJsonReader *reader, const Json::Value &member, Json::Valu
 }
 
 long long numberIn(const char *szText) {
-  constexpr int kDecimal = 10;
   return strtoll(szText, nullptr, kDecimal);
 }
 
@@ -199,7 +198,7 @@ bool fitsCommand(std::string_view encoded) {
 }
 
 bool eachFits(PSZHASH hash) {
-  const char *szCommand = QLIBCSzHashGetValue(hash, kCommandKey);
+  const char *szCommand = QLIBCSzHashGetValue(hash, kSchedCommandKey);
   if (szCommand != nullptr && !fitsCommand(szCommand)) {
     return false;
   }

@@ -7,6 +7,9 @@
 #include <cstdio>
 #include <cstring>
 
+// What the numbers of the stored and the JSON form are written in.
+inline constexpr int kDecimal = 10;
+
 // Copies szText into szBuf, cut to cbBuf - 1 characters. The two may overlap.
 inline void copyText(char *szBuf, size_t cbBuf, const char *szText) {
   const size_t length = strnlen(szText, cbBuf - 1);

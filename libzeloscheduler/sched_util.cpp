@@ -12,8 +12,7 @@
 
 namespace {
 
-constexpr int kFirstYear = 1900;  // of struct tm
-constexpr int kDecimal = 10;
+constexpr int kFirstYearOfTm = 1900;
 
 // Whether the text has only digits and that separator.
 bool consistsOf(const char *szText, char separator) {
@@ -93,7 +92,7 @@ int ZELOSchedDateGet(ZELO_SCHED_DATE *pDate) {
     SCHED_SET_ERROR(kErrSystem);
     return -1;
   }
-  pDate->year = static_cast<uint32_t>(local->tm_year + kFirstYear);
+  pDate->year = static_cast<uint32_t>(local->tm_year + kFirstYearOfTm);
   pDate->month = static_cast<uint32_t>(local->tm_mon + 1);
   pDate->day = static_cast<uint32_t>(local->tm_mday);
   pDate->weekday = static_cast<uint32_t>(local->tm_wday);

@@ -25,7 +25,7 @@ namespace {
 constexpr char kProgram[] = "zeloschedtask";
 constexpr int kExitUsage = 2;
 
-constexpr char kUsage[] =
+constexpr char kUsageText[] =
     "usage: zeloschedtask --run id=ID\n"
     "       zeloschedtask --run id=ID --now [--trigger=manual|catch-up] [--due=SECONDS]\n"
     "                     [--skip-disabled] [--tell=FD] [--copy=FD]\n"
@@ -46,7 +46,7 @@ constexpr char kHelp[] =
     "could not be started, 2 when the arguments are wrong.\n";
 
 int usage() {
-  std::fputs(kUsage, stderr);
+  std::fputs(kUsageText, stderr);
   return kExitUsage;
 }
 
@@ -132,7 +132,7 @@ int refuseRights() {
 }  // namespace
 
 int main(int argc, char **argv) {
-  if (argc == 2 && std::strcmp(argv[1], "--help") == 0) return show(kUsage, kHelp);
+  if (argc == 2 && std::strcmp(argv[1], "--help") == 0) return show(kUsageText, kHelp);
   if (argc == 2 && std::strcmp(argv[1], "--version") == 0) {
     return show(kProgram, " " ZELO_VERSION "\n");
   }

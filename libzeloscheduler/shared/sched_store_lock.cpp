@@ -18,7 +18,7 @@ namespace {
 
 constexpr const char *kFile = kSchedStoreLockFile;
 constexpr mode_t kMode = 0600;
-constexpr int kTries = 6000;  // thirty seconds in all
+constexpr int kLockTries = 6000;  // thirty seconds in all
 constexpr useconds_t kPause = 5000;
 
 // If the file was removed while we waited, the next process would lock a new one.
@@ -86,7 +86,7 @@ Turn tryLock(int *pFile) {
 // Waits for the lock. The caller closes *pFile.
 Turn lock(int *pFile) {
   Turn turn = *pFile < 0 ? Turn::kNever : tryLock(pFile);
-  for (int i = 0; i < kTries && turn == Turn::kWait; ++i) {
+  for (int i = 0; i < kLockTries && turn == Turn::kWait; ++i) {
     usleep(kPause);
     turn = tryLock(pFile);
   }

@@ -77,10 +77,10 @@ int addLine(const ZELO_SCHEDULE &schedule) {
 // The daemon's process, 0 when there is none. kill() would take 0 or a negative number for a
 // process group or all processes, and 1 is init: none of them is signalled.
 pid_t processOf(const std::string &pidFile) noexcept {
-  constexpr int kDecimal = 10;
+  constexpr int kBase = 10;
   constexpr long kFirstProcess = 1;
   constexpr long kMostProcesses = 1L << 22;  // the kernel's own limit
-  const long pid = std::strtol(pidFile.c_str(), nullptr, kDecimal);
+  const long pid = std::strtol(pidFile.c_str(), nullptr, kBase);
   return pid > kFirstProcess && pid <= kMostProcesses ? static_cast<pid_t>(pid) : 0;
 }
 

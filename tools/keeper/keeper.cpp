@@ -36,13 +36,12 @@
 #include "runs/status_row.h"
 #include "runs/stop_run.h"
 #include "runs/task_notes.h"
+#include "runs/time_units.h"
 #include "store/owner.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
 
 namespace {
-
-constexpr int64_t kMinute = 60;  // seconds
 
 // So that the task's owner can open /dev/stdout and /dev/stderr for writing.
 constexpr mode_t kPipeMode = 0622;

@@ -4,9 +4,8 @@
 #include <zelocore.h>
 
 #include <cstdint>
-#include <fstream>
-#include <iterator>
 
+#include "store/place_file.h"
 #include "store/store_copy.h"
 #include "store/store_files.h"
 #include "terminal/failure.h"
@@ -33,11 +32,6 @@ Findings ok(const std::string &text) {
   return {{Severity::kOk, kKind, text}};
 }
 
-std::string contents(const std::string &path) {
-  std::ifstream file(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(file), {}};
-}
-
 bool exists(const char *path) {
   return QLIBCFileExist(path) != 0;
 }
@@ -53,7 +47,7 @@ Findings checkLastGoodCopy() {
   if (!exists(kPersistentCopy) || !judgeStore(kPersistentCopy).isWhole()) return {};
   if (!exists(kLastGoodCopy))
     return warning(std::string(kLastGoodCopy) + " is missing", kWriteAnew);
-  if (contents(kLastGoodCopy) == contents(kPersistentCopy)) return {};
+  if (contentsIfReadable(kLastGoodCopy) == contentsIfReadable(kPersistentCopy)) return {};
   return warning(std::string(kLastGoodCopy) + " is not as " + kPersistentCopy + " is", kWriteAnew);
 }
 
@@ -79,11 +73,11 @@ Findings checkCopies() {
   if (!countSections(kPersistentCopy)) {
     return warning(std::string(kPersistentCopy) + " cannot be read: " + errorInWords());
   }
-  if (contents(kPersistentCopy).empty()) {
+  if (contentsIfReadable(kPersistentCopy).empty()) {
     return warning(std::string(kPersistentCopy) + " is cut off",
                    std::string(kWriteAnew) + " from " + kWorkingCopy);
   }
-  if (contents(kWorkingCopy) == contents(kPersistentCopy)) {
+  if (contentsIfReadable(kWorkingCopy) == contentsIfReadable(kPersistentCopy)) {
     return ok("the working and the persistent copy of the tasks agree");
   }
   return warning("the working and the persistent copy of the tasks differ",

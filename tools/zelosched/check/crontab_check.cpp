@@ -13,11 +13,8 @@
 namespace {
 
 constexpr char kCrontab[] = "/etc/crontab";
-constexpr char kPowerOffProgram[] = "/usr/zelo/bin/zelo_poweroff_feasible_check";
 constexpr char kPowerOff[] = "poweroff";
 constexpr unsigned kEveryDay = (1U << kDaysOfWeek) - 1;
-
-using Tasks = std::vector<const ZELO_SCHED_TASK *>;
 
 // The platform writes every day as an asterisk.
 std::string powerOffLine(const ZELO_SCHED_TASK &task) {
@@ -31,7 +28,7 @@ bool isOurs(const std::string &line) {
          line.find(kPowerOffProgram) != std::string::npos;
 }
 
-std::vector<std::string> expectedLines(const Tasks &tasks) {
+std::vector<std::string> expectedLines(const std::vector<const ZELO_SCHED_TASK *> &tasks) {
   std::vector<std::string> lines;
   for (const ZELO_SCHED_TASK *task : tasks) {
     if (!isEnabled(*task)) continue;
@@ -69,7 +66,7 @@ void report(const std::vector<std::string> &lines, const std::vector<std::string
 
 }  // namespace
 
-std::vector<std::string> crontabDifferences(const Tasks &tasks) {
+std::vector<std::string> crontabDifferences(const std::vector<const ZELO_SCHED_TASK *> &tasks) {
   std::vector<std::string> found;
   if (!readLines(&found)) {
     return {std::string(kCrontab) + " cannot be read: " + std::strerror(errno)};

@@ -12,6 +12,7 @@
 #include "runs/result_text.h"
 #include "runs/runs.h"
 #include "runs/task_notes.h"
+#include "runs/time_units.h"
 #include "terminal/text.h"
 
 namespace {
@@ -19,8 +20,6 @@ namespace {
 constexpr char kFailedRun[] = "failed-run";
 constexpr char kGaveUp[] = "gave-up";
 constexpr char kMissedRun[] = "missed-run";
-constexpr int64_t kDay = int64_t{24} * 60 * 60;  // seconds
-constexpr int64_t kMinute = 60;
 
 using Tasks = std::map<int64_t, const TaskRecord *>;
 

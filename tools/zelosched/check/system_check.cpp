@@ -4,41 +4,21 @@
 #include <sched_store_lock.h>
 #include <sys/stat.h>
 #include <unistd.h>
-#include <zelocore.h>
 
 #include <cerrno>
 #include <cstring>
-#include <fstream>
-#include <iterator>
-#include <optional>
 
+#include "runs/cron_surroundings.h"
 #include "runs/settings.h"
 #include "store/change_lock.h"
+#include "store/place_file.h"
 #include "store/shared_names.h"
 #include "store/store_files.h"
-#include "terminal/number.h"
 #include "terminal/text.h"
 
 namespace {
 
-constexpr char kCronPidFile[] = "/var/run/crond.pid";
 constexpr char kTmp[] = "/tmp";
-constexpr int kAlive = 1;
-
-std::string contents(const std::string &path) {
-  std::ifstream file(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(file), {}};
-}
-
-std::string firstWord(const std::string &path) {
-  const std::string text = contents(path);
-  return text.substr(0, text.find_first_of(" \n"));
-}
-
-// The pid in the file may be another program's by now.
-bool isCron(int64_t pid) {
-  return firstWord("/proc/" + std::to_string(pid) + "/comm").find("cron") != std::string::npos;
-}
 
 // The process that keeps the lock for two seconds, or 0.
 pid_t lastingHolder(const char *lockFile) {
@@ -55,11 +35,10 @@ pid_t lastingHolder(const char *lockFile) {
 }  // namespace
 
 Findings checkCron() {
-  const std::string text = firstWord(kCronPidFile);
-  const std::optional<int64_t> pid = parseNumber(text);
-  const bool isRunning = pid && *pid > 0 && *pid <= INT32_MAX &&
-                         QLIBCProcAlive(static_cast<pid_t>(*pid)) == kAlive && isCron(*pid);
-  if (isRunning) return {{Severity::kOk, "cron", "cron is running (process " + text + ")"}};
+  const int64_t cron = cronProcess();
+  if (cron != 0) {
+    return {{Severity::kOk, "cron", "cron is running (process " + std::to_string(cron) + ")"}};
+  }
   return {{Severity::kCritical, "cron", "cron is not running: no task will start by itself"}};
 }
 
@@ -77,7 +56,7 @@ Findings checkProgram() {
   if (info.st_uid != 0 || schedWhyForeign(kSchedTaskProgram, info) != nullptr) {
     return critical(" is not root's alone: whoever can write it runs commands as root");
   }
-  if (contents(kTaskProgram) == kSchedTaskProgram.contents) {
+  if (contentsIfReadable(kTaskProgram) == kSchedTaskProgram.contents) {
     return critical(" only stands in for the program that starts tasks",
                     "'zelosched restore' puts that there");
   }

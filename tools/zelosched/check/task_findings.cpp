@@ -16,8 +16,6 @@
 
 namespace {
 
-constexpr char kPowerOffProgram[] = "/usr/zelo/bin/zelo_poweroff_feasible_check";
-
 bool isUnreadableByCron(const ZELO_SCHED_TASK *task) {
   return isEnabled(*task) && !unreadableFieldsOf(*task).empty();
 }

@@ -18,11 +18,11 @@
 
 namespace {
 
-constexpr Option kOptions[] = {TASK_OPTIONS,
-                               {"stdin"},
-                               {"disabled"},
-                               {"stagger", Option::kValue},
-                               {"quiet", Option::kNone, 'q'}};
+constexpr Option kAddOptions[] = {TASK_OPTIONS,
+                                  {"stdin"},
+                                  {"disabled"},
+                                  {"stagger", Option::kValue},
+                                  {"quiet", Option::kNone, 'q'}};
 
 void announce(const ZELO_SCHED_TASK &task) {
   const std::optional<LocalMinute> next = nextRun(task, localMinute(time(nullptr)));
@@ -32,7 +32,7 @@ void announce(const ZELO_SCHED_TASK &task) {
 }
 
 int runAdd(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kAddOptions);
   arguments.requireNoOperands();
   requireOneSource(arguments);
   const bool isRead = arguments.has("stdin");

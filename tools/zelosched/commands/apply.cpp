@@ -10,13 +10,13 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"dry-run"},
-                               {"diff"},
-                               {"force"},
-                               {"prune"},
-                               {"json"},
-                               {"app", Option::kValue},
-                               {"stagger", Option::kValue}};
+constexpr Option kApplyOptions[] = {{"dry-run"},
+                                    {"diff"},
+                                    {"force"},
+                                    {"prune"},
+                                    {"json"},
+                                    {"app", Option::kValue},
+                                    {"stagger", Option::kValue}};
 
 ApplyRules rulesOf(const Arguments &arguments) {
   ApplyRules rules;
@@ -37,7 +37,7 @@ ApplyRules rulesOf(const Arguments &arguments) {
 }
 
 int runApply(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kApplyOptions);
   arguments.requireNoCommand();
   if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
   const ApplyRules rules = rulesOf(arguments);

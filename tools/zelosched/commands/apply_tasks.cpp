@@ -157,7 +157,7 @@ void take(const ApplyStep &step, const ApplyRules &rules, Report *report) {
 }
 
 // Reports the runs under way of a task that was disabled or removed.
-void tellOfRuns(const ApplyStep &step, const ApplyRules &rules) {
+void tellOfEndedTask(const ApplyStep &step, const ApplyRules &rules) {
   const bool isDisabled =
       step.change == Change::kChanged && isEnabled(*step.before) && !isEnabled(*step.after);
   if (isDisabled || step.change == Change::kRemoved) {
@@ -172,7 +172,7 @@ int takeAll(const std::vector<ApplyStep> &steps, const ApplyRules &rules, Report
     const size_t before = report->count();
     const int taken = attempt([&] {
       take(step, rules, report);
-      tellOfRuns(step, rules);
+      tellOfEndedTask(step, rules);
     });
     if (report->count() == before) report->addFailed(step);
     status = std::max(status, taken);

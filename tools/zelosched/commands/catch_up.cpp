@@ -17,7 +17,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"within", Option::kValue}, {"dry-run"}};
+constexpr Option kCatchUpOptions[] = {{"within", Option::kValue}, {"dry-run"}};
 constexpr char kUsualSpan[] = "12h";
 
 int64_t secondsOf(const std::string &text) {
@@ -61,7 +61,7 @@ int catchUpAll(const std::string &span, bool isDryRun) {
 }
 
 int runCatchUp(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kCatchUpOptions);
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   const std::string span = arguments.value("within", kUsualSpan);

@@ -18,7 +18,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {TASK_OPTIONS, {"stdin"}, {"force"}, EXPECTED_TASK_OPTIONS};
+constexpr Option kEditOptions[] = {TASK_OPTIONS, {"stdin"}, {"force"}, EXPECTED_TASK_OPTIONS};
 
 void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &before,
                         const ZELO_SCHED_TASK &task) {
@@ -34,7 +34,7 @@ void requirePermissions(const Arguments &arguments, const ZELO_SCHED_TASK &befor
 }
 
 int runEdit(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kEditOptions);
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   if (ids.size() > 1) throw UsageError("one task at a time");
   requireOneSource(arguments);

@@ -17,7 +17,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"wire"}};
+constexpr Option kExportOptions[] = {{"wire"}};
 
 // ---- the library's own form -----------------------------------------------------------------
 
@@ -100,7 +100,7 @@ class Export {
 };
 
 int runExport(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kExportOptions);
   arguments.requireNoCommand();
   Export out(arguments.has("wire"));
   int status = kDone;

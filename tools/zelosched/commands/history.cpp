@@ -15,22 +15,22 @@
 #include "runs/history_keep.h"
 #include "runs/moment_text.h"
 #include "runs/result_text.h"
+#include "runs/time_units.h"
 #include "terminal/number.h"
 #include "terminal/table.h"
 #include "terminal/text.h"
 
 namespace {
 
-constexpr Option kOptions[] = {
+constexpr Option kHistoryOptions[] = {
     {"limit", Option::kValue, 'n'}, {"json"}, {"failed"}, {"since", Option::kValue},
     {"task", Option::kValue},       {"keep"}, {"tell"}};
 constexpr int64_t kUsualLimit = 50;
-constexpr int64_t kMostRuns = 100000000;
-constexpr char kNothing[] = "-";
+constexpr int64_t kMostLines = 100000000;
 
 std::string startText(const KeptRun &run) {
   const std::optional<int64_t> moment = run.start ? run.start : run.queued;
-  if (!moment) return kNothing;
+  if (!moment) return kNoValue;
   constexpr int64_t kSecondsPerMinute = 60;
   char seconds[16];
   std::snprintf(seconds, sizeof seconds, ":%02d", static_cast<int>(*moment % kSecondsPerMinute));
@@ -46,9 +46,7 @@ std::optional<int64_t> durationOf(const KeptRun &run) {
 
 std::string durationText(const KeptRun &run) {
   const std::optional<int64_t> seconds = durationOf(run);
-  if (!seconds) return kNothing;
-  constexpr int64_t kMinute = 60;
-  constexpr int64_t kHour = 3600;
+  if (!seconds) return kNoValue;
   char rest[16];
   std::snprintf(rest, sizeof rest, ":%02d:%02d", static_cast<int>(*seconds % kHour / kMinute),
                 static_cast<int>(*seconds % kMinute));
@@ -68,7 +66,7 @@ void print(const std::vector<KeptRun> &runs) {
                {std::to_string(run.run)},
                {std::to_string(run.task)},
                {resultInWords(run), isBad(run) ? Emphasis::kBad : Emphasis::kNone},
-               {run.taskName.empty() ? kNothing : run.taskName}});
+               {run.taskName.empty() ? kNoValue : run.taskName}});
   }
   table.print();
 }
@@ -101,7 +99,7 @@ int64_t momentOf(const std::string &text) {
 }
 
 int runHistory(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kHistoryOptions);
   arguments.requireNoCommand();
   if (arguments.has("keep")) {
     arguments.requireNoOperands();
@@ -116,7 +114,7 @@ int runHistory(int argc, char **argv) {
   if (const std::optional<std::string> since = arguments.value("since")) {
     filter.since = momentOf(*since);
   }
-  filter.limit = arguments.number("limit", 1, kMostRuns).value_or(kUsualLimit);
+  filter.limit = arguments.number("limit", 1, kMostLines).value_or(kUsualLimit);
   // When the sweep fails, that is reported, and the history is shown all the same.
   int status = geteuid() == 0 ? attempt([] { sweepRuns(); }) : kDone;
   std::vector<KeptRun> runs;

@@ -21,7 +21,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"wire"}, {"new"}, {"force"}};
+constexpr Option kImportOptions[] = {{"wire"}, {"new"}, {"force"}};
 constexpr char kNoTask[] = "there is no task to import";
 
 // ---- the library's own form -----------------------------------------------------------------
@@ -129,7 +129,7 @@ int importWire(const std::string &text, bool areNew) {
 // ---- the command ----------------------------------------------------------------------------
 
 int runImport(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kImportOptions);
   arguments.requireNoCommand();
   if (arguments.operands().size() != 1) throw UsageError("give one file, or - for standard input");
   if (arguments.has("new") && !arguments.has("wire")) throw UsageError("'--new' is for --wire");

@@ -23,18 +23,17 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"all", Option::kNone, 'a'},
-                               {"app", Option::kValue},
-                               {"owner", Option::kValue},
-                               {"enabled"},
-                               {"failed"},
-                               {"running"},
-                               {"power"},
-                               {"sort", Option::kValue},
-                               {"reverse", Option::kNone, 'r'},
-                               {"json"}};
-constexpr char kUnknown[] = "?";  // to a user who may not read the runs
-constexpr char kNothing[] = "-";
+constexpr Option kListOptions[] = {{"all", Option::kNone, 'a'},
+                                   {"app", Option::kValue},
+                                   {"owner", Option::kValue},
+                                   {"enabled"},
+                                   {"failed"},
+                                   {"running"},
+                                   {"power"},
+                                   {"sort", Option::kValue},
+                                   {"reverse", Option::kNone, 'r'},
+                                   {"json"}};
+constexpr char kHidden[] = "?";  // to a user who may not read the runs
 
 struct Row {
   const ZELO_SCHED_TASK *task;
@@ -115,8 +114,8 @@ std::vector<Row> rowsOf(const Choice &choice, const TaskList &list, const Latest
     const RunRecord *last = runs.of(task->ID);
     rows.push_back({task, nextRun(*task, now), userName(task->Owner), last,
                     last != nullptr ? outcomeInBrief(*last)
-                    : runs.isKnown  ? kNothing
-                                    : kUnknown});
+                    : runs.isKnown  ? kNoValue
+                                    : kHidden});
   }
   return rows;
 }
@@ -138,7 +137,7 @@ std::string nextText(const Row &row, const LocalMinute &now) {
   constexpr int kWeek = 7;
   constexpr size_t kShortName = 3;
   if (!isEnabled(*row.task)) return "disabled";
-  if (!row.next) return kNothing;
+  if (!row.next) return kNoValue;
   if ((row.next->day - now.day).count() >= kWeek) return dayInBrief(*row.next, now);
   return std::string(weekdayName(*row.next)).substr(0, kShortName) + " " + timeText(*row.next);
 }
@@ -180,7 +179,7 @@ void printAsJson(const std::vector<Row> &rows, const LatestRuns &runs, bool with
 }
 
 int runList(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kListOptions);
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   const SortKey &key = sortKey(arguments.value("sort", "next"));

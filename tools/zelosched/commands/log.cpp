@@ -21,9 +21,10 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"run", Option::kValue}, {"follow", Option::kNone, 'f'}, {"json"}};
+constexpr Option kLogOptions[] = {
+    {"run", Option::kValue}, {"follow", Option::kNone, 'f'}, {"json"}};
 constexpr int64_t kMostRun = int64_t{1} << 62;
-constexpr std::chrono::milliseconds kPause(100);
+constexpr std::chrono::milliseconds kFollowPause(100);
 constexpr std::chrono::seconds kSweepPause(1);
 
 std::string leftOutLine(int64_t bytes) {
@@ -87,7 +88,7 @@ void follow(const KeptRun &run, const OutputFile &file, RunOutput *output) {
   int64_t shown = 0;
   ProcessName keeper = run.keeper;
   auto nextSweep = std::chrono::steady_clock::now();
-  for (bool isLast = false;; std::this_thread::sleep_for(kPause)) {
+  for (bool isLast = false;; std::this_thread::sleep_for(kFollowPause)) {
     int64_t lost = 0;
     const int64_t total = file.total();
     const std::string bytes = file.since(shown, &lost);
@@ -155,7 +156,7 @@ void printAsJson(const KeptRun &run, const Output &printed) {
 }
 
 int runLog(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kLogOptions);
   arguments.requireNoCommand();
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   if (ids.size() > 1) throw UsageError("one task at a time");

@@ -26,7 +26,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"to", Option::kValue}, {"to-owners"}, {"json"}};
+constexpr Option kMailOptions[] = {{"to", Option::kValue}, {"to-owners"}, {"json"}};
 constexpr char kSettings[] = "/etc/default/zelosched-mail";
 constexpr char kUsualProgram[] = "/usr/share/zelosched/mail-on-failure";
 constexpr char kAddress[] = "MAIL_TO=";
@@ -185,7 +185,7 @@ void tell(bool asJson) {
 }
 
 int runMail(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kMailOptions);
   arguments.requireNoCommand();
   const std::vector<std::string> &words = arguments.operands();
   const std::optional<std::string> to = arguments.value("to");

@@ -19,8 +19,8 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"output", Option::kValue, 'o'}};
-constexpr mode_t kMode = 0644;  // the collector does not run as root
+constexpr Option kMetricsOptions[] = {{"output", Option::kValue, 'o'}};
+constexpr mode_t kMetricsMode = 0644;  // the collector does not run as root
 
 MetricsText::Labels labelsOf(const TaskRecord &task) {
   return {{"task_id", std::to_string(task.ID)}, {"task", task.Name}, {"app", task.App}};
@@ -167,7 +167,7 @@ std::string allMetrics() {
 }
 
 int runMetrics(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kMetricsOptions);
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   if (geteuid() != 0) throw Failure("reading the runs takes root's rights");
@@ -177,7 +177,7 @@ int runMetrics(int argc, char **argv) {
   if (!path) {
     std::fwrite(text.data(), 1, text.size(), stdout);
   } else {
-    placeFile(*path, text, kMode);
+    placeFile(*path, text, kMetricsMode);
   }
   return kDone;
 }

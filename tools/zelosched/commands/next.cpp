@@ -26,7 +26,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {
+constexpr Option kNextOptions[] = {
     {"count", Option::kValue, 'n'}, {"within", Option::kValue}, {"preview"}, {"json"}};
 constexpr int64_t kUsualCount = 20;
 constexpr int64_t kMostRuns = 10000;
@@ -215,7 +215,7 @@ std::optional<LocalMinute> lastMinute(const Arguments &arguments, time_t now) {
 }
 
 int runNext(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kNextOptions);
   arguments.requireNoCommand();
   const time_t now = time(nullptr);
   const std::optional<LocalMinute> last = lastMinute(arguments, now);

@@ -14,7 +14,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"json"}};
+constexpr Option kOwnersOptions[] = {{"json"}};
 constexpr uid_t kNobody = 65534;
 constexpr uid_t kFirstPerson = 1000;  // on Debian; lower ones are of programs
 
@@ -68,7 +68,7 @@ void printAsJson(const std::vector<Owner> &all) {
 }
 
 int runOwners(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kOwnersOptions);
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   if (arguments.has("json")) {

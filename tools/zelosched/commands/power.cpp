@@ -22,8 +22,6 @@
 
 namespace {
 
-constexpr char kNothing[] = "-";
-
 // ---- list -----------------------------------------------------------------------------------
 
 void printTable(const std::vector<const ZELO_SCHED_TASK *> &tasks) {
@@ -35,7 +33,7 @@ void printTable(const std::vector<const ZELO_SCHED_TASK *> &tasks) {
     table.add({{std::to_string(task->ID)},
                {directionOf(*task)},
                {stateName(*task), isEnabled(*task) ? Emphasis::kNone : Emphasis::kDim},
-               {next ? minuteText(*next) : kNothing},
+               {next ? minuteText(*next) : kNoValue},
                {scheduleInWords(*task)}});
   }
   table.print();

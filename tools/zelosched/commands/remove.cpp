@@ -6,11 +6,11 @@
 
 namespace {
 
-constexpr Option kOptions[] = {
+constexpr Option kRemoveOptions[] = {
     {"yes", Option::kNone, 'y'}, {"force"}, {"stop"}, EXPECTED_TASK_OPTIONS};
 
 int runRemove(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kRemoveOptions);
   arguments.requireNoCommand();
   return removeTasks(parseIds(arguments.operands()),
                      {arguments.has("yes"), arguments.has("force"), false, arguments.has("stop"),

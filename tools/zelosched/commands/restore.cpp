@@ -23,7 +23,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"force"}};
+constexpr Option kRestoreOptions[] = {{"force"}};
 
 constexpr mode_t kStoreMode = 0644;
 
@@ -180,7 +180,7 @@ void putProgramBack() {
 // ---- all together -------------------------------------------------------------------------------
 
 int runRestore(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kRestoreOptions);
   arguments.requireNoOperands();
   arguments.requireNoCommand();
   const bool isForced = arguments.has("force");

@@ -23,9 +23,9 @@
 
 namespace {
 
-constexpr Option kOptions[] = {
+constexpr Option kRunOptions[] = {
     {"wait", Option::kNone, 'w'}, {"output"}, {"force"}, EXPECTED_TASK_OPTIONS};
-constexpr std::chrono::milliseconds kPause(50);
+constexpr std::chrono::milliseconds kWaitPause(50);
 constexpr std::chrono::seconds kPatience(2);  // for the first events of a new keeper
 constexpr char kClearLine[] = "\r\033[K";
 
@@ -104,7 +104,7 @@ std::string whatItDoes(const RunEvents &events) {
   progress->clear();
   const RunEvents &events = run->events();
   const Clock::time_point until = Clock::now() + kPatience;
-  while (!events.isKnown && !run->isSilent() && Clock::now() < until) run->listen(kPause);
+  while (!events.isKnown && !run->isSilent() && Clock::now() < until) run->listen(kWaitPause);
   if (events.isKnown && !events.isRunning && cancelWaiting(events.run.process)) {
     std::printf("%s will not run: it was waiting for its turn\n", title.c_str());
     std::fflush(stdout);
@@ -116,7 +116,7 @@ std::string whatItDoes(const RunEvents &events) {
 
 // Its keeper was killed: the run goes on, and its row says how it ends.
 RunRecord waitWithoutKeeper(const RunEvents &events) {
-  while (isAlive(events.run.process) && interruptedBy == 0) std::this_thread::sleep_for(kPause);
+  while (isAlive(events.run.process) && interruptedBy == 0) std::this_thread::sleep_for(kWaitPause);
   sweepRuns();
   RunFilter filter;
   filter.run = events.run.run;
@@ -134,14 +134,14 @@ RunRecord waitForEnd(StartedRun *run, const std::string &title, RunOutput *outpu
   while (!run->isSilent()) {
     if (interruptedBy != 0) endInterrupted(run, title, &progress);
     if (isOutputOpen) {
-      isOutputOpen = output->pass(kPause);
+      isOutputOpen = output->pass(kWaitPause);
       run->listen(std::chrono::milliseconds(0));
     } else {
-      run->listen(kPause);
+      run->listen(kWaitPause);
     }
     if (output == nullptr && run->events().isKnown) progress.show(whatItDoes(run->events()));
   }
-  while (isOutputOpen && interruptedBy == 0) isOutputOpen = output->pass(kPause);
+  while (isOutputOpen && interruptedBy == 0) isOutputOpen = output->pass(kWaitPause);
   if (output != nullptr) output->finish();
   if (interruptedBy != 0) endInterrupted(run, title, &progress);
   if (run->events().isEnded) return run->events().run;
@@ -170,7 +170,7 @@ void runUnseen(const ZELO_SCHED_TASK &task) {
   const Clock::time_point until = Clock::now() + kPatience;
   const RunEvents &events = run.events();
   while (!events.isWaiting && !events.isRunning && !events.isEnded && Clock::now() < until) {
-    if (!run.listen(kPause)) break;
+    if (!run.listen(kWaitPause)) break;
   }
   if (events.isWaiting) {
     std::printf("%s %s\n", titleOf(task).c_str(), whatItDoes(events).c_str());
@@ -191,7 +191,7 @@ void runOne(int64_t id, const Arguments &arguments) {
 }
 
 int runRun(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kRunOptions);
   arguments.requireNoCommand();
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   // Files of a plain user's run in /tmp would block the runs of others.

@@ -22,7 +22,7 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"json"}};
+constexpr Option kShowOptions[] = {{"json"}};
 
 struct Line {
   const char *title;
@@ -103,7 +103,7 @@ void add(const ZELO_SCHED_TASK &task, const LatestRuns &runs, Json::Value *top) 
 }
 
 int runShow(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kShowOptions);
   arguments.requireNoCommand();
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   const LatestRuns runs = latestRuns();

@@ -19,20 +19,20 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"quiet", Option::kNone, 'q'}, {"json"}, {"acknowledge"}};
+constexpr Option kStatusOptions[] = {{"quiet", Option::kNone, 'q'}, {"json"}, {"acknowledge"}};
 
 int exitStatusOf(Severity worst) {
   switch (worst) {
     case Severity::kOk:
       return kDone;
     case Severity::kUnknown:
-      return kUnknown;
+      return kHealthUnknown;
     case Severity::kWarning:
       return kFailed;
     case Severity::kCritical:
-      return kCritical;
+      return kHealthCritical;
   }
-  return kCritical;
+  return kHealthCritical;
 }
 
 const char *colourOf(Severity severity) {
@@ -109,7 +109,7 @@ int acknowledgeAll(const Arguments &arguments) {
 }
 
 int runStatus(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kStatusOptions);
   arguments.requireNoCommand();
   if (arguments.has("acknowledge")) return acknowledgeAll(arguments);
   arguments.requireNoOperands();

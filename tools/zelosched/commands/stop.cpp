@@ -12,11 +12,11 @@
 
 namespace {
 
-constexpr Option kOptions[] = {{"grace", Option::kValue}, EXPECTED_TASK_OPTIONS};
+constexpr Option kStopOptions[] = {{"grace", Option::kValue}, EXPECTED_TASK_OPTIONS};
 constexpr int64_t kMostGrace = int64_t{24} * 60 * 60;  // seconds
 
 int runStop(int argc, char **argv) {
-  const Arguments arguments(argc, argv, kOptions);
+  const Arguments arguments(argc, argv, kStopOptions);
   arguments.requireNoCommand();
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   const std::chrono::seconds grace(

@@ -2,6 +2,8 @@
 
 #include <cstdio>
 
+#include "runs/time_units.h"
+
 namespace {
 
 using std::chrono::sys_days;
@@ -37,7 +39,7 @@ ZELO_SCHED_DATE libraryDate(const LocalMinute &minute) {
           static_cast<uint32_t>(minute.minute)};
 }
 
-LocalMinute localMinute(const ZELO_SCHED_DATE &date) {
+LocalMinute minuteOf(const ZELO_SCHED_DATE &date) {
   const year_month_day day(std::chrono::year(static_cast<int>(date.year)),
                            std::chrono::month(date.month), std::chrono::day(date.day));
   return {sys_days(day), static_cast<int>(date.hour), static_cast<int>(date.minute)};
@@ -58,9 +60,6 @@ LocalMinute localMinute(time_t moment) {
 // the former gives the earlier one. mktime() needs tm_isdst = 1 to find that one, and is slow with
 // it in a time zone without summer time.
 std::optional<time_t> momentOf(const LocalMinute &minute) {
-  constexpr time_t kMinute = 60;
-  constexpr time_t kHour = 60 * kMinute;
-  constexpr time_t kDay = 24 * kHour;
   const time_t inUtc =
       minute.day.time_since_epoch().count() * kDay + minute.hour * kHour + minute.minute * kMinute;
   for (const time_t near : {inUtc - kDay, inUtc + kDay}) {
@@ -99,7 +98,7 @@ ComingRuns::ComingRuns(const ZELO_SCHED_TASK &task, const LocalMinute &after)
 std::optional<LocalMinute> ComingRuns::next() {
   constexpr auto kLast = static_cast<uint32_t>(int{std::chrono::year::max()});
   for (ZELO_SCHED_DATE date; runs_.next(&date) && date.year <= kLast;) {
-    const LocalMinute run = localMinute(date);
+    const LocalMinute run = minuteOf(date);
     if (momentOf(run)) return run;
   }
   return std::nullopt;

@@ -17,7 +17,6 @@ constexpr char kCronPidFile[] = "/var/run/crond.pid";
 constexpr char kCrontab[] = "/etc/crontab";
 // As cron's PAM configuration names them.
 constexpr const char *kLocaleFiles[] = {"/etc/environment", "/etc/default/locale"};
-constexpr int kAlive = 1;
 
 using Variables = std::map<std::string, std::string>;
 
@@ -92,6 +91,7 @@ std::vector<std::string> environmentOfCron() {
 }
 
 int64_t cronProcess() {
+  constexpr int kAlive = 1;
   const std::optional<int64_t> pid = parseNumber(firstWord(kCronPidFile));
   const bool isThere =
       pid && *pid > 0 && *pid <= INT32_MAX && QLIBCProcAlive(static_cast<pid_t>(*pid)) == kAlive;

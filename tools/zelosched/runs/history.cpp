@@ -6,11 +6,9 @@
 #include <ctime>
 
 #include "runs/processes.h"
+#include "runs/time_units.h"
 
 namespace {
-
-constexpr char kDirectory[] = "/usr/zelo/var";
-constexpr int64_t kDay = int64_t{24} * 60 * 60;  // seconds
 
 #define COLUMNS                                                                          \
   "run, task, generation, task_name, app, owner, started_by, due, queued, start, ended," \
@@ -131,7 +129,7 @@ std::string conditionOf(const KeptDatabase &kept, const RunFilter &filter,
 bool isNearlyFull(const Settings &settings) {
   constexpr uint64_t kAll = 100;
   struct statvfs info {};
-  if (statvfs(kDirectory, &info) != 0) return true;
+  if (statvfs(kHistoryDirectory, &info) != 0) return true;
   return info.f_bavail * kAll < info.f_blocks * static_cast<uint64_t>(settings.outputFreePercent);
 }
 

@@ -14,10 +14,9 @@
 
 namespace {
 
-constexpr char kPath[] = "/usr/zelo/var/history.sqlite";
-constexpr char kDirectory[] = "/usr/zelo/var";
-constexpr mode_t kDirectoryMode = 0755;
-constexpr mode_t kMode = 0600;  // only root may read results of commands
+constexpr char kHistoryPath[] = "/usr/zelo/var/history.sqlite";
+constexpr mode_t kHistoryDirectoryMode = 0755;
+constexpr mode_t kHistoryMode = 0600;  // only root may read results of commands
 constexpr char kBootId[] = "/proc/sys/kernel/random/boot_id";
 constexpr int64_t kFirstVersion = 1;
 constexpr int64_t kVersion = 2;  // in user_version; 0 is a new database
@@ -75,7 +74,7 @@ constexpr char kFromFirst[] =
     "DROP TABLE run_of_first; DROP TABLE up; DROP TABLE missed;";
 
 Failure cannot(const char *what, const char *why) {
-  return Failure(std::string("cannot ") + what + " " + kPath + ": " + why);
+  return Failure(std::string("cannot ") + what + " " + kHistoryPath + ": " + why);
 }
 
 // A busy database is a temporary failure.
@@ -86,8 +85,8 @@ Failure cannot(const char *what, const char *why) {
 }
 
 void makeDirectories() {
-  for (const char *directory : {"/usr/zelo", kDirectory}) {
-    if (mkdir(directory, kDirectoryMode) != 0 && errno != EEXIST) {
+  for (const char *directory : {"/usr/zelo", kHistoryDirectory}) {
+    if (mkdir(directory, kHistoryDirectoryMode) != 0 && errno != EEXIST) {
       const int reason = errno;
       throw Failure(std::string("cannot make ") + directory + ": " + std::strerror(reason));
     }
@@ -97,7 +96,8 @@ void makeDirectories() {
 // SQLite would create it with a mode that depends on the umask.
 void makeFile() {
   makeDirectories();
-  const int file = open(kPath, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kMode);
+  const int file =
+      open(kHistoryPath, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kHistoryMode);
   if (file >= 0) {
     close(file);
   } else if (errno != EEXIST) {
@@ -113,7 +113,7 @@ bool isOurs(const struct stat &info) {
 void requireOurFile() {
   struct stat file {};
   struct stat directory {};
-  if (lstat(kPath, &file) != 0 || stat(kDirectory, &directory) != 0) {
+  if (lstat(kHistoryPath, &file) != 0 || stat(kHistoryDirectory, &directory) != 0) {
     throw cannot("open", std::strerror(errno));
   }
   if (!isOurs(directory)) throw cannot("open", "its directory is not this user's alone");
@@ -125,10 +125,10 @@ void requireOurFile() {
 // The directory may be a link of root's to a data volume. It is resolved first, as SQLite is told
 // to follow no link at all.
 std::string pathBehindLinks() {
-  const std::unique_ptr<char, decltype(&std::free)> directory(realpath(kDirectory, nullptr),
+  const std::unique_ptr<char, decltype(&std::free)> directory(realpath(kHistoryDirectory, nullptr),
                                                               std::free);
   if (directory == nullptr) throw cannot("open", std::strerror(errno));
-  return std::string(directory.get()) + std::strrchr(kPath, '/');
+  return std::string(directory.get()) + std::strrchr(kHistoryPath, '/');
 }
 
 int64_t versionOf(const KeptDatabase &database) {
@@ -156,7 +156,7 @@ void makeTables(const KeptDatabase &database) {
 }  // namespace
 
 bool isKeptFromUs() {
-  return access(kPath, F_OK) == 0 && access(kPath, R_OK) != 0;
+  return access(kHistoryPath, F_OK) == 0 && access(kHistoryPath, R_OK) != 0;
 }
 
 std::string bootId() {
@@ -166,7 +166,7 @@ std::string bootId() {
 }
 
 KeptDatabase::KeptDatabase(Access access, std::chrono::milliseconds patience) {
-  if (access == kRead && ::access(kPath, F_OK) != 0 && errno == ENOENT) return;
+  if (access == kRead && ::access(kHistoryPath, F_OK) != 0 && errno == ENOENT) return;
   if (isKeptFromUs()) throw cannot("read", "that takes root's rights");
   if (access == kChange) makeFile();
   requireOurFile();

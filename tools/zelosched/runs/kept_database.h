@@ -11,6 +11,8 @@
 
 #include "terminal/failure.h"
 
+inline constexpr char kHistoryDirectory[] = "/usr/zelo/var";
+
 struct sqlite3;
 struct sqlite3_stmt;
 

@@ -4,6 +4,7 @@
 
 #include "runs/history.h"
 #include "runs/history_keep.h"
+#include "runs/time_units.h"
 #include "terminal/failure.h"
 
 namespace {
@@ -15,9 +16,6 @@ std::string signalName(int signal) {
 
 // In the largest unit of which it is one at least.
 std::string spanText(int64_t seconds) {
-  constexpr int64_t kMinute = 60;
-  constexpr int64_t kHour = 60 * kMinute;
-  constexpr int64_t kDay = 24 * kHour;
   constexpr struct {
     int64_t seconds;
     const char *name;

@@ -8,11 +8,11 @@
 #include "runs/coming_runs.h"
 #include "runs/planned_off.h"
 #include "runs/task_notes.h"
+#include "runs/time_units.h"
 #include "store/store_files.h"
 
 namespace {
 
-constexpr int64_t kMinute = 60;          // seconds
 constexpr int64_t kGrace = 2 * kMinute;  // in which the program that cron starts may still begin
 constexpr int64_t kClockMoved = 2 * kMinute;
 constexpr int64_t kBetweenLooks = 11 * kMinute;  // of the sweep: its timer's period and accuracy

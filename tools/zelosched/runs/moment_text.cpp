@@ -4,32 +4,18 @@
 #include <cstdlib>
 #include <ctime>
 
+#include "runs/time_units.h"
 #include "terminal/number.h"
 
 namespace {
-
-constexpr int64_t kMinute = 60;
-constexpr int kMinutesPerHour = 60;
-constexpr int64_t kHour = 60 * kMinute;
-constexpr int64_t kDay = 24 * kHour;
 
 std::optional<int64_t> ago(const std::string &text, int64_t now) {
   if (text.size() < 2) return std::nullopt;
   const std::optional<int64_t> count = parseNumber(text.substr(0, text.size() - 1));
   constexpr int64_t kMostCount = 10000000;
-  if (!count || *count < 0 || *count > kMostCount) return std::nullopt;
-  switch (text.back()) {
-    case 's':
-      return now - *count;
-    case 'm':
-      return now - *count * kMinute;
-    case 'h':
-      return now - *count * kHour;
-    case 'd':
-      return now - *count * kDay;
-    default:
-      return std::nullopt;
-  }
+  const std::optional<int64_t> unit = secondsOfUnit(text.back());
+  if (!count || *count < 0 || *count > kMostCount || !unit) return std::nullopt;
+  return now - *count * *unit;
 }
 
 std::optional<int64_t> byFormat(const std::string &text, const char *format, tm fields) {

@@ -12,20 +12,20 @@
 
 namespace {
 
-constexpr char kDirectory[] = "/run/zelosched";
-constexpr mode_t kDirectoryMode = 0700;  // only root may read what commands print
-constexpr mode_t kMode = 0600;
+constexpr char kOutputDirectory[] = "/run/zelosched";
+constexpr mode_t kOutputDirectoryMode = 0700;  // only root may read what commands print
+constexpr mode_t kOutputMode = 0600;
 constexpr char kMagic[8] = {'z', 'e', 'l', 'o', 'o', 'u', 't', '1'};
 
 std::string pathOf(const ProcessName &process) {
-  return std::string(kDirectory) + "/output." + std::to_string(process.pid) + "." +
+  return std::string(kOutputDirectory) + "/output." + std::to_string(process.pid) + "." +
          std::to_string(process.born);
 }
 
 bool isDirectoryOurs() {
-  if (mkdir(kDirectory, kDirectoryMode) != 0 && errno != EEXIST) return false;
+  if (mkdir(kOutputDirectory, kOutputDirectoryMode) != 0 && errno != EEXIST) return false;
   struct stat info {};
-  return lstat(kDirectory, &info) == 0 && S_ISDIR(info.st_mode) && info.st_uid == geteuid() &&
+  return lstat(kOutputDirectory, &info) == 0 && S_ISDIR(info.st_mode) && info.st_uid == geteuid() &&
          (info.st_mode & (S_IWGRP | S_IWOTH)) == 0;
 }
 
@@ -49,7 +49,7 @@ OutputFile OutputFile::make(const ProcessName &process, int64_t first, int64_t l
     made.path_ = pathOf(process);
     unlink(made.path_.c_str());
     made.file_ =
-        ::open(made.path_.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kMode);
+        ::open(made.path_.c_str(), O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, kOutputMode);
   }
   if (made.file_ < 0) {
     made.path_.clear();

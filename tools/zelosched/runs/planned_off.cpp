@@ -2,12 +2,12 @@
 
 #include <algorithm>
 
+#include "runs/time_units.h"
 #include "schedule_days.h"
 #include "store/power_room.h"
 
 namespace {
 
-constexpr int kMinutesPerHour = 60;
 constexpr int kMinutesPerDay = 24 * kMinutesPerHour;
 
 int minuteOfDay(int hour, int minute) {

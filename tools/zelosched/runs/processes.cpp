@@ -29,9 +29,11 @@ std::string textOf(const std::string &path) {
   return text;
 }
 
-ProcessStat statOf(const std::string &pid) {
+}  // namespace
+
+ProcessStat statOf(pid_t pid) {
   constexpr int kFieldsBetween = 17;  // between the parent and the start in /proc/PID/stat
-  const std::string text = textOf("/proc/" + pid + "/stat");
+  const std::string text = textOf("/proc/" + std::to_string(pid) + "/stat");
   const size_t name = text.rfind(')');  // the name before it may have any character
   if (name == std::string::npos) return {};
   std::istringstream fields(text.substr(name + 1));
@@ -43,12 +45,6 @@ ProcessStat statOf(const std::string &pid) {
   return stat;
 }
 
-}  // namespace
-
-ProcessStat statOf(pid_t pid) {
-  return statOf(std::to_string(pid));
-}
-
 std::map<pid_t, ProcessStat> processes() {
   std::map<pid_t, ProcessStat> found;
   DIR *directory = opendir("/proc");
@@ -56,7 +52,8 @@ std::map<pid_t, ProcessStat> processes() {
   while (const dirent *entry = readdir(directory)) {
     const std::optional<int64_t> pid = parseNumber(entry->d_name);
     if (!pid) continue;
-    found[static_cast<pid_t>(*pid)] = statOf(entry->d_name);
+    const auto process = static_cast<pid_t>(*pid);
+    found[process] = statOf(process);
   }
   closedir(directory);
   return found;
@@ -105,7 +102,7 @@ bool isOfRoot(pid_t pid) {
 }
 
 bool isOver(pid_t pid) {
-  return statOf(std::to_string(pid)).state == 'Z';
+  return statOf(pid).state == 'Z';
 }
 
 bool isOfSameProgram(pid_t pid, pid_t other) {

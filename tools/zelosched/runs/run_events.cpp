@@ -6,11 +6,11 @@
 
 namespace {
 
-constexpr char kNothing[] = "-";
+constexpr char kNoNumber[] = "-";
 
 template <class Number>
 std::string textOf(const std::optional<Number> &number) {
-  return number ? std::to_string(*number) : kNothing;
+  return number ? std::to_string(*number) : kNoNumber;
 }
 
 template <class Number>

@@ -14,7 +14,7 @@
 namespace {
 
 constexpr size_t kMostAtOnce = size_t{64} << 10;  // the usual capacity of a pipe
-constexpr int kPause = 50;                        // milliseconds
+constexpr int kWritePause = 50;                   // milliseconds
 
 }  // namespace
 
@@ -60,7 +60,7 @@ void RunOutput::writeAll(std::string_view bytes) {
       written += static_cast<size_t>(count);
     } else if (errno == EAGAIN) {
       pollfd wanted{STDOUT_FILENO, POLLOUT, 0};
-      poll(&wanted, 1, kPause);
+      poll(&wanted, 1, kWritePause);
     } else if (errno != EINTR) {
       fault_ = std::strerror(errno);
     }

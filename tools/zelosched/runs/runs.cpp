@@ -17,7 +17,6 @@
 namespace {
 
 constexpr char kDatabase[] = "/tmp/sched_status.sqlite";
-constexpr int kAlive = 1;
 
 constexpr char kColumns[] =
     "SELECT status_id, pid, timestamp, app, task_id, status_code, comment FROM task_status ";
@@ -54,6 +53,7 @@ Failure cannotRead(const char *why) {
 }  // namespace
 
 bool isGone(const Run &run) {
+  constexpr int kAlive = 1;
   const bool isProcess = run.pid > 0 && run.pid <= INT32_MAX;
   return run.statusCode == ZELO_SCHED_STATUS_RUNNING &&
          (!isProcess || QLIBCProcAlive(static_cast<pid_t>(run.pid)) != kAlive);

@@ -15,7 +15,7 @@
 
 namespace {
 
-constexpr char kPath[] = "/etc/zelosched.conf";
+constexpr char kSettingsPath[] = "/etc/zelosched.conf";
 constexpr size_t kLongestLine = 1000;
 
 enum class Kind { kNumber, kBytes, kPercent };
@@ -91,10 +91,10 @@ std::string take(std::string_view line, Settings *settings) {
 
 Settings readSettings(SettingsFaults *faults) {
   Settings settings;
-  if (access(kPath, F_OK) != 0 && errno == ENOENT) return settings;
+  if (access(kSettingsPath, F_OK) != 0 && errno == ENOENT) return settings;
   std::istringstream file;
   try {
-    file.str(contentsOf(kPath));
+    file.str(contentsOf(kSettingsPath));
   } catch (const Failure &failure) {
     faults->push_back(failure.what());
     return settings;
@@ -103,7 +103,8 @@ Settings readSettings(SettingsFaults *faults) {
   for (int number = 1; std::getline(file, line); ++number) {
     const std::string fault = line.size() > kLongestLine ? "it is too long" : take(line, &settings);
     if (fault.empty()) continue;
-    faults->push_back(std::string(kPath) + ", line " + std::to_string(number) + ": " + fault);
+    faults->push_back(std::string(kSettingsPath) + ", line " + std::to_string(number) + ": " +
+                      fault);
   }
   return settings;
 }

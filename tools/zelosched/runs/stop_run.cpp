@@ -19,8 +19,8 @@
 namespace {
 
 using Clock = std::chrono::steady_clock;
-constexpr std::chrono::milliseconds kPause(10);
-constexpr std::chrono::milliseconds kPatience(2000);
+constexpr std::chrono::milliseconds kStopPause(10);
+constexpr std::chrono::milliseconds kStopPatience(2000);
 constexpr int kMostKills = 1000;     // against processes that fork as fast as they are killed
 constexpr int kStatusPatience = 20;  // milliseconds: the stopped process may hold the lock
 
@@ -58,7 +58,7 @@ bool hasStopped(pid_t pid) {
     const char state = statOf(pid).state;
     if (state == 'T') return true;
     if (state == 'Z' || state == '\0') return false;
-    std::this_thread::sleep_for(kPause / 2);
+    std::this_thread::sleep_for(kStopPause / 2);
   }
   return false;
 }
@@ -72,9 +72,9 @@ bool hasRow(pid_t pid) {
 // The run's own process may have been stopped, and would not go on by itself.
 void endOwn(const Held &own) {
   own.send(SIGCONT);
-  if (own.waitForEnd(kPatience)) return;
+  if (own.waitForEnd(kStopPatience)) return;
   own.send(SIGKILL);
-  own.waitForEnd(kPatience);
+  own.waitForEnd(kStopPatience);
 }
 
 Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds grace) {
@@ -83,16 +83,16 @@ Stopped endTree(ProcessTree *tree, const Held &own, std::chrono::milliseconds gr
   tree->signal(SIGTERM);
   while (Clock::now() < until) {
     const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(until - Clock::now());
-    const bool isOver = own.waitForEnd(std::min(left, kPause * 5));
+    const bool isOver = own.waitForEnd(std::min(left, kStopPause * 5));
     // A command that was about to start appears after the first signal.
     tree->signalNew(SIGTERM);
     if (isOver && tree->look() == 0) return Stopped::kEnded;
   }
   for (int i = 0; i < kMostKills && tree->look() > 0; ++i) {
     tree->killAll();
-    own.waitForEnd(kPause);
+    own.waitForEnd(kStopPause);
   }
-  if (!own.waitForEnd(kPatience)) endOwn(own);
+  if (!own.waitForEnd(kStopPatience)) endOwn(own);
   const bool isOver = own.waitForEnd(std::chrono::milliseconds(0)) && tree->look() == 0;
   return isOver ? Stopped::kKilled : Stopped::kNot;
 }
@@ -122,10 +122,10 @@ bool cancelWaiting(const ProcessName &process) {
       if (hasChild(pid) || hasRow(pid)) break;
       own.send(i == 0 ? kSignalOfCancelling : SIGKILL);
       own.send(SIGCONT);
-      if (own.waitForEnd(i == 0 ? kPause * 20 : std::chrono::milliseconds(10000))) return true;
+      if (own.waitForEnd(i == 0 ? kStopPause * 20 : std::chrono::milliseconds(10000))) return true;
     } catch (const Failure &) {  // it was just about to write its row
       own.send(SIGCONT);
-      std::this_thread::sleep_for(kPause);
+      std::this_thread::sleep_for(kStopPause);
     }
   }
   if (own.isThere()) own.send(SIGCONT);

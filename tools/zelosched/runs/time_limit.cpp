@@ -4,6 +4,8 @@
 #include <cctype>
 #include <charconv>
 
+#include "runs/time_units.h"
+
 namespace {
 
 constexpr std::string_view kBeforeLimit = "timeout --kill-after=30s ";
@@ -11,12 +13,6 @@ constexpr std::string_view kBeforeCommand = " sh -c ";
 constexpr char kQuote = '\'';
 constexpr std::string_view kQuotedQuote = "'\\''";
 constexpr size_t kMostDigits = 6;  // of seconds eleven days, of hours a century
-
-struct Unit {
-  char letter;
-  int64_t seconds;
-};
-constexpr Unit kUnits[] = {{'s', 1}, {'m', 60}, {'h', 3600}, {'d', 86400}};
 
 std::string quoted(std::string_view command) {
   std::string text(1, kQuote);
@@ -56,15 +52,13 @@ std::optional<int64_t> secondsOfLimit(std::string_view limit) {
     return std::nullopt;
   }
   const std::string_view digits = limit.substr(0, limit.size() - 1);
-  const auto *const unit =
-      std::find_if(std::begin(kUnits), std::end(kUnits),
-                   [&](const Unit &known) { return known.letter == limit.back(); });
+  const std::optional<int64_t> unit = secondsOfUnit(limit.back());
   const bool isNumber = std::all_of(digits.begin(), digits.end(),
                                     [](unsigned char c) { return std::isdigit(c) != 0; });
-  if (!isNumber || unit == std::end(kUnits)) return std::nullopt;
+  if (!isNumber || !unit) return std::nullopt;
   int64_t number = 0;
   std::from_chars(digits.data(), digits.data() + digits.size(), number);
-  return number * unit->seconds;
+  return number * *unit;
 }
 
 std::string storedCommand(const LimitedCommand &limited) {

@@ -13,6 +13,7 @@
 #include <string>
 #include <string_view>
 
+#include "store/directory.h"
 #include "terminal/failure.h"
 
 namespace {
@@ -71,12 +72,8 @@ bool isLeftOver(int directory, const char *entry) {
          info.st_uid == 0 && info.st_mtime < time(nullptr) - kOldest;
 }
 
-struct CloseDirectory {
-  void operator()(DIR *directory) const { closedir(directory); }
-};
-
 void removeBeside(const Replaced &replaced) {
-  const std::unique_ptr<DIR, CloseDirectory> directory(opendir(replaced.directory));
+  const Directory directory(opendir(replaced.directory));
   if (directory == nullptr) return;
   const int descriptor = dirfd(directory.get());
   while (const dirent *entry = readdir(directory.get())) {

@@ -69,6 +69,14 @@ std::string contentsOf(const std::string &path) {
   }
 }
 
+std::string contentsIfReadable(const std::string &path) {
+  try {
+    return contentsOf(path);
+  } catch (const Failure &) {
+    return "";
+  }
+}
+
 void fill(SchedNewFile *file, const std::string &contents, mode_t mode) {
   if (!file->open()) throw cannot("make a file beside", withoutSuffix(file->path()));
   struct stat like {};

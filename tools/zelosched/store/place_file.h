@@ -11,6 +11,8 @@
 
 // The contents of a regular file, also through a symbolic link.
 std::string contentsOf(const std::string &path);
+// Nothing where that cannot be read; does not throw.
+std::string contentsIfReadable(const std::string &path);
 
 // Writes the new file to the disk, owned by root and with that mode.
 void fill(SchedNewFile *file, const std::string &contents, mode_t mode);

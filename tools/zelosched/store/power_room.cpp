@@ -14,7 +14,7 @@ constexpr int32_t kPowerOn = 60000000;
 constexpr int32_t kPowerOff = 80000000;
 constexpr int32_t kEnabled = 10000000;
 constexpr int32_t kWeekdays = 10000;
-constexpr int32_t kHour = 100;
+constexpr int32_t kHours = 100;
 
 }  // namespace
 
@@ -26,7 +26,7 @@ int32_t powerId(const ZELO_SCHED_TASK &task) {
   const auto weekdays = static_cast<int32_t>(schedWeekdayMaskOf(task));
   const int32_t base = directionOf(task) == "off" ? kPowerOff : kPowerOn;
   return base + (isEnabled(task) ? kEnabled : 0) + weekdays * kWeekdays +
-         static_cast<int32_t>(task.RunHour) * kHour + static_cast<int32_t>(task.RunMin);
+         static_cast<int32_t>(task.RunHour) * kHours + static_cast<int32_t>(task.RunMin);
 }
 
 PowerRoom::PowerRoom() {

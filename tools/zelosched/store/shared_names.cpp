@@ -16,13 +16,14 @@
 #include <memory>
 #include <string_view>
 
+#include "store/directory.h"
 #include "terminal/failure.h"
 #include "terminal/text.h"
 
 namespace {
 
 constexpr mode_t kPermissions = 07777;
-constexpr char kDirectory[] = "/tmp";
+constexpr char kSharedDirectory[] = "/tmp";
 constexpr std::string_view kScratchPrefix = "scheduled_tasks.tmp.";
 constexpr std::string_view kAsidePrefix = "zeloscheduler.";
 
@@ -76,15 +77,11 @@ void requireNoFault() {
 
 // ---- scratch copies ---------------------------------------------------------------------------
 
-struct CloseDirectory {
-  void operator()(DIR *directory) const { closedir(directory); }
-};
-
 using ActOnName = std::function<void(int directory, const char *name)>;
 
 void forEachName(std::string_view prefix, const ActOnName &act) {
-  const std::unique_ptr<DIR, CloseDirectory> directory(opendir(kDirectory));
-  if (directory == nullptr) throw cannot(std::string("read ") + kDirectory);
+  const Directory directory(opendir(kSharedDirectory));
+  if (directory == nullptr) throw cannot(std::string("read ") + kSharedDirectory);
   while (const dirent *entry = readdir(directory.get())) {
     if (std::string_view(entry->d_name).starts_with(prefix))
       act(dirfd(directory.get()), entry->d_name);
@@ -106,7 +103,7 @@ class AsideDirectory {
 
  private:
   void make() {
-    std::string pattern = std::string(kDirectory) + "/zeloscheduler.XXXXXX";
+    std::string pattern = std::string(kSharedDirectory) + "/zeloscheduler.XXXXXX";
     if (mkdtemp(pattern.data()) == nullptr) throw cannot("make a directory in /tmp");
     path_ = pattern;
   }
@@ -166,7 +163,7 @@ std::vector<std::string> movedAway() {
     struct stat info {};
     const bool isRoots = fstatat(directory, name, &info, AT_SYMLINK_NOFOLLOW) == 0 &&
                          S_ISDIR(info.st_mode) && info.st_uid == 0;
-    if (isRoots) directories.push_back(std::string(kDirectory) + "/" + name);
+    if (isRoots) directories.push_back(std::string(kSharedDirectory) + "/" + name);
   });
   return directories;
 }

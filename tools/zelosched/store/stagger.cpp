@@ -6,6 +6,7 @@
 #include <fstream>
 
 #include "runs/time_limit.h"
+#include "runs/time_units.h"
 #include "schedule_shift.h"
 #include "terminal/failure.h"
 #include "terminal/text.h"
@@ -14,8 +15,6 @@ namespace {
 
 constexpr char kMachineId[] = "/etc/machine-id";
 constexpr size_t kIdLength = 32;
-constexpr int64_t kMinute = 60;
-constexpr int64_t kDay = int64_t{24} * 60 * kMinute;
 
 // Machines without an id have the same word in its place.
 bool isId(const std::string &text) {

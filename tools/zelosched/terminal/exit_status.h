@@ -7,5 +7,5 @@ inline constexpr int kUsage = 2;
 // Of 'apply --dry-run' alone: there is something to do.
 inline constexpr int kToDo = 3;
 // Of 'status' alone.
-inline constexpr int kUnknown = 3;
-inline constexpr int kCritical = 4;
+inline constexpr int kHealthUnknown = 3;
+inline constexpr int kHealthCritical = 4;

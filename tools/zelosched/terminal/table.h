@@ -5,6 +5,9 @@
 #include <string>
 #include <vector>
 
+// In a cell, where there is nothing to tell.
+inline constexpr char kNoValue[] = "-";
+
 struct Column {
   const char *title;
   enum Alignment { kLeft, kRight } alignment = kLeft;

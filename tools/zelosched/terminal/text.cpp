@@ -106,10 +106,10 @@ std::string printableLines(std::string_view text) {
 }
 
 size_t cutCharacterLength(std::string_view text) {
-  constexpr size_t kMostBytes = 4;
+  constexpr size_t kMostOfCharacter = 4;
   constexpr unsigned char kTailMask = 0xC0;
   constexpr unsigned char kTail = 0x80;
-  for (size_t bytes = 1; bytes < kMostBytes && bytes <= text.size(); ++bytes) {
+  for (size_t bytes = 1; bytes < kMostOfCharacter && bytes <= text.size(); ++bytes) {
     const auto byte = static_cast<unsigned char>(text[text.size() - bytes]);
     if ((byte & kTailMask) == kTail) continue;
     return schedBytesOfCharacter(byte) > bytes ? bytes : 0;
