@@ -24,8 +24,8 @@ setting() {
 
 configure() {
   cmake -S "$root" -B "$1" -G "$(setting CMAKE_GENERATOR)" -DCMAKE_BUILD_TYPE=Debug -DCMAKE_CXX_FLAGS_DEBUG=-O0 \
-    -DCMAKE_CXX_COMPILER_LAUNCHER="$(setting CMAKE_CXX_COMPILER_LAUNCHER)" -DZELO_WEB=OFF -DZELO_PLATFORM="$PLATFORM" \
-    "${@:2}" >"$WORK/log" 2>&1
+    -DCMAKE_CXX_COMPILER_LAUNCHER="$(setting CMAKE_CXX_COMPILER_LAUNCHER)" -DCMAKE_UNITY_BUILD=ON -DZELO_WEB=OFF \
+    -DZELO_PLATFORM="$PLATFORM" "${@:2}" >"$WORK/log" 2>&1
 }
 
 is_refused() {

@@ -28,42 +28,53 @@ tidy() {
   clang-tidy -p "$BUILD_DIR" --quiet "$1" 2>/dev/null
 }
 
-# The arguments by which the units of zelosched are compiled, one after a null byte each.
-arguments_of_zelosched() {
+# The arguments by which a unit is compiled, one after a null byte each.
+arguments_of() {
   python3 -c 'import json, shlex, sys
-command = next(unit["command"] for unit in json.load(sys.stdin) if unit["file"].endswith("/zelosched/json/json_out.cpp"))
-print("\0".join(shlex.split(command.split(" -o ")[0])[1:]), end="\0")' <"$BUILD_DIR/compile_commands.json"
+unit = next(unit for unit in json.load(sys.stdin) if unit["file"] == sys.argv[1])
+print("\0".join(shlex.split(unit["command"].split(" -o ")[0])[1:]), end="\0")' "$PWD/$1" <"$BUILD_DIR/compile_commands.json"
 }
 
-# Most of a unit's time goes into what it includes, so some are looked at as one.
+# Most of a unit's time goes into what it includes, so those of a folder are looked at as one. The
+# analyzer leaves included files out unless it is told not to.
 are_tidy_together() {
-  printf '#include "%s"\n' "${@/#/$PWD/}" >"$scratch/together.cpp"
-  clang-tidy --quiet --config="$(cat .clang-tidy)" --checks=-bugprone-suspicious-include "$scratch/together.cpp" -- \
-    "${arguments[@]}" >/dev/null 2>&1
+  local together=$scratch/${1%/*}/together.cpp
+  local -a arguments
+  mkdir -p "${together%/*}"
+  cp --parents .clang-tidy tools/.clang-tidy "$scratch" # it takes the ones above the file that it is given
+  arguments_of "$1" >"$scratch/arguments" # no process substitution, which needs /proc
+  mapfile -d '' arguments <"$scratch/arguments"
+  printf '#include "%s"\n' "${@/#/$PWD/}" >"$together"
+  clang-tidy --quiet --checks=-bugprone-suspicious-include "$together" -- "${arguments[@]}" -Xclang \
+    -analyzer-opt-analyze-headers >/dev/null 2>&1
 }
 
-# Two units may have names in common, so only each by itself tells what is wrong with it. Whether a using
-# declaration is needed is looked for in the file that clang-tidy is given, not in what this includes.
+# The two backends have the same operations, each under the same names. Whether a using declaration is
+# needed is looked for in the file that clang-tidy is given, not in what this includes.
+stands_alone() {
+  [[ $1 == */backends/* ]] || grep -qE '^ *using [A-Za-z_:]+;' "$1"
+}
+
+# Only each unit by itself tells what is wrong with it.
 check_tidiness() {
   local unit
-  if (($# > 1)) && ! grep -qE '^ *using [A-Za-z_:]+;' "$@" && are_tidy_together "$@"; then
-    printf 'ok - clang-tidy: %s\n' "$@"
-    return
+  local -a together=() alone=()
+  for unit in "$@"; do
+    if stands_alone "$unit"; then alone+=("$unit"); else together+=("$unit"); fi
+  done
+  if ((${#together[@]} > 1)) && are_tidy_together "${together[@]}"; then
+    printf 'ok - clang-tidy: %s\n' "${together[@]}"
+    together=()
   fi
-  for unit in "$@"; do check "clang-tidy: $unit" tidy "$unit"; done
+  for unit in "${together[@]}" "${alone[@]}"; do check "clang-tidy: $unit" tidy "$unit"; done
 }
 
-# Three at a time, of different folders where that can be, as these include the same and are named apart.
-check_tidiness_of_zelosched() {
-  local -a files arguments
-  local i groups
-  mapfile -t files <<<"$(printf '%s\n' "${units[@]}" | grep '^tools/zelosched/.*/')"
-  arguments_of_zelosched >"$scratch/arguments" # no process substitution, which needs /proc
-  mapfile -d '' arguments <"$scratch/arguments"
-  groups=$(((${#files[@]} + 2) / 3))
-  for ((i = 0; i < groups; i++)); do
-    check_tidiness "${files[i]}" ${files[i + groups]:+"${files[i + groups]}"} \
-      ${files[i + 2 * groups]:+"${files[i + 2 * groups]}"}
+check_tidiness_of_folders() {
+  local folder
+  local -a in_folder
+  for folder in $(printf '%s\n' "${units[@]%/*}" | sort -u); do
+    mapfile -t in_folder <<<"$(printf '%s\n' "${units[@]}" | grep "^$folder/[^/]*$")"
+    check_tidiness "${in_folder[@]}"
   done
 }
 
@@ -97,10 +108,7 @@ if have cppcheck "sources are checked by cppcheck"; then
   check "libzeloscheduler is checked by cppcheck" cpp_check_library
 fi
 if have clang-tidy "every unit is checked by clang-tidy"; then
-  for unit in "${units[@]}"; do
-    if [[ $unit != tools/zelosched/*/* ]]; then check_tidiness "$unit"; fi
-  done
-  check_tidiness_of_zelosched
+  check_tidiness_of_folders
 fi
 rm -r "$scratch"
 finish
