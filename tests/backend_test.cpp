@@ -65,7 +65,6 @@ int intercepted(const char *szInit, Init real, const char *szName, ZELO_SCHED_BA
   return real(szName, pBackend);
 }
 
-const ErrorRecord kNoError{0, ""};
 constexpr int kEarlierError = 0x1111;
 constexpr char kEarlierFile[] = "earlier.cpp";
 const ErrorRecord kEarlier{kEarlierError, kEarlierFile};

@@ -32,7 +32,6 @@ constexpr char kUnit[] = "backend_zeloautopower.cpp:N ";
 constexpr char kKey[] = "/usr/zelo/bin/zelo_poweroff_feasible_check";
 constexpr char kInjected[] = "[0x0900 injected.cpp:N]";
 constexpr int kInjectedCode = 0x0900;
-const ErrorRecord kNoError{0, ""};
 
 const Entry kDailyOn{1, 127, 7, 30};
 constexpr long kDailyOnId = 71270730;

@@ -36,7 +36,6 @@ constexpr char kCreateTable[] =
     "CREATE TABLE if not exists task_status(status_id INTEGER PRIMARY KEY ASC, pid INTEGER, "
     "timestamp INTEGER, app STRING, task_id INTEGER, status_code INTEGER, comment STRING);";
 constexpr char kLocked[] = "database is locked";
-const ErrorRecord kNoError{0, ""};
 constexpr size_t kMostAttempts = 101;
 constexpr int kRunning = ZELO_SCHED_STATUS_RUNNING;
 constexpr int kFinished = ZELO_SCHED_STATUS_FINISHED;

@@ -25,7 +25,6 @@ constexpr long kId = 7;
 constexpr int32_t kFirst = ZELO_SCHED_BACKEND_SCHEDULE;
 constexpr int32_t kSecond = ZELO_SCHED_BACKEND_AUTOPOWER;
 constexpr int32_t kNobody = -9;
-const ErrorRecord kNoError{0, ""};
 const ErrorRecord kFakesError{kFakeError, kFakeFile};
 
 void expectFailure(int result, const Lines &log, const ErrorRecord &error) {

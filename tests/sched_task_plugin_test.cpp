@@ -16,13 +16,13 @@ namespace {
 
 using support::ErrorRecord;
 using support::errorRecord;
+using support::kNoError;
 using support::logged;
 using support::setText;
 using Lines = std::vector<std::string>;
 
 constexpr int kPre = ZELO_SCHED_PLUGIN_PRE;
 constexpr int kPost = ZELO_SCHED_PLUGIN_POST;
-const ErrorRecord kNoError{0, ""};
 const ErrorRecord kBadArgument{0x0D00, "sched_task_plugin.cpp"};
 
 Lines operator+(Lines first, const Lines &second) {

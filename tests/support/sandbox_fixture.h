@@ -49,6 +49,8 @@ struct ErrorRecord {
   bool operator==(const ErrorRecord &) const = default;
 };
 
+inline const ErrorRecord kNoError{0, ""};
+
 std::ostream &operator<<(std::ostream &out, const ErrorRecord &record);
 
 std::string readFile(const std::string &path);

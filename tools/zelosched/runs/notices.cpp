@@ -1,6 +1,5 @@
 #include "runs/notices.h"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <signal.h>
 #include <spawn.h>
@@ -16,6 +15,7 @@
 #include <cstring>
 
 #include "runs/moment_text.h"
+#include "store/directory.h"
 #include "store/place_file.h"
 #include "terminal/failure.h"
 #include "terminal/text.h"
@@ -39,12 +39,11 @@ bool isBackup(const std::string &name) {
 
 std::vector<std::string> namesIn(const char *directory) {
   std::vector<std::string> names;
-  DIR *const entries = opendir(directory);
+  const Directory entries(opendir(directory));
   if (entries == nullptr) return names;
-  while (const dirent *entry = readdir(entries)) {
+  while (const dirent *entry = readdir(entries.get())) {
     if (!isBackup(entry->d_name)) names.emplace_back(entry->d_name);
   }
-  closedir(entries);
   std::sort(names.begin(), names.end());
   return names;
 }

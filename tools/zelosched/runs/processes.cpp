@@ -1,6 +1,5 @@
 #include "runs/processes.h"
 
-#include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -12,6 +11,7 @@
 #include <sstream>
 #include <string>
 
+#include "store/directory.h"
 #include "terminal/failure.h"
 #include "terminal/number.h"
 
@@ -47,15 +47,14 @@ ProcessStat statOf(pid_t pid) {
 
 std::map<pid_t, ProcessStat> processes() {
   std::map<pid_t, ProcessStat> found;
-  DIR *directory = opendir("/proc");
+  const Directory directory(opendir("/proc"));
   if (directory == nullptr) throw Failure(std::string("cannot read /proc: ") + strerror(errno));
-  while (const dirent *entry = readdir(directory)) {
+  while (const dirent *entry = readdir(directory.get())) {
     const std::optional<int64_t> pid = parseNumber(entry->d_name);
     if (!pid) continue;
     const auto process = static_cast<pid_t>(*pid);
     found[process] = statOf(process);
   }
-  closedir(directory);
   return found;
 }
 
