@@ -5,6 +5,7 @@
 #include <ctime>
 
 #include "commands/command.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "runs/coming_runs.h"
 #include "runs/history_keep.h"
@@ -49,15 +50,7 @@ int catchUpAll(const std::string &span, bool isDryRun) {
   std::vector<MissedTask> all = missedTasks(KeptDatabase(KeptDatabase::kRead), list, since);
   std::erase_if(all, [](const MissedTask &missed) { return missed.times == 0; });
   if (all.empty()) std::printf("no run was missed within %s\n", span.c_str());
-  int status = kDone;
-  for (const MissedTask &missed : all) {
-    try {
-      catchUp(missed, isDryRun);
-    } catch (const Failure &failure) {
-      status = complain(failure.what());
-    }
-  }
-  return status;
+  return forEach(all, [&](const MissedTask &missed) { catchUp(missed, isDryRun); });
 }
 
 int runCatchUp(int argc, char **argv) {

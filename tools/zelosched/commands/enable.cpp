@@ -3,7 +3,7 @@
 
 #include "commands/command.h"
 #include "commands/expected_task.h"
-#include "commands/for_each_id.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "commands/stop_task.h"
 #include "store/change_lock.h"
@@ -47,16 +47,16 @@ int runEnable(int argc, char **argv) {
   const Arguments arguments(argc, argv, kEnableOptions);
   arguments.requireNoCommand();
   const ExpectedTask expected(arguments);
-  return forEachId(parseIds(arguments.operands()),
-                   [&](int64_t id) { setState(id, ZELO_SCHED_STATE_ENABLED, expected); });
+  return forEach(parseIds(arguments.operands()),
+                 [&](int64_t id) { setState(id, ZELO_SCHED_STATE_ENABLED, expected); });
 }
 
 int runDisable(int argc, char **argv) {
   const Arguments arguments(argc, argv, kDisableOptions);
   arguments.requireNoCommand();
   const ExpectedTask expected(arguments);
-  return forEachId(parseIds(arguments.operands()),
-                   [&](int64_t id) { disable(id, arguments.has("stop"), expected); });
+  return forEach(parseIds(arguments.operands()),
+                 [&](int64_t id) { disable(id, arguments.has("stop"), expected); });
 }
 
 }  // namespace

@@ -7,7 +7,7 @@
 #include <utility>
 
 #include "commands/command.h"
-#include "commands/for_each_id.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "json/json_out.h"
 #include "json/task_json.h"
@@ -107,7 +107,7 @@ int runExport(int argc, char **argv) {
   if (arguments.operands().empty()) {
     status = out.addAll();
   } else {
-    status = forEachId(parseIds(arguments.operands()), [&](int64_t id) { out.add(*loadTask(id)); });
+    status = forEach(parseIds(arguments.operands()), [&](int64_t id) { out.add(*loadTask(id)); });
   }
   return std::max(status, out.finish());
 }

@@ -31,9 +31,8 @@ constexpr int64_t kMostLines = 100000000;
 std::string startText(const KeptRun &run) {
   const std::optional<int64_t> moment = run.start ? run.start : run.queued;
   if (!moment) return kNoValue;
-  constexpr int64_t kSecondsPerMinute = 60;
   char seconds[16];
-  std::snprintf(seconds, sizeof seconds, ":%02d", static_cast<int>(*moment % kSecondsPerMinute));
+  std::snprintf(seconds, sizeof seconds, ":%02d", static_cast<int>(*moment % kMinute));
   return minuteText(localMinute(*moment)) + seconds;
 }
 

@@ -9,13 +9,14 @@
 
 #include "check/task_check.h"
 #include "commands/command.h"
-#include "commands/for_each_id.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "json/json_out.h"
 #include "json/task_input.h"
 #include "json/task_json.h"
 #include "runs/coming_runs.h"
 #include "runs/span.h"
+#include "runs/time_units.h"
 #include "store/owner.h"
 #include "store/power_room.h"
 #include "store/task_list.h"
@@ -30,7 +31,7 @@ constexpr Option kNextOptions[] = {
     {"count", Option::kValue, 'n'}, {"within", Option::kValue}, {"preview"}, {"json"}};
 constexpr int64_t kUsualCount = 20;
 constexpr int64_t kMostRuns = 10000;
-constexpr int64_t kLongestSpan = int64_t{366} * 24 * 60 * 60;  // seconds
+constexpr int64_t kLongestSpan = 366 * kDay;
 
 struct Entry {
   LocalMinute run;
@@ -230,7 +231,7 @@ int runNext(int argc, char **argv) {
   if (arguments.operands().empty()) {
     runs.add(std::make_unique<TaskList>());
   } else {
-    status = forEachId(parseIds(arguments.operands()), [&](int64_t id) { addNamed(id, &runs); });
+    status = forEach(parseIds(arguments.operands()), [&](int64_t id) { addNamed(id, &runs); });
   }
   const std::vector<Entry> entries = runs.take(count, last);
   if (arguments.has("json")) {

@@ -5,7 +5,7 @@
 #include <cstdio>
 #include <string>
 
-#include "commands/for_each_id.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "commands/stop_task.h"
 #include "json/wire_json.h"
@@ -96,5 +96,5 @@ int removeTasks(const std::vector<int64_t> &ids, const RemoveRules &rules) {
   if (!rules.isSure && isatty(STDIN_FILENO) != 1) {
     throw UsageError("there is nobody to ask: give --yes to remove without a question");
   }
-  return forEachId(ids, [&](int64_t id) { removeOne(id, rules); });
+  return forEach(ids, [&](int64_t id) { removeOne(id, rules); });
 }

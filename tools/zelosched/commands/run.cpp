@@ -9,7 +9,7 @@
 
 #include "commands/command.h"
 #include "commands/expected_task.h"
-#include "commands/for_each_id.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "runs/history_keep.h"
 #include "runs/result_text.h"
@@ -196,7 +196,7 @@ int runRun(int argc, char **argv) {
   const std::vector<int64_t> ids = parseIds(arguments.operands());
   // Files of a plain user's run in /tmp would block the runs of others.
   if (geteuid() != 0) throw Failure("running tasks takes root's rights");
-  return forEachId(ids, [&](int64_t id) { runOne(id, arguments); });
+  return forEach(ids, [&](int64_t id) { runOne(id, arguments); });
 }
 
 }  // namespace

@@ -7,7 +7,7 @@
 
 #include "check/task_check.h"
 #include "commands/command.h"
-#include "commands/for_each_id.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "json/json_out.h"
 #include "json/task_json.h"
@@ -110,7 +110,7 @@ int runShow(int argc, char **argv) {
   Json::Value top = topObject();
   top["tasks"] = Json::Value(Json::arrayValue);
   bool isFirst = true;
-  const int found = forEachId(ids, [&](int64_t id) {
+  const int found = forEach(ids, [&](int64_t id) {
     const Task task = loadTask(id);
     if (arguments.has("json")) return add(*task, runs, &top);
     if (!isFirst) std::puts("");

@@ -5,15 +5,16 @@
 
 #include "commands/command.h"
 #include "commands/expected_task.h"
-#include "commands/for_each_id.h"
+#include "commands/for_each.h"
 #include "commands/options.h"
 #include "commands/stop_task.h"
+#include "runs/time_units.h"
 #include "terminal/failure.h"
 
 namespace {
 
 constexpr Option kStopOptions[] = {{"grace", Option::kValue}, EXPECTED_TASK_OPTIONS};
-constexpr int64_t kMostGrace = int64_t{24} * 60 * 60;  // seconds
+constexpr int64_t kMostGrace = kDay;
 
 int runStop(int argc, char **argv) {
   const Arguments arguments(argc, argv, kStopOptions);
@@ -23,7 +24,7 @@ int runStop(int argc, char **argv) {
       arguments.number("grace", 0, kMostGrace).value_or(kUsualGrace.count()));
   if (geteuid() != 0) throw Failure("stopping runs takes root's rights");
   const ExpectedTask expected(arguments);
-  return forEachId(ids, [&](int64_t id) {
+  return forEach(ids, [&](int64_t id) {
     const Task task = expected.isAny() ? loadTask(id) : findTask(id);
     if (task) expected.require(*task);
     const std::string title = task ? titleOf(*task) : "task " + std::to_string(id);

@@ -14,6 +14,7 @@
 #include "check/task_check.h"
 #include "json/json_in.h"
 #include "json/json_out.h"
+#include "store/platform_guards.h"
 #include "terminal/failure.h"
 #include "terminal/number.h"
 #include "terminal/text.h"
@@ -23,13 +24,6 @@ namespace {
 constexpr int kHashCapacity = 64;
 constexpr char kCommandKey[] = "cmd";
 constexpr char kCommandBase64Key[] = "cmd base64";
-
-struct FreeHash {
-  void operator()(QLIBC_SZHASH *hash) const { QLIBCSzHashFree(hash); }
-};
-struct FreeList {
-  void operator()(QLIBC_SZLIST *list) const { QLIBCSzListFree(list); }
-};
 
 // The keys whose values are numbers, with the ranges of their fields; all others are texts.
 struct NumberKey {
@@ -215,8 +209,8 @@ std::vector<StoredMember> storedMembersOf(const ZELO_SCHED_TASK &task) {
   const bool filled = rawHash != nullptr && rawKeys != nullptr &&
                       ZELOSchedInitHashFromTask(&rawHash, &task) == 0 &&
                       QLIBCSzHashEnumKey(rawHash, &rawKeys) >= 0;
-  const std::unique_ptr<QLIBC_SZHASH, FreeHash> hash(rawHash);
-  const std::unique_ptr<QLIBC_SZLIST, FreeList> keys(rawKeys);
+  const Hash hash(rawHash);
+  const List keys(rawKeys);
   if (!filled) throw failedTo("convert task " + std::to_string(task.ID));
   std::vector<StoredMember> members;
   for (int i = 0; i < QLIBCSzListCount(keys.get()); ++i) {
@@ -239,7 +233,7 @@ void fillFromJson(const Json::Value &object, ZELO_SCHED_TASK *task) {
   const bool isWire = isWireForm(object);
   PSZHASH raw = QLIBCSzHashAlloc(kHashCapacity);
   if (raw == nullptr) throw failedTo("read a task");
-  std::unique_ptr<QLIBC_SZHASH, FreeHash> hash(raw);
+  Hash hash(raw);
   const auto set = [&](const std::string &key, const std::string &value) {
     PSZHASH handle = hash.release();
     const int result = QLIBCSzHashSetValue(&handle, key.c_str(), value.c_str());

@@ -10,6 +10,7 @@
 #include <map>
 
 #include "terminal/number.h"
+#include "terminal/text.h"
 
 namespace {
 
@@ -20,17 +21,10 @@ constexpr const char *kLocaleFiles[] = {"/etc/environment", "/etc/default/locale
 
 using Variables = std::map<std::string, std::string>;
 
-std::string trimmed(const std::string &text) {
-  constexpr char kBlanks[] = " \t\r";
-  const size_t first = text.find_first_not_of(kBlanks);
-  if (first == std::string::npos) return "";
-  return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
-}
-
-std::string unquoted(const std::string &text) {
+std::string withoutQuotes(std::string_view text) {
   const bool isQuoted = text.size() >= 2 && (text.front() == '"' || text.front() == '\'') &&
                         text.back() == text.front();
-  return isQuoted ? text.substr(1, text.size() - 2) : text;
+  return std::string(isQuoted ? text.substr(1, text.size() - 2) : text);
 }
 
 bool isName(const std::string &text) {
@@ -59,13 +53,13 @@ void addVariables(const char *path, Variables *variables) {
   std::ifstream file(path);
   std::string line;
   while (std::getline(file, line)) {
-    std::string text = trimmed(line);
+    std::string text(trimmed(line));
     constexpr char kExport[] = "export ";
     if (text.starts_with(kExport)) text = trimmed(text.substr(sizeof kExport - 1));
     const size_t sign = text.find('=');
     if (sign == std::string::npos) continue;
-    const std::string name = unquoted(trimmed(text.substr(0, sign)));
-    if (isName(name)) (*variables)[name] = unquoted(trimmed(text.substr(sign + 1)));
+    const std::string name = withoutQuotes(trimmed(text.substr(0, sign)));
+    if (isName(name)) (*variables)[name] = withoutQuotes(trimmed(text.substr(sign + 1)));
   }
 }
 

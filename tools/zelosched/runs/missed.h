@@ -9,10 +9,11 @@
 
 #include "runs/history.h"
 #include "runs/kept_database.h"
+#include "runs/time_units.h"
 #include "store/task_list.h"
 
 // How long a missed time is reported.
-inline constexpr int64_t kMissedRemembered = int64_t{8} * 24 * 60 * 60;  // seconds
+inline constexpr int64_t kMissedRemembered = 8 * kDay;
 
 // Records that the machine is up, and its clock. `isStarting`: cron was not started yet, so that
 // what is due up to this minute was missed for certain. Throws Failure.

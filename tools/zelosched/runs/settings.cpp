@@ -40,13 +40,6 @@ constexpr Setting kSettings[] = {
     {"runs-days", &Settings::runsDays, Kind::kNumber, 0, 36500},
 };
 
-std::string_view trimmed(std::string_view text) {
-  constexpr char kBlanks[] = " \t\r";
-  const size_t first = text.find_first_not_of(kBlanks);
-  if (first == std::string_view::npos) return {};
-  return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
-}
-
 // "64K", "16M", "1G", or a number alone.
 std::optional<int64_t> valueOf(std::string_view text, Kind kind) {
   int64_t unit = 1;

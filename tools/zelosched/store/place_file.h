@@ -11,7 +11,7 @@
 
 // The contents of a regular file, also through a symbolic link.
 std::string contentsOf(const std::string &path);
-// Nothing where that cannot be read; does not throw.
+// Nothing where that fails.
 std::string contentsIfReadable(const std::string &path);
 
 // Writes the new file to the disk, owned by root and with that mode.

@@ -10,6 +10,7 @@
 #include <sstream>
 
 #include "store/place_file.h"
+#include "store/platform_guards.h"
 #include "store/store_files.h"
 #include "store/task_list.h"
 #include "terminal/failure.h"
@@ -17,14 +18,6 @@
 namespace {
 
 constexpr int kHashCapacity = 64;
-
-struct FreeHash {
-  void operator()(QLIBC_SZHASH *hash) const { QLIBCSzHashFree(hash); }
-};
-struct FreeList {
-  void operator()(QLIBC_SZLIST *list) const { QLIBCSzListFree(list); }
-};
-using List = std::unique_ptr<QLIBC_SZLIST, FreeList>;
 
 // Null when the file cannot be read as sections.
 List sectionsOf(const std::string &path) {
@@ -38,7 +31,7 @@ List sectionsOf(const std::string &path) {
 bool isTask(const std::string &path, const char *section) {
   PSZHASH raw = QLIBCSzHashAlloc(kHashCapacity);
   const bool isRead = raw != nullptr && QLIBCFileGetSection(path.c_str(), section, &raw) > 0;
-  const std::unique_ptr<QLIBC_SZHASH, FreeHash> hash(raw);
+  const Hash hash(raw);
   TaskRecord task = {};
   return isRead && ZELOSchedInitTaskFromHash(&task, hash.get()) == 0;
 }
@@ -74,7 +67,7 @@ std::string writtenAnew(const std::string &contents) {
   fill(&scratch, contents, kMode);
   PSZHASH raw = QLIBCSzHashAlloc(1);
   if (raw == nullptr) throw Failure("out of memory");
-  const std::unique_ptr<QLIBC_SZHASH, FreeHash> nothing(raw);
+  const Hash nothing(raw);
   forgetError();
   if (QLIBCFileAddSection(scratch.path(), kSection, nothing.get(), 0) < 0 ||
       QLIBCFileRemoveSection(scratch.path(), kSection) < 0) {

@@ -97,6 +97,13 @@ bool needsQuotes(std::string_view word) {
 
 }  // namespace
 
+std::string_view trimmed(std::string_view text) {
+  constexpr char kBlanks[] = " \t\r";
+  const size_t first = text.find_first_not_of(kBlanks);
+  if (first == std::string_view::npos) return {};
+  return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
+}
+
 std::string printable(std::string_view text) {
   return escaped(text, "");
 }

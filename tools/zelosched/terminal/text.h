@@ -12,6 +12,9 @@ std::string printable(std::string_view text);
 // The same of several lines: line feeds and tabs stay.
 std::string printableLines(std::string_view text);
 
+// The text without blanks, tabs and carriage returns at its ends.
+std::string_view trimmed(std::string_view text);
+
 // The bytes at the end of a text that begin a character whose rest may follow; 0 when there are
 // none.
 size_t cutCharacterLength(std::string_view text);
