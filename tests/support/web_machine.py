@@ -185,11 +185,14 @@ class Server:
 
     def start(self):
         """Anew: a session that nobody uses for a while ends, and with it the server's only one."""
-        self.stop()
         if os.path.exists(self.broken_file):
             os.remove(self.broken_file)
         with open(self.calls_file, "w", encoding="utf-8"):
             os.chmod(self.calls_file, 0o666)
+        self.new_session()
+
+    def new_session(self):
+        self.stop()
         with open(os.path.join(WORK, f"ws.{self.port}.log"), "w", encoding="utf-8") as log:
             self.process = subprocess.Popen(
                 ["/usr/lib/cockpit/cockpit-ws", "--no-tls", "--address", "127.0.0.1", "--port", str(self.port),
@@ -263,7 +266,8 @@ class Browser:
         try:
             self.driver.get(server.url + "#/" + path)
         except TimeoutException:  # Chromium's renderer now and then never begins; the page is not to blame
-            self.driver.execute_cdp_cmd("Network.clearBrowserCookies", {})  # nobody was there, and the session has ended
+            self.driver.execute_cdp_cmd("Network.clearBrowserCookies", {})
+            server.new_session()  # nobody was there, and the session has ended
             self.driver.get(server.url + "#/" + path)
         wait_for("the page is there", lambda: self.find("nav a"))
 
