@@ -44,7 +44,7 @@ def wait_for(what, condition, patience=PATIENCE):
             last = error
         if time.monotonic() > end:
             raise AssertionError(f"not within {patience} s: {what} (last: {last!r})")
-        time.sleep(0.06)
+        time.sleep(0.02)
 
 
 def same(got, wanted):
