@@ -141,8 +141,6 @@ class StoreWalk {
   int fill(ZELO_SCHED_TASK *pTask) { return convert(pTask) < 0 ? -1 : setNextTrigger(pTask); }
 
  private:
-  static constexpr int kDecimal = 10;
-
   ListGuard names_{nullptr};
   HashGuard hash_{nullptr};
   SchedTriggerClock clock_;
